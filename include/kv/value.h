@@ -1,0 +1,236 @@
+// The property value model: dynamically typed, reference-counted values shared by reference.
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <initializer_list>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "kv/ref.h"
+
+namespace tally {
+
+enum class KvType : std::uint8_t { String, Number, Boolean, Date, Data, Array, Dictionary };
+
+// Base of all values. Created only through the create functions of the concrete types, which
+// return an owning KvRef. Reference counting is safe from any thread; changing a container is not.
+class KvObject {
+ public:
+  KvObject(const KvObject&) = delete;
+  KvObject& operator=(const KvObject&) = delete;
+
+  KvType type() const noexcept { return type_; }
+  void retain() const noexcept { references_.fetch_add(1, std::memory_order_relaxed); }
+  void release() const noexcept;
+
+ protected:
+  explicit KvObject(KvType type) noexcept : type_(type) {}
+  ~KvObject() = default;
+
+ private:
+  mutable std::atomic<std::uint32_t> references_{1};
+  const KvType type_;
+};
+
+// The value as a T, or null when it is null or of another type.
+template <class T>
+T* kvCast(KvObject* object) noexcept {
+  return object != nullptr && object->type() == T::kType ? static_cast<T*>(object) : nullptr;
+}
+template <class T>
+const T* kvCast(const KvObject* object) noexcept {
+  return object != nullptr && object->type() == T::kType ? static_cast<const T*>(object) : nullptr;
+}
+
+// Immutable text. Always valid UTF-8: bytes that are not become U+FFFD when it is created.
+class KvString final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::String;
+  static KvRef<KvString> create(std::string_view text);
+  std::string_view view() const noexcept {
+    return {reinterpret_cast<const char*>(this + 1), size_};  // the text follows the object
+  }
+
+ private:
+  friend class KvObject;
+  friend class KvDictionary;
+  KvString() noexcept : KvObject(kType) {}
+  std::uint32_t hash_ = 0;
+  std::size_t size_ = 0;
+};
+
+// The width and signedness that a number was created with; kept through copies and documents.
+enum class KvNumberKind : std::uint8_t { Int8, Int32, Int64, UInt32, UInt64, Float, Double };
+
+class KvNumber final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Number;
+  static KvRef<KvNumber> int8(std::int8_t value);
+  static KvRef<KvNumber> int32(std::int32_t value);
+  static KvRef<KvNumber> int64(std::int64_t value);
+  static KvRef<KvNumber> uint32(std::uint32_t value);
+  static KvRef<KvNumber> uint64(std::uint64_t value);
+  static KvRef<KvNumber> float32(float value);
+  static KvRef<KvNumber> float64(double value);
+
+  KvNumberKind kind() const noexcept { return kind_; }
+  bool isReal() const noexcept { return kind_ >= KvNumberKind::Float; }
+  bool isUnsigned() const noexcept {
+    return kind_ == KvNumberKind::UInt32 || kind_ == KvNumberKind::UInt64;
+  }
+  // Integers keep their low bits when they are read in a narrower type; reals are truncated
+  // toward zero and saturate at the type's ends, and a NaN reads as 0.
+  std::int32_t asInt32() const noexcept;
+  std::int64_t asInt64() const noexcept;
+  std::uint32_t asUInt32() const noexcept;
+  std::uint64_t asUInt64() const noexcept;
+  double asDouble() const noexcept;
+
+ private:
+  friend class KvObject;
+  explicit KvNumber(KvNumberKind kind) noexcept : KvObject(kType), kind_(kind) {}
+  static KvNumber* make(KvNumberKind kind);
+  const KvNumberKind kind_;
+  union {
+    std::int64_t integer_;  // UInt64 keeps its bits here
+    double real_;
+  };
+};
+
+class KvBoolean final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Boolean;
+  // One of the two shared values.
+  static KvRef<KvBoolean> of(bool value);
+  bool value() const noexcept { return value_; }
+
+ private:
+  friend class KvObject;
+  explicit KvBoolean(bool value) noexcept : KvObject(kType), value_(value) {}
+  const bool value_;
+};
+
+class KvDate final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Date;
+  // Seconds since 1970-01-01 00:00 UTC.
+  static KvRef<KvDate> create(double secondsSince1970);
+  double secondsSince1970() const noexcept { return seconds_; }
+
+ private:
+  friend class KvObject;
+  explicit KvDate(double seconds) noexcept : KvObject(kType), seconds_(seconds) {}
+  const double seconds_;
+};
+
+class KvData final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Data;
+  static KvRef<KvData> create(std::span<const std::byte> bytes);
+  std::span<const std::byte> bytes() const noexcept { return bytes_; }
+
+ private:
+  friend class KvObject;
+  explicit KvData(std::span<const std::byte> bytes)
+      : KvObject(kType), bytes_(bytes.begin(), bytes.end()) {}
+  const std::vector<std::byte> bytes_;
+};
+
+class KvArray final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Array;
+  static KvRef<KvArray> create(std::size_t capacity = 0);
+  static KvRef<KvArray> create(std::initializer_list<KvRef<KvObject>> items);
+
+  std::size_t size() const noexcept { return items_.size(); }
+  bool empty() const noexcept { return items_.empty(); }
+  // Borrowed; null past the end.
+  KvObject* get(std::size_t index) const noexcept {
+    return index < items_.size() ? items_[index].get() : nullptr;
+  }
+  template <class T>
+  T* getAs(std::size_t index) const noexcept {
+    return kvCast<T>(get(index));
+  }
+  // A null item is not added: an array never holds an absent value.
+  void append(KvRef<KvObject> item);
+  void removeAt(std::size_t index);
+  auto begin() const noexcept { return items_.begin(); }
+  auto end() const noexcept { return items_.end(); }
+  // A new array of the same items.
+  KvRef<KvArray> copy() const;
+
+ private:
+  friend class KvObject;
+  KvArray() noexcept : KvObject(kType) {}
+  std::vector<KvRef<KvObject>> items_;
+};
+
+// String keys to values, enumerated in the order of first insertion. A small dictionary is a flat
+// vector; a larger one carries a hash index.
+class KvDictionary final : public KvObject {
+ public:
+  static constexpr KvType kType = KvType::Dictionary;
+  struct Entry {
+    KvRef<KvString> key;
+    KvRef<KvObject> value;
+  };
+
+  static KvRef<KvDictionary> create(std::size_t capacity = 0);
+  static KvRef<KvDictionary> create(
+      std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries);
+
+  std::size_t size() const noexcept { return entries_.size(); }
+  bool empty() const noexcept { return entries_.empty(); }
+  bool contains(std::string_view key) const noexcept { return get(key) != nullptr; }
+  // Borrowed; null when the key is missing.
+  KvObject* get(std::string_view key) const noexcept;
+  // Null when the key is missing or its value is of another type.
+  template <class T>
+  T* getAs(std::string_view key) const noexcept {
+    return kvCast<T>(get(key));
+  }
+  // Empty when the key is missing or its value is not a number (string, boolean).
+  std::optional<std::int64_t> getInt64(std::string_view key) const noexcept;
+  std::optional<double> getDouble(std::string_view key) const noexcept;
+  std::optional<bool> getBool(std::string_view key) const noexcept;
+  std::optional<std::string_view> getString(std::string_view key) const noexcept;
+
+  // Replaces in place or adds at the end; a null value removes the key.
+  void set(std::string_view key, KvRef<KvObject> value);
+  // The same with a key object that is shared instead of copied.
+  void set(const KvRef<KvString>& key, KvRef<KvObject> value);
+  // Keeps the order of the others; costs the length of the dictionary.
+  bool remove(std::string_view key);
+  // Sets every entry of other in this dictionary.
+  void merge(const KvDictionary& other);
+  auto begin() const noexcept { return entries_.begin(); }
+  auto end() const noexcept { return entries_.end(); }
+  // A new dictionary of the same keys and values.
+  KvRef<KvDictionary> copy() const;
+
+ private:
+  friend class KvObject;
+  KvDictionary() noexcept : KvObject(kType) {}
+  std::size_t find(std::string_view key, std::uint32_t hash) const noexcept;
+  void append(KvRef<KvString> key, KvRef<KvObject> value);
+  void rebuildIndex();
+  std::vector<Entry> entries_;
+  std::vector<std::uint32_t> index_;  // open addressing: entry number + 1, 0 = free
+};
+
+// Same type and same content, at any depth to 512. Numbers compare by value, whatever their width.
+bool kvEqual(const KvObject* a, const KvObject* b);
+
+// The one text form of a value, as messages and labels show it: a string is itself, integers are
+// decimal, reals the shortest text that reads back equal ("inf", "-inf", "nan"), booleans "1" and
+// "0", containers indented over several lines. Null gives "(null)".
+std::string kvText(const KvObject* value);
+
+}  // namespace tally

@@ -1,0 +1,21 @@
+// Numbers as text and back, the same on every machine and in every locale.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace tally {
+
+void appendInt64(std::string& out, std::int64_t value);
+void appendUInt64(std::string& out, std::uint64_t value);
+// Shortest text that reads back equal: "2.5", "10", "1e+22", "inf", "-inf", "nan".
+void appendDouble(std::string& out, double value);
+
+// The whole text as a number, or nothing: no blanks, no sign but a leading '-', no overflow.
+std::optional<std::int64_t> parseInt64(std::string_view text);
+// Also "inf", "-inf" and "nan".
+std::optional<double> parseDouble(std::string_view text);
+
+}  // namespace tally

@@ -1,0 +1,66 @@
+// The metrics store: per-day scalars and distributions.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string_view>
+
+#include "kv/value.h"
+
+namespace tally {
+
+// The samples of one distribution key on one day, in the order in which they were recorded.
+class DistributionValues {
+ public:
+  virtual ~DistributionValues() = default;
+  // Copies up to capacity further samples to values, and each one's seconds into the day to
+  // offsets unless that is null. Returns how many; 0 at the end.
+  virtual std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) = 0;
+  // The next sample and its seconds into the day; false at the end.
+  bool nextValue(double* value, std::uint32_t* offset) {
+    return nextValues(value, offset, 1) == 1;
+  }
+};
+
+// Reads a consistent state of the store: what others write meanwhile is not seen.
+class HistoryStore {
+ public:
+  // stop is false at the call; setting it ends the enumeration after this row.
+  using ScalarHandler = std::function<void(std::string_view key, std::int32_t day,
+                                           std::int64_t value, bool& stop)>;
+  using DistributionHandler = std::function<void(std::string_view key, std::int32_t day,
+                                                 DistributionValues& values, bool& stop)>;
+  virtual ~HistoryStore() = default;
+  // Calls the handler, before returning, for every row whose key begins with keyPrefix and whose
+  // day lies in (minimumDay, maximumDay], ordered by day and then by key (bytewise).
+  virtual void enumerateScalars(std::string_view keyPrefix, std::int32_t minimumDay,
+                                std::int32_t maximumDay, const ScalarHandler& handler) = 0;
+  virtual void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
+                                      std::int32_t maximumDay,
+                                      const DistributionHandler& handler) = 0;
+};
+
+// The instant at which a day begins (UTC).
+KvRef<KvDate> DayToDate(std::int32_t day);
+
+class MetricsStore {
+ public:
+  virtual ~MetricsStore() = default;
+  // Whole days since 1970-01-01 UTC, now.
+  virtual std::int32_t TBDaysSince1970() = 0;
+  // Folds new samples into their day's chunks and forgets days older than 30.
+  virtual void TBClientCheckpoint() = 0;
+  // Sets the scalar for the day in progress; a store that does not exist yet is created. A failure
+  // is logged.
+  virtual void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
+  // Scalars set between these two are one transaction.
+  virtual void beginBatch() = 0;
+  virtual void endBatch() = 0;
+  // The history of the store on its default path. Never null: a store that is missing has no rows,
+  // one that cannot be read has none either and the reason is logged at error level.
+  virtual std::unique_ptr<HistoryStore> openHistory() = 0;
+};
+
+}  // namespace tally

@@ -1,0 +1,68 @@
+// Platform: one of each service that the program calls.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <string_view>
+#include <utility>
+
+#include <fmt/format.h>
+
+#include "platform/applications.h"
+#include "platform/clock.h"
+#include "platform/crash_reporting.h"
+#include "platform/device_information.h"
+#include "platform/event_loop.h"
+#include "platform/files.h"
+#include "platform/kernel_values.h"
+#include "platform/log_submission.h"
+#include "platform/metrics_store.h"
+#include "platform/preferences.h"
+#include "platform/run_lock.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// The services; none is null once the platform is installed. Shared, so that a variant of a
+// platform (a preview that must change nothing) can replace some and keep the rest.
+struct Platform {
+  std::shared_ptr<SystemLog> log;
+  std::shared_ptr<Clock> clock;
+  std::shared_ptr<EventLoop> eventLoop;
+  std::shared_ptr<Files> files;
+  std::shared_ptr<RunLock> runLock;
+  std::shared_ptr<Preferences> preferences;
+  std::shared_ptr<MetricsStore> metricsStore;
+  std::shared_ptr<LogSubmission> logSubmission;
+  std::shared_ptr<CrashReporting> crashReporting;
+  std::shared_ptr<CrashSupportLibrary> crashSupportLibrary;
+  std::shared_ptr<DeviceInformation> deviceInformation;
+  std::shared_ptr<AppRegistry> appRegistry;
+  std::shared_ptr<Locale> locale;
+  std::shared_ptr<KernelValues> kernelValues;
+};
+
+// The platform in force. REQUIRES: one is installed.
+Platform& platform();
+
+// Installs a platform for a scope and puts the former one back at its end.
+class PlatformScope {
+ public:
+  explicit PlatformScope(Platform services);
+  ~PlatformScope();
+  PlatformScope(const PlatformScope&) = delete;
+  PlatformScope& operator=(const PlatformScope&) = delete;
+
+ private:
+  Platform services_;
+  Platform* former_;
+};
+
+// Writes a formatted message; the arguments are not formatted when nobody would see it.
+template <class... Arguments>
+void logMessage(LogLevel level, fmt::format_string<Arguments...> format, Arguments&&... arguments) {
+  SystemLog& log = *platform().log;
+  if (log.enabled(level)) log.write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
+}
+
+}  // namespace tally

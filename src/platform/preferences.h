@@ -1,0 +1,32 @@
+// The preference store of the program's own user.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "kv/value.h"
+
+namespace tally {
+
+// Values by key and domain. Writes are seen by later reads at once and reach storage at
+// SMAPreferencesSynchronize of their domain, or when the program ends normally.
+class Preferences {
+ public:
+  virtual ~Preferences() = default;
+  // Null when the key is absent.
+  virtual KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view domain) = 0;
+  // A null value removes the key.
+  virtual void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
+                                      std::string_view domain) = 0;
+  // Makes the domain's writes durable, in one atomic replacement. False when that failed; the
+  // reason is logged and the writes are kept for the next attempt.
+  virtual bool SMAPreferencesSynchronize(std::string_view domain) = 0;
+
+  // 0 when the key is absent or not a number.
+  std::int32_t SMAPreferencesGetIntegerValue(std::string_view key, std::string_view domain);
+  // False when the key is absent or neither a boolean nor a number; *exists (when given) tells
+  // whether there is such a value.
+  bool SMAPreferencesGetBoolValue(std::string_view key, std::string_view domain, bool* exists);
+};
+
+}  // namespace tally
