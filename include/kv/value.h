@@ -95,7 +95,8 @@ class KvNumber final : public KvObject {
  private:
   friend class KvObject;
   explicit KvNumber(KvNumberKind kind) noexcept : KvObject(kType), kind_(kind) {}
-  static KvNumber* make(KvNumberKind kind);
+  static KvRef<KvNumber> makeInteger(KvNumberKind kind, std::int64_t bits);
+  static KvRef<KvNumber> makeReal(KvNumberKind kind, double value);
   const KvNumberKind kind_;
   union {
     std::int64_t integer_;  // UInt64 keeps its bits here

@@ -12,6 +12,8 @@ void appendInt64(std::string& out, std::int64_t value);
 void appendUInt64(std::string& out, std::uint64_t value);
 // Shortest text that reads back equal: "2.5", "10", "1e+22", "inf", "-inf", "nan".
 void appendDouble(std::string& out, double value);
+// The same for a single, whose shortest text is not that of the double of equal value.
+void appendFloat(std::string& out, float value);
 
 // The whole text as a number, or nothing: no blanks, no sign but a leading '-', no overflow.
 std::optional<std::int64_t> parseInt64(std::string_view text);

@@ -1,0 +1,140 @@
+// KvDictionary: a vector of entries in insertion order, with a hash index once it is large.
+#include <bit>
+
+#include "kv/hash.h"
+#include "kv/value.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kFlatEntries = 12;  // up to here a scan beats a hash index
+constexpr std::size_t kNotFound = static_cast<std::size_t>(-1);
+
+}  // namespace
+
+KvRef<KvDictionary> KvDictionary::create(std::size_t capacity) {
+  auto dictionary = KvRef<KvDictionary>::adopt(new KvDictionary());
+  dictionary->entries_.reserve(capacity);
+  return dictionary;
+}
+
+KvRef<KvDictionary> KvDictionary::create(
+    std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries) {
+  auto dictionary = create(entries.size());
+  for (const auto& [key, value] : entries) dictionary->set(key, value);
+  return dictionary;
+}
+
+std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const noexcept {
+  if (index_.empty()) {
+    for (std::size_t i = 0; i < entries_.size(); ++i) {
+      if (entries_[i].key->view() == key) return i;
+    }
+    return kNotFound;
+  }
+  const std::size_t mask = index_.size() - 1;
+  for (std::size_t slot = hash & mask; index_[slot] != 0; slot = (slot + 1) & mask) {
+    const Entry& entry = entries_[index_[slot] - 1];
+    if (entry.key->hash_ == hash && entry.key->view() == key) return index_[slot] - 1;
+  }
+  return kNotFound;
+}
+
+KvObject* KvDictionary::get(std::string_view key) const noexcept {
+  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  return found == kNotFound ? nullptr : entries_[found].value.get();
+}
+
+void KvDictionary::rebuildIndex() {
+  if (entries_.size() <= kFlatEntries) {
+    index_.clear();
+    return;
+  }
+  index_.assign(std::bit_ceil(entries_.size() * 2), 0);
+  const std::size_t mask = index_.size() - 1;
+  for (std::size_t i = 0; i < entries_.size(); ++i) {
+    std::size_t slot = entries_[i].key->hash_ & mask;
+    while (index_[slot] != 0) slot = (slot + 1) & mask;
+    index_[slot] = static_cast<std::uint32_t>(i + 1);
+  }
+}
+
+void KvDictionary::append(KvRef<KvString> key, KvRef<KvObject> value) {
+  const std::uint32_t hash = key->hash_;
+  entries_.push_back({std::move(key), std::move(value)});
+  // At most three quarters full, so that a search stays short.
+  if (entries_.size() > kFlatEntries && entries_.size() * 4 > index_.size() * 3) {
+    rebuildIndex();
+  } else if (!index_.empty()) {
+    const std::size_t mask = index_.size() - 1;
+    std::size_t slot = hash & mask;
+    while (index_[slot] != 0) slot = (slot + 1) & mask;
+    index_[slot] = static_cast<std::uint32_t>(entries_.size());
+  }
+}
+
+void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
+  if (!value) {
+    remove(key);
+    return;
+  }
+  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  if (found != kNotFound) {
+    entries_[found].value = std::move(value);
+  } else {
+    set(KvString::create(key), std::move(value));
+  }
+}
+
+void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
+  const std::size_t found = find(key->view(), key->hash_);
+  if (!value) {
+    if (found != kNotFound) remove(key->view());
+  } else if (found != kNotFound) {
+    entries_[found].value = std::move(value);
+  } else {
+    append(key, std::move(value));
+  }
+}
+
+bool KvDictionary::remove(std::string_view key) {
+  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  if (found == kNotFound) return false;
+  entries_.erase(entries_.begin() + static_cast<std::ptrdiff_t>(found));
+  rebuildIndex();
+  return true;
+}
+
+void KvDictionary::merge(const KvDictionary& other) {
+  if (&other == this) return;
+  for (const Entry& entry : other.entries_) set(entry.key, entry.value);
+}
+
+KvRef<KvDictionary> KvDictionary::copy() const {
+  auto dictionary = create(0);
+  dictionary->entries_ = entries_;
+  dictionary->index_ = index_;
+  return dictionary;
+}
+
+std::optional<std::int64_t> KvDictionary::getInt64(std::string_view key) const noexcept {
+  const auto* number = getAs<KvNumber>(key);
+  return number != nullptr ? std::optional(number->asInt64()) : std::nullopt;
+}
+
+std::optional<double> KvDictionary::getDouble(std::string_view key) const noexcept {
+  const auto* number = getAs<KvNumber>(key);
+  return number != nullptr ? std::optional(number->asDouble()) : std::nullopt;
+}
+
+std::optional<bool> KvDictionary::getBool(std::string_view key) const noexcept {
+  const auto* boolean = getAs<KvBoolean>(key);
+  return boolean != nullptr ? std::optional(boolean->value()) : std::nullopt;
+}
+
+std::optional<std::string_view> KvDictionary::getString(std::string_view key) const noexcept {
+  const auto* string = getAs<KvString>(key);
+  return string != nullptr ? std::optional(string->view()) : std::nullopt;
+}
+
+}  // namespace tally

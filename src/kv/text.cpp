@@ -1,0 +1,146 @@
+// Text form and equality of values.
+#include <algorithm>
+
+#include "base/number_text.h"
+#include "base/time_text.h"
+#include "kv/value.h"
+
+namespace tally {
+namespace {
+
+constexpr int kMaximumDepth = 512;  // deeper is a cycle or not worth showing
+
+void appendNumber(std::string& out, const KvNumber& number) {
+  if (number.kind() == KvNumberKind::Float) {
+    appendFloat(out, static_cast<float>(number.asDouble()));
+  } else if (number.isReal()) {
+    appendDouble(out, number.asDouble());
+  } else if (number.isUnsigned()) {
+    appendUInt64(out, number.asUInt64());
+  } else {
+    appendInt64(out, number.asInt64());
+  }
+}
+
+void appendData(std::string& out, const KvData& data) {
+  static constexpr char kDigits[] = "0123456789abcdef";
+  out += '<';
+  for (const std::byte byte : data.bytes()) {
+    const auto value = std::to_integer<unsigned>(byte);
+    out += kDigits[value >> 4];
+    out += kDigits[value & 15];
+  }
+  out += '>';
+}
+
+void appendText(std::string& out, const KvObject* value, int depth) {
+  if (value == nullptr) {
+    out += "(null)";
+    return;
+  }
+  if (depth > kMaximumDepth) {
+    out += "...";
+    return;
+  }
+  const auto indent = [&](int levels) { out.append(static_cast<std::size_t>(levels) * 4, ' '); };
+  switch (value->type()) {
+    case KvType::String:
+      out += static_cast<const KvString*>(value)->view();
+      return;
+    case KvType::Number:
+      appendNumber(out, *static_cast<const KvNumber*>(value));
+      return;
+    case KvType::Boolean:
+      out += static_cast<const KvBoolean*>(value)->value() ? '1' : '0';
+      return;
+    case KvType::Date:
+      appendTimestamp(out, static_cast<const KvDate*>(value)->secondsSince1970());
+      return;
+    case KvType::Data:
+      appendData(out, *static_cast<const KvData*>(value));
+      return;
+    case KvType::Array: {
+      const auto& array = *static_cast<const KvArray*>(value);
+      out += "(\n";
+      for (std::size_t i = 0; i < array.size(); ++i) {
+        indent(depth + 1);
+        appendText(out, array.get(i), depth + 1);
+        out += i + 1 < array.size() ? ",\n" : "\n";
+      }
+      indent(depth);
+      out += ')';
+      return;
+    }
+    case KvType::Dictionary:
+      out += "{\n";
+      for (const auto& entry : *static_cast<const KvDictionary*>(value)) {
+        indent(depth + 1);
+        out += entry.key->view();
+        out += " = ";
+        appendText(out, entry.value.get(), depth + 1);
+        out += ";\n";
+      }
+      indent(depth);
+      out += '}';
+      return;
+  }
+}
+
+bool equalNumbers(const KvNumber& a, const KvNumber& b) {
+  if (a.isReal() || b.isReal()) return a.asDouble() == b.asDouble();
+  const bool aHuge = a.kind() == KvNumberKind::UInt64 && a.asInt64() < 0;
+  const bool bHuge = b.kind() == KvNumberKind::UInt64 && b.asInt64() < 0;
+  return aHuge == bHuge && a.asInt64() == b.asInt64();
+}
+
+bool equal(const KvObject* a, const KvObject* b, int depth) {
+  if (a == b) return true;
+  if (a == nullptr || b == nullptr || a->type() != b->type() || depth > kMaximumDepth) return false;
+  switch (a->type()) {
+    case KvType::String:
+      return static_cast<const KvString*>(a)->view() == static_cast<const KvString*>(b)->view();
+    case KvType::Number:
+      return equalNumbers(*static_cast<const KvNumber*>(a), *static_cast<const KvNumber*>(b));
+    case KvType::Boolean:
+      return false;  // each value exists once
+    case KvType::Date:
+      return static_cast<const KvDate*>(a)->secondsSince1970() ==
+             static_cast<const KvDate*>(b)->secondsSince1970();
+    case KvType::Data: {
+      const auto x = static_cast<const KvData*>(a)->bytes();
+      const auto y = static_cast<const KvData*>(b)->bytes();
+      return std::equal(x.begin(), x.end(), y.begin(), y.end());
+    }
+    case KvType::Array: {
+      const auto& x = *static_cast<const KvArray*>(a);
+      const auto& y = *static_cast<const KvArray*>(b);
+      if (x.size() != y.size()) return false;
+      for (std::size_t i = 0; i < x.size(); ++i) {
+        if (!equal(x.get(i), y.get(i), depth + 1)) return false;
+      }
+      return true;
+    }
+    case KvType::Dictionary: {
+      const auto& x = *static_cast<const KvDictionary*>(a);
+      const auto& y = *static_cast<const KvDictionary*>(b);
+      if (x.size() != y.size()) return false;
+      for (const auto& entry : x) {
+        if (!equal(entry.value.get(), y.get(entry.key->view()), depth + 1)) return false;
+      }
+      return true;
+    }
+  }
+  return false;
+}
+
+}  // namespace
+
+bool kvEqual(const KvObject* a, const KvObject* b) { return equal(a, b, 0); }
+
+std::string kvText(const KvObject* value) {
+  std::string out;
+  appendText(out, value, 0);
+  return out;
+}
+
+}  // namespace tally
