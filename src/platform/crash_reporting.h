@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <string_view>
 
 #include "kv/value.h"
 
@@ -20,15 +21,22 @@ class CrashReporting {
   virtual void rollFixlineLogs() = 0;
 };
 
-// The crash-reporting support library, which a product may ship without. It is opened on first use;
-// its entry points reach the preferences.
+// The crash-reporting support library, which a product may ship without. Its entry points give
+// access to the preferences.
 class CrashSupportLibrary {
  public:
   virtual ~CrashSupportLibrary() = default;
-  // False when there is no such library. May be called again.
-  virtual bool open() = 0;
-  // True when the opened library has the entry point of this name.
-  virtual bool hasSymbol(const char* name) = 0;
+  // Loads the library; false when the device has none at that path. May be called again.
+  virtual bool open(std::string_view path) = 0;
+  // True when the loaded library has the entry point of this name.
+  virtual bool hasSymbol(std::string_view name) = 0;
+
+  // The entry points found so far, kept for the rest of the process.
+  struct Accessors {
+    bool getIntegerValue = false;
+    bool setValue = false;
+  };
+  Accessors accessors;
 };
 
 }  // namespace tally

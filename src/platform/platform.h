@@ -23,6 +23,12 @@
 
 namespace tally {
 
+// The answer to a question that is asked once per process.
+struct OnceBoolean {
+  std::once_flag asked;
+  bool answer = false;
+};
+
 // The services; none is null once the platform is installed. Shared, so that a variant of a
 // platform (a preview that must change nothing) can replace some and keep the rest.
 struct Platform {
@@ -40,6 +46,7 @@ struct Platform {
   std::shared_ptr<AppRegistry> appRegistry;
   std::shared_ptr<Locale> locale;
   std::shared_ptr<KernelValues> kernelValues;
+  std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 
 // The platform in force. REQUIRES: one is installed.
