@@ -1,0 +1,77 @@
+// TBConfig: the key whitelist, read once for each report.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "config/key_table.h"
+#include "config/scalar_options.h"
+#include "kv/value.h"
+
+namespace tally {
+
+constexpr std::string_view kWhitelistPath =
+    "/Library/Application Support/Tallybook/Whitelist_Nimbus.plist";
+// The group that exists on internal devices only.
+constexpr std::string_view kInternalTestingGroup = "InternalTesting";
+// Boolean preferences named like a group switch that group on or off in this domain.
+constexpr std::string_view kGroupSwitchDomain = "vellum.da";
+
+// How a key came to be admitted.
+enum class WhitelistMatchKind { None, Exact, Prefix, InternalDevice };
+struct WhitelistMatch {
+  WhitelistMatchKind kind = WhitelistMatchKind::None;
+  const WhitelistEntry* entry = nullptr;   // for Exact and Prefix
+  const ScalarOptions* options = nullptr;  // null for None; borrowed from the TBConfig
+};
+
+// Why a group of the file is not in force.
+struct SkippedGroup {
+  std::string name;
+  std::string reason;
+};
+
+class TBConfig {
+ public:
+  // Reads the whitelist file. Null when it cannot be read or parsed; the reason is logged. A group,
+  // section or option that is malformed is left out with one error line that names it.
+  static std::unique_ptr<TBConfig> init();
+
+  // Null: the key must not be reported. Any dictionary, empty or not: report it with these options.
+  // The dictionary lives as long as the TBConfig and must not be changed.
+  const ScalarOptions* configOptionsForScalarKey(std::string_view key) const;
+  const ScalarOptions* configOptionsForDistributionKey(std::string_view key) const;
+  // MD5 of the file's bytes as read, 32 lowercase hexadecimal digits.
+  const std::string& configFileDigest() const { return _configFileDigest; }
+
+  // The same answers with their reasons, for tools; nothing is logged.
+  WhitelistMatch matchScalarKey(std::string_view key) const;
+  WhitelistMatch matchDistributionKey(std::string_view key) const;
+  const std::vector<SkippedGroup>& skippedGroups() const { return _skippedGroups; }
+  const KeyTable& scalarKeys() const { return _scalarKeys; }
+  const KeyTable& scalarPrefixes() const { return _scalarPrefixes; }
+  const KeyTable& distributionKeys() const { return _distributionKeys; }
+  const KeyTable& distributionPrefixes() const { return _distributionPrefixes; }
+
+ private:
+  TBConfig() = default;
+  void addGroups(const KvDictionary& root);
+  bool groupIsInForce(std::string_view group);
+  void addGroup(const KvRef<KvString>& group, const KvDictionary& sections);
+  void addSection(const KvRef<KvString>& group, std::string_view section, const KvDictionary& keys,
+                  KeyTable& table);
+  WhitelistMatch match(std::string_view key, const KeyTable& keys, const KeyTable& prefixes) const;
+
+  KeyTable _scalarKeys;
+  KeyTable _scalarPrefixes;
+  KeyTable _distributionKeys;
+  KeyTable _distributionPrefixes;
+  bool _isInternalDevice = false;
+  std::string _configFileDigest;
+  std::vector<SkippedGroup> _skippedGroups;
+  KvRef<KvDictionary> _noOptions = KvDictionary::create();
+};
+
+}  // namespace tally

@@ -1,0 +1,20 @@
+#include "config/internal_device.h"
+
+#include "platform/platform.h"
+
+namespace tally {
+
+bool TBIsInternalDevice() {
+  OnceBoolean& once = *platform().internalDevice;
+  std::call_once(once.asked, [&once] {
+    const auto answer = platform().deviceInformation->DeviceQuery("InternalBuild");
+    if (const auto* boolean = kvCast<KvBoolean>(answer.get())) {
+      once.answer = boolean->value();
+    } else if (const auto* number = kvCast<KvNumber>(answer.get())) {
+      once.answer = number->asInt64() != 0;
+    }
+  });
+  return once.answer;
+}
+
+}  // namespace tally

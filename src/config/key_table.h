@@ -1,0 +1,44 @@
+// KeyTable: whitelisted keys or key prefixes of one kind, with their options.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "kv/value.h"
+
+namespace tally {
+
+struct WhitelistEntry {
+  KvRef<KvString> key;  // the exact key, or the prefix
+  KvRef<KvDictionary> options;
+  KvRef<KvString> group;  // the group that it was taken from
+};
+
+class KeyTable {
+ public:
+  // Replaces the entry of the same key that an earlier group put there.
+  void set(WhitelistEntry entry);
+  // Makes longestPrefix() usable; nothing may be set afterwards.
+  void buildPrefixIndex();
+
+  // Null when there is none.
+  const WhitelistEntry* exact(std::string_view key) const;
+  // The longest entry with which key begins. Costs the logarithm of the table's size, and a step for
+  // each further entry that nests inside it.
+  const WhitelistEntry* longestPrefix(std::string_view key) const;
+  const std::vector<WhitelistEntry>& entries() const { return entries_; }
+
+ private:
+  static constexpr std::uint32_t kNone = UINT32_MAX;
+  struct SortedPrefix {
+    std::uint32_t entry;   // into entries_
+    std::uint32_t parent;  // the longest other prefix that this one begins with, into sorted_
+  };
+  std::vector<WhitelistEntry> entries_;
+  std::unordered_map<std::string_view, std::uint32_t> positions_;  // views into the entries' keys
+  std::vector<SortedPrefix> sorted_;
+};
+
+}  // namespace tally
