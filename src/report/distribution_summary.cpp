@@ -1,0 +1,48 @@
+#include "report/distribution_summary.h"
+
+#include <algorithm>
+#include <limits>
+
+namespace tally {
+namespace {
+
+template <bool kWithHistogram>
+DistributionSummary addSamples(DistributionSummary summary, std::span<const double> samples,
+                               const HistogramIntervals* intervals,
+                               std::span<std::uint32_t> counts) {
+  for (const double sample : samples) {
+    // The division is what each sample waits for; finding the bucket fits into that time.
+    ++summary.count;
+    const double delta = sample - summary.mean;
+    summary.mean += delta / static_cast<double>(summary.count);
+    summary.squaredDeviations += delta * (sample - summary.mean);
+    summary.minimum = sample < summary.minimum ? sample : summary.minimum;
+    summary.maximum = sample > summary.maximum ? sample : summary.maximum;
+    if constexpr (kWithHistogram) ++counts[intervals->bucketOf(sample)];
+  }
+  return summary;
+}
+
+}  // namespace
+
+void DistributionSummary::add(std::span<const double> samples, const HistogramIntervals* intervals,
+                              std::span<std::uint32_t> counts) {
+  if (samples.empty()) return;
+  if (count == 0) {
+    minimum = maximum = mean = samples.front();
+    count = 1;
+    if (intervals != nullptr) ++counts[intervals->bucketOf(samples.front())];
+    samples = samples.subspan(1);
+  }
+  *this = intervals != nullptr ? addSamples<true>(*this, samples, intervals, counts)
+                               : addSamples<false>(*this, samples, nullptr, {});
+}
+
+KvRef<KvArray> DistributionSummary::toArray() const {
+  constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();
+  return KvArray::create({KvNumber::float64(minimum), KvNumber::float64(maximum),
+                          KvNumber::float64(mean), KvNumber::float64(squaredDeviations),
+                          KvNumber::int32(static_cast<std::int32_t>(std::min(count, kMost)))});
+}
+
+}  // namespace tally
