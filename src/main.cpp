@@ -1,1 +1,12 @@
-int main() { return 0; }
+// tallyrun: the daily job. The one place where the Linux platform is built and installed.
+#include <span>
+
+#include "driver/daily_job.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/platform.h"
+
+int main(int count, char** arguments) {
+  const tally::PlatformScope scope(tally::makeLinuxPlatform(tally::deviceRootFromEnvironment()));
+  tally::DailyJob job({});
+  return job.run({arguments, static_cast<std::size_t>(count)});
+}

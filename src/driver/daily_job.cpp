@@ -1,0 +1,85 @@
+#include "driver/daily_job.h"
+
+#include <string_view>
+
+#include "platform/platform.h"
+#include "report/report.h"
+
+namespace tally {
+namespace {
+
+constexpr std::string_view kLastProcessedDay = "LastCrashLogSerializationDateInDaysSince1970";
+// The scheduled mode ends when no event came for this long.
+constexpr double kQuietSeconds = 10.0;
+
+}  // namespace
+
+int DailyJob::run(std::span<const char* const> arguments) {
+  logMessage(LogLevel::Default, "tallyrun started");
+  if (arguments.size() == 1) {
+    runScheduled();
+  } else if (arguments.size() > 1) {
+    runSwitch(arguments[1]);
+  }
+  logMessage(LogLevel::Default, "tallyrun ended");
+  return 0;
+}
+
+void DailyJob::runScheduled() {
+  // Without a listener the loop still runs its time: a peer may only be late.
+  if (capabilities_.startListener) capabilities_.startListener(*this);
+  for (;;) {
+    const SliceResult slice = platform().eventLoop->runMainLoopSlice(kQuietSeconds, true);
+    // A loop without sources will never deliver: starting it again at once would only spin.
+    if (slice == SliceResult::TimedOut || slice == SliceResult::Finished) break;
+  }
+  if (!appInfoRequested) return;
+  logMessage(LogLevel::Default, "never received requested AAI, so moving along without it");
+  runIfNewDay(nullptr);
+}
+
+void DailyJob::runSwitch(const char* argument) {
+  const std::int32_t today = platform().metricsStore->TBDaysSince1970();
+  const std::string_view name = argument;
+  if (name == "-d") {
+    runIfNewDay(nullptr);
+  } else if (name == "-f") {
+    runDaily(today - 1, nullptr);
+  } else if (name == "-t") {
+    runDaily(today, nullptr);
+  } else {
+    logMessage(LogLevel::Default, "Unknown arg: {}", name);
+  }
+}
+
+void DailyJob::runIfNewDay(const KvArray* appInfo) {
+  // Waiting for another run comes first: it may be processing the very day.
+  const RunTurn turn(*platform().runLock);
+  const std::int32_t yesterday = platform().metricsStore->TBDaysSince1970() - 1;
+  Preferences& preferences = *platform().preferences;
+  const std::int32_t last =
+      preferences.SMAPreferencesGetIntegerValue(kLastProcessedDay, kProgramDomain);
+  if (last >= yesterday) {
+    logMessage(LogLevel::Default, "Day unchanged since last run");
+    return;
+  }
+  runDaily(yesterday, appInfo);
+  preferences.SMAPreferencesSetValue(kLastProcessedDay, KvNumber::int32(yesterday), kProgramDomain);
+  preferences.SMAPreferencesSynchronize(kProgramDomain);
+}
+
+void DailyJob::runDaily(std::int32_t day, const KvArray* appInfo) {
+  const RunTurn turn(*platform().runLock);
+  logMessage(LogLevel::Default, "daily tasks for day {}", day);
+  platform().metricsStore->TBClientCheckpoint();
+  CrashReporting& crashReporting = *platform().crashReporting;
+  if (crashReporting.isDiagnosticSubmissionEnabled()) {
+    TBReport().writeLogForYesterdayWithAppInfo(day, appInfo);
+  }
+  if (capabilities_.runTelemetrySweep) capabilities_.runTelemetrySweep();
+  crashReporting.FDDumpAllOldStructuredDataLogs();
+  if (capabilities_.updateTaskingState) capabilities_.updateTaskingState();
+  crashReporting.rollFixlineLogs();
+}
+
+}  // namespace tally
