@@ -190,16 +190,16 @@ struct FakeCrashReporting final : CrashReporting {
 struct FakeCrashSupportLibrary final : CrashSupportLibrary {
   bool present = true;
   std::set<std::string> missingSymbols;
-  int opened = 0;
+  std::vector<std::string> opened;  // paths
   std::vector<std::string> lookups;
 
-  bool open() override {
-    ++opened;
+  bool open(std::string_view path) override {
+    opened.emplace_back(path);
     return present;
   }
-  bool hasSymbol(const char* name) override {
+  bool hasSymbol(std::string_view name) override {
     lookups.emplace_back(name);
-    return present && !missingSymbols.contains(name);
+    return present && !missingSymbols.contains(std::string(name));
   }
 };
 
@@ -315,7 +315,8 @@ struct FakePlatform {
             deviceInformation,
             appRegistry,
             locale,
-            kernelValues};
+            kernelValues,
+            std::make_shared<OnceBoolean>()};
   }
   // Puts the fakes in force until the returned scope ends.
   std::unique_ptr<PlatformScope> install() const {
