@@ -25,6 +25,10 @@ Error systemError(std::string_view what, const std::string& path, int code = err
   return {std::string(what) + " " + path + ": " + std::strerror(code), code};
 }
 
+Error tooLarge(const std::string& path, std::size_t limit) {
+  return {path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
+}
+
 template <class Call>
 auto retried(Call call) {
   auto result = call();
@@ -61,24 +65,18 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
   struct stat status {};
   if (::fstat(file.get(), &status) != 0) return systemError("cannot examine", path);
   if (!S_ISREG(status.st_mode)) return Error{path + " is not a regular file"};
-  if (static_cast<std::uint64_t>(status.st_size) > limit) {
-    return Error{path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
-  }
+  if (static_cast<std::uint64_t>(status.st_size) > limit) return tooLarge(path, limit);
   // One byte more than it should hold shows the end, or that the file grew meanwhile.
   std::string contents(static_cast<std::size_t>(status.st_size) + 1, '\0');
   std::size_t used = 0;
   for (;;) {
-    if (used == contents.size()) {
-      if (used > limit) {
-        return Error{path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
-      }
-      contents.resize(contents.size() * 2);
-    }
     const auto count = retried(
         [&] { return ::read(file.get(), contents.data() + used, contents.size() - used); });
     if (count < 0) return systemError("cannot read", path);
-    if (count == 0) break;
     used += static_cast<std::size_t>(count);
+    if (used > limit) return tooLarge(path, limit);
+    if (count == 0) break;
+    if (used == contents.size()) contents.resize(contents.size() * 2);
   }
   contents.resize(used);
   return contents;

@@ -9,6 +9,8 @@ namespace tally {
 namespace {
 
 constexpr int kMaximumDepth = 512;  // deeper is a cycle or not worth showing
+// A cycle that branches would otherwise be written out for ever.
+constexpr std::size_t kMaximumText = 16u << 20;
 
 void appendNumber(std::string& out, const KvNumber& number) {
   if (number.kind() == KvNumberKind::Float) {
@@ -38,6 +40,7 @@ void appendText(std::string& out, const KvObject* value, int depth) {
     out += "(null)";
     return;
   }
+  if (out.size() > kMaximumText) return;
   if (depth > kMaximumDepth) {
     out += "...";
     return;

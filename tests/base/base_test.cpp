@@ -1,0 +1,209 @@
+// Text, number, time and file helpers at their borders.
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <stdlib.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cmath>
+#include <fstream>
+#include <limits>
+
+#include "base/byte_reader.h"
+#include "base/file.h"
+#include "base/number_text.h"
+#include "base/time_text.h"
+#include "base/utf8.h"
+
+namespace tally {
+namespace {
+
+TEST(Utf8, RepairAndXmlTable) {
+  const struct {
+    std::string_view text;
+    const char* repaired;
+    const char* forXml;
+  } cases[] = {
+      {"plain", "plain", "plain"},
+      {"caf\xC3\xA9 \xE2\x82\xAC \xF0\x9F\x98\x80", "café € 😀", "café € 😀"},
+      {"\xC0\xAF", "\uFFFD\uFFFD", "\uFFFD\uFFFD"},                    // overlong
+      {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD"},    // surrogate
+      {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD\uFFFD"},
+      {"a\xE2\x82", "a\uFFFD\uFFFD", "a\uFFFD\uFFFD"},                 // cut
+      {"\xFF", "\uFFFD", "\uFFFD"},
+      {"\x01\t\n\r\x1F\x7F", "\x01\t\n\r\x1F\x7F", "\uFFFD\t\n\r\uFFFD\x7F"},
+      {"\xEF\xBF\xBE\xEF\xBF\xBF", "\xEF\xBF\xBE\xEF\xBF\xBF", "\uFFFD\uFFFD"},
+  };
+  for (const auto& c : cases) {
+    EXPECT_EQ(repairUtf8(c.text), c.repaired);
+    EXPECT_EQ(isValidUtf8(c.text), repairUtf8(c.text) == c.text) << c.repaired;
+    EXPECT_EQ(replaceNonXmlCharacters(repairUtf8(c.text)), c.forXml);
+  }
+}
+
+TEST(NumberText, RealsReadBackEqual) {
+  const struct {
+    double value;
+    const char* text;
+  } cases[] = {{0, "0"},         {-0.0, "-0"},   {10, "10"},     {2.5, "2.5"},
+               {0.1, "0.1"},     {1e22, "1e+22"}, {5e-324, "5e-324"}, {1.0 / 3, "0.3333333333333333"},
+               {-std::numeric_limits<double>::infinity(), "-inf"}, {-std::nan(""), "nan"}};
+  for (const auto& c : cases) {
+    std::string text;
+    appendDouble(text, c.value);
+    EXPECT_EQ(text, c.text);
+    EXPECT_TRUE(std::isnan(c.value) || parseDouble(text) == c.value) << text;
+  }
+  std::string single;
+  appendFloat(single, 0.1f);
+  EXPECT_EQ(single, "0.1");
+}
+
+TEST(NumberText, OnlyWholeNumbersOfTheRangeAreRead) {
+  for (const char* text : {"", " 1", "1 ", "+1", "1.0", "9223372036854775808", "0x1", "--1"}) {
+    EXPECT_FALSE(parseInt64(text)) << text;
+  }
+  EXPECT_EQ(parseInt64("-9223372036854775808"), std::numeric_limits<std::int64_t>::min());
+  for (const char* text : {"", "1e999", "1,5", "1.5x", " 2"}) EXPECT_FALSE(parseDouble(text)) << text;
+}
+
+TEST(TimeText, DaysAndInstants) {
+  const struct {
+    double seconds;
+    std::int32_t day;
+    const char* text;
+  } cases[] = {{0, 0, "1970-01-01T00:00:00Z"},
+               {86399.9, 0, "1970-01-01T23:59:59Z"},
+               {-0.5, -1, "1969-12-31T23:59:59Z"},
+               {1709208000, 19782, "2024-02-29T12:00:00Z"},
+               {1e300, std::numeric_limits<std::int32_t>::max(), "9999-12-31T23:59:59Z"},
+               {-1e300, std::numeric_limits<std::int32_t>::min(), "0001-01-01T00:00:00Z"},
+               {std::nan(""), 0, "1970-01-01T00:00:00Z"}};
+  for (const auto& c : cases) {
+    std::string text;
+    appendTimestamp(text, c.seconds);
+    EXPECT_EQ(text, c.text);
+    EXPECT_EQ(dayOfSeconds(c.seconds), c.day) << c.seconds;
+  }
+  EXPECT_EQ(dayText(19782), "2024-02-29");
+}
+
+TEST(ByteReader, NothingOutsideIsRead) {
+  const std::byte bytes[5] = {std::byte{1}, std::byte{2}, std::byte{3}, std::byte{4}, std::byte{5}};
+  const ByteReader reader(bytes);
+  EXPECT_EQ(reader.read<std::uint32_t>(1), 0x05040302u);
+  EXPECT_EQ(reader.readBigEndian(2, 3), 0x030405u);
+  EXPECT_FALSE(reader.read<std::uint32_t>(2));
+  EXPECT_FALSE(reader.readBigEndian(0, 9));
+  EXPECT_FALSE(reader.slice(SIZE_MAX, 2));
+  EXPECT_FALSE(reader.slice(2, SIZE_MAX));
+  EXPECT_TRUE(reader.slice(5, 0));
+}
+
+class FileTest : public testing::Test {
+ protected:
+  FileTest() {
+    char name[] = "/tmp/tally-base-XXXXXX";
+    folder = ::mkdtemp(name);
+  }
+  ~FileTest() override { [[maybe_unused]] int status = std::system(("rm -rf " + folder).c_str()); }
+  void put(const std::string& name, std::string_view text) {
+    std::ofstream(folder + "/" + name) << text;
+  }
+  std::string folder;
+};
+
+TEST_F(FileTest, ReadingRefusesWhatIsNoFileOrTooLarge) {
+  put("ok", "12345");
+  EXPECT_EQ(*readFile(folder + "/ok", 5), "12345");
+  EXPECT_NE(readFile(folder + "/ok", 4).error().message.find("larger than 4 bytes"),
+            std::string::npos);
+  EXPECT_EQ(readFile(folder + "/none", 9).error().systemError, ENOENT);
+  EXPECT_FALSE(readFile(folder, 9));
+  EXPECT_FALSE(readFile("/dev/zero", 9));
+  ASSERT_EQ(::mkfifo((folder + "/pipe").c_str(), 0600), 0);
+  EXPECT_FALSE(readFile(folder + "/pipe", 9)) << "a pipe without a writer must not be waited for";
+  EXPECT_FALSE(readFile("/proc/self/comm", 100)->empty()) << "its size says 0";
+}
+
+TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
+  const std::string path = folder + "/deep/er/file";
+  ASSERT_TRUE(writeFileAtomically(path, "one"));
+  const auto first = fileIdentity(path);
+  ASSERT_TRUE(writeFileAtomically(path, "two"));
+  EXPECT_EQ(*readFile(path, 9), "two");
+  EXPECT_NE(fileIdentity(path), first);
+  {
+    auto abandoned = TemporaryFile::beside(path);
+    ASSERT_TRUE(abandoned);
+    ASSERT_TRUE(abandoned->write("half"));
+    EXPECT_TRUE(isTemporaryName(listFolder(folder + "/deep/er")->back()));
+  }
+  EXPECT_EQ(listFolder(folder + "/deep/er")->size(), 1u) << "an abandoned file is removed";
+  EXPECT_FALSE(writeFileAtomically(path + "/below-a-file", "x"));
+  ASSERT_TRUE(makeFolders(folder + "/taken"));
+  EXPECT_FALSE(writeFileAtomically(folder + "/taken", "x"));
+  EXPECT_EQ(listFolder(folder)->size(), 2u) << "nothing is left behind on failure";
+}
+
+TEST_F(FileTest, AKillAtAnyMomentLeavesTheOldFileOrTheNew) {
+  const std::string path = folder + "/file";
+  const std::string old(100'000, 'o');
+  const std::string fresh(100'000, 'n');
+  ASSERT_TRUE(writeFileAtomically(path, old));
+  for (int attempt = 0; attempt < 20; ++attempt) {
+    const pid_t child = ::fork();
+    if (child == 0) {
+      for (;;) {
+        if (!writeFileAtomically(path, fresh) || !writeFileAtomically(path, old)) ::_exit(1);
+      }
+    }
+    ::usleep(static_cast<useconds_t>(500 + attempt * 137));
+    ::kill(child, SIGKILL);
+    int status = 0;
+    ::waitpid(child, &status, 0);
+    ASSERT_TRUE(WIFSIGNALED(status)) << "the writer failed by itself";
+    const auto contents = readFile(path, 1'000'000);
+    ASSERT_TRUE(contents && (*contents == old || *contents == fresh));
+  }
+}
+
+TEST_F(FileTest, ALockIsHeldByOneAndFreedByDeath) {
+  const std::string path = folder + "/lock";
+  int ready[2];
+  ASSERT_EQ(::pipe(ready), 0);
+  const pid_t child = ::fork();
+  if (child == 0) {
+    const auto held = FileLock::acquire(path);
+    [[maybe_unused]] const auto written = ::write(ready[1], held ? "1" : "0", 1);
+    ::pause();
+    ::_exit(0);
+  }
+  char answer = 0;
+  ASSERT_EQ(::read(ready[0], &answer, 1), 1);
+  ASSERT_EQ(answer, '1');
+  const pid_t waiter = ::fork();
+  if (waiter == 0) ::_exit(FileLock::acquire(path) ? 0 : 1);
+  ::usleep(50'000);
+  int status = 0;
+  EXPECT_EQ(::waitpid(waiter, &status, WNOHANG), 0) << "the second did not wait";
+  ::kill(child, SIGKILL);
+  ::waitpid(child, nullptr, 0);
+  ::waitpid(waiter, &status, 0);
+  EXPECT_EQ(WEXITSTATUS(status), 0);
+}
+
+TEST(SafeFileName, NamesFromOutside) {
+  for (const std::string_view name : {"vellum.da", "a", "...", "with space"}) {
+    EXPECT_TRUE(isSafeFileName(name)) << name;
+  }
+  using namespace std::string_view_literals;
+  for (const std::string_view name : {""sv, "."sv, ".."sv, "a/b"sv, "/"sv, "a\0b"sv}) {
+    EXPECT_FALSE(isSafeFileName(name)) << name;
+  }
+  EXPECT_FALSE(isSafeFileName(std::string(201, 'x')));
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,164 @@
+// Run modes, the day check and the order of a day's tasks.
+#include "driver/daily_job.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "fakes/fake_platform.h"
+#include "report/report.h"
+
+namespace tally {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr std::int32_t kToday = 20000;
+constexpr const char* kLastDay = "LastCrashLogSerializationDateInDaysSince1970";
+
+class DailyJobTest : public testing::Test {
+ protected:
+  DailyJobTest() {
+    fake.files->contents[std::string(kWhitelistPath)] =
+        "<plist version=\"1.0\"><dict><key>G</key><dict><key>ScalarKeys</key><dict><key>a</key>"
+        "<dict/></dict></dict></dict></plist>";
+    fake.preferences->put("LastOSVersion", KvString::create("1.0 (1A1)"), kProgramDomain);
+    for (std::int32_t day = kToday - 3; day <= kToday; ++day) {
+      fake.metricsStore->putScalar(day, "a", day);
+    }
+  }
+  DailyCapabilities allCapabilities() {
+    return {[this](DailyJob&) {
+              fake.calls->push_back("listener");
+              return true;
+            },
+            [this] { fake.calls->push_back("sweep"); }, [this] { fake.calls->push_back("tasking"); }};
+  }
+  int run(std::vector<const char*> arguments, DailyCapabilities capabilities = {}) {
+    arguments.insert(arguments.begin(), "tallyrun");
+    DailyJob job(std::move(capabilities));
+    return job.run(arguments);
+  }
+  // The days whose log was submitted, by the value that each day's row carries.
+  std::vector<std::string> loggedDays() {
+    std::vector<std::string> days;
+    for (const auto& log : fake.logSubmission->logs) {
+      const auto start = log.body.find("<integer>", log.body.find("<key>a</key>")) + 9;
+      days.push_back(log.body.substr(start, log.body.find('<', start) - start));
+    }
+    return days;
+  }
+  std::string lastDay() {
+    return kvText(fake.preferences->SMAPreferencesGetValue(kLastDay, kProgramDomain).get());
+  }
+
+  fakes::FakePlatform fake = fakes::makeFakePlatform();
+  std::unique_ptr<PlatformScope> scope = fake.install();
+};
+
+TEST_F(DailyJobTest, SwitchesProcessTheirDay) {
+  const struct {
+    std::vector<const char*> arguments;
+    std::optional<std::int32_t> stored;
+    std::vector<std::string> days;
+    std::string storedAfter;
+    std::string message;  // between start and end, "" for any
+  } cases[] = {
+      {{"-d"}, std::nullopt, {"19999"}, "19999", ""},
+      {{"-d"}, kToday - 4, {"19999"}, "19999", ""},
+      {{"-d"}, kToday - 1, {}, "19999", "Day unchanged since last run"},
+      {{"-d"}, kToday + 9, {}, "20009", "Day unchanged since last run"},
+      {{"-f"}, kToday - 1, {"19999"}, "19999", ""},
+      {{"-f"}, std::nullopt, {"19999"}, "(null)", ""},
+      {{"-t", "-f", "junk"}, std::nullopt, {"20000"}, "(null)", ""},
+      {{"-D"}, std::nullopt, {}, "(null)", "Unknown arg: -D"},
+      {{""}, std::nullopt, {}, "(null)", "Unknown arg: "},
+      {{"-f "}, std::nullopt, {}, "(null)", "Unknown arg: -f "},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::PrintToString(c.arguments));
+    fake.log->lines.clear();
+    fake.logSubmission->logs.clear();
+    fake.preferences->put(kLastDay, c.stored ? KvNumber::int32(*c.stored) : nullptr,
+                          kProgramDomain);
+    EXPECT_EQ(run(c.arguments), 0);
+    EXPECT_EQ(loggedDays(), c.days);
+    EXPECT_EQ(lastDay(), c.storedAfter);
+    const auto messages = fake.log->texts(LogLevel::Default);
+    EXPECT_EQ(messages.front(), "tallyrun started");
+    EXPECT_EQ(messages.back(), "tallyrun ended");
+    if (!c.message.empty()) {
+      EXPECT_THAT(messages, ElementsAre("tallyrun started", c.message, "tallyrun ended"));
+    }
+  }
+}
+
+TEST_F(DailyJobTest, TheSequenceOfADay) {
+  run({"-d"}, allCapabilities());
+  EXPECT_THAT(*fake.calls,
+              ElementsAre("lock", "TBClientCheckpoint", "isDiagnosticSubmissionEnabled",
+                          "submit 193 log-tallyd", "sweep", "FDDumpAllOldStructuredDataLogs",
+                          "tasking", "rollFixlineLogs",
+                          "set vellum.tallyd.tallyrun " + std::string(kLastDay) + "=19999",
+                          "synchronize vellum.tallyd.tallyrun", "unlock"));
+  EXPECT_TRUE(fake.log->has(LogLevel::Default, "daily tasks for day 19999"));
+}
+
+TEST_F(DailyJobTest, WithoutTheUsersConsentNoWhitelistIsReadButTheRestRuns) {
+  fake.crashReporting->submissionEnabled = false;
+  run({"-f"}, allCapabilities());
+  EXPECT_THAT(fake.files->reads, IsEmpty());
+  EXPECT_THAT(*fake.calls, ElementsAre("lock", "TBClientCheckpoint",
+                                       "isDiagnosticSubmissionEnabled", "sweep",
+                                       "FDDumpAllOldStructuredDataLogs", "tasking",
+                                       "rollFixlineLogs", "unlock"));
+}
+
+TEST_F(DailyJobTest, ADoneDayOpensNeitherStoreNorWhitelist) {
+  fake.preferences->put(kLastDay, KvNumber::int32(kToday - 1), kProgramDomain);
+  run({"-d"}, allCapabilities());
+  EXPECT_THAT(fake.files->reads, IsEmpty());
+  EXPECT_EQ(fake.metricsStore->historiesOpened, 0);
+  EXPECT_THAT(*fake.calls, ElementsAre("lock", "unlock"));
+}
+
+TEST_F(DailyJobTest, AFailedSubmissionStillEndsTheDay) {
+  fake.logSubmission->failSubmit = true;
+  run({"-d"});
+  EXPECT_EQ(lastDay(), "19999");
+}
+
+TEST_F(DailyJobTest, TheScheduledModeWaitsOutAQuietSlice) {
+  fake.eventLoop->results = {SliceResult::HandledEvent, SliceResult::Stopped,
+                             SliceResult::HandledEvent, SliceResult::TimedOut};
+  EXPECT_EQ(run({}, allCapabilities()), 0);
+  EXPECT_THAT(fake.eventLoop->slices, ElementsAre(10.0, 10.0, 10.0, 10.0));
+  EXPECT_THAT(*fake.calls, ElementsAre("listener"));
+  EXPECT_THAT(fake.log->texts(LogLevel::Default),
+              ElementsAre("tallyrun started", "tallyrun ended"));
+}
+
+TEST_F(DailyJobTest, ALoopWithoutSourcesIsNotSpun) {
+  fake.eventLoop->results = {SliceResult::Finished, SliceResult::HandledEvent};
+  run({});
+  EXPECT_EQ(fake.eventLoop->slices.size(), 1u);
+}
+
+TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
+  run({}, {.startListener = [](DailyJob& job) { return job.appInfoRequested = true; },
+           .runTelemetrySweep = {},
+           .updateTaskingState = {}});
+  EXPECT_TRUE(fake.log->has(LogLevel::Default,
+                            "never received requested AAI, so moving along without it"));
+  EXPECT_EQ(loggedDays(), std::vector<std::string>{"19999"});
+  EXPECT_EQ(lastDay(), "19999");
+}
+
+TEST_F(DailyJobTest, NoArgumentsAtAllDoNothing) {
+  DailyJob job({});
+  EXPECT_EQ(job.run({}), 0);
+  EXPECT_THAT(fake.eventLoop->slices, IsEmpty());
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,174 @@
+// Rounding, bucketing and summarising, at their borders.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <limits>
+#include <random>
+
+#include "report/distribution_summary.h"
+#include "report/histogram.h"
+#include "report/scalar_rounding.h"
+
+namespace tally {
+namespace {
+
+constexpr std::int64_t kMaximum = std::numeric_limits<std::int64_t>::max();
+constexpr std::int64_t kMinimum = std::numeric_limits<std::int64_t>::min();
+constexpr double kInfinity = std::numeric_limits<double>::infinity();
+
+TEST(ScalarRounding, Table) {
+  constexpr std::int64_t kAbsent = -1;
+  const struct {
+    std::int64_t value, bucketInterval, significantFigures, expected;
+  } cases[] = {
+      {123456, kAbsent, 2, 120000},
+      {-1550, kAbsent, 2, -1600},
+      {95, kAbsent, 1, 100},
+      {7, kAbsent, 0, 10},
+      {1, kAbsent, 0, 1},
+      {0, kAbsent, 1, 0},
+      {100, kAbsent, 1, 100},
+      {101, kAbsent, 2, 100},
+      {105, kAbsent, 2, 110},
+      {-105, kAbsent, 2, -110},
+      {99, kAbsent, 2, 99},
+      {4294967295, kAbsent, 3, 4290000000},
+      {123, kAbsent, 4294967295, 123},
+      {14, 10, kAbsent, 10},
+      {15, 10, kAbsent, 20},
+      {-14, 10, kAbsent, 0},
+      {-15, 10, kAbsent, -10},
+      {-16, 10, kAbsent, -10},
+      {7, 1, kAbsent, 7},
+      {7, 0, kAbsent, 7},
+      {5, 3, kAbsent, 6},
+      {123, 10, 2, 120},
+      {4, 10, 2, 0},
+      // The ends of the range saturate instead of wrapping.
+      {kMaximum, 10, kAbsent, 9223372036854775800},
+      {kMinimum, 10, kAbsent, -9223372036854775800},
+      {kMinimum, 4294967295, kAbsent, -9223372034707292160},
+      {kMaximum, kAbsent, 0, kMaximum},
+      {kMinimum, kAbsent, 1, -9000000000000000000},
+      {kMaximum, kAbsent, 1, 9000000000000000000},
+  };
+  for (const auto& c : cases) {
+    auto options = KvDictionary::create();
+    if (c.bucketInterval != kAbsent) {
+      options->set("bucket_interval", KvNumber::int64(c.bucketInterval));
+    }
+    if (c.significantFigures != kAbsent) {
+      options->set("sig_fig", KvNumber::int64(c.significantFigures));
+    }
+    EXPECT_EQ(roundScalar(c.value, *options), c.expected)
+        << c.value << " bucket " << c.bucketInterval << " figures " << c.significantFigures;
+  }
+}
+
+KvRef<KvArray> boundaries(const std::vector<double>& values) {
+  auto array = KvArray::create();
+  for (const double value : values) {
+    const bool integer = std::trunc(value) == value && std::fabs(value) < 1e9;
+    array->append(integer ? KvNumber::int64(static_cast<std::int64_t>(value))
+                          : KvNumber::float64(value));
+  }
+  return array;
+}
+
+// What the search must agree with: the first boundary, in array order, at or above the value.
+std::size_t scan(const std::vector<double>& values, double sample) {
+  for (std::size_t i = 0; i < values.size(); ++i) {
+    if (values[i] >= sample) return i;
+  }
+  return values.size();
+}
+
+TEST(Histogram, TheSearchAnswersLikeAScan) {
+  const double nan = std::nan("");
+  std::vector<std::vector<double>> sets = {
+      {}, {10}, {10, 20}, {2.5}, {20, 10}, {5, 5, 5}, {3, 1, 4, 1, 5, 9, 2, 6}, {nan, 1, nan, 2},
+      {nan}, {-kInfinity, 0, kInfinity}, {kInfinity, 1}, {-0.0, 0.0, 1e-300}};
+  std::mt19937 random(7);
+  for (std::size_t size = 1; size < 40; ++size) {
+    std::vector<double> set;
+    for (std::size_t i = 0; i < size; ++i) set.push_back(static_cast<double>(random() % 50));
+    sets.push_back(set);
+    std::sort(set.begin(), set.end());
+    sets.push_back(set);
+  }
+  for (const auto& set : sets) {
+    const auto array = boundaries(set);
+    const HistogramIntervals intervals(*array);
+    std::vector<double> probes = {nan, kInfinity, -kInfinity, 0, -0.0, 1e300, -1e300};
+    for (const double boundary : set) {
+      probes.insert(probes.end(), {boundary, std::nextafter(boundary, kInfinity),
+                                   std::nextafter(boundary, -kInfinity)});
+    }
+    for (const double probe : probes) {
+      ASSERT_EQ(intervals.bucketOf(probe), scan(set, probe))
+          << kvText(array.get()) << " sample " << probe;
+    }
+  }
+}
+
+TEST(Histogram, LabelsShowTheNumbersOfTheWhitelist) {
+  const auto array = KvArray::create({KvNumber::int64(10), KvNumber::float64(2.5),
+                                      KvNumber::float64(30), KvNumber::uint64(UINT64_MAX)});
+  const HistogramIntervals intervals(*array);
+  const char* labels[] = {"(-inf, 10]", "(10, 2.5]", "(2.5, 30]", "(30, 18446744073709551615]",
+                          "(18446744073709551615, inf)"};
+  ASSERT_EQ(intervals.bucketCount(), std::size(labels));
+  for (std::size_t i = 0; i < std::size(labels); ++i) EXPECT_EQ(intervals.label(i), labels[i]);
+  const auto none = KvArray::create();
+  EXPECT_EQ(HistogramIntervals(*none).label(0), "(-inf, inf)");
+}
+
+TEST(Histogram, OnlyBucketsWithSamplesAreListed) {
+  const auto array = boundaries({10, 20});
+  const HistogramIntervals intervals(*array);
+  std::vector<std::uint32_t> counts(intervals.bucketCount());
+  EXPECT_EQ(makeHistogramDictionary(intervals, counts).get(), nullptr);
+  DistributionSummary summary;
+  summary.add(std::vector<double>{5, 10, 30}, &intervals, counts);
+  EXPECT_EQ(kvText(makeHistogramDictionary(intervals, counts).get()),
+            "{\n    (-inf, 10] = 2;\n    (20, inf) = 1;\n}");
+}
+
+TEST(DistributionSummary, TheFiveNumbers) {
+  const double nan = std::nan("");
+  const struct {
+    const char* name;
+    std::vector<double> samples;
+    const char* expected;
+  } cases[] = {
+      {"none", {}, "0 0 0 0 0"},
+      {"one", {-3.5}, "-3.5 -3.5 -3.5 0 1"},
+      {"textbook", {2, 4, 4, 4, 5, 5, 7, 9}, "2 9 5 32 8"},
+      {"a NaN inside changes neither end", {1, nan, 3}, "1 3 nan nan 3"},
+      {"a NaN first stays", {nan, 3}, "nan nan nan nan 2"},
+      {"infinite", {1, kInfinity}, "1 inf inf nan 2"},
+  };
+  for (const auto& c : cases) {
+    // In batches of every size the figures are the same to the last bit.
+    for (std::size_t batch = 1; batch <= c.samples.size() + 1; ++batch) {
+      DistributionSummary summary;
+      for (std::size_t i = 0; i < c.samples.size(); i += batch) {
+        const std::size_t count = std::min(batch, c.samples.size() - i);
+        summary.add(std::span(c.samples).subspan(i, count), nullptr, {});
+      }
+      std::string text;
+      const auto array = summary.toArray();
+      for (const auto& item : *array) text += (text.empty() ? "" : " ") + kvText(item.get());
+      EXPECT_EQ(text, c.expected) << c.name << ", batch " << batch;
+    }
+  }
+}
+
+TEST(DistributionSummary, TheCountSaturates) {
+  DistributionSummary summary;
+  summary.count = std::int64_t{1} << 40;
+  EXPECT_EQ(kvText(summary.toArray()->get(4)), "2147483647");
+}
+
+}  // namespace
+}  // namespace tally
