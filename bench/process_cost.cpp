@@ -58,9 +58,8 @@ ProcessCost medianRun(int runs, const std::vector<std::string>& command,
   std::vector<ProcessCost> costs;
   for (int i = 0; i < runs; ++i) costs.push_back(runProcess(command, environment));
   const auto middle = costs.begin() + runs / 2;
-  std::nth_element(costs.begin(), middle, costs.end(), [](const auto& a, const auto& b) {
-    return a.wallSeconds < b.wallSeconds;
-  });
+  std::nth_element(costs.begin(), middle, costs.end(),
+                   [](const auto& a, const auto& b) { return a.wallSeconds < b.wallSeconds; });
   return *middle;
 }
 

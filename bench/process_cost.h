@@ -8,9 +8,9 @@ namespace tally::bench {
 
 struct ProcessCost {
   double wallSeconds = 0;
-  double cpuSeconds = 0;     // user and system
-  long peakKibibytes = 0;    // largest resident size
-  int exitStatus = -1;       // -1 when it could not be started or was killed
+  double cpuSeconds = 0;   // user and system
+  long peakKibibytes = 0;  // largest resident size
+  int exitStatus = -1;     // -1 when it could not be started or was killed
 };
 
 // Runs a program with further environment entries ("NAME=value"); its output is thrown away.

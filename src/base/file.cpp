@@ -70,8 +70,8 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
   std::string contents(static_cast<std::size_t>(status.st_size) + 1, '\0');
   std::size_t used = 0;
   for (;;) {
-    const auto count = retried(
-        [&] { return ::read(file.get(), contents.data() + used, contents.size() - used); });
+    const auto count =
+        retried([&] { return ::read(file.get(), contents.data() + used, contents.size() - used); });
     if (count < 0) return systemError("cannot read", path);
     used += static_cast<std::size_t>(count);
     if (used > limit) return tooLarge(path, limit);
@@ -212,8 +212,8 @@ bool isTemporaryName(std::string_view name) {
 
 Result<FileLock> FileLock::acquire(const std::string& path) {
   if (auto made = makeFolders(folderOf(path)); !made) return made.error();
-  const int descriptor =
-      retried([&] { return ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600); });
+  const int descriptor = retried(
+      [&] { return ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600); });
   if (descriptor < 0) return systemError("cannot open lock", path);
   FileLock lock(descriptor);
   if (retried([&] { return ::flock(descriptor, LOCK_EX); }) != 0) {
@@ -222,8 +222,7 @@ Result<FileLock> FileLock::acquire(const std::string& path) {
   return lock;
 }
 
-FileLock::FileLock(FileLock&& other) noexcept
-    : descriptor_(std::exchange(other.descriptor_, -1)) {}
+FileLock::FileLock(FileLock&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}
 
 FileLock& FileLock::operator=(FileLock&& other) noexcept {
   std::swap(descriptor_, other.descriptor_);

@@ -23,9 +23,8 @@ std::chrono::year_month_day dateOf(std::int64_t day) {
 std::int32_t dayOfSeconds(double secondsSince1970) {
   if (std::isnan(secondsSince1970)) return 0;
   const double day = std::floor(secondsSince1970 / kSecondsPerDay);
-  return static_cast<std::int32_t>(
-      std::clamp(day, double{std::numeric_limits<std::int32_t>::min()},
-                 double{std::numeric_limits<std::int32_t>::max()}));
+  return static_cast<std::int32_t>(std::clamp(day, double{std::numeric_limits<std::int32_t>::min()},
+                                              double{std::numeric_limits<std::int32_t>::max()}));
 }
 
 void appendTimestamp(std::string& out, double secondsSince1970) {
@@ -37,10 +36,10 @@ void appendTimestamp(std::string& out, double secondsSince1970) {
   const auto rest = static_cast<int>(seconds - std::int64_t{day} * 86400);
   const auto date = dateOf(day);
   char text[40];
-  const int length = std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ",
-                                   static_cast<int>(date.year()), static_cast<unsigned>(date.month()),
-                                   static_cast<unsigned>(date.day()), rest / 3600, rest / 60 % 60,
-                                   rest % 60);
+  const int length =
+      std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ",
+                    static_cast<int>(date.year()), static_cast<unsigned>(date.month()),
+                    static_cast<unsigned>(date.day()), rest / 3600, rest / 60 % 60, rest % 60);
   out.append(text, static_cast<std::size_t>(length));
 }
 

@@ -132,8 +132,8 @@ void TBConfig::addSection(const KvRef<KvString>& group, std::string_view section
                           const KvDictionary& keys, KeyTable& table) {
   for (const auto& item : keys) {
     if (auto* options = kvCast<KvDictionary>(item.value.get())) {
-      table.set({item.key, wellFormedOptions(*options, group->view(), section, item.key->view()),
-                 group});
+      table.set(
+          {item.key, wellFormedOptions(*options, group->view(), section, item.key->view()), group});
     } else {
       logMessage(LogLevel::Error, "whitelist: group {}, {}: malformed options of key {}, skipped",
                  group->view(), section, item.key->view());

@@ -22,9 +22,8 @@ void KeyTable::buildPrefixIndex() {
   sorted_.clear();
   for (std::uint32_t i = 0; i < entries_.size(); ++i) sorted_.push_back({i, kNone});
   const auto prefix = [this](const SortedPrefix& item) { return entries_[item.entry].key->view(); };
-  std::sort(sorted_.begin(), sorted_.end(), [&](const auto& a, const auto& b) {
-    return prefix(a) < prefix(b);
-  });
+  std::sort(sorted_.begin(), sorted_.end(),
+            [&](const auto& a, const auto& b) { return prefix(a) < prefix(b); });
   for (std::uint32_t i = 1; i < sorted_.size(); ++i) {
     std::uint32_t candidate = i - 1;
     while (candidate != kNone && !prefix(sorted_[i]).starts_with(prefix(sorted_[candidate]))) {
@@ -42,13 +41,12 @@ const WhitelistEntry* KeyTable::exact(std::string_view key) const {
 const WhitelistEntry* KeyTable::longestPrefix(std::string_view key) const {
   // Whatever sorts between a prefix of the key and the key begins with that prefix too, so the last
   // entry that does not sort after the key is the longest match or leads to it through its parents.
-  const auto after = std::upper_bound(
-      sorted_.begin(), sorted_.end(), key, [this](std::string_view wanted, const auto& item) {
-        return wanted < entries_[item.entry].key->view();
-      });
-  auto position = after == sorted_.begin()
-                      ? kNone
-                      : static_cast<std::uint32_t>(after - sorted_.begin() - 1);
+  const auto after = std::upper_bound(sorted_.begin(), sorted_.end(), key,
+                                      [this](std::string_view wanted, const auto& item) {
+                                        return wanted < entries_[item.entry].key->view();
+                                      });
+  auto position =
+      after == sorted_.begin() ? kNone : static_cast<std::uint32_t>(after - sorted_.begin() - 1);
   while (position != kNone) {
     const WhitelistEntry& entry = entries_[sorted_[position].entry];
     if (key.starts_with(entry.key->view())) return &entry;

@@ -25,8 +25,8 @@ class KeyTable {
 
   // Null when there is none.
   const WhitelistEntry* exact(std::string_view key) const;
-  // The longest entry with which key begins. Costs the logarithm of the table's size, and a step for
-  // each further entry that nests inside it.
+  // The longest entry with which key begins. Costs the logarithm of the table's size, and a step
+  // for each further entry that nests inside it.
   const WhitelistEntry* longestPrefix(std::string_view key) const;
   const std::vector<WhitelistEntry>& entries() const { return entries_; }
 

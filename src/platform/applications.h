@@ -18,8 +18,8 @@ class AppRegistry {
  public:
   virtual ~AppRegistry() = default;
   // Calls the handler with the type of every bundle of a kind.
-  virtual void enumerateBundles(int kind,
-                                const std::function<void(std::string_view bundleType)>& handler) = 0;
+  virtual void enumerateBundles(
+      int kind, const std::function<void(std::string_view bundleType)>& handler) = 0;
 };
 
 class Locale {

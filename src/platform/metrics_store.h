@@ -19,17 +19,15 @@ class DistributionValues {
   // offsets unless that is null. Returns how many; 0 at the end.
   virtual std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) = 0;
   // The next sample and its seconds into the day; false at the end.
-  bool nextValue(double* value, std::uint32_t* offset) {
-    return nextValues(value, offset, 1) == 1;
-  }
+  bool nextValue(double* value, std::uint32_t* offset) { return nextValues(value, offset, 1) == 1; }
 };
 
 // Reads a consistent state of the store: what others write meanwhile is not seen.
 class HistoryStore {
  public:
   // stop is false at the call; setting it ends the enumeration after this row.
-  using ScalarHandler = std::function<void(std::string_view key, std::int32_t day,
-                                           std::int64_t value, bool& stop)>;
+  using ScalarHandler =
+      std::function<void(std::string_view key, std::int32_t day, std::int64_t value, bool& stop)>;
   using DistributionHandler = std::function<void(std::string_view key, std::int32_t day,
                                                  DistributionValues& values, bool& stop)>;
   virtual ~HistoryStore() = default;

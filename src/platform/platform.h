@@ -69,7 +69,8 @@ class PlatformScope {
 template <class... Arguments>
 void logMessage(LogLevel level, fmt::format_string<Arguments...> format, Arguments&&... arguments) {
   SystemLog& log = *platform().log;
-  if (log.enabled(level)) log.write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
+  if (log.enabled(level))
+    log.write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
 }
 
 }  // namespace tally

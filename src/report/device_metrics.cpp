@@ -11,10 +11,10 @@ namespace tally {
 
 // A kernel value that is recorded as it is read.
 struct KernelCounter {
-  std::string_view key;     // of the report
-  std::string_view name;    // of the kernel
-  std::size_t width;        // bytes that are read
-  std::size_t valueWidth;   // of which the first are the value, an unsigned integer
+  std::string_view key;    // of the report
+  std::string_view name;   // of the kernel
+  std::size_t width;       // bytes that are read
+  std::size_t valueWidth;  // of which the first are the value, an unsigned integer
 };
 
 namespace {

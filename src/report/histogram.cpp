@@ -22,7 +22,8 @@ HistogramIntervals::HistogramIntervals(const KvArray& boundaries) : boundaries_(
     steps_.push_back(boundary);
     positions_.push_back(static_cast<std::uint32_t>(i));
   }
-  positions_.resize(std::bit_ceil(steps_.size() + 1), static_cast<std::uint32_t>(boundaries.size()));
+  positions_.resize(std::bit_ceil(steps_.size() + 1),
+                    static_cast<std::uint32_t>(boundaries.size()));
   steps_.resize(positions_.size() - 1, kInfinity);
 }
 

@@ -30,13 +30,12 @@ void TBReport::writeLogForYesterdayWithAppInfo(std::int32_t day, const KvArray* 
 
 void TBReport::readHistory(std::int32_t day) {
   const auto history = platform().metricsStore->openHistory();
-  history->enumerateScalars(
-      "", day - 1, day,
-      [this](std::string_view key, std::int32_t, std::int64_t value, bool&) {
-        if (const auto* options = scalarOptions(key)) {
-          addScalarForKeyWithOptions(value, key, *options);
-        }
-      });
+  history->enumerateScalars("", day - 1, day,
+                            [this](std::string_view key, std::int32_t, std::int64_t value, bool&) {
+                              if (const auto* options = scalarOptions(key)) {
+                                addScalarForKeyWithOptions(value, key, *options);
+                              }
+                            });
   history->enumerateDistributions(
       "", day - 1, day,
       [this](std::string_view key, std::int32_t, DistributionValues& values, bool&) {

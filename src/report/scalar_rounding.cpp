@@ -24,9 +24,8 @@ std::int64_t toSignificantFigures(std::int64_t value, std::uint32_t figures) {
   const std::int64_t shift = static_cast<std::int64_t>(digits) - std::int64_t{figures};
   if (shift < 1) return value;
   // At most 19: these are the powers of ten that a signed 64-bit integer can reach, all exact.
-  static constexpr double kPowers[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,
-                                       1e7,  1e8,  1e9,  1e10, 1e11, 1e12, 1e13,
-                                       1e14, 1e15, 1e16, 1e17, 1e18, 1e19};
+  static constexpr double kPowers[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,  1e8,  1e9,
+                                       1e10, 1e11, 1e12, 1e13, 1e14, 1e15, 1e16, 1e17, 1e18, 1e19};
   const double power = kPowers[shift];
   return saturatedInt64(power * std::round(static_cast<double>(value) / power));
 }

@@ -27,10 +27,10 @@ TEST(Utf8, RepairAndXmlTable) {
   } cases[] = {
       {"plain", "plain", "plain"},
       {"caf\xC3\xA9 \xE2\x82\xAC \xF0\x9F\x98\x80", "café € 😀", "café € 😀"},
-      {"\xC0\xAF", "\uFFFD\uFFFD", "\uFFFD\uFFFD"},                    // overlong
-      {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD"},    // surrogate
+      {"\xC0\xAF", "\uFFFD\uFFFD", "\uFFFD\uFFFD"},                  // overlong
+      {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD"},  // surrogate
       {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD\uFFFD"},
-      {"a\xE2\x82", "a\uFFFD\uFFFD", "a\uFFFD\uFFFD"},                 // cut
+      {"a\xE2\x82", "a\uFFFD\uFFFD", "a\uFFFD\uFFFD"},  // cut
       {"\xFF", "\uFFFD", "\uFFFD"},
       {"\x01\t\n\r\x1F\x7F", "\x01\t\n\r\x1F\x7F", "\uFFFD\t\n\r\uFFFD\x7F"},
       {"\xEF\xBF\xBE\xEF\xBF\xBF", "\xEF\xBF\xBE\xEF\xBF\xBF", "\uFFFD\uFFFD"},
@@ -46,9 +46,16 @@ TEST(NumberText, RealsReadBackEqual) {
   const struct {
     double value;
     const char* text;
-  } cases[] = {{0, "0"},         {-0.0, "-0"},   {10, "10"},     {2.5, "2.5"},
-               {0.1, "0.1"},     {1e22, "1e+22"}, {5e-324, "5e-324"}, {1.0 / 3, "0.3333333333333333"},
-               {-std::numeric_limits<double>::infinity(), "-inf"}, {-std::nan(""), "nan"}};
+  } cases[] = {{0, "0"},
+               {-0.0, "-0"},
+               {10, "10"},
+               {2.5, "2.5"},
+               {0.1, "0.1"},
+               {1e22, "1e+22"},
+               {5e-324, "5e-324"},
+               {1.0 / 3, "0.3333333333333333"},
+               {-std::numeric_limits<double>::infinity(), "-inf"},
+               {-std::nan(""), "nan"}};
   for (const auto& c : cases) {
     std::string text;
     appendDouble(text, c.value);
@@ -65,7 +72,8 @@ TEST(NumberText, OnlyWholeNumbersOfTheRangeAreRead) {
     EXPECT_FALSE(parseInt64(text)) << text;
   }
   EXPECT_EQ(parseInt64("-9223372036854775808"), std::numeric_limits<std::int64_t>::min());
-  for (const char* text : {"", "1e999", "1,5", "1.5x", " 2"}) EXPECT_FALSE(parseDouble(text)) << text;
+  for (const char* text : {"", "1e999", "1,5", "1.5x", " 2"})
+    EXPECT_FALSE(parseDouble(text)) << text;
 }
 
 TEST(TimeText, DaysAndInstants) {

@@ -48,23 +48,32 @@ class ConfigTest : public testing::Test {
 };
 
 TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
-  const auto config =
-      load(group("A", section("ScalarKeys", entry("net.wifi.rx", 1) + "<key>net.bare</key><dict/>") +
-                          section("ScalarKeyPrefixes", entry("net.", 2) + entry("net.wifi.", 3))) +
-           group("B", section("ScalarKeyPrefixes", entry("net.wifi.rx.", 4) + entry("n", 5)) +
-                          section("DistributionKeys", entry("lat", 6)) +
-                          section("DistributionKeyPrefixes", entry("net.", 7))));
+  const auto config = load(
+      group("A", section("ScalarKeys", entry("net.wifi.rx", 1) + "<key>net.bare</key><dict/>") +
+                     section("ScalarKeyPrefixes", entry("net.", 2) + entry("net.wifi.", 3))) +
+      group("B", section("ScalarKeyPrefixes", entry("net.wifi.rx.", 4) + entry("n", 5)) +
+                     section("DistributionKeys", entry("lat", 6)) +
+                     section("DistributionKeyPrefixes", entry("net.", 7))));
   ASSERT_TRUE(config);
   const struct {
     const char* key;
     const char* scalar;
     const char* distribution;
   } cases[] = {
-      {"net.wifi.rx", "1", "7"},        {"net.wifi.tx", "3", "7"}, {"net.wifi.rx.bytes", "4", "7"},
-      {"net.wifi.", "3", "7"},          {"net.wifi", "2", "7"},    {"net.cell", "2", "7"},
-      {"net.bare", "(null)", "7"},      {"nfc", "5", "-"},         {"Net.cell", "-", "-"},
-      {"lat", "-", "6"},                {"late", "-", "-"},        {"", "-", "-"},
-      {"net.wifi.rx\xC3\xA9", "3", "7"}, {"m", "-", "-"},
+      {"net.wifi.rx", "1", "7"},
+      {"net.wifi.tx", "3", "7"},
+      {"net.wifi.rx.bytes", "4", "7"},
+      {"net.wifi.", "3", "7"},
+      {"net.wifi", "2", "7"},
+      {"net.cell", "2", "7"},
+      {"net.bare", "(null)", "7"},
+      {"nfc", "5", "-"},
+      {"Net.cell", "-", "-"},
+      {"lat", "-", "6"},
+      {"late", "-", "-"},
+      {"", "-", "-"},
+      {"net.wifi.rx\xC3\xA9", "3", "7"},
+      {"m", "-", "-"},
   };
   for (const auto& c : cases) {
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey(c.key)), c.scalar) << c.key;
@@ -143,12 +152,11 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey("internal")), c.internalKey);
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey("radio")), c.radioKey);
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey("unlisted")), c.unlisted);
+    EXPECT_EQ(fake.log->has(LogLevel::Default, "keyGroup Radio is disabled by tasking"),
+              c.disabledLogged);
     EXPECT_EQ(
-        fake.log->has(LogLevel::Default, "keyGroup Radio is disabled by tasking"),
-        c.disabledLogged);
-    EXPECT_EQ(fake.log->has(LogLevel::Debug,
-                            "passing @{} for unlisted as device is Orrery Internal"),
-              c.internal);
+        fake.log->has(LogLevel::Debug, "passing @{} for unlisted as device is Orrery Internal"),
+        c.internal);
   }
 }
 
@@ -185,9 +193,9 @@ TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {
     fake.log->lines.clear();
     fake.files->contents[std::string(kWhitelistPath)] = text;
     EXPECT_EQ(TBConfig::init(), nullptr) << text;
-    EXPECT_THAT(fake.log->texts(LogLevel::Error),
-                ElementsAre(testing::StartsWith(
-                    "Couldn't parse the contents of the config file. Error: ")))
+    EXPECT_THAT(
+        fake.log->texts(LogLevel::Error),
+        ElementsAre(testing::StartsWith("Couldn't parse the contents of the config file. Error: ")))
         << text;
   }
 }

@@ -32,7 +32,8 @@ class DailyJobTest : public testing::Test {
               fake.calls->push_back("listener");
               return true;
             },
-            [this] { fake.calls->push_back("sweep"); }, [this] { fake.calls->push_back("tasking"); }};
+            [this] { fake.calls->push_back("sweep"); },
+            [this] { fake.calls->push_back("tasking"); }};
   }
   int run(std::vector<const char*> arguments, DailyCapabilities capabilities = {}) {
     arguments.insert(arguments.begin(), "tallyrun");
@@ -108,10 +109,10 @@ TEST_F(DailyJobTest, WithoutTheUsersConsentNoWhitelistIsReadButTheRestRuns) {
   fake.crashReporting->submissionEnabled = false;
   run({"-f"}, allCapabilities());
   EXPECT_THAT(fake.files->reads, IsEmpty());
-  EXPECT_THAT(*fake.calls, ElementsAre("lock", "TBClientCheckpoint",
-                                       "isDiagnosticSubmissionEnabled", "sweep",
-                                       "FDDumpAllOldStructuredDataLogs", "tasking",
-                                       "rollFixlineLogs", "unlock"));
+  EXPECT_THAT(
+      *fake.calls,
+      ElementsAre("lock", "TBClientCheckpoint", "isDiagnosticSubmissionEnabled", "sweep",
+                  "FDDumpAllOldStructuredDataLogs", "tasking", "rollFixlineLogs", "unlock"));
 }
 
 TEST_F(DailyJobTest, ADoneDayOpensNeitherStoreNorWhitelist) {
@@ -148,8 +149,8 @@ TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
   run({}, {.startListener = [](DailyJob& job) { return job.appInfoRequested = true; },
            .runTelemetrySweep = {},
            .updateTaskingState = {}});
-  EXPECT_TRUE(fake.log->has(LogLevel::Default,
-                            "never received requested AAI, so moving along without it"));
+  EXPECT_TRUE(
+      fake.log->has(LogLevel::Default, "never received requested AAI, so moving along without it"));
   EXPECT_EQ(loggedDays(), std::vector<std::string>{"19999"});
   EXPECT_EQ(lastDay(), "19999");
 }

@@ -111,7 +111,8 @@ TEST(KvEqual, ComparesContentNotWidth) {
       {nullptr, nullptr, true},
       {nullptr, KvString::create(""), false},
   };
-  for (const auto& c : cases) EXPECT_EQ(kvEqual(c.a.get(), c.b.get()), c.equal) << kvText(c.a.get());
+  for (const auto& c : cases)
+    EXPECT_EQ(kvEqual(c.a.get(), c.b.get()), c.equal) << kvText(c.a.get());
 }
 
 TEST(KvText, OneFormForAll) {

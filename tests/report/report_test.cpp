@@ -16,9 +16,9 @@ using testing::IsEmpty;
 constexpr std::int32_t kDay = 19999;
 
 // A whitelist of exact keys (each with options, as plist text) in one group.
-std::string whitelist(std::initializer_list<std::pair<std::string_view, std::string_view>> scalars,
-                      std::initializer_list<std::pair<std::string_view, std::string_view>>
-                          distributions = {}) {
+std::string whitelist(
+    std::initializer_list<std::pair<std::string_view, std::string_view>> scalars,
+    std::initializer_list<std::pair<std::string_view, std::string_view>> distributions = {}) {
   std::string text = "<plist version=\"1.0\"><dict><key>G</key><dict>";
   const auto add = [&text](std::string_view section, const auto& keys) {
     text += "<key>" + std::string(section) + "</key><dict>";
@@ -114,8 +114,7 @@ TEST_F(ReportTest, TheTaskingInForceAndTheAppListAreCarried) {
   admit({{"a", ""}});
   fake.preferences->put("TaskingID", KvNumber::int32(17), kProgramDomain);
   fake.preferences->put("TaskingDigest", KvString::create("abc"), kProgramDomain);
-  fake.preferences->put("TaskingPayload", KvArray::create({KvString::create("x")}),
-                        kProgramDomain);
+  fake.preferences->put("TaskingPayload", KvArray::create({KvString::create("x")}), kProgramDomain);
   fake.locale->preferred.clear();
   fake.locale->system.clear();
   fake.locale->region.reset();
@@ -253,7 +252,10 @@ TEST_F(ReportTest, TheCorruptionCountIsTakenAndReset) {
       {false, {}, {kNoLibrary}, "0", "5"},
       {true, {"SMAPreferencesGetIntegerValue"}, {kNoRead}, "0", "5"},
       {true, {"SMAPreferencesSetValue"}, {kNoWrite}, "0", "5"},
-      {true, {"SMAPreferencesGetIntegerValue", "SMAPreferencesSetValue"}, {kNoRead, kNoWrite}, "0",
+      {true,
+       {"SMAPreferencesGetIntegerValue", "SMAPreferencesSetValue"},
+       {kNoRead, kNoWrite},
+       "0",
        "5"},
   };
   for (const auto& c : cases) {
@@ -267,10 +269,10 @@ TEST_F(ReportTest, TheCorruptionCountIsTakenAndReset) {
     writeLog();
     EXPECT_EQ(fake.log->texts(LogLevel::Error), c.errors);
     EXPECT_EQ(scalar(kKey), c.recorded);
-    EXPECT_EQ(kvText(fake.preferences->SMAPreferencesGetValue("DatabaseCorruptionCount",
-                                                              "vellum.tallyd")
-                         .get()),
-              c.left);
+    EXPECT_EQ(
+        kvText(fake.preferences->SMAPreferencesGetValue("DatabaseCorruptionCount", "vellum.tallyd")
+                   .get()),
+        c.left);
     // A second report tries again only while something is missing.
     writeLog();
     EXPECT_EQ(fake.crashSupportLibrary->opened.size(), c.errors.empty() ? 1u : 2u);
@@ -287,8 +289,10 @@ TEST_F(ReportTest, UptimeIsWholeMinutes) {
     const char* expected;
     bool error;
   } cases[] = {
-      {119'000'000'000, Timebase{1, 1}, "1", false}, {24'000'000 * 600ULL, Timebase{125, 3}, "10", false},
-      {5, std::nullopt, "-1", true},                 {5, Timebase{1, 0}, "-1", true},
+      {119'000'000'000, Timebase{1, 1}, "1", false},
+      {24'000'000 * 600ULL, Timebase{125, 3}, "10", false},
+      {5, std::nullopt, "-1", true},
+      {5, Timebase{1, 0}, "-1", true},
       {UINT64_MAX, Timebase{UINT32_MAX, 1}, "1320469587216440", false},
   };
   for (const auto& c : cases) {

@@ -85,9 +85,18 @@ std::size_t scan(const std::vector<double>& values, double sample) {
 
 TEST(Histogram, TheSearchAnswersLikeAScan) {
   const double nan = std::nan("");
-  std::vector<std::vector<double>> sets = {
-      {}, {10}, {10, 20}, {2.5}, {20, 10}, {5, 5, 5}, {3, 1, 4, 1, 5, 9, 2, 6}, {nan, 1, nan, 2},
-      {nan}, {-kInfinity, 0, kInfinity}, {kInfinity, 1}, {-0.0, 0.0, 1e-300}};
+  std::vector<std::vector<double>> sets = {{},
+                                           {10},
+                                           {10, 20},
+                                           {2.5},
+                                           {20, 10},
+                                           {5, 5, 5},
+                                           {3, 1, 4, 1, 5, 9, 2, 6},
+                                           {nan, 1, nan, 2},
+                                           {nan},
+                                           {-kInfinity, 0, kInfinity},
+                                           {kInfinity, 1},
+                                           {-0.0, 0.0, 1e-300}};
   std::mt19937 random(7);
   for (std::size_t size = 1; size < 40; ++size) {
     std::vector<double> set;
