@@ -1,0 +1,34 @@
+# Shared by the scripts; sourced, not run.
+set -euo pipefail
+
+root_dir=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
+jobs=$(nproc)
+
+# The compiler cache needs a folder that can be written, also where there is no home.
+if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
+  export CCACHE_DIR="$root_dir/build/ccache"
+fi
+
+say() { printf '\n== %s\n' "$*"; }
+fail() {
+  printf '%s: %s\n' "$(basename "$0")" "$*" >&2
+  exit 1
+}
+
+# build_with PRESET [TARGET ...]: configures the first time, then builds.
+build_with() {
+  local preset=$1
+  shift
+  cd "$root_dir"
+  cmake --preset "$preset" -DCMAKE_COLOR_DIAGNOSTICS=OFF >"/tmp/tallyrun-configure.$$" 2>&1 ||
+    { cat "/tmp/tallyrun-configure.$$" >&2; rm -f "/tmp/tallyrun-configure.$$"; fail "cannot configure"; }
+  rm -f "/tmp/tallyrun-configure.$$"
+  cmake --build "$(build_folder "$preset")" --parallel "$jobs" ${1:+--target "$@"}
+}
+
+build_folder() {
+  case $1 in
+    default) echo "$root_dir/build" ;;
+    *) echo "$root_dir/build-$1" ;;
+  esac
+}
