@@ -1,0 +1,148 @@
+"""A device root in a temporary folder, and the real programs run on it."""
+import csv
+import io
+import os
+import pathlib
+import plistlib
+import shutil
+import subprocess
+import tempfile
+import time
+import unittest
+
+BIN = pathlib.Path(os.environ["TALLYRUN_BIN"])
+PROGRAM_DOMAIN = "vellum.tallyd.tallyrun"
+LAST_DAY = "LastCrashLogSerializationDateInDaysSince1970"
+TODAY = 20514  # 2026-03-02
+NOON = 43200
+WHITELIST = "Library/Application Support/Tallybook/Whitelist_Nimbus.plist"
+STORE = "var/mobile/Library/Tallybook/TBDataStore.sqlitedb"
+SPOOL = "var/mobile/Library/Logs/Submission"
+PREFERENCES = "var/mobile/Library/Preferences"
+
+
+def group(scalars=None, distributions=None, **prefixes):
+    return {"ScalarKeys": scalars or {}, "DistributionKeys": distributions or {},
+            "ScalarKeyPrefixes": prefixes.get("scalar_prefixes", {}),
+            "DistributionKeyPrefixes": prefixes.get("distribution_prefixes", {})}
+
+
+class Device:
+    def __init__(self):
+        self.root = pathlib.Path(tempfile.mkdtemp(prefix="tally-e2e-"))
+
+    def remove(self):
+        shutil.rmtree(self.root, ignore_errors=True)
+
+    def write(self, path, content):
+        target = self.root / path
+        target.parent.mkdir(parents=True, exist_ok=True)
+        target.write_bytes(content if isinstance(content, bytes) else plistlib.dumps(content))
+        return target
+
+    def whitelist(self, **groups):
+        self.write(WHITELIST, groups)
+
+    def describe(self, **entries):
+        self.write("device/device.plist", entries)
+
+    def store(self, scalars=(), distributions=()):
+        """scalars: (key, day, value); distributions: (key, day, [values])."""
+        text = io.StringIO()
+        out = csv.writer(text, lineterminator="\n")
+        out.writerow(["kind", "key", "day", "offset", "value"])
+        for key, day, value in scalars:
+            out.writerow(["scalar", key, day, "", value])
+        for key, day, values in distributions:
+            for offset, value in enumerate(values):
+                out.writerow(["distribution", key, day, offset % 86400, repr(value)])
+        self.tool("store", "import", "-", stdin=text.getvalue().encode())
+
+    def environment(self, day=None, **more):
+        environment = dict(os.environ, TALLYRUN_ROOT=str(self.root), TALLYRUN_LOG="stderr", TZ="UTC",
+                           LANG="C", LC_ALL="C", LANGUAGE="", **more)
+        environment.pop("TALLYRUN_LOG_LEVEL", None)
+        # A preloaded library comes before the sanitizer's runtime, which is fine here.
+        environment["ASAN_OPTIONS"] = environment.get("ASAN_OPTIONS", "") + ":verify_asan_link_order=0"
+        if day is not None:
+            environment.update(NO_FAKE_STAT="1", DONT_FAKE_MONOTONIC="1")
+        return environment
+
+    def command(self, *arguments, day=TODAY, seconds=NOON):
+        command = [str(BIN / "tallyrun"), *arguments]
+        if day is not None:
+            moment = time.strftime("%Y-%m-%d %H:%M:%S", time.gmtime(day * 86400 + seconds))
+            command = ["faketime", "-f", "@" + moment] + command
+        return command
+
+    def run(self, *arguments, day=TODAY, seconds=NOON):
+        """Runs tallyrun at that time; the messages, without their prefix, by level and text."""
+        result = subprocess.run(self.command(*arguments, day=day, seconds=seconds),
+                                capture_output=True, timeout=120, env=self.environment(day))
+        assert result.returncode == 0, (result.returncode, result.stderr[-2000:])
+        return parse_messages(result.stderr)
+
+    def start(self, *arguments, day=TODAY):
+        return subprocess.Popen(self.command(*arguments, day=day), stderr=subprocess.PIPE,
+                                env=self.environment(day))
+
+    def tool(self, *arguments, stdin=b"", status=0):
+        result = subprocess.run([str(BIN / "tallyctl"), "--root", str(self.root), *arguments],
+                                input=stdin, capture_output=True, timeout=120,
+                                env=self.environment())
+        assert result.returncode == status, (arguments, result.returncode, result.stderr[-2000:])
+        return result.stdout.decode()
+
+    def preferences(self, domain=PROGRAM_DOMAIN):
+        path = self.root / PREFERENCES / f"{domain}.plist"
+        return plistlib.loads(path.read_bytes()) if path.exists() else {}
+
+    def set_preferences(self, domain=PROGRAM_DOMAIN, **values):
+        self.write(f"{PREFERENCES}/{domain}.plist", values)
+
+    def log_files(self):
+        return sorted((self.root / SPOOL).glob("*.log"))
+
+    def logs(self):
+        return [plistlib.loads(path.read_bytes()) for path in self.log_files()]
+
+    def log(self):
+        logs = self.logs()
+        assert len(logs) == 1, f"{len(logs)} logs"
+        return logs[0]
+
+    def info(self, path):
+        return plistlib.loads(path.with_name(path.name[:-len(".log")] + ".info.plist").read_bytes())
+
+
+def parse_messages(stderr):
+    messages = []
+    for line in stderr.decode().splitlines():
+        head, _, text = line.partition("]: ")
+        assert head.startswith("tallyrun["), line
+        messages.append((head[len("tallyrun["):], text))
+    return messages
+
+
+def texts(messages, level=None):
+    return [text for found, text in messages if level in (None, found)]
+
+
+class DeviceTest(unittest.TestCase):
+    def setUp(self):
+        self.device = self.fresh()
+
+    def fresh(self):
+        device = Device()
+        self.addCleanup(device.remove)
+        return device
+
+    def simple(self):
+        """A device with one whitelisted scalar on each of the last days."""
+        device = self.fresh()
+        device.whitelist(G=group({"a": {}}))
+        device.store([("a", day, day) for day in range(TODAY - 4, TODAY + 4)])
+        return device
+
+    def logged_days(self, device):
+        return [log["TBScalars"]["a"] for log in device.logs()]
