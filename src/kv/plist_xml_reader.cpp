@@ -1,0 +1,327 @@
+// A reader of our own, in one pass without a tree in between. The library takes quadratic time over
+// references in a text and over large dictionaries, holds several times the document's size in
+// memory, and lets much damage through in silence: text in a number, impossible dates, a key
+// without a value, a document that stops half-way.
+#include "kv/plist_xml_reader.h"
+
+#include <array>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "kv/plist_codec.h"
+#include "kv/plist_xml_leaf.h"
+
+namespace tally {
+namespace {
+
+constexpr auto kNone = std::string_view::npos;
+
+bool isBlank(char character) {
+  return character == ' ' || character == '\n' || character == '\t' || character == '\r';
+}
+
+struct Tag {
+  std::string_view name;
+  bool closing = false;
+  bool empty = false;
+};
+
+// A container that is still open; one of the first two is set.
+struct Frame {
+  KvRef<KvArray> array;
+  KvRef<KvDictionary> dictionary;
+  KvRef<KvString> key;  // waits for its value
+};
+
+class Reader {
+ public:
+  explicit Reader(std::string_view document) : text_(document) {}
+
+  Result<KvRef<KvObject>> read() {
+    if (prolog() && body() && epilog()) return std::move(root_);
+    std::size_t line = 1;
+    for (const char character : text_.substr(0, position_)) line += character == '\n';
+    return Error{"line " + std::to_string(line) + ": " + problem_};
+  }
+
+ private:
+  bool fail(const char* problem) {
+    problem_ = problem;
+    return false;
+  }
+  bool atEnd() const { return position_ >= text_.size(); }
+  bool at(std::string_view prefix) const { return text_.substr(position_).starts_with(prefix); }
+
+  bool take(std::string_view prefix) {
+    if (!at(prefix)) return false;
+    position_ += prefix.size();
+    return true;
+  }
+  bool skipPast(std::string_view mark, const char* problem) {
+    const std::size_t found = text_.find(mark, position_);
+    if (found == kNone) return fail(problem);
+    position_ = found + mark.size();
+    return true;
+  }
+  void skipBlanks() {
+    while (!atEnd() && isBlank(text_[position_])) ++position_;
+  }
+
+  // Blanks, comments and processing instructions, which may stand between any two elements.
+  bool skipBetween() {
+    for (;;) {
+      skipBlanks();
+      if (!at("<!") && !at("<?")) return true;
+      if (take("<!--")) {
+        if (!skipPast("-->", "a comment has no end")) return false;
+      } else if (take("<?")) {
+        if (!skipPast("?>", "a processing instruction has no end")) return false;
+      } else {
+        return true;
+      }
+    }
+  }
+
+  bool prolog() {
+    if (text_.find('\0') != kNone) return fail("there are zero bytes in the document");
+    take("\xEF\xBB\xBF");
+    if (at("<?xml") && !checkEncoding()) return false;
+    if (!skipBetween()) return false;
+    if (take("<!DOCTYPE") && (!skipDocumentType() || !skipBetween())) return false;
+    if (!at("<plist")) return true;
+    Tag tag;
+    wrapped_ = true;
+    return readTag(tag) && (tag.name == "plist" || fail("unknown element")) &&
+           (!tag.empty || fail("the property list is empty"));
+  }
+
+  bool checkEncoding() {
+    const std::string_view declaration = text_.substr(position_, text_.find("?>", position_));
+    const std::size_t found = declaration.find("encoding");
+    if (found == kNone) return true;
+    const std::size_t open = declaration.find_first_of("\"'", found);
+    if (open == kNone) return fail("the encoding is not readable");
+    const std::size_t close = declaration.find(declaration[open], open + 1);
+    if (close == kNone) return fail("the encoding is not readable");
+    std::string name(declaration.substr(open + 1, close - open - 1));
+    for (char& letter : name) {
+      if (letter >= 'A' && letter <= 'Z') letter = static_cast<char>(letter - 'A' + 'a');
+    }
+    return name == "utf-8" || name == "utf8" || name == "us-ascii" ||
+           fail("the encoding is not UTF-8");
+  }
+
+  // An internal subset could define entities, which no property list needs: refused.
+  bool skipDocumentType() {
+    for (; !atEnd(); ++position_) {
+      const char character = text_[position_];
+      if (character == '[' || character == '<') {
+        return fail("a document type with definitions of its own is not accepted");
+      }
+      if (character == '"' || character == '\'') {
+        const std::size_t close = text_.find(character, position_ + 1);
+        if (close == kNone) break;
+        position_ = close;
+      } else if (character == '>') {
+        ++position_;
+        return true;
+      }
+    }
+    return fail("the document type has no end");
+  }
+
+  // Expects a '<' at the position. Attributes carry nothing in a property list and are skipped.
+  bool readTag(Tag& tag) {
+    ++position_;
+    tag.closing = take("/");
+    const std::size_t start = position_;
+    while (!atEnd() && !isBlank(text_[position_]) && !std::strchr("<>/", text_[position_])) {
+      ++position_;
+    }
+    tag.name = text_.substr(start, position_ - start);
+    for (; !atEnd(); ++position_) {
+      const char character = text_[position_];
+      if (character == '>') {
+        tag.empty = text_[position_ - 1] == '/';
+        ++position_;
+        if (tag.empty && tag.closing) return fail("a closing tag is not well formed");
+        return true;
+      }
+      if (character == '<') break;
+      if (tag.closing && !isBlank(character)) return fail("a closing tag is not well formed");
+      if (character == '"' || character == '\'') {
+        const std::size_t close = text_.find(character, position_ + 1);
+        if (close == kNone) break;
+        position_ = close;
+      }
+    }
+    return fail("a tag has no end");
+  }
+
+  bool body() {
+    do {
+      if (!skipBetween()) return false;
+      if (atEnd()) return fail("the document ends too early");
+      if (text_[position_] != '<') return fail("there is text outside of a value");
+      Tag tag;
+      if (!readTag(tag)) return false;
+      if (!(tag.closing ? closeContainer(tag.name) : openElement(tag))) return false;
+    } while (!stack_.empty());
+    return true;
+  }
+
+  bool epilog() {
+    if (!skipBetween()) return false;
+    if (wrapped_) {
+      if (atEnd()) return fail("the document ends too early");
+      Tag tag;
+      if (text_[position_] != '<') return fail("there is text outside of a value");
+      if (!readTag(tag)) return false;
+      if (!tag.closing || tag.name != "plist") return fail("there is more than one root value");
+      if (!skipBetween()) return false;
+    }
+    return atEnd() || fail("there is something after the end of the property list");
+  }
+
+  bool openElement(const Tag& tag) {
+    if (++objects_ > kPlistMaximumObjects) return fail("there are more than 4000000 values");
+    if (tag.name == "dict") return openContainer(tag, {nullptr, KvDictionary::create(), nullptr});
+    if (tag.name == "array") return openContainer(tag, {KvArray::create(), nullptr, nullptr});
+
+    std::string_view content;
+    if (!tag.empty && !readContent(tag.name, content)) return false;
+    if (tag.name == "key") return addKey(content);
+    if (tag.name == "string") return addValue(stringOf(content));
+    if (tag.name == "integer") return addParsed(integerFromText(content), "not an integer");
+    if (tag.name == "true" || tag.name == "false") {
+      if (!content.empty()) return fail("there is text in a boolean");
+      return addValue(KvBoolean::of(tag.name == "true"));
+    }
+    if (tag.name == "real") return addParsed(realFromText(content), "not a real number");
+    if (tag.name == "date") return addParsed(dateFromText(content), "not a date");
+    if (tag.name == "data") return addParsed(dataFromText(content), "not base64 data");
+    return fail("unknown element");
+  }
+
+  bool openContainer(const Tag& tag, Frame frame) {
+    if (stack_.size() == static_cast<std::size_t>(kPlistMaximumDepth)) {
+      return fail("nested deeper than 512 levels");
+    }
+    // Refused now, although the value is added at the closing tag.
+    if (!stack_.empty() && stack_.back().dictionary && !stack_.back().key) {
+      return fail("a value in a dictionary has no key");
+    }
+    stack_.push_back(std::move(frame));
+    return !tag.empty || closeContainer(tag.name);
+  }
+
+  bool closeContainer(std::string_view name) {
+    if (stack_.empty() || name != (stack_.back().array ? "array" : "dict")) {
+      return fail("a closing tag does not match");
+    }
+    if (stack_.back().key) return fail("a key in a dictionary has no value");
+    Frame frame = std::move(stack_.back());
+    stack_.pop_back();
+    if (frame.array) return addValue(std::move(frame.array));
+    return addValue(std::move(frame.dictionary));
+  }
+
+  // Reads to the closing tag. The content lies in the document, or in content_ when it differs.
+  bool readContent(std::string_view name, std::string_view& content) {
+    bool plain = true;
+    content_.clear();
+    for (;;) {
+      const std::size_t end = text_.find('<', position_);
+      if (end == kNone) return fail("the document ends too early");
+      const std::string_view piece = text_.substr(position_, end - position_);
+      const bool raw = piece.find('&') == kNone && piece.find('\r') == kNone;
+      const bool last = text_.substr(end).starts_with("</");
+      if (plain && raw && last) {
+        content = piece;
+      } else {
+        plain = false;
+        const auto unescaped = unescapeXml(piece);
+        if (!unescaped) return fail("a reference is unknown or not well formed");
+        content_ += *unescaped;
+        content = content_;
+      }
+      position_ = end;
+      if (last) break;
+      if (!skipInsideContent()) return false;
+    }
+    Tag tag;
+    if (!readTag(tag)) return false;
+    return tag.name == name || fail("a closing tag does not match");
+  }
+
+  bool skipInsideContent() {
+    if (take("<!--")) return skipPast("-->", "a comment has no end");
+    if (!take("<![CDATA[")) return fail("there is an element inside a plain value");
+    const std::size_t start = position_;
+    if (!skipPast("]]>", "a character-data section has no end")) return false;
+    const std::string_view section = text_.substr(start, position_ - 3 - start);
+    for (std::size_t i = 0; i < section.size(); ++i) {
+      const bool lineEnd = section[i] == '\r';  // alone or with a newline: one newline
+      if (lineEnd && section.substr(i + 1).starts_with('\n')) continue;
+      content_ += lineEnd ? '\n' : section[i];
+    }
+    return true;
+  }
+
+  // Documents repeat a few short texts very often ("type", "scalar"): those share one object.
+  KvRef<KvString> stringOf(std::string_view content) {
+    constexpr std::size_t longestShared = 24;
+    if (content.empty() || content.size() > longestShared) return KvString::create(content);
+    const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(content[i]); };
+    const std::size_t mixed = content.size() * 131 + byte(0) * 31u + byte(content.size() / 2) * 7u +
+                              byte(content.size() - 1);
+    KvRef<KvString>& slot = recent_[mixed % recent_.size()];
+    if (!slot || slot->view() != content) slot = KvString::create(content);
+    return slot;
+  }
+
+  bool addKey(std::string_view content) {
+    if (stack_.empty() || !stack_.back().dictionary) return fail("a key outside of a dictionary");
+    if (stack_.back().key) return fail("a key in a dictionary has no value");
+    stack_.back().key = stringOf(content);
+    return true;
+  }
+
+  template <class T>
+  bool addParsed(KvRef<T> value, const char* problem) {
+    if (!value) return fail(problem);
+    return addValue(std::move(value));
+  }
+
+  bool addValue(KvRef<KvObject> value) {
+    if (stack_.empty()) {
+      root_ = std::move(value);
+      return true;
+    }
+    Frame& frame = stack_.back();
+    if (frame.array) {
+      frame.array->append(std::move(value));
+      return true;
+    }
+    if (!frame.key) return fail("a value in a dictionary has no key");
+    frame.dictionary->set(std::exchange(frame.key, nullptr), std::move(value));
+    return true;
+  }
+
+  const std::string_view text_;
+  std::size_t position_ = 0;
+  const char* problem_ = "";
+  bool wrapped_ = false;  // in a plist element
+  std::size_t objects_ = 0;
+  std::string content_;
+  std::vector<Frame> stack_;
+  KvRef<KvObject> root_;
+  std::array<KvRef<KvString>, 256> recent_;
+};
+
+}  // namespace
+
+Result<KvRef<KvObject>> readXmlPlist(std::string_view document) { return Reader(document).read(); }
+
+}  // namespace tally
