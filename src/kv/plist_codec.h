@@ -20,7 +20,8 @@ constexpr std::size_t kPlistMaximumObjects = 4'000'000;
 Result<KvRef<KvObject>> decodePlist(std::string_view document);
 
 // An XML property list, version 1.0, UTF-8, ending in a newline. Fails when the value is nested
-// deeper than kPlistMaximumDepth, which a reference cycle always is. Characters that XML 1.0 cannot
+// deeper than kPlistMaximumDepth, which a reference cycle always is, or when the document would be
+// larger than kPlistMaximumBytes and so could not be read again. Characters that XML 1.0 cannot
 // carry are written as U+FFFD. Reals read back equal.
 Result<std::string> encodeXmlPlist(const KvObject& root);
 
