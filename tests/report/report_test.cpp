@@ -293,7 +293,7 @@ TEST_F(ReportTest, UptimeIsWholeMinutes) {
       {24'000'000 * 600ULL, Timebase{125, 3}, "10", false},
       {5, std::nullopt, "-1", true},
       {5, Timebase{1, 0}, "-1", true},
-      {UINT64_MAX, Timebase{UINT32_MAX, 1}, "1320469587216440", false},
+      {UINT64_MAX, Timebase{UINT32_MAX, 1}, "1320469374930293248", false},
   };
   for (const auto& c : cases) {
     fake.log->lines.clear();
