@@ -1,1 +1,15 @@
-int main() { return 0; }
+// tallyctl: the operator's tool.
+#include <span>
+
+#include "platform/linux/linux_platform.h"
+#include "tools/tool.h"
+
+int main(int count, char** arguments) {
+  using namespace tally;
+  tools::ToolContext context;
+  context.root = deviceRootFromEnvironment();
+  context.output = terminalOf(1);
+  context.errors = terminalOf(2);
+  return tools::runTool(std::move(context), {arguments, static_cast<std::size_t>(count)},
+                        makeLinuxPlatform);
+}

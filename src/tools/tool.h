@@ -1,0 +1,51 @@
+// What every command of tallyctl shares: the device, the form of the output and the exit status.
+#pragma once
+
+#include <cstdio>
+#include <functional>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include <CLI/CLI.hpp>
+
+#include "platform/linux/terminal.h"
+#include "platform/platform.h"
+
+namespace tally::tools {
+
+enum ExitStatus : int {
+  kSuccess = 0,
+  kWrong = 1,     // the thing asked about is wrong or missing
+  kBadUsage = 2,  // the command line makes no sense
+};
+
+struct ToolContext {
+  std::string root;   // the device root: --root, else what it was built with
+  bool json = false;  // --json: output for programs
+  Terminal output;    // what standard output can show
+  Terminal errors;    // what standard error can show
+  std::FILE* out = stdout;
+  std::FILE* err = stderr;
+  // The command that the arguments chose, set by the callback of its CLI::App. It runs once the
+  // platform of the root is installed, and returns the exit status.
+  std::function<int()> command;
+};
+
+// Each family of commands adds its own subcommands with a function of this form, declared in its
+// own header and listed in commandFamilies(). The app and the context outlive the commands.
+using CommandFamily = void (*)(CLI::App& app, ToolContext& context);
+std::span<const CommandFamily> commandFamilies();
+
+// Makes the platform of a device root.
+using PlatformFactory = std::function<Platform(const std::string& root)>;
+
+// Runs the command that the arguments name (the first is the program's own name) and returns the
+// exit status. Help goes to context.out, usage errors to context.err.
+int runTool(ToolContext context, std::span<const char* const> arguments,
+            const PlatformFactory& makePlatform);
+
+// Writes text as it is.
+void print(std::FILE* file, std::string_view text);
+
+}  // namespace tally::tools
