@@ -14,7 +14,13 @@ PlatformScope::PlatformScope(Platform services) : services_(std::move(services))
   current = &services_;
 }
 
-// The services may still log while they are destroyed, so the former platform comes back first.
-PlatformScope::~PlatformScope() { current = former_; }
+// Services may log while they end (preferences that cannot be written), so the log goes last.
+PlatformScope::~PlatformScope() {
+  Platform ending;
+  ending.log = services_.log;
+  std::swap(ending, services_);
+  ending = Platform();
+  current = former_;
+}
 
 }  // namespace tally

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <algorithm>
-#include <cmath>
 #include <map>
 #include <memory>
 #include <string>
@@ -10,6 +9,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/time_text.h"
 #include "platform/clock.h"
 #include "platform/metrics_store.h"
 
@@ -87,9 +87,7 @@ struct FakeMetricsStore final : MetricsStore {
   FakeRows rows;
   int batchDepth = 0, historiesOpened = 0;
 
-  std::int32_t TBDaysSince1970() override {
-    return static_cast<std::int32_t>(std::floor(clock->secondsSince1970() / 86400.0));
-  }
+  std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock->secondsSince1970()); }
   void TBClientCheckpoint() override { calls->push_back("TBClientCheckpoint"); }
   void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     calls->push_back("scalar " + std::string(key) + "=" + std::to_string(value));

@@ -75,6 +75,21 @@ TEST(Platform, ScopesNestAndMessagesAreFormattedOnlyWhenSeen) {
   EXPECT_EQ(outer.log->lines, (std::vector<fakes::FakeSystemLog::Line>{{LogLevel::Info, "day 3"}}));
 }
 
+TEST(Platform, AServiceCanLogWhileItEnds) {
+  struct Farewell final : RunLock {
+    void enter() override {}
+    void leave() override {}
+    ~Farewell() override { logMessage(LogLevel::Error, "not written"); }
+  };
+  const auto fake = fakes::makeFakePlatform();
+  {
+    Platform services = fake.services();
+    services.runLock = std::make_shared<Farewell>();
+    const PlatformScope scope(std::move(services));
+  }
+  EXPECT_TRUE(fake.log->has(LogLevel::Error, "not written"));
+}
+
 TEST(DayToDate, IsTheDaysFirstInstant) {
   EXPECT_EQ(DayToDate(20049)->secondsSince1970(), 20049 * 86400.0);
   EXPECT_EQ(DayToDate(INT32_MIN)->secondsSince1970(), -2147483648.0 * 86400.0);
