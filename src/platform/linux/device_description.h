@@ -1,0 +1,45 @@
+// The device description: device/device.plist under the device root, whose entries override what
+// Linux would answer.
+#pragma once
+
+#include <memory>
+#include <set>
+#include <string>
+#include <string_view>
+
+#include "kv/value.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// Read once, at the first question. A damaged file is named in one error line and answers nothing;
+// an entry of the wrong type is named in one error line and counts as absent.
+class DeviceDescription {
+ public:
+  DeviceDescription(std::string path, std::shared_ptr<SystemLog> log)
+      : path_(std::move(path)), log_(std::move(log)) {}
+
+  // Borrowed; null when it is not described.
+  const KvObject* get(std::string_view key);
+  // Borrowed; null when it is not described or of another type.
+  template <class T>
+  const T* getAs(std::string_view key) {
+    const KvObject* value = get(key);
+    if (value != nullptr && value->type() != T::kType) {
+      reportEntry(key, "is of the wrong type");
+      return nullptr;
+    }
+    return static_cast<const T*>(value);
+  }
+  // Says once, as an error, that an entry cannot be used.
+  void reportEntry(std::string_view entry, std::string_view fault);
+
+ private:
+  std::string path_;
+  std::shared_ptr<SystemLog> log_;
+  bool read_ = false;
+  KvRef<KvDictionary> entries_;
+  std::set<std::string, std::less<>> reported_;
+};
+
+}  // namespace tally

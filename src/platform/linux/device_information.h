@@ -1,0 +1,34 @@
+// What the device says of itself: its description, else Linux.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "platform/device_information.h"
+#include "platform/linux/device_description.h"
+
+namespace tally {
+
+class LinuxDeviceInformation final : public DeviceInformation {
+ public:
+  LinuxDeviceInformation(std::string prefix, std::shared_ptr<DeviceDescription> description)
+      : prefix_(std::move(prefix)), description_(std::move(description)) {}
+  KvRef<KvObject> DeviceQuery(std::string_view question) override;
+  bool HasInternalDiagnostics(std::string_view subsystem) override;
+  std::string SMAOSVersion() override;
+  KvRef<KvDictionary> copySystemVersionDictionary() override;
+
+ private:
+  KvRef<KvObject> diskUsage() const;
+  KvRef<KvObject> inverseDeviceID() const;
+
+  std::string prefix_;
+  std::shared_ptr<DeviceDescription> description_;
+};
+
+// An identifier that is stable for a machine and a stranger to its machine id, which it is a hash
+// of: 32 hexadecimal digits. Empty when the text holds no machine id.
+std::string inverseDeviceID(std::string_view machineId);
+
+}  // namespace tally

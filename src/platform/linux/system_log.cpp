@@ -1,0 +1,133 @@
+#include "platform/linux/system_log.h"
+
+#include <sys/uio.h>
+#define SD_JOURNAL_SUPPRESS_LOCATION  // every message would name this file
+#include <systemd/sd-journal.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <optional>
+
+#include "base/utf8.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kLongestMessage = 16384;
+constexpr char kJournalSocket[] = "/run/systemd/journal/socket";
+
+struct LevelName {
+  LogLevel level;
+  std::string_view name;
+  std::string_view priority;  // the journal's
+};
+constexpr std::array kLevels{
+    LevelName{LogLevel::Debug, "debug", "PRIORITY=7"},
+    LevelName{LogLevel::Info, "info", "PRIORITY=6"},
+    LevelName{LogLevel::Default, "default", "PRIORITY=5"},
+    LevelName{LogLevel::Error, "error", "PRIORITY=3"},
+};
+
+const LevelName& levelName(LogLevel level) { return kLevels[static_cast<std::size_t>(level)]; }
+
+iovec field(std::string_view text) { return {const_cast<char*>(text.data()), text.size()}; }
+
+void appendEscaped(std::string& out, std::string_view text) {
+  constexpr char kDigits[] = "0123456789abcdef";
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    auto byte = static_cast<unsigned char>(text[i]);
+    // U+0080 to U+009F, which terminals obey as they obey the controls below U+0020.
+    const bool upperControl =
+        byte == 0xC2 && i + 1 < text.size() && static_cast<unsigned char>(text[i + 1]) < 0xA0;
+    if (upperControl) byte = static_cast<unsigned char>(text[++i]);
+    if (byte == '\n') {
+      out += "\\n";
+    } else if (byte == '\t') {
+      out += "\\t";
+    } else if (upperControl || byte < 0x20 || byte == 0x7F) {
+      out += "\\x";
+      out += kDigits[byte >> 4];
+      out += kDigits[byte & 15];
+    } else {
+      out += static_cast<char>(byte);
+    }
+  }
+}
+
+// The message as valid UTF-8 of bounded length.
+std::string readable(std::string_view message) {
+  std::string text = repairUtf8(message.substr(0, kLongestMessage));
+  if (message.size() > kLongestMessage) text += " [cut short]";
+  return text;
+}
+
+void writeToStandardError(std::string_view line) {
+  while (!line.empty()) {
+    const auto count = ::write(STDERR_FILENO, line.data(), line.size());
+    if (count < 0 && errno == EINTR) continue;
+    if (count < 0) return;  // there is nowhere left to report it
+    line.remove_prefix(static_cast<std::size_t>(count));
+  }
+}
+
+class LinuxSystemLog final : public SystemLog {
+ public:
+  explicit LinuxSystemLog(SystemLogSettings settings) : settings_(settings) {}
+
+  bool enabled(LogLevel level) const override { return level >= settings_.lowest; }
+
+  void write(LogLevel level, std::string_view message) override {
+    if (!enabled(level)) return;
+    if (!useJournal() || !sendToJournal(level, message)) {
+      writeToStandardError(standardErrorLine(level, message));
+    }
+  }
+
+ private:
+  bool useJournal() {
+    if (!useJournal_) {
+      useJournal_ = !settings_.forceStandardError && ::access(kJournalSocket, W_OK) == 0;
+    }
+    return *useJournal_;
+  }
+
+  static bool sendToJournal(LogLevel level, std::string_view message) {
+    const std::string text = "MESSAGE=" + readable(message);
+    const std::array fields{field(text), field(levelName(level).priority),
+                            field("SYSLOG_IDENTIFIER=tallyrun"),
+                            field("SUBSYSTEM=vellum.tallyd.tallyrun")};
+    return ::sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) == 0;
+  }
+
+  SystemLogSettings settings_;
+  std::optional<bool> useJournal_;
+};
+
+}  // namespace
+
+SystemLogSettings systemLogSettings(const char* destination, const char* level) {
+  SystemLogSettings settings;
+  settings.forceStandardError = destination != nullptr && std::strcmp(destination, "stderr") == 0;
+  if (settings.forceStandardError) settings.lowest = LogLevel::Debug;
+  for (const LevelName& known : kLevels) {
+    if (level != nullptr && known.name == level) settings.lowest = known.level;
+  }
+  return settings;
+}
+
+std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings) {
+  return std::make_shared<LinuxSystemLog>(settings);
+}
+
+std::string standardErrorLine(LogLevel level, std::string_view message) {
+  std::string line = "tallyrun[";
+  line += levelName(level).name;
+  line += "]: ";
+  appendEscaped(line, readable(message));
+  line += '\n';
+  return line;
+}
+
+}  // namespace tally

@@ -1,0 +1,29 @@
+// The system log: the journal, or standard error.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "platform/system_log.h"
+
+namespace tally {
+
+struct SystemLogSettings {
+  bool forceStandardError = false;
+  LogLevel lowest = LogLevel::Info;
+};
+
+// From the values of TALLYRUN_LOG and TALLYRUN_LOG_LEVEL; null is unset. What is not understood
+// counts as unset.
+SystemLogSettings systemLogSettings(const char* destination, const char* level);
+
+// Whether there is a journal is found out at the first message.
+std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings);
+
+// The one line, ending in a newline, that a message is on standard error: control characters are
+// written as escapes ("\n", "\x1b"), so that no message can pass for two, and bytes that are not
+// UTF-8 as U+FFFD. Messages above 16 KiB are cut short.
+std::string standardErrorLine(LogLevel level, std::string_view message);
+
+}  // namespace tally
