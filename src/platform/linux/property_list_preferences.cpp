@@ -1,0 +1,207 @@
+#include "platform/linux/property_list_preferences.h"
+
+#include <fmt/format.h>
+
+#include <cerrno>
+
+#include "kv/plist_codec.h"
+
+namespace tally {
+namespace {
+
+constexpr std::string_view kSuffix = ".plist";
+constexpr std::string_view kLockName = ".preferences.lock";
+// Damaged files that are kept for whoever looks into the matter.
+constexpr int kDamagedFilesKept = 8;
+
+}  // namespace
+
+PropertyListPreferences::~PropertyListPreferences() {
+  for (auto& [domain, state] : domains_) {
+    if (!state.pending.empty()) writePending(state, domain);
+  }
+}
+
+KvRef<KvObject> PropertyListPreferences::SMAPreferencesGetValue(std::string_view key,
+                                                                std::string_view domain) {
+  Domain* const state = find(domain);
+  if (state == nullptr) return nullptr;
+  if (const auto written = state->pending.find(key); written != state->pending.end()) {
+    return written->second;
+  }
+  refresh(*state, domain);
+  return KvRef<KvObject>::share(state->stored->get(key));
+}
+
+void PropertyListPreferences::SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
+                                                     std::string_view domain) {
+  if (Domain* const state = find(domain)) state->pending.insert_or_assign(std::string(key), value);
+}
+
+bool PropertyListPreferences::SMAPreferencesSynchronize(std::string_view domain) {
+  Domain* const state = find(domain);
+  return state != nullptr && (state->pending.empty() || writePending(*state, domain));
+}
+
+KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain) {
+  Domain* const state = find(domain);
+  if (state == nullptr) return KvDictionary::create();
+  refresh(*state, domain);
+  auto all = state->stored->copy();
+  for (const auto& [key, value] : state->pending) all->set(key, value);
+  return all;
+}
+
+Result<std::vector<std::string>> PropertyListPreferences::listDomains() const {
+  auto names = listFolder(folder_);
+  if (!names) return names;
+  std::vector<std::string> domains;
+  for (const std::string& name : *names) {
+    if (name.ends_with(kSuffix)) domains.push_back(name.substr(0, name.size() - kSuffix.size()));
+  }
+  return domains;
+}
+
+PropertyListPreferences::Domain* PropertyListPreferences::find(std::string_view domain) {
+  if (const auto known = domains_.find(domain); known != domains_.end()) return &known->second;
+  // A name that looks like a temporary file's would be swept with them.
+  if (!isSafeFileName(domain) || isTemporaryName(domain)) {
+    report(domain, "not a name that a domain can have");
+    return nullptr;
+  }
+  return &domains_.try_emplace(std::string(domain)).first->second;
+}
+
+std::string PropertyListPreferences::pathOf(std::string_view domain) const {
+  return fmt::format("{}/{}{}", folder_, domain, kSuffix);
+}
+
+// One look at the file's identity instead of reading it again.
+void PropertyListPreferences::refresh(Domain& state, std::string_view domain) {
+  if (state.read && fileIdentity(pathOf(domain)) == state.identity) return;
+  reload(state, domain, /*locked=*/false);
+}
+
+void PropertyListPreferences::reload(Domain& state, std::string_view domain, bool locked) {
+  const std::string path = pathOf(domain);
+  // Taken first: should the file be replaced meanwhile, the next look reads it again.
+  const auto identity = fileIdentity(path);
+  const bool seen = state.read && identity == state.identity;
+  state.read = true;
+  state.identity = identity;
+  const auto document = readFile(path, kPlistMaximumBytes);
+  if (document) {
+    auto root = decodePlist(*document);
+    auto* const dictionary = root ? kvCast<KvDictionary>(root->get()) : nullptr;
+    if (dictionary == nullptr) {
+      recover(state, domain, root ? "not a dictionary" : root.error().message, locked);
+      return;
+    }
+    state.stored = KvRef<KvDictionary>::share(dictionary);
+    state.writable = true;
+    return;
+  }
+  const int code = document.error().systemError;
+  const bool unusable = code == 0 || code == EFBIG;  // a folder in its place, or far too large
+  if (unusable) {
+    recover(state, domain, document.error().message, locked);
+    return;
+  }
+  state.stored = KvDictionary::create();
+  // What cannot be read now may be sound, so nothing is written over it.
+  state.writable = code == ENOENT;
+  if (!state.writable && !seen) report(domain, document.error().message);
+}
+
+// Makes room for a new file where there is a damaged one.
+void PropertyListPreferences::recover(Domain& state, std::string_view domain,
+                                      const std::string& fault, bool locked) {
+  if (!locked) {
+    // Another process may be at the same, or may just have put a sound file in its place.
+    const auto lock = lockFolder();
+    if (lock) {
+      reload(state, domain, /*locked=*/true);
+      return;
+    }
+  }
+  const bool wasWritable = state.writable;
+  state.stored = KvDictionary::create();
+  const auto moved = setAside(pathOf(domain));
+  state.writable = static_cast<bool>(moved);
+  if (moved) {
+    report(domain, fmt::format("damaged, set aside: {}", fault));
+    state.identity.reset();
+  } else if (wasWritable) {
+    report(domain, fmt::format("damaged: {}; {}", fault, moved.error().message));
+  }
+}
+
+Status PropertyListPreferences::setAside(const std::string& path) const {
+  for (int number = 1; number <= kDamagedFilesKept; ++number) {
+    const std::string aside = fmt::format("{}.damaged-{}", path, number);
+    if (!fileIdentity(aside)) return renameFile(path, aside);
+  }
+  // A file that is damaged again and again must not fill the volume.
+  return removeFile(path);
+}
+
+Result<FileLock> PropertyListPreferences::lockFolder() {
+  auto lock = FileLock::acquire(fmt::format("{}/{}", folder_, kLockName));
+  if (lock && !std::exchange(swept_, true)) {
+    // Nobody else is writing here, so temporary files are those of killed runs.
+    if (const auto names = listFolder(folder_)) {
+      for (const std::string& name : *names) {
+        if (isTemporaryName(name)) (void)removeFile(folder_ + "/" + name);
+      }
+    }
+  }
+  return lock;
+}
+
+bool PropertyListPreferences::writePending(Domain& state, std::string_view domain) {
+  const auto lock = lockFolder();
+  if (!lock) {
+    report(domain, lock.error().message);
+    return false;
+  }
+  reload(state, domain, /*locked=*/true);
+  if (!state.writable) {
+    report(domain, "not written, since what is there cannot be read");
+    return false;
+  }
+  const auto merged = state.stored->copy();
+  bool changed = false;
+  for (const auto& [key, value] : state.pending) {
+    if (kvEqual(merged->get(key), value.get())) continue;
+    merged->set(key, value);
+    changed = true;
+  }
+  if (changed) {
+    const auto text = encodeXmlPlist(*merged);
+    const std::string path = pathOf(domain);
+    const Status written = text ? writeFileAtomically(path, *text, mode_) : Status(text.error());
+    if (!written) {
+      report(domain, written.error().message);
+      return false;
+    }
+    state.stored = merged;
+    state.identity = fileIdentity(path);
+  }
+  state.pending.clear();
+  return true;
+}
+
+void PropertyListPreferences::report(std::string_view domain, std::string_view fault) const {
+  log_->write(LogLevel::Error, fmt::format("preferences {}: {}", domain, fault));
+}
+
+std::optional<std::string> userPreferencesFolder(const std::string& prefix, std::string_view user) {
+  if (!isSafeFileName(user)) return std::nullopt;
+  return fmt::format("{}/var/{}/Library/Preferences", prefix, user);
+}
+
+std::string systemPreferencesFolder(const std::string& prefix) {
+  return prefix + "/Library/Preferences";
+}
+
+}  // namespace tally

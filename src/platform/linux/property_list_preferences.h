@@ -1,0 +1,70 @@
+// Preferences in property-list files, one per domain, in one folder.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/file.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// The preferences of whoever owns the folder: the program's own user, another user, the system.
+// A domain is read at its first use and again whenever another process has replaced its file.
+// Writes are kept per key and laid over what the file holds when they are synchronised, so that
+// two processes never undo each other's keys. Domains still unsynchronised are written when the
+// object is destroyed. Values are shared, not copied: a value given or got must not be changed.
+class PropertyListPreferences final : public Preferences {
+ public:
+  PropertyListPreferences(std::string folder, std::shared_ptr<SystemLog> log, unsigned mode = 0600)
+      : folder_(std::move(folder)), log_(std::move(log)), mode_(mode) {}
+  ~PropertyListPreferences() override;
+  PropertyListPreferences(const PropertyListPreferences&) = delete;
+  PropertyListPreferences& operator=(const PropertyListPreferences&) = delete;
+
+  KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view domain) override;
+  void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
+                              std::string_view domain) override;
+  bool SMAPreferencesSynchronize(std::string_view domain) override;
+
+  // All keys of a domain as they read now; empty when there are none.
+  KvRef<KvDictionary> copyDomain(std::string_view domain);
+  // The domains that have a file, sorted.
+  Result<std::vector<std::string>> listDomains() const;
+
+ private:
+  struct Domain {
+    KvRef<KvDictionary> stored = KvDictionary::create();  // what the file held when it was read
+    std::map<std::string, KvRef<KvObject>, std::less<>> pending;  // null removes
+    std::optional<FileIdentity> identity;                         // of the file that was read
+    bool read = false;
+    bool writable = true;  // false while the file holds something that could not be read
+  };
+
+  Domain* find(std::string_view domain);
+  std::string pathOf(std::string_view domain) const;
+  void refresh(Domain& state, std::string_view domain);
+  void reload(Domain& state, std::string_view domain, bool locked);
+  void recover(Domain& state, std::string_view domain, const std::string& fault, bool locked);
+  Status setAside(const std::string& path) const;
+  Result<FileLock> lockFolder();
+  bool writePending(Domain& state, std::string_view domain);
+  void report(std::string_view domain, std::string_view fault) const;
+
+  std::string folder_;
+  std::shared_ptr<SystemLog> log_;
+  unsigned mode_;
+  bool swept_ = false;
+  std::map<std::string, Domain, std::less<>> domains_;
+};
+
+// Where a user's preferences lie below a root; empty when the name cannot be a folder's.
+std::optional<std::string> userPreferencesFolder(const std::string& prefix, std::string_view user);
+std::string systemPreferencesFolder(const std::string& prefix);
+
+}  // namespace tally
