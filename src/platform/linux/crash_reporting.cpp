@@ -1,0 +1,67 @@
+#include "platform/linux/crash_reporting.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+
+#include "platform/linux/log_spool.h"
+
+namespace tally {
+
+LinuxCrashReporting::LinuxCrashReporting(const std::string& prefix, std::shared_ptr<SystemLog> log,
+                                         std::shared_ptr<Clock> clock,
+                                         std::shared_ptr<Preferences> preferences,
+                                         std::shared_ptr<DeviceDescription> description)
+    : fixlineFolder_(prefix + "/var/mobile/Library/Logs/Fixline"),
+      log_(std::move(log)),
+      clock_(std::move(clock)),
+      preferences_(std::move(preferences)),
+      description_(std::move(description)),
+      structuredData_(prefix + "/var/mobile/Library/Logs/StructuredData", *clock_) {}
+
+bool LinuxCrashReporting::isDiagnosticSubmissionEnabled() {
+  constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";
+  if (const auto* described = description_->getAs<KvBoolean>(kSwitch)) return described->value();
+  bool exists = false;
+  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, "vellum.tallyd", &exists);
+  return enabled || !exists;
+}
+
+void LinuxCrashReporting::FDLogStructuredData(std::uint32_t recordType,
+                                              const KvDictionary& record) {
+  const auto appended = structuredData_.append(recordType, record, folderBounds(*preferences_));
+  if (!appended) report(fmt::format("structured data of type {}", recordType), appended.error());
+}
+
+void LinuxCrashReporting::FDDumpAllOldStructuredDataLogs() {
+  structuredData_.finishAll(folderBounds(*preferences_),
+                            [this](const Error& error) { report("structured data", error); });
+}
+
+void LinuxCrashReporting::rollFixlineLogs() {
+  if (const auto rolled = rollLogs(fixlineFolder_); !rolled) {
+    report("repair-service logs", rolled.error());
+  }
+}
+
+void LinuxCrashReporting::report(std::string_view what, const Error& error) const {
+  log_->write(LogLevel::Error, fmt::format("{}: {}", what, error.message));
+}
+
+bool LinuxCrashSupportLibrary::open(std::string_view) {
+  const auto* described = description_->getAs<KvDictionary>("CrashSupport");
+  return described == nullptr || !described->getBool("Absent").value_or(false);
+}
+
+bool LinuxCrashSupportLibrary::hasSymbol(std::string_view name) {
+  const auto* described = description_->getAs<KvDictionary>("CrashSupport");
+  const auto* missing =
+      described != nullptr ? described->getAs<KvArray>("MissingSymbols") : nullptr;
+  return missing == nullptr ||
+         std::none_of(missing->begin(), missing->end(), [&](const auto& item) {
+           const auto* symbol = kvCast<KvString>(item.get());
+           return symbol != nullptr && symbol->view() == name;
+         });
+}
+
+}  // namespace tally

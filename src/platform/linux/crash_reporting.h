@@ -1,0 +1,48 @@
+// Crash-reporting services on files.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "platform/crash_reporting.h"
+#include "platform/linux/device_description.h"
+#include "platform/linux/structured_data.h"
+#include "platform/preferences.h"
+
+namespace tally {
+
+class LinuxCrashReporting final : public CrashReporting {
+ public:
+  LinuxCrashReporting(const std::string& prefix, std::shared_ptr<SystemLog> log,
+                      std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
+                      std::shared_ptr<DeviceDescription> description);
+  bool isDiagnosticSubmissionEnabled() override;
+  void FDLogStructuredData(std::uint32_t recordType, const KvDictionary& record) override;
+  void FDDumpAllOldStructuredDataLogs() override;
+  void rollFixlineLogs() override;
+
+ private:
+  void report(std::string_view what, const Error& error) const;
+
+  std::string fixlineFolder_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<Clock> clock_;
+  std::shared_ptr<Preferences> preferences_;
+  std::shared_ptr<DeviceDescription> description_;
+  StructuredDataFolder structuredData_;
+};
+
+// The support library is part of this platform, whatever the path, unless the device description
+// says otherwise: "CrashSupport" = { "Absent" = true, "MissingSymbols" = [names] }.
+class LinuxCrashSupportLibrary final : public CrashSupportLibrary {
+ public:
+  explicit LinuxCrashSupportLibrary(std::shared_ptr<DeviceDescription> description)
+      : description_(std::move(description)) {}
+  bool open(std::string_view path) override;
+  bool hasSymbol(std::string_view name) override;
+
+ private:
+  std::shared_ptr<DeviceDescription> description_;
+};
+
+}  // namespace tally

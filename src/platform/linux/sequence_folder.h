@@ -1,0 +1,49 @@
+// A bounded folder of finished logs, whose names begin with a rising number.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/result.h"
+
+namespace tally {
+
+struct FolderBounds {
+  std::uint64_t maximumLogs = 500;
+  std::uint64_t maximumBytes = 50u << 20;
+};
+
+// Space that logs leave free on their volume.
+constexpr std::uint64_t kReservedBytes = 16u << 20;
+
+// The files of one log; their names begin with its number.
+struct SequencedLog {
+  std::uint64_t sequence = 0;
+  std::uint64_t bytes = 0;         // of all its files
+  std::vector<std::string> names;  // sorted
+};
+
+// The number that a file's name begins with; empty when the name is not such a name.
+std::optional<std::uint64_t> sequenceOf(std::string_view name);
+// "0000000042-", the beginning of a log's names.
+std::string sequencePrefix(std::uint64_t sequence);
+
+// The logs of a folder, oldest first. Age is the number's, so that it does not depend on the clock.
+Result<std::vector<SequencedLog>> listSequenced(const std::string& folder);
+// The number for the next log.
+Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
+
+// Removes the oldest logs until the folder is within its bounds, but never the log `kept`. A log's
+// files go last name first.
+Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::uint64_t kept);
+
+// An error when writing this many more bytes would use what is reserved of the volume.
+Status checkReserve(const std::string& folder, std::uint64_t bytes);
+
+// Makes the folder readable by its owner alone.
+Status makePrivateFolder(const std::string& folder);
+
+}  // namespace tally

@@ -1,0 +1,152 @@
+// Structured-data logs and the rolling of logs across kills and damage.
+#include "platform/linux/structured_data.h"
+
+#include <random>
+
+#include "kv/plist_codec.h"
+#include "linux/temporary_root.h"
+#include "platform/linux/crash_reporting.h"
+
+namespace tally {
+namespace {
+
+using Names = std::vector<std::string>;
+
+class StructuredDataTest : public TemporaryRoot {
+ protected:
+  Status append(std::uint32_t type, std::int64_t value) {
+    return folder.append(type, *KvDictionary::create({{"n", KvNumber::int64(value)}}), bounds);
+  }
+  Names finish() {
+    Names failures;
+    folder.finishAll(bounds, [&](const Error& error) { failures.push_back(error.message); });
+    return failures;
+  }
+  // The values of the records in all finished logs, in order; also checks each one's type.
+  std::vector<std::int64_t> finished(std::int64_t type) {
+    std::vector<std::int64_t> values;
+    for (const std::string& name : names("data")) {
+      if (!name.ends_with(".plist")) continue;
+      const auto document = decodePlist(get("data/" + name));
+      EXPECT_TRUE(document) << name;
+      const auto* entries = kvCast<KvDictionary>(document->get());
+      if (entries->getInt64("RecordType") != type) continue;
+      for (const auto& item : *entries->getAs<KvArray>("Records")) {
+        values.push_back(*kvCast<KvDictionary>(item.get())->getInt64("n"));
+      }
+    }
+    return values;
+  }
+
+  fakes::FakeClock clock;
+  StructuredDataFolder folder{at("data"), clock};
+  FolderBounds bounds;
+};
+
+TEST_F(StructuredDataTest, RecordsAreGatheredByTypeAndWrittenOutOnce) {
+  EXPECT_TRUE(finish().empty());
+  EXPECT_FALSE(fileIdentity(at("data"))) << "made without need";
+  for (int i = 1; i <= 3; ++i) ASSERT_TRUE(append(172, i));
+  ASSERT_TRUE(append(176, 9));
+  EXPECT_EQ(names("data"), (Names{"0000000001-172.pending", "0000000002-176.pending"}));
+  EXPECT_TRUE(finish().empty());
+  EXPECT_TRUE(finish().empty());
+  ASSERT_TRUE(append(172, 4));
+  EXPECT_EQ(names("data"),
+            (Names{"0000000001-172.plist", "0000000002-176.plist", "0000000003-172.pending"}));
+  EXPECT_TRUE(finish().empty());
+  EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 3, 4}));
+  EXPECT_EQ(finished(176), std::vector<std::int64_t>{9});
+  bounds.maximumLogs = 1;
+  ASSERT_TRUE(append(176, 10));
+  EXPECT_TRUE(finish().empty());
+  EXPECT_EQ(names("data"), Names{"0000000004-176.plist"});
+}
+
+TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {
+  ASSERT_TRUE(append(172, 1));
+  const std::string whole = get("data/0000000001-172.pending");
+  EXPECT_EQ(wholeRecords(whole), whole.size());
+  for (const std::string_view torn :
+       {"0", "0000000099", "0000000099\nabc", "9999999999\n", "-000000001\n", "garbage garbage"}) {
+    EXPECT_EQ(wholeRecords(whole + std::string(torn)), whole.size()) << torn;
+  }
+  for (std::size_t cut = 0; cut < whole.size(); ++cut) {
+    EXPECT_EQ(wholeRecords(whole.substr(0, cut)), 0u) << cut;
+  }
+  put("data/0000000001-172.pending", whole + "0000000300\nhalf a rec");
+  ASSERT_TRUE(append(172, 2));
+  put("data/0000000001-172.pending",
+      get("data/0000000001-172.pending") + "0000000003\nbad\n" + whole);
+  const auto failures = finish();
+  ASSERT_EQ(failures.size(), 1u);
+  EXPECT_NE(failures[0].find("1 damaged"), std::string::npos) << failures[0];
+  EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 1}));
+}
+
+TEST_F(StructuredDataTest, ALogThatWasWrittenOutBeforeAKillIsNotWrittenOutAgain) {
+  ASSERT_TRUE(append(172, 1));
+  const std::string pending = get("data/0000000001-172.pending");
+  EXPECT_TRUE(finish().empty());
+  put("data/0000000001-172.pending", pending);  // as if killed before it was removed
+  ASSERT_TRUE(append(172, 2));
+  EXPECT_TRUE(finish().empty());
+  EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2}));
+}
+
+TEST_F(StructuredDataTest, AKillLosesNoWholeRecord) {
+  std::mt19937 random(5);
+  for (int round = 0; round < 30; ++round) {
+    runAndKill(random() % 4000, [&] {
+      for (int i = 1;; ++i) {
+        (void)append(172, round * 1000 + i);
+        if (i % 3 == 0) finish();
+      }
+    });
+  }
+  EXPECT_TRUE(finish().empty());
+  std::int64_t last = 0;
+  for (const std::int64_t value : finished(172)) {
+    const bool follows = value == last + 1 || value % 1000 == 1;
+    EXPECT_TRUE(follows && value > last) << value << " after " << last;
+    last = value;
+  }
+  for (const std::string& name : names("data")) EXPECT_TRUE(name.ends_with(".plist")) << name;
+}
+
+TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
+  EXPECT_TRUE(rollLogs(at("absent")));
+  put("logs/empty.log", "");
+  put("logs/other.txt", "x");
+  for (int i = 1; i <= 9; ++i) {
+    put("logs/a.log", std::to_string(i));
+    ASSERT_TRUE(rollLogs(at("logs")));
+  }
+  EXPECT_EQ(names("logs"), (Names{"a.log.1", "a.log.2", "a.log.3", "a.log.4", "a.log.5", "a.log.6",
+                                  "a.log.7", "empty.log", "other.txt"}));
+  EXPECT_EQ(get("logs/a.log.1"), "9");
+  EXPECT_EQ(get("logs/a.log.7"), "3");
+  std::filesystem::remove(at("logs/a.log.3"));  // a gap, as a kill in between leaves it
+  put("logs/a.log", "10");
+  ASSERT_TRUE(rollLogs(at("logs")));
+  EXPECT_EQ(get("logs/a.log.3"), "8");
+  EXPECT_EQ(get("logs/a.log.7"), "3") << "nothing had to go";
+}
+
+TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
+  const auto preferences = std::make_shared<fakes::FakePreferences>();
+  const auto enabled = [&] {
+    const auto description = std::make_shared<DeviceDescription>(at("device/device.plist"), log);
+    return LinuxCrashReporting(root, log, std::make_shared<fakes::FakeClock>(), preferences,
+                               description)
+        .isDiagnosticSubmissionEnabled();
+  };
+  EXPECT_TRUE(enabled());
+  preferences->put("DiagnosticSubmissionEnabled", KvBoolean::of(false), "vellum.tallyd");
+  EXPECT_FALSE(enabled());
+  putPlist("device/device.plist", "<dict><key>DiagnosticSubmissionEnabled</key><true/></dict>");
+  EXPECT_TRUE(enabled());
+}
+
+}  // namespace
+}  // namespace tally
