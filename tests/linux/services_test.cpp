@@ -12,6 +12,7 @@
 #include "platform/linux/event_loop.h"
 #include "platform/linux/files.h"
 #include "platform/linux/kernel_values.h"
+#include "platform/linux/linux_platform.h"
 #include "platform/linux/locale.h"
 #include "platform/linux/run_lock.h"
 #include "platform/linux/system_log.h"
@@ -265,6 +266,20 @@ TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
     right = right && loop.runMainLoopSlice(30, true) == SliceResult::Stopped;
     return right && loop.runMainLoopSlice(30, true) == SliceResult::TimedOut;
   });
+}
+
+TEST_F(ServicesTest, MakingThePlatformTouchesNothing) {
+  {
+    const Platform services = makeLinuxPlatform(root + "//");
+    EXPECT_EQ(services.preferences->SMAPreferencesGetIntegerValue("a", "b"), 0);
+    EXPECT_FALSE(services.files->fileSize("/device/device.plist"));
+    EXPECT_GT(services.clock->secondsSince1970(), 1.7e9);
+  }
+  EXPECT_TRUE(std::filesystem::is_empty(root));
+  const struct {
+    const char *given, *prefix;
+  } cases[] = {{"/", ""}, {"", ""}, {"//", ""}, {"/a/", "/a"}, {"a", "a"}};
+  for (const auto& c : cases) EXPECT_EQ(devicePrefix(c.given), c.prefix) << c.given;
 }
 
 }  // namespace

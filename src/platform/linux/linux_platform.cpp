@@ -1,0 +1,84 @@
+#include "platform/linux/linux_platform.h"
+
+#include <cstdlib>
+
+#include "platform/linux/applications.h"
+#include "platform/linux/clock.h"
+#include "platform/linux/crash_reporting.h"
+#include "platform/linux/device_information.h"
+#include "platform/linux/event_loop.h"
+#include "platform/linux/files.h"
+#include "platform/linux/kernel_values.h"
+#include "platform/linux/locale.h"
+#include "platform/linux/log_spool.h"
+#include "platform/linux/metrics_store.h"
+#include "platform/linux/property_list_preferences.h"
+#include "platform/linux/run_lock.h"
+#include "platform/linux/system_log.h"
+
+namespace tally {
+namespace {
+
+std::string variable(const char* name) {
+  const char* const value = std::getenv(name);
+  return value != nullptr ? value : "";
+}
+
+// The data folder of whoever runs the program, who is part of the device only when the device is
+// this machine.
+std::string userDataFolder(const std::string& prefix) {
+  if (!prefix.empty()) return "";
+  const std::string data = variable("XDG_DATA_HOME");
+  if (data.starts_with('/')) return data;
+  const std::string home = variable("HOME");
+  return home.starts_with('/') ? home + "/.local/share" : "";
+}
+
+}  // namespace
+
+Platform makeLinuxPlatform(const std::string& root) {
+  const std::string prefix = devicePrefix(root);
+  const std::string data = prefix + "/var/mobile/Library/Tallybook";
+  const auto log = makeLinuxSystemLog(
+      systemLogSettings(std::getenv("TALLYRUN_LOG"), std::getenv("TALLYRUN_LOG_LEVEL")));
+  const auto clock = std::make_shared<LinuxClock>();
+  const auto description =
+      std::make_shared<DeviceDescription>(prefix + "/device/device.plist", log);
+  const auto preferences = std::make_shared<PropertyListPreferences>(
+      userPreferencesFolder(prefix, "mobile").value(), log);
+
+  Platform services;
+  services.log = log;
+  services.clock = clock;
+  services.eventLoop = std::make_shared<SdEventLoop>(log);
+  services.files = std::make_shared<RootedFiles>(prefix);
+  services.runLock = std::make_shared<FileRunLock>(data + "/tallyrun.lock", log);
+  services.preferences = preferences;
+  services.metricsStore = makeSqliteMetricsStore(data + "/TBDataStore.sqlitedb", clock);
+  services.logSubmission =
+      std::make_shared<SpoolSubmission>(spoolFolder(prefix), log, clock, preferences);
+  services.crashReporting =
+      std::make_shared<LinuxCrashReporting>(prefix, log, clock, preferences, description);
+  services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);
+  services.deviceInformation = std::make_shared<LinuxDeviceInformation>(prefix, description);
+  services.appRegistry = std::make_shared<DesktopAppRegistry>(
+      applicationFolders(prefix, userDataFolder(prefix)), description);
+  services.locale =
+      std::make_shared<LinuxLocale>(prefix,
+                                    LocaleEnvironment{variable("LANGUAGE"), variable("LC_ALL"),
+                                                      variable("LC_MESSAGES"), variable("LANG")},
+                                    description);
+  services.kernelValues = std::make_shared<LinuxKernelValues>(description);
+  return services;
+}
+
+std::string deviceRootFromEnvironment() {
+  const std::string root = variable("TALLYRUN_ROOT");
+  return root.empty() ? "/" : root;
+}
+
+std::string devicePrefix(const std::string& root) {
+  return root.substr(0, root.find_last_not_of('/') + 1);
+}
+
+}  // namespace tally

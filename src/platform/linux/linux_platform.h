@@ -1,0 +1,23 @@
+// The Linux platform: every service below a device root.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "platform/linux/device_description.h"
+#include "platform/platform.h"
+
+namespace tally {
+
+// All services of the device whose root is the folder. Cheap: nothing is opened or read before a
+// service is used.
+Platform makeLinuxPlatform(const std::string& root);
+
+// TALLYRUN_ROOT; "/" when it is unset or empty.
+std::string deviceRootFromEnvironment();
+
+// The root without a slash at its end, so that an absolute path of the device can follow: "" is
+// the machine itself.
+std::string devicePrefix(const std::string& root);
+
+}  // namespace tally
