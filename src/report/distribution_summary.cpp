@@ -2,9 +2,17 @@
 
 #include <algorithm>
 #include <limits>
+#include <memory>
+#include <new>
+#include <optional>
+
+#include "platform/platform.h"
 
 namespace tally {
 namespace {
+
+// Samples taken at a time: they stay in the first-level cache between reading and counting.
+constexpr std::size_t kSampleBatch = 1024;
 
 template <bool kWithHistogram>
 DistributionSummary addSamples(DistributionSummary summary, std::span<const double> samples,
@@ -43,6 +51,34 @@ KvRef<KvArray> DistributionSummary::toArray() const {
   return KvArray::create({KvNumber::float64(minimum), KvNumber::float64(maximum),
                           KvNumber::float64(mean), KvNumber::float64(squaredDeviations),
                           KvNumber::int32(static_cast<std::int32_t>(std::min(count, kMost)))});
+}
+
+DistributionResult summariseDistribution(DistributionValues& values, std::string_view key,
+                                         const ScalarOptions& options) {
+  DistributionResult result;
+  std::optional<HistogramIntervals> intervals;
+  std::unique_ptr<std::uint32_t[]> counters;
+  std::span<std::uint32_t> counts;
+  if (const auto* boundaries = options.getAs<KvArray>(kOptionIntervals)) {
+    logMessage(LogLevel::Debug, "Treating key {} as a histogram", key);
+    intervals.emplace(*boundaries);
+    counters.reset(new (std::nothrow) std::uint32_t[intervals->bucketCount()]());
+    result.hasHistogram = counters != nullptr;
+    if (result.hasHistogram) {
+      counts = {counters.get(), intervals->bucketCount()};
+    } else {
+      logMessage(LogLevel::Default,
+                 "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
+                 key);
+    }
+  }
+  const HistogramIntervals* counted = result.hasHistogram ? &*intervals : nullptr;
+  double batch[kSampleBatch];
+  while (const std::size_t count = values.nextValues(batch, nullptr, kSampleBatch)) {
+    result.summary.add({batch, count}, counted, counts);
+  }
+  if (counted != nullptr) result.histogram = makeHistogramDictionary(*counted, counts);
+  return result;
 }
 
 }  // namespace tally

@@ -3,8 +3,11 @@
 
 #include <cstdint>
 #include <span>
+#include <string_view>
 
+#include "config/scalar_options.h"
 #include "kv/value.h"
+#include "platform/metrics_store.h"
 #include "report/histogram.h"
 
 namespace tally {
@@ -25,5 +28,16 @@ struct DistributionSummary {
   // which saturates.
   KvRef<KvArray> toArray() const;
 };
+
+// What a distribution comes to under its options.
+struct DistributionResult {
+  DistributionSummary summary;
+  bool hasHistogram = false;      // "intervals" were given and their counters could be allocated
+  KvRef<KvDictionary> histogram;  // null when no bucket has samples
+};
+
+// Reads every sample, in one pass and constant memory. The key is for messages.
+DistributionResult summariseDistribution(DistributionValues& values, std::string_view key,
+                                         const ScalarOptions& options);
 
 }  // namespace tally

@@ -1,21 +1,11 @@
 // The history pass: scalars and distributions of the day.
 #include "report/report.h"
 
-#include <new>
-#include <vector>
-
 #include "platform/platform.h"
 #include "report/distribution_summary.h"
 #include "report/scalar_rounding.h"
 
 namespace tally {
-namespace {
-
-// Samples taken at a time: they stay in the first-level cache between reading and counting.
-constexpr std::size_t kSampleBatch = 1024;
-
-}  // namespace
-
 TBReport::TBReport() : _config(TBConfig::init()) {}
 
 const ScalarOptions* TBReport::scalarOptions(std::string_view key) const {
@@ -60,31 +50,10 @@ void TBReport::addScalarForKeyByExecutingBlock(std::string_view key, const Produ
 void TBReport::computeAndAddDistributionForKeyWithOptions(DistributionValues& values,
                                                           std::string_view key,
                                                           const ScalarOptions& options) {
-  std::optional<HistogramIntervals> intervals;
-  std::unique_ptr<std::uint32_t[]> counters;
-  std::span<std::uint32_t> counts;
-  if (const auto* boundaries = options.getAs<KvArray>(kOptionIntervals)) {
-    logMessage(LogLevel::Debug, "Treating key {} as a histogram", key);
-    intervals.emplace(*boundaries);
-    counters.reset(new (std::nothrow) std::uint32_t[intervals->bucketCount()]());
-    if (counters) {
-      counts = {counters.get(), intervals->bucketCount()};
-    } else {
-      intervals.reset();
-      logMessage(LogLevel::Default,
-                 "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
-                 key);
-    }
-  }
-  DistributionSummary summary;
-  double batch[kSampleBatch];
-  while (const std::size_t count = values.nextValues(batch, nullptr, kSampleBatch)) {
-    summary.add({batch, count}, intervals ? &*intervals : nullptr, counts);
-  }
-  if (intervals) {
-    _histogramsOutput->set(key, histogramDictForIntervalsWithHistCounts(*intervals, counts));
-  }
-  _distributionsOutput->set(key, summary.toArray());
+  const DistributionResult result = summariseDistribution(values, key, options);
+  // A histogram without samples takes away what an earlier row of the key has left.
+  if (result.hasHistogram) _histogramsOutput->set(key, result.histogram);
+  _distributionsOutput->set(key, result.summary.toArray());
 }
 
 std::size_t TBReport::determineHistBucketForValueWithIntervals(
