@@ -12,13 +12,16 @@
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
 #include "platform/device_information.h"
+#include "platform/device_registry.h"
 #include "platform/event_loop.h"
 #include "platform/files.h"
 #include "platform/kernel_values.h"
 #include "platform/log_submission.h"
 #include "platform/metrics_store.h"
 #include "platform/preferences.h"
+#include "platform/purgeable_space.h"
 #include "platform/run_lock.h"
+#include "platform/stackshot.h"
 #include "platform/system_log.h"
 
 namespace tally {
@@ -46,6 +49,9 @@ struct Platform {
   std::shared_ptr<AppRegistry> appRegistry;
   std::shared_ptr<Locale> locale;
   std::shared_ptr<KernelValues> kernelValues;
+  std::shared_ptr<DeviceRegistry> deviceRegistry;
+  std::shared_ptr<Stackshot> stackshot;
+  std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 
