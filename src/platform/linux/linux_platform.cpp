@@ -14,6 +14,7 @@
 #include "platform/linux/metrics_store.h"
 #include "platform/linux/property_list_preferences.h"
 #include "platform/linux/run_lock.h"
+#include "platform/linux/store_schema.h"
 #include "platform/linux/system_log.h"
 
 namespace tally {
@@ -54,7 +55,7 @@ Platform makeLinuxPlatform(const std::string& root) {
   services.files = std::make_shared<RootedFiles>(prefix);
   services.runLock = std::make_shared<FileRunLock>(data + "/tallyrun.lock", log);
   services.preferences = preferences;
-  services.metricsStore = makeSqliteMetricsStore(data + "/TBDataStore.sqlitedb", clock);
+  services.metricsStore = makeSqliteMetricsStore(metricsStorePath(prefix), log, clock);
   services.logSubmission =
       std::make_shared<SpoolSubmission>(spoolFolder(prefix), log, clock, preferences);
   services.crashReporting =

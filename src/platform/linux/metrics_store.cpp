@@ -1,0 +1,122 @@
+#include "platform/linux/metrics_store.h"
+
+#include <optional>
+#include <utility>
+#include <vector>
+
+#include "base/time_text.h"
+#include "platform/linux/store_history.h"
+#include "platform/linux/store_writer.h"
+
+namespace tally {
+namespace {
+
+constexpr std::int32_t kDaysKept = 30;
+
+class SqliteMetricsStore final : public MetricsStore {
+ public:
+  SqliteMetricsStore(std::string path, std::shared_ptr<SystemLog> log,
+                     std::shared_ptr<const Clock> clock)
+      : path_(std::move(path)), log_(std::move(log)), clock_(std::move(clock)) {}
+
+  std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock_->secondsSince1970()); }
+
+  void TBClientCheckpoint() override { report(checkpoint()); }
+
+  void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
+    if (!isStoreKey(key)) {
+      report(Error{"metrics store " + path_ + ": " + std::string(kStoreKeyRule)});
+      return;
+    }
+    // Kept in memory until the batch ends, so that others need not wait while its values are read.
+    batch_.push_back({TBDaysSince1970(), std::string(key), value});
+    if (batchDepth_ == 0) writeBatch();
+  }
+  void beginBatch() override { ++batchDepth_; }
+  void endBatch() override {
+    if (batchDepth_ > 0 && --batchDepth_ == 0) writeBatch();
+  }
+
+  std::unique_ptr<HistoryStore> openHistory() override {
+    return openSqliteHistory(path_, [this](const std::string& message) { report(Error{message}); });
+  }
+
+ private:
+  struct Scalar {
+    std::int32_t day;
+    std::string key;
+    std::int64_t value;
+  };
+
+  void report(const Status& status) {
+    if (status || status.error().message == reported_) return;
+    reported_ = status.error().message;
+    log_->write(LogLevel::Error, reported_);
+  }
+
+  // The connection stays open, since a run writes more than once. Null: there is no store.
+  Result<StoreWriter*> writer(IfMissing ifMissing) {
+    if (!writer_) {
+      auto opened = StoreWriter::open(path_, ifMissing);
+      if (!opened) return opened.error();
+      writer_ = std::move(*opened);
+    }
+    return writer_ ? &*writer_ : nullptr;
+  }
+
+  template <class Work>
+  static Status transaction(StoreWriter& writer, const Work& work) {
+    if (auto begun = writer.begin(); !begun) return begun;
+    Status done = work();
+    if (done) return writer.commit();
+    writer.rollBack();
+    return done;
+  }
+
+  Status checkpoint() {
+    const auto opened = writer(IfMissing::Leave);
+    if (!opened) return opened.error();
+    if (*opened == nullptr) return Done{};
+    StoreWriter& store = **opened;
+    const std::int32_t oldest = TBDaysSince1970() - kDaysKept;
+    const auto needed = store.needsCheckpoint(oldest);
+    if (!needed) return needed.error();
+    if (!*needed) return Done{};
+    return transaction(store, [&]() -> Status {
+      if (auto folded = store.foldRecent(); !folded) return folded;
+      return store.forgetBefore(oldest);
+    });
+  }
+
+  void writeBatch() {
+    const auto scalars = std::exchange(batch_, {});
+    if (scalars.empty()) return;
+    const auto opened = writer(IfMissing::Create);
+    if (!opened) return report(opened.error());
+    report(transaction(**opened, [&]() -> Status {
+      for (const Scalar& scalar : scalars) {
+        auto set = (*opened)->setScalar(scalar.day, scalar.key, scalar.value);
+        if (!set) return set;
+      }
+      return Done{};
+    }));
+  }
+
+  std::string path_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<const Clock> clock_;
+  std::optional<StoreWriter> writer_;
+  std::vector<Scalar> batch_;
+  int batchDepth_ = 0;
+  std::string reported_;
+};
+
+}  // namespace
+
+std::shared_ptr<MetricsStore> makeSqliteMetricsStore(std::string path,
+                                                     std::shared_ptr<SystemLog> log,
+                                                     std::shared_ptr<const Clock> clock) {
+  return std::make_shared<SqliteMetricsStore>(std::move(path), std::move(log), std::move(clock));
+}
+
+}  // namespace tally

@@ -1,0 +1,173 @@
+#include "platform/linux/sqlite_database.h"
+
+#include <fcntl.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+namespace tally {
+namespace {
+
+constexpr int kBusyMilliseconds = 60'000;
+
+// The path as a URI that asks SQLite to read without locks.
+std::string immutableUri(std::string_view path) {
+  std::string uri = "file:";
+  for (const char c : path) {
+    if (c == '%' || c == '?' || c == '#') {
+      constexpr std::string_view kDigits = "0123456789ABCDEF";
+      uri += '%';
+      uri += kDigits[static_cast<unsigned char>(c) >> 4];
+      uri += kDigits[static_cast<unsigned char>(c) & 15];
+    } else {
+      uri += c;
+    }
+  }
+  return uri + "?immutable=1";
+}
+
+// SQLite would give a new file the modes of the umask. Only a file that is not there yet is opened
+// here: closing any other would drop the locks that this process holds on it.
+void makePrivateFile(const std::string& path) {
+  const int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
+  if (file >= 0) ::close(file);
+}
+
+}  // namespace
+
+void Statement::Finalise::operator()(sqlite3_stmt* statement) const {
+  ::sqlite3_finalize(statement);
+}
+
+Statement& Statement::bind(int parameter, std::int64_t value) {
+  ::sqlite3_bind_int64(handle_.get(), parameter, value);
+  return *this;
+}
+
+Statement& Statement::bind(int parameter, std::string_view text) {
+  ::sqlite3_bind_text64(handle_.get(), parameter, text.data() != nullptr ? text.data() : "",
+                        text.size(), SQLITE_STATIC, SQLITE_UTF8);
+  return *this;
+}
+
+Statement& Statement::bind(int parameter, std::span<const std::byte> blob) {
+  ::sqlite3_bind_blob64(handle_.get(), parameter, blob.data(), blob.size(), SQLITE_STATIC);
+  return *this;
+}
+
+Step Statement::step() {
+  switch (::sqlite3_step(handle_.get())) {
+    case SQLITE_ROW:
+      return Step::Row;
+    case SQLITE_DONE:
+      return Step::Done;
+    default:
+      return Step::Failed;
+  }
+}
+
+void Statement::reset() { ::sqlite3_reset(handle_.get()); }
+
+bool Statement::run() {
+  Step result = Step::Row;
+  while (result == Step::Row) result = step();
+  reset();
+  return result == Step::Done;
+}
+
+ColumnType Statement::type(int column) const {
+  switch (::sqlite3_column_type(handle_.get(), column)) {
+    case SQLITE_INTEGER:
+      return ColumnType::Integer;
+    case SQLITE_FLOAT:
+      return ColumnType::Real;
+    case SQLITE_TEXT:
+      return ColumnType::Text;
+    case SQLITE_BLOB:
+      return ColumnType::Blob;
+    default:
+      return ColumnType::Null;
+  }
+}
+
+std::int64_t Statement::integer(int column) const {
+  return ::sqlite3_column_int64(handle_.get(), column);
+}
+
+std::string_view Statement::text(int column) const {
+  const auto* bytes = static_cast<const char*>(::sqlite3_column_blob(handle_.get(), column));
+  return {bytes != nullptr ? bytes : "", blob(column).size()};
+}
+
+std::span<const std::byte> Statement::blob(int column) const {
+  const auto* bytes = static_cast<const std::byte*>(::sqlite3_column_blob(handle_.get(), column));
+  if (bytes == nullptr) return {};
+  return {bytes, static_cast<std::size_t>(::sqlite3_column_bytes(handle_.get(), column))};
+}
+
+void Database::Close::operator()(sqlite3* handle) const { ::sqlite3_close_v2(handle); }
+
+Result<Database> Database::open(const std::string& path, Access access) {
+  int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
+  switch (access) {
+    case Access::ReadOnly:
+      flags |= SQLITE_OPEN_READONLY;
+      break;
+    case Access::Immutable:
+      flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
+      break;
+    case Access::Create:
+      makePrivateFile(path);
+      flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+      break;
+    case Access::ReadWrite:
+      flags |= SQLITE_OPEN_READWRITE;
+      break;
+  }
+  sqlite3* handle = nullptr;
+  const std::string name = access == Access::Immutable ? immutableUri(path) : path;
+  const int code = ::sqlite3_open_v2(name.c_str(), &handle, flags, nullptr);
+  Database database;
+  database.path_ = path;
+  database.handle_.reset(handle);
+  if (code != SQLITE_OK) return database.error();
+  ::sqlite3_busy_timeout(handle, kBusyMilliseconds);
+  return database;
+}
+
+Status Database::execute(const char* sql) {
+  if (::sqlite3_exec(handle_.get(), sql, nullptr, nullptr, nullptr) != SQLITE_OK) return error();
+  return Done{};
+}
+
+Result<Statement> Database::prepare(std::string_view sql) {
+  sqlite3_stmt* handle = nullptr;
+  const int code = ::sqlite3_prepare_v3(handle_.get(), sql.data(), static_cast<int>(sql.size()),
+                                        SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
+  if (code != SQLITE_OK) return error();
+  Statement statement;
+  statement.handle_.reset(handle);
+  return statement;
+}
+
+Result<std::int64_t> Database::integer(std::string_view sql) {
+  auto statement = prepare(sql);
+  if (!statement) return statement.error();
+  if (statement->step() != Step::Row) return error();
+  return statement->integer(0);
+}
+
+Error Database::error() const {
+  return error(handle_ ? ::sqlite3_errmsg(handle_.get()) : "out of memory");
+}
+
+Error Database::error(std::string_view reason) const {
+  return {"metrics store " + path_ + ": " + std::string(reason)};
+}
+
+bool Database::busy() const { return (::sqlite3_errcode(handle_.get()) & 0xff) == SQLITE_BUSY; }
+
+void Database::foldLogOnClose(bool fold) {
+  ::sqlite3_db_config(handle_.get(), SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, fold ? 0 : 1, nullptr);
+}
+
+}  // namespace tally

@@ -1,0 +1,79 @@
+// SQLite handles that close themselves, and the few calls that the metrics store makes.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "base/result.h"
+
+struct sqlite3;
+struct sqlite3_stmt;
+
+namespace tally {
+
+enum class Step { Row, Done, Failed };
+enum class ColumnType { Null, Integer, Real, Text, Blob };
+
+// A prepared statement. Parameters count from 1, columns from 0. Texts and blobs that are bound are
+// borrowed until the next reset(); those of a column live until the next step() or reset().
+class Statement {
+ public:
+  Statement& bind(int parameter, std::int64_t value);
+  Statement& bind(int parameter, std::string_view text);
+  Statement& bind(int parameter, std::span<const std::byte> blob);
+  Step step();
+  // Ready for other parameters, and no longer in the way of a commit.
+  void reset();
+  // Binds nothing, runs to its end, resets. False on failure.
+  bool run();
+
+  ColumnType type(int column) const;
+  std::int64_t integer(int column) const;
+  std::string_view text(int column) const;
+  std::span<const std::byte> blob(int column) const;
+
+ private:
+  friend class Database;
+  struct Finalise {
+    void operator()(sqlite3_stmt* statement) const;
+  };
+  std::unique_ptr<sqlite3_stmt, Finalise> handle_;
+};
+
+// A connection. It waits a minute for the locks of others before an operation fails.
+class Database {
+ public:
+  enum class Access {
+    ReadOnly,
+    Immutable,  // read only, without locks: for volumes on which no lock file can be made
+    ReadWrite,
+    Create,  // read and write; makes the file when it is missing, readable by its owner alone
+  };
+  static Result<Database> open(const std::string& path, Access access);
+
+  const std::string& path() const { return path_; }
+  Status execute(const char* sql);
+  Result<Statement> prepare(std::string_view sql);
+  // The one integer that a query or pragma answers with.
+  Result<std::int64_t> integer(std::string_view sql);
+  // A failure, in words that name the file; without a reason, the last call's.
+  Error error() const;
+  Error error(std::string_view reason) const;
+  // Whether the last call failed since another connection held a lock.
+  bool busy() const;
+  // Whether closing the last connection may fold the write-ahead log into the file.
+  void foldLogOnClose(bool fold);
+
+ private:
+  struct Close {
+    void operator()(sqlite3* handle) const;
+  };
+  std::string path_;
+  std::unique_ptr<sqlite3, Close> handle_;
+};
+
+}  // namespace tally

@@ -1,0 +1,30 @@
+// The metrics store as a file: where it lies, what makes it one, and how it is opened.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/linux/sqlite_database.h"
+
+namespace tally {
+
+// The store of the device whose root, without a slash at its end, is the prefix.
+std::string metricsStorePath(const std::string& prefix);
+
+// A key of the store is valid UTF-8 of 1 to 512 bytes without a zero byte.
+bool isStoreKey(std::string_view key);
+constexpr std::string_view kStoreKeyRule =
+    "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
+
+// Opens the store and takes hold of its present state: what others commit afterwards is not seen.
+// Nothing is created. Empty when there is no store yet; an error when there is something else in
+// its place, or a store of a newer version of the program.
+Result<std::optional<Database>> openStoreForReading(const std::string& path);
+
+enum class IfMissing { Leave, Create };
+// Opens the store for writing. With Leave, empty when there is no store yet. Whatever is not a
+// store, or is a newer one, is left as it is.
+Result<std::optional<Database>> openStoreForWriting(const std::string& path, IfMissing ifMissing);
+
+}  // namespace tally

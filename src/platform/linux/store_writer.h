@@ -1,0 +1,55 @@
+// Writes to the metrics store.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "platform/linux/store_schema.h"
+
+namespace tally {
+
+// One connection that writes. Everything between begin() and commit() is one transaction, which
+// others see as a whole and which a kill or a full disk undoes as a whole; so does the destructor.
+// Keys are checked here; the other arguments are taken as they are.
+class StoreWriter {
+ public:
+  // Empty when there is no store and none is to be made.
+  static Result<std::optional<StoreWriter>> open(const std::string& path, IfMissing ifMissing);
+
+  Status begin();
+  Status commit();
+  void rollBack();
+
+  // REQUIRES for these: a transaction has begun. After a failure it can only be rolled back.
+  Status setScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  // Records further samples of the key, after all that it has. Both spans have the same length.
+  Status pushSamples(std::int32_t day, std::string_view key, std::span<const double> values,
+                     std::span<const std::uint32_t> offsets);
+  // The same for many samples, straight into chunks. REQUIRES: foldRecent() in this transaction.
+  Status appendToChunks(std::int32_t day, std::string_view key, std::span<const double> values,
+                        std::span<const std::uint32_t> offsets);
+  // Moves pushed samples to the chunks of their day. Damaged rows stay where they are.
+  Status foldRecent();
+  Status forgetBefore(std::int32_t day);
+
+  // Whether foldRecent() or forgetBefore(day) would find something to do.
+  Result<bool> needsCheckpoint(std::int32_t day);
+
+ private:
+  struct Statements {
+    Statement setScalar, lastRecent, addRecent, lastChunk, putChunk;
+  };
+  class ChunkTail;
+  StoreWriter(Database database, Statements statements)
+      : database_(std::move(database)), statements_(std::move(statements)) {}
+  Status checkKey(std::string_view key) const;
+
+  Database database_;
+  Statements statements_;
+};
+
+}  // namespace tally
