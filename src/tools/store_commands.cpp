@@ -1,9 +1,235 @@
 #include "tools/store_commands.h"
 
-namespace tally::tools {
+#include <limits>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <vector>
 
-void addStoreCommands(CLI::App& app, ToolContext&) {
-  app.add_subcommand("store", "Write and read the metrics store")->require_subcommand(1);
+#include "base/file.h"
+#include "base/number_text.h"
+#include "base/time_text.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store_history.h"
+#include "platform/linux/store_writer.h"
+#include "tools/store_csv.h"
+#include "tools/store_dump.h"
+#include "tools/store_import.h"
+
+namespace tally::tools {
+namespace {
+
+using Json = nlohmann::ordered_json;
+
+// What the arguments of a store command were.
+struct StoreArguments {
+  std::string key, value, file;
+  std::vector<std::string> values;
+  std::optional<std::int32_t> day;
+  std::optional<std::uint32_t> offset;
+  std::string prefix;
+};
+
+std::string storePath(const ToolContext& context) {
+  return metricsStorePath(devicePrefix(context.root));
+}
+
+int complain(const ToolContext& context, std::string_view message, ExitStatus status) {
+  print(context.err, fmt::format("tallyctl: {}\n", message));
+  return status;
+}
+
+void printJson(const ToolContext& context, const Json& document) {
+  print(context.out, document.dump(2, ' ', false, Json::error_handler_t::replace) + "\n");
+}
+
+template <class Work>
+Status writeStore(const ToolContext& context, const Work& work) {
+  auto opened = StoreWriter::open(storePath(context), IfMissing::Create);
+  if (!opened) return opened.error();
+  StoreWriter& writer = **opened;
+  if (auto begun = writer.begin(); !begun) return begun;
+  if (Status done = work(writer); !done) return done;
+  return writer.commit();
+}
+
+int setScalar(const ToolContext& context, const StoreArguments& arguments) {
+  const auto value = parseInt64(arguments.value);
+  if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
+  if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
+  const std::int32_t day = arguments.day.value_or(platform().metricsStore->TBDaysSince1970());
+  const Status set = writeStore(
+      context, [&](StoreWriter& writer) { return writer.setScalar(day, arguments.key, *value); });
+  if (!set) return complain(context, set.error().message, kWrong);
+  if (context.json) {
+    printJson(context, {{"key", arguments.key}, {"day", day}, {"value", *value}});
+  } else {
+    print(context.out,
+          fmt::format("{} = {} on day {} ({})\n", arguments.key, *value, day, dayText(day)));
+  }
+  return kSuccess;
+}
+
+int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
+  std::vector<double> values;
+  for (const std::string& text : arguments.values) {
+    const auto value = parseDouble(text);
+    if (!value) return complain(context, text + " is not a number", kBadUsage);
+    values.push_back(*value);
+  }
+  if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
+  const double now = platform().clock->secondsSince1970();
+  const std::int32_t today = dayOfSeconds(now);
+  const std::int32_t day = arguments.day.value_or(today);
+  const std::uint32_t offset =
+      arguments.offset.value_or(static_cast<std::uint32_t>(now - kSecondsPerDay * today));
+  const std::vector<std::uint32_t> offsets(values.size(), offset);
+  const Status pushed = writeStore(context, [&](StoreWriter& writer) {
+    return writer.pushSamples(day, arguments.key, values, offsets);
+  });
+  if (!pushed) return complain(context, pushed.error().message, kWrong);
+  if (context.json) {
+    printJson(
+        context,
+        {{"key", arguments.key}, {"day", day}, {"offset", offset}, {"samples", values.size()}});
+  } else {
+    print(context.out,
+          fmt::format("{} has {} more {} on day {} ({})\n", arguments.key, values.size(),
+                      values.size() == 1 ? "sample" : "samples", day, dayText(day)));
+  }
+  return kSuccess;
+}
+
+void printImport(const ToolContext& context, const ImportResult& result) {
+  for (const BadLine& bad : result.firstRejected) {
+    print(context.err, fmt::format("line {}: {}\n", bad.line, bad.reason));
+  }
+  if (const auto more = result.rejected - result.firstRejected.size(); more > 0) {
+    print(context.err, fmt::format("and {} more bad lines\n", more));
+  }
+  if (!context.json) {
+    if (result.failure.empty()) {
+      print(context.out, fmt::format("imported {} scalars and {} samples; {} bad lines\n",
+                                     result.scalars, result.samples, result.rejected));
+    }
+    return;
+  }
+  Json bad = Json::array();
+  for (const auto& [line, reason] : result.firstRejected) {
+    bad.push_back({{"line", line}, {"reason", reason}});
+  }
+  const bool stored = result.failure.empty();
+  Json document = {{"scalars", stored ? result.scalars : 0},
+                   {"samples", stored ? result.samples : 0},
+                   {"rejected", result.rejected},
+                   {"firstRejected", bad}};
+  if (!stored) document["failure"] = result.failure;
+  printJson(context, document);
+}
+
+int import(const ToolContext& context, const StoreArguments& arguments) {
+  std::unique_ptr<std::FILE, int (*)(std::FILE*)> owned(nullptr, std::fclose);
+  std::FILE* file = stdin;
+  if (arguments.file != "-") {
+    owned.reset(std::fopen(arguments.file.c_str(), "rbe"));
+    if (!owned) return complain(context, "cannot open " + arguments.file, kWrong);
+    file = owned.get();
+  }
+  const std::uint64_t bytes = owned ? fileSize(arguments.file).value_or(0) : 0;
+  const ImportResult result = importStoreCsv(file, bytes, storePath(context), context);
+  printImport(context, result);
+  if (!result.failure.empty()) {
+    return complain(context, "nothing was imported: " + result.failure, kWrong);
+  }
+  return result.rejected == 0 ? kSuccess : kWrong;
+}
+
+int dump(const ToolContext& context, const StoreArguments& arguments) {
+  DumpRange range;
+  range.keyPrefix = arguments.prefix;
+  if (arguments.day) {
+    // The range is open at its lower end; the least day of all has none below it.
+    range.minimumDay = *arguments.day == range.minimumDay ? *arguments.day : *arguments.day - 1;
+    range.maximumDay = *arguments.day;
+  }
+  std::string fault;
+  const auto history = openSqliteHistory(storePath(context), [&](const std::string& message) {
+    if (fault.empty()) fault = message;
+  });
+  const bool written = context.json ? dumpAsJson(*history, range, context.out)
+                                    : dumpAsCsv(*history, range, context.out);
+  if (!written) return complain(context, "cannot write the rows", kWrong);
+  return fault.empty() ? kSuccess : complain(context, fault, kWrong);
+}
+
+int listKeys(const ToolContext& context, const StoreArguments&) {
+  Json document = Json::array();
+  std::string fault;
+  listStoreKeys(
+      storePath(context),
+      [&](const StoreKey& key) {
+        const bool scalar = key.kind == StoreKey::Kind::Scalar;
+        const std::string_view kind = scalar ? "scalar" : "distribution";
+        if (context.json) {
+          Json entry = {{"kind", kind},
+                        {"key", key.key},
+                        {"firstDay", key.firstDay},
+                        {"lastDay", key.lastDay},
+                        {"days", key.days}};
+          if (!scalar) entry["samples"] = key.samples;
+          document.push_back(std::move(entry));
+          return;
+        }
+        // The key last: it has any length and may hold anything.
+        print(context.out,
+              fmt::format("{:<12} {:>6} - {:<6} {:>3} {:<4} {:>11} {}\n", kind, key.firstDay,
+                          key.lastDay, key.days, key.days == 1 ? "day" : "days",
+                          scalar ? "" : fmt::format("{} x", key.samples), csvField(key.key)));
+      },
+      [&](const std::string& message) { fault = message; });
+  if (context.json) printJson(context, document);
+  return fault.empty() ? kSuccess : complain(context, fault, kWrong);
+}
+
+}  // namespace
+
+void addStoreCommands(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<StoreArguments>();
+  CLI::App* const store = app.add_subcommand("store", "Write and read the metrics store");
+  store->require_subcommand(1);
+  const auto add = [&](const char* name, const char* description, auto run) {
+    CLI::App* const command = store->add_subcommand(name, description);
+    command->callback([&context, arguments, run] {
+      context.command = [&context, arguments, run] { return run(context, *arguments); };
+    });
+    return command;
+  };
+  const auto addDay = [&](CLI::App* command, const char* meaning) {
+    command->add_option("--day", arguments->day, meaning)->type_name("N");
+  };
+  constexpr const char* kDay = "Days since 1970-01-01 (UTC); today when left out";
+
+  CLI::App* command = add("set", "Set a scalar", setScalar);
+  command->add_option("KEY", arguments->key)->required();
+  command->add_option("VALUE", arguments->value, "A whole number of 64 bits")->required();
+  addDay(command, kDay);
+
+  command = add("push", "Add samples to a distribution", pushSamples);
+  command->add_option("KEY", arguments->key)->required();
+  command->add_option("VALUE", arguments->values, "Numbers; inf and nan count")->required();
+  addDay(command, kDay);
+  command->add_option("--offset", arguments->offset, "Seconds into the day; now when left out")
+      ->check(CLI::Range(0, 86399))
+      ->type_name("S");
+
+  command = add("import", "Import CSV: kind,key,day,offset,value", import);
+  command->add_option("FILE", arguments->file, "A file, or - for standard input")->required();
+
+  command = add("dump", "Print all rows as CSV, in the form that import reads", dump);
+  addDay(command, "Only this day");
+  command->add_option("--prefix", arguments->prefix, "Only keys that begin so");
+
+  add("keys", "List the keys, with their days and numbers of samples", listKeys);
 }
 
 }  // namespace tally::tools

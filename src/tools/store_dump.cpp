@@ -1,0 +1,114 @@
+#include "tools/store_dump.h"
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <string_view>
+
+#include "base/number_text.h"
+#include "tools/store_csv.h"
+#include "tools/tool.h"
+
+namespace tally::tools {
+namespace {
+
+// Text on its way to a file, written in large pieces.
+class Output {
+ public:
+  explicit Output(std::FILE* file) : file_(file) {}
+  std::string& text() {
+    constexpr std::size_t kPiece = 64u << 10;
+    if (text_.size() >= kPiece) flush();
+    return text_;
+  }
+  bool finish() {
+    flush();
+    return std::fflush(file_) == 0 && std::ferror(file_) == 0;
+  }
+
+ private:
+  void flush() {
+    print(file_, text_);
+    text_.clear();
+  }
+  std::FILE* file_;
+  std::string text_;
+};
+
+template <class Handler>
+void eachSample(DistributionValues& values, const Handler& handler) {
+  constexpr std::size_t kBatch = 1024;
+  double batch[kBatch];
+  std::uint32_t offsets[kBatch];
+  while (const std::size_t count = values.nextValues(batch, offsets, kBatch)) {
+    for (std::size_t i = 0; i < count; ++i) handler(offsets[i], batch[i]);
+  }
+}
+
+std::string jsonText(std::string_view text) {
+  return nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
+}
+
+}  // namespace
+
+bool dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out) {
+  Output output(out);
+  output.text().append(kStoreCsvHeader) += '\n';
+  history.enumerateScalars(range.keyPrefix, range.minimumDay, range.maximumDay,
+                           [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+                             appendScalarRow(output.text(), csvField(key), day, value);
+                           });
+  history.enumerateDistributions(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
+        const std::string field = csvField(key);
+        eachSample(values, [&](std::uint32_t offset, double value) {
+          appendSampleRow(output.text(), field, day, offset, value);
+        });
+      });
+  return output.finish();
+}
+
+bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
+  Output output(out);
+  const auto beginRow = [&](const char* separator, std::string_view key, std::int32_t day) {
+    std::string& text = output.text();
+    text.append(separator).append("{\"key\": ").append(jsonText(key)).append(", \"day\": ");
+    appendInt64(text, day);
+  };
+  output.text() += "{\"scalars\": [";
+  const char* separator = "\n  ";
+  history.enumerateScalars(range.keyPrefix, range.minimumDay, range.maximumDay,
+                           [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+                             beginRow(separator, key, day);
+                             separator = ",\n  ";
+                             output.text() += ", \"value\": ";
+                             appendInt64(output.text(), value);
+                             output.text() += '}';
+                           });
+  output.text() += "],\n \"distributions\": [";
+  separator = "\n  ";
+  history.enumerateDistributions(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
+        beginRow(separator, key, day);
+        separator = ",\n  ";
+        output.text() += ", \"samples\": [";
+        const char* comma = "";
+        eachSample(values, [&](std::uint32_t offset, double value) {
+          std::string& text = output.text();
+          text.append(comma) += '[';
+          comma = ", ";
+          appendUInt64(text, offset);
+          text += ", ";
+          const char* quote = std::isfinite(value) ? "" : "\"";
+          text += quote;
+          appendDouble(text, value);
+          text.append(quote) += ']';
+        });
+        output.text() += "]}";
+      });
+  output.text() += "]}\n";
+  return output.finish();
+}
+
+}  // namespace tally::tools

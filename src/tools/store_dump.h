@@ -1,0 +1,27 @@
+// Prints rows of the metrics store.
+#pragma once
+
+#include <cstdint>
+#include <cstdio>
+#include <limits>
+#include <string>
+
+#include "platform/metrics_store.h"
+
+namespace tally::tools {
+
+struct DumpRange {
+  std::string keyPrefix;
+  // As in HistoryStore: above the minimum, up to the maximum.
+  std::int32_t minimumDay = std::numeric_limits<std::int32_t>::min();
+  std::int32_t maximumDay = std::numeric_limits<std::int32_t>::max();
+};
+
+// Scalars, then samples, by day and key. Memory does not grow with the rows. False when the file
+// cannot take them.
+bool dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out);
+// {"scalars": [{"key", "day", "value"}], "distributions": [{"key", "day", "samples": [[offset,
+// value]]}]}; a value that JSON cannot carry is the string "inf", "-inf" or "nan".
+bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out);
+
+}  // namespace tally::tools
