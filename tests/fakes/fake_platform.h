@@ -302,21 +302,22 @@ struct FakePlatform {
   std::shared_ptr<FakeKernelValues> kernelValues = std::make_shared<FakeKernelValues>();
 
   Platform services() const {
-    return {log,
-            clock,
-            eventLoop,
-            files,
-            runLock,
-            preferences,
-            metricsStore,
-            logSubmission,
-            crashReporting,
-            crashSupportLibrary,
-            deviceInformation,
-            appRegistry,
-            locale,
-            kernelValues,
-            std::make_shared<OnceBoolean>()};
+    Platform services;
+    services.log = log;
+    services.clock = clock;
+    services.eventLoop = eventLoop;
+    services.files = files;
+    services.runLock = runLock;
+    services.preferences = preferences;
+    services.metricsStore = metricsStore;
+    services.logSubmission = logSubmission;
+    services.crashReporting = crashReporting;
+    services.crashSupportLibrary = crashSupportLibrary;
+    services.deviceInformation = deviceInformation;
+    services.appRegistry = appRegistry;
+    services.locale = locale;
+    services.kernelValues = kernelValues;
+    return services;
   }
   // Puts the fakes in force until the returned scope ends.
   std::unique_ptr<PlatformScope> install() const {
