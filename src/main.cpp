@@ -1,4 +1,6 @@
 // tallyrun: the daily job. The one place where the platform is built and installed.
+#include <malloc.h>
+
 #include <span>
 
 #include "driver/daily_job.h"
@@ -7,6 +9,11 @@
 #include "platform/platform.h"
 
 int main(int count, char** arguments) {
+  // A run is short: memory that it gave back to the kernel it would soon ask for again, at the
+  // price of a fault for each page.
+  constexpr int kKeptBytes = 64 << 20;
+  ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
+  ::mallopt(M_MMAP_THRESHOLD, kKeptBytes / 2);
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
   tally::DailyJob job({});
   return job.run({arguments, static_cast<std::size_t>(count)});

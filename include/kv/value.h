@@ -218,12 +218,13 @@ class KvDictionary final : public KvObject {
 
  private:
   friend class KvObject;
-  KvDictionary() noexcept : KvObject(kType) {}
+  KvDictionary() noexcept;
+  ~KvDictionary();
   std::size_t find(std::string_view key, std::uint32_t hash) const noexcept;
   void append(KvRef<KvString> key, KvRef<KvObject> value);
   void rebuildIndex();
   std::vector<Entry> entries_;
-  std::vector<std::uint32_t> index_;  // open addressing: entry number + 1, 0 = free
+  std::unique_ptr<class HashIndex> index_;  // null while the dictionary is small
 };
 
 // Same type and same content, at any depth to 512. Numbers compare by value, whatever their width.

@@ -130,6 +130,7 @@ void TBConfig::addGroup(const KvRef<KvString>& group, const KvDictionary& sectio
 
 void TBConfig::addSection(const KvRef<KvString>& group, std::string_view section,
                           const KvDictionary& keys, KeyTable& table) {
+  table.reserve(keys.size());
   for (const auto& item : keys) {
     if (auto* options = kvCast<KvDictionary>(item.value.get())) {
       table.set(

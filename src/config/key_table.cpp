@@ -5,17 +5,20 @@
 
 namespace tally {
 
+void KeyTable::reserve(std::size_t further) {
+  entries_.reserve(entries_.size() + further);
+  positions_.reserve(entries_.size() + further);
+}
+
 void KeyTable::set(WhitelistEntry entry) {
-  const auto next = static_cast<std::uint32_t>(entries_.size());
-  const auto [position, added] = positions_.try_emplace(entry.key->view(), next);
-  if (added) {
-    entries_.push_back(std::move(entry));
+  const std::string_view key = entry.key->view();
+  const std::uint32_t hash = hashBytes(key);
+  if (const auto present = position(key, hash); present != HashIndex::kNone) {
+    entries_[present] = std::move(entry);
     return;
   }
-  // The key object in place stays: the position's view points into it.
-  WhitelistEntry& present = entries_[position->second];
-  present.options = std::move(entry.options);
-  present.group = std::move(entry.group);
+  positions_.add(hash, static_cast<std::uint32_t>(entries_.size()));
+  entries_.push_back(std::move(entry));
 }
 
 void KeyTable::buildPrefixIndex() {
@@ -34,8 +37,9 @@ void KeyTable::buildPrefixIndex() {
 }
 
 const WhitelistEntry* KeyTable::exact(std::string_view key) const {
-  const auto found = positions_.find(key);
-  return found != positions_.end() ? &entries_[found->second] : nullptr;
+  if (entries_.empty()) return nullptr;
+  const auto found = position(key, hashBytes(key));
+  return found != HashIndex::kNone ? &entries_[found] : nullptr;
 }
 
 const WhitelistEntry* KeyTable::longestPrefix(std::string_view key) const {

@@ -3,9 +3,9 @@
 
 #include <cstdint>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
+#include "kv/hash.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -18,6 +18,8 @@ struct WhitelistEntry {
 
 class KeyTable {
  public:
+  // Room for so many further entries.
+  void reserve(std::size_t further);
   // Replaces the entry of the same key that an earlier group put there.
   void set(WhitelistEntry entry);
   // Makes longestPrefix() usable; nothing may be set afterwards.
@@ -36,8 +38,11 @@ class KeyTable {
     std::uint32_t entry;   // into entries_
     std::uint32_t parent;  // the longest other prefix that this one begins with, into sorted_
   };
+  std::uint32_t position(std::string_view key, std::uint32_t hash) const {
+    return positions_.find(hash, [&](auto i) { return entries_[i].key->view() == key; });
+  }
   std::vector<WhitelistEntry> entries_;
-  std::unordered_map<std::string_view, std::uint32_t> positions_;  // views into the entries' keys
+  HashIndex positions_;
   std::vector<SortedPrefix> sorted_;
 };
 

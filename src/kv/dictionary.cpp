@@ -1,5 +1,5 @@
 // KvDictionary: a vector of entries in insertion order, with a hash index once it is large.
-#include <bit>
+#include <algorithm>
 
 #include "kv/hash.h"
 #include "kv/value.h"
@@ -11,6 +11,9 @@ constexpr std::size_t kFlatEntries = 12;  // up to here a scan beats a hash inde
 constexpr std::size_t kNotFound = static_cast<std::size_t>(-1);
 
 }  // namespace
+
+KvDictionary::KvDictionary() noexcept : KvObject(kType) {}
+KvDictionary::~KvDictionary() = default;
 
 KvRef<KvDictionary> KvDictionary::create(std::size_t capacity) {
   auto dictionary = KvRef<KvDictionary>::adopt(new KvDictionary());
@@ -26,50 +29,39 @@ KvRef<KvDictionary> KvDictionary::create(
 }
 
 std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const noexcept {
-  if (index_.empty()) {
-    for (std::size_t i = 0; i < entries_.size(); ++i) {
-      if (entries_[i].key->view() == key) return i;
-    }
-    return kNotFound;
+  const auto isKey = [&](std::size_t i) { return entries_[i].key->view() == key; };
+  if (index_) {
+    const std::uint32_t found = index_->find(hash, isKey);
+    return found == HashIndex::kNone ? kNotFound : found;
   }
-  const std::size_t mask = index_.size() - 1;
-  for (std::size_t slot = hash & mask; index_[slot] != 0; slot = (slot + 1) & mask) {
-    const Entry& entry = entries_[index_[slot] - 1];
-    if (entry.key->hash_ == hash && entry.key->view() == key) return index_[slot] - 1;
+  for (std::size_t i = 0; i < entries_.size(); ++i) {
+    if (isKey(i)) return i;
   }
   return kNotFound;
 }
 
 KvObject* KvDictionary::get(std::string_view key) const noexcept {
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
   return found == kNotFound ? nullptr : entries_[found].value.get();
 }
 
 void KvDictionary::rebuildIndex() {
-  if (entries_.size() <= kFlatEntries) {
-    index_.clear();
-    return;
-  }
-  index_.assign(std::bit_ceil(entries_.size() * 2), 0);
-  const std::size_t mask = index_.size() - 1;
+  index_.reset();
+  if (entries_.size() <= kFlatEntries) return;
+  index_ = std::make_unique<HashIndex>();
+  index_->reserve(std::max(entries_.size(), entries_.capacity()));
   for (std::size_t i = 0; i < entries_.size(); ++i) {
-    std::size_t slot = entries_[i].key->hash_ & mask;
-    while (index_[slot] != 0) slot = (slot + 1) & mask;
-    index_[slot] = static_cast<std::uint32_t>(i + 1);
+    index_->add(entries_[i].key->hash_, static_cast<std::uint32_t>(i));
   }
 }
 
 void KvDictionary::append(KvRef<KvString> key, KvRef<KvObject> value) {
   const std::uint32_t hash = key->hash_;
   entries_.push_back({std::move(key), std::move(value)});
-  // At most three quarters full, so that a search stays short.
-  if (entries_.size() > kFlatEntries && entries_.size() * 4 > index_.size() * 3) {
+  if (index_) {
+    index_->add(hash, static_cast<std::uint32_t>(entries_.size() - 1));
+  } else if (entries_.size() > kFlatEntries) {
     rebuildIndex();
-  } else if (!index_.empty()) {
-    const std::size_t mask = index_.size() - 1;
-    std::size_t slot = hash & mask;
-    while (index_[slot] != 0) slot = (slot + 1) & mask;
-    index_[slot] = static_cast<std::uint32_t>(entries_.size());
   }
 }
 
@@ -78,7 +70,7 @@ void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
     remove(key);
     return;
   }
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
   if (found != kNotFound) {
     entries_[found].value = std::move(value);
   } else {
@@ -98,7 +90,7 @@ void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
 }
 
 bool KvDictionary::remove(std::string_view key) {
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
   if (found == kNotFound) return false;
   entries_.erase(entries_.begin() + static_cast<std::ptrdiff_t>(found));
   rebuildIndex();
@@ -113,7 +105,7 @@ void KvDictionary::merge(const KvDictionary& other) {
 KvRef<KvDictionary> KvDictionary::copy() const {
   auto dictionary = create(0);
   dictionary->entries_ = entries_;
-  dictionary->index_ = index_;
+  if (index_) dictionary->index_ = std::make_unique<HashIndex>(*index_);
   return dictionary;
 }
 
