@@ -2,16 +2,15 @@
 """The yardstick of bench_daily_log: the daily log's figures by a plain script.
 
 daily_log.py DATABASE WHITELIST DAY OUTPUT: reads scalars(day, key, value) and
-samples(day, key, offset, value), one row per sample, and writes a property list of the log's
-TBScalars, TBDistributions, TBDistributionsHistogram and TBWhitelistDigest.
+samples(day, key, offset, value), one row per sample in the order of their recording, and writes a
+property list of the log's figures.
 """
+import bisect
 import hashlib
 import math
 import plistlib
 import sqlite3
 import sys
-from itertools import groupby
-from operator import itemgetter
 
 
 def rounded(value, options):
@@ -29,44 +28,35 @@ def rounded(value, options):
     return value
 
 
-def bucket(sample, boundaries):
-    for position, boundary in enumerate(boundaries):
-        if boundary >= sample:
-            return position
-    return len(boundaries)
+class Summary:
+    __slots__ = ("low", "high", "mean", "squares", "count", "boundaries", "counts")
 
+    def __init__(self, boundaries):
+        self.low = self.high = self.mean = self.squares = 0.0
+        self.count = 0
+        self.boundaries = boundaries
+        self.counts = None if boundaries is None else [0] * (len(boundaries) + 1)
 
-def summarise(samples, boundaries):
-    counts = None if boundaries is None else [0] * (len(boundaries) + 1)
-    low = high = mean = squares = 0.0
-    count = 0
-    for _, sample in samples:
-        count += 1
-        if count == 1:
-            low = high = mean = sample
+    def add(self, sample):
+        self.count += 1
+        if self.count == 1:
+            self.low = self.high = self.mean = sample
         else:
-            if sample < low:
-                low = sample
-            elif sample > high:
-                high = sample
-            delta = sample - mean
-            mean += delta / count
-            squares += delta * (sample - mean)
-        if counts is not None:
-            counts[bucket(sample, boundaries)] += 1
-    return [low, high, mean, squares, count], counts
+            if sample < self.low:
+                self.low = sample
+            elif sample > self.high:
+                self.high = sample
+            delta = sample - self.mean
+            self.mean += delta / self.count
+            self.squares += delta * (sample - self.mean)
+        if self.counts is not None:
+            self.counts[bisect.bisect_left(self.boundaries, sample)] += 1
 
-
-def text(number):
-    return repr(number) if isinstance(number, int) else f"{number:.17g}" if number != float(
-        repr(number)) else repr(number).removesuffix(".0")
-
-
-def labelled(counts, boundaries):
-    edges = ["-inf"] + [text(boundary) for boundary in boundaries] + ["inf"]
-    last = len(boundaries)
-    return {f"({edges[i]}, {edges[i + 1]}" + (")" if i == last else "]"): count
-            for i, count in enumerate(counts) if count}
+    def histogram(self):
+        edges = ["-inf"] + [repr(bound).removesuffix(".0") for bound in self.boundaries] + ["inf"]
+        last = len(self.boundaries)
+        return {f"({edges[i]}, {edges[i + 1]}" + (")" if i == last else "]"): count
+                for i, count in enumerate(self.counts) if count}
 
 
 def main(database, whitelist, day, output):
@@ -82,20 +72,21 @@ def main(database, whitelist, day, output):
         options = scalar_options.get(key)
         if options is not None:
             scalars[key] = rounded(value, options)
-    distributions, histograms = {}, {}
-    rows = connection.execute("SELECT key, value FROM samples WHERE day = ?", (day,))
-    for key, samples in groupby(rows, itemgetter(0)):
-        options = distribution_options.get(key)
-        if options is None:
-            continue
-        boundaries = options.get("intervals")
-        distributions[key], counts = summarise(samples, boundaries)
-        if counts is not None:
-            histograms[key] = labelled(counts, boundaries)
+    summaries = {key: Summary(options.get("intervals"))
+                 for key, options in distribution_options.items()}
+    for key, sample in connection.execute("SELECT key, value FROM samples WHERE day = ?", (day,)):
+        summary = summaries.get(key)
+        if summary is not None:
+            summary.add(sample)
+    found = {key: summary for key, summary in summaries.items() if summary.count}
     with open(output, "wb") as file:
-        plistlib.dump({"TBScalars": scalars, "TBDistributions": distributions,
-                       "TBDistributionsHistogram": histograms,
-                       "TBWhitelistDigest": hashlib.md5(content).hexdigest()}, file)
+        plistlib.dump({
+            "TBScalars": scalars,
+            "TBDistributions": {key: [s.low, s.high, s.mean, s.squares, s.count]
+                                for key, s in found.items()},
+            "TBDistributionsHistogram": {key: s.histogram() for key, s in found.items()
+                                         if s.counts is not None},
+            "TBWhitelistDigest": hashlib.md5(content).hexdigest()}, file)
 
 
 main(sys.argv[1], sys.argv[2], int(sys.argv[3]), sys.argv[4])

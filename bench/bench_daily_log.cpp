@@ -1,0 +1,132 @@
+// The daily log of a large day: `tallyrun -f` as a whole, beside a query and a script that work on
+// a table with a row for each sample; and the pass over the samples alone, beside reading the same
+// store with nothing computed. Each measurement is a process of its own.
+#include <stdlib.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <filesystem>
+#include <limits>
+#include <string_view>
+
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store_history.h"
+#include "platform/linux/store_schema.h"
+#include "process_cost.h"
+#include "report/distribution_summary.h"
+#include "sample_device.h"
+
+namespace {
+
+using namespace tally;
+using namespace tally::bench;
+
+constexpr int kRuns = 5;
+volatile double keep;  // what is computed must not be optimised away
+
+int readOnly(const char* path, const char* sql) {
+  auto database = Database::open(path, Database::Access::ReadOnly);
+  if (!database) return 1;
+  auto rows = database->prepare(sql);
+  if (!rows) return 1;
+  std::size_t bytes = 0;
+  while (rows->step() == Step::Row) bytes += rows->blob(0).size();
+  keep = static_cast<double>(bytes);
+  return bytes > 0 ? 0 : 1;
+}
+
+// What the report does with the day's samples, without the whitelist and the log.
+int passOverSamples(const char* root) {
+  const PlatformScope scope(makeLinuxPlatform(root));
+  const KvRef<KvDictionary> options[] = {SampleDay::distributionOptions(0),
+                                         SampleDay::distributionOptions(1)};
+  const auto history =
+      openSqliteHistory(metricsStorePath(root), [](const std::string&) { std::exit(1); });
+  std::size_t number = 0;
+  history->enumerateDistributions(
+      "", std::numeric_limits<std::int32_t>::min(), std::numeric_limits<std::int32_t>::max(),
+      [&](std::string_view key, std::int32_t, DistributionValues& values, bool&) {
+        keep = summariseDistribution(values, key, *options[number++ % 2]).summary.mean;
+      });
+  return number > 0 ? 0 : 1;
+}
+
+// Each line: what, its CPU time, and its share of a yardstick.
+void line(const char* name, const ProcessCost& cost) {
+  std::printf("%-46s %8.3f s CPU %8.1f MiB peak\n", name, cost.cpuSeconds,
+              static_cast<double>(cost.peakKibibytes) / 1024);
+  if (cost.exitStatus != 0) {
+    std::printf("failed\n");
+    std::exit(1);
+  }
+}
+
+std::string newestLog(const std::string& root) {
+  std::string newest;
+  for (const auto& entry :
+       std::filesystem::directory_iterator(root + "/var/mobile/Library/Logs/Submission")) {
+    if (entry.path().extension() == ".log") newest = std::max(newest, entry.path().string());
+  }
+  return newest;
+}
+
+int measure(const std::string& self, const std::string& yardsticks) {
+  const auto programs = std::filesystem::path(self).parent_path();
+  char folder[] = "/tmp/tally-daily-log-XXXXXX";
+  if (::mkdtemp(folder) == nullptr) return 1;
+  const std::string base = folder, full = base + "/full", few = base + "/few";
+  const std::string rows = base + "/rows.sqlite", expected = base + "/expected.plist";
+  SampleDay day{yesterday()};
+  SampleDay fewer = day;
+  fewer.samplesEach /= 100;
+  if (!makeDevice(full, day) || !makeDevice(few, fewer) || !makeRowDatabase(rows, day)) return 1;
+  std::printf("%zu scalars, %zu distributions of %zu samples\n\n", day.scalars, day.distributions,
+              day.samplesEach);
+
+  const auto job = [&](const std::string& root) {
+    return medianRun(kRuns, {programs / "tallyrun", "-f"},
+                     {"TALLYRUN_ROOT=" + root, "TALLYRUN_LOG=stderr", "TALLYRUN_LOG_LEVEL=error"});
+  };
+  const ProcessCost whole = job(full), small = job(few);
+  const ProcessCost pass = medianRun(kRuns, {self, "pass", full});
+  const std::string store = metricsStorePath(full);
+  const ProcessCost floor =
+      medianRun(kRuns, {self, "read", store, "SELECT sample_values FROM chunks"});
+  const ProcessCost query = runProcess(
+      {self, "read", rows,
+       "SELECT key, count(*), min(value), max(value), avg(value) FROM samples GROUP BY key"});
+  const ProcessCost script = runProcess({"python3", yardsticks + "/daily_log.py", rows,
+                                         whitelistPath(full), std::to_string(day.day), expected});
+  line("tallyrun -f, whole", whole);
+  line("tallyrun -f, a hundredth of the samples", small);
+  line("yardstick: one SQL query, a row per sample", query);
+  line("yardstick: Python script, a row per sample", script);
+  line("the samples' pass alone", pass);
+  line("yardstick: the same samples read, not computed", floor);
+  const ProcessCost compared =
+      runProcess({"python3", yardsticks + "/compare_logs.py", newestLog(full), expected});
+  std::filesystem::remove_all(base);
+
+  std::printf("\nthe program's log and the script's          %s\n",
+              compared.exitStatus == 0 ? "equal" : "DIFFERENT");
+  std::printf("query / tallyrun                     %6.1f (to reach: at least 10)\n",
+              query.cpuSeconds / whole.cpuSeconds);
+  std::printf("script / tallyrun                    %6.1f (to reach: at least 50)\n",
+              script.cpuSeconds / whole.cpuSeconds);
+  std::printf("pass / read                          %6.2f (to reach: at most 2)\n",
+              pass.cpuSeconds / floor.cpuSeconds);
+  std::printf(
+      "peak, 100 times the samples          %+6.1f %% (to reach: below 5; below 96 MiB)\n",
+      100.0 * (static_cast<double>(whole.peakKibibytes) / static_cast<double>(small.peakKibibytes) -
+               1));
+  return compared.exitStatus;
+}
+
+}  // namespace
+
+int main(int count, char** arguments) {
+  const std::string_view mode = count > 1 ? arguments[1] : "";
+  if (mode == "read" && count == 4) return readOnly(arguments[2], arguments[3]);
+  if (mode == "pass" && count == 3) return passOverSamples(arguments[2]);
+  return measure(std::filesystem::canonical("/proc/self/exe"), YARDSTICK_FOLDER);
+}

@@ -1,0 +1,35 @@
+// `tallyctl store import` of ten million samples, beside a script that reads the same file into a
+// table with a row for each.
+#include <stdlib.h>
+
+#include <cstdio>
+#include <filesystem>
+
+#include "platform/linux/store_schema.h"
+#include "process_cost.h"
+#include "sample_device.h"
+
+int main(int, char** arguments) {
+  using namespace tally::bench;
+  const auto programs = std::filesystem::canonical(arguments[0]).parent_path();
+  char folder[] = "/tmp/tally-import-XXXXXX";
+  if (::mkdtemp(folder) == nullptr) return 1;
+  const std::string base = folder, csv = base + "/day.csv";
+  const SampleDay day{yesterday()};
+  if (!makeCsv(csv, day)) return 1;
+  const double lines = static_cast<double>(day.scalars + day.distributions * day.samplesEach);
+  const ProcessCost import =
+      runProcess({programs / "tallyctl", "--root", base + "/root", "store", "import", csv});
+  const ProcessCost yardstick =
+      runProcess({"python3", YARDSTICK_FOLDER "/import_rows.py", csv, base + "/rows.sqlite"});
+  std::filesystem::remove_all(base);
+  const auto line = [&](const char* name, const ProcessCost& cost) {
+    std::printf("%-42s %8.2f million lines/s %8.1f MiB peak\n", name,
+                lines / cost.wallSeconds / 1e6, static_cast<double>(cost.peakKibibytes) / 1024);
+  };
+  line("tallyctl store import", import);
+  line("yardstick: Python's csv and sqlite3", yardstick);
+  std::printf("ratio %.1f (to reach: at least 1 million lines/s, below 64 MiB)\n",
+              yardstick.wallSeconds / import.wallSeconds);
+  return import.exitStatus != 0 || yardstick.exitStatus != 0 ? 1 : 0;
+}
