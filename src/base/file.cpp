@@ -59,6 +59,7 @@ std::string folderOf(const std::string& path) {
 }  // namespace
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
+  constexpr std::size_t kPiece = 128u << 10;
   // Non-blocking, so that a pipe put in a file's place cannot hold the run up.
   Descriptor file(retried([&] { return ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK); }));
   if (file.get() < 0) return systemError("cannot open", path);
@@ -66,20 +67,18 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
   if (::fstat(file.get(), &status) != 0) return systemError("cannot examine", path);
   if (!S_ISREG(status.st_mode)) return Error{path + " is not a regular file"};
   if (static_cast<std::uint64_t>(status.st_size) > limit) return tooLarge(path, limit);
-  // One byte more than it should hold shows the end, or that the file grew meanwhile.
-  std::string contents(static_cast<std::size_t>(status.st_size) + 1, '\0');
-  std::size_t used = 0;
+  // Through a buffer that stays in the cache, so that the contents are written to memory once.
+  std::string contents;
+  contents.reserve(static_cast<std::size_t>(status.st_size));
+  std::vector<char> piece(
+      std::min<std::size_t>(kPiece, static_cast<std::size_t>(status.st_size) + 1));
   for (;;) {
-    const auto count =
-        retried([&] { return ::read(file.get(), contents.data() + used, contents.size() - used); });
+    const auto count = retried([&] { return ::read(file.get(), piece.data(), piece.size()); });
     if (count < 0) return systemError("cannot read", path);
-    used += static_cast<std::size_t>(count);
-    if (used > limit) return tooLarge(path, limit);
-    if (count == 0) break;
-    if (used == contents.size()) contents.resize(contents.size() * 2);
+    if (count == 0) return contents;
+    contents.append(piece.data(), static_cast<std::size_t>(count));
+    if (contents.size() > limit) return tooLarge(path, limit);
   }
-  contents.resize(used);
-  return contents;
 }
 
 Status writeFileAtomically(const std::string& path, std::string_view contents, unsigned mode) {

@@ -2,6 +2,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 namespace tally {
 namespace {
@@ -41,7 +42,17 @@ bool xmlCanCarry(std::string_view character) {
 }  // namespace
 
 bool isValidUtf8(std::string_view text) {
+  // Nearly all text is ASCII: eight bytes at a time while their top bits are clear.
+  constexpr std::uint64_t kTopBits = 0x8080808080808080;
+  std::uint64_t word = 0;
   for (std::size_t i = 0; i < text.size();) {
+    if (text.size() - i >= sizeof word) {
+      std::memcpy(&word, text.data() + i, sizeof word);
+      if ((word & kTopBits) == 0) {
+        i += sizeof word;
+        continue;
+      }
+    }
     const std::size_t length = sequenceLength(text, i);
     if (length == 0) return false;
     i += length;

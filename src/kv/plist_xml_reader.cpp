@@ -193,7 +193,7 @@ class Reader {
     if (!tag.empty && !readContent(tag.name, content)) return false;
     if (tag.name == "key") return addKey(content);
     if (tag.name == "string") return addValue(stringOf(content));
-    if (tag.name == "integer") return addParsed(integerFromText(content), "not an integer");
+    if (tag.name == "integer") return addParsed(integerOf(content), "not an integer");
     if (tag.name == "true" || tag.name == "false") {
       if (!content.empty()) return fail("there is text in a boolean");
       return addValue(KvBoolean::of(tag.name == "true"));
@@ -281,6 +281,19 @@ class Reader {
     return slot;
   }
 
+  // So do the numbers below 100, which most counts and settings are.
+  KvRef<KvNumber> integerOf(std::string_view content) {
+    std::size_t value = 0;
+    for (const char character : content) {
+      if (character < '0' || character > '9' || content.size() > 2) return integerFromText(content);
+      value = value * 10 + static_cast<std::size_t>(character - '0');
+    }
+    if (content.empty()) return nullptr;
+    KvRef<KvNumber>& slot = smallIntegers_[value];
+    if (!slot) slot = integerFromText(content);
+    return slot;
+  }
+
   bool addKey(std::string_view content) {
     if (stack_.empty() || !stack_.back().dictionary) return fail("a key outside of a dictionary");
     if (stack_.back().key) return fail("a key in a dictionary has no value");
@@ -318,6 +331,7 @@ class Reader {
   std::vector<Frame> stack_;
   KvRef<KvObject> root_;
   std::array<KvRef<KvString>, 256> recent_;
+  std::array<KvRef<KvNumber>, 100> smallIntegers_;
 };
 
 }  // namespace
