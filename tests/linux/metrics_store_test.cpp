@@ -2,14 +2,19 @@
 #include <gmock/gmock.h>
 #include <sqlite3.h>
 
+#include <sys/stat.h>
+
 #include <cmath>
 #include <cstring>
+#include <functional>
 #include <limits>
+#include <random>
 
 #include "linux/temporary_root.h"
 #include "platform/linux/metrics_store.h"
 #include "platform/linux/sample_chunk.h"
 #include "platform/linux/store_history.h"
+#include "platform/linux/store_importer.h"
 #include "platform/linux/store_writer.h"
 
 namespace tally {
@@ -233,6 +238,217 @@ TEST_F(StoreTest, ABatchIsOneTransactionOfTheDayInProgress) {
     EXPECT_EQ(errors().size(), 1u) << key;
   }
   EXPECT_EQ(scalars().size(), 2u);
+}
+
+TEST_F(StoreTest, AMissingStoreHasNoRowsAndIsNotMadeByReading) {
+  EXPECT_THAT(scalars(), IsEmpty());
+  EXPECT_THAT(lengths(), IsEmpty());
+  store()->TBClientCheckpoint();
+  EXPECT_FALSE(std::filesystem::exists(at("data")));
+  put("data/TBDataStore.sqlitedb", "");
+  EXPECT_THAT(scalars(), IsEmpty()) << "as when its maker was killed at once";
+  EXPECT_THAT(errors(), IsEmpty());
+  store()->TBClientSetValueForScalarKey("a", 1);
+  EXPECT_EQ(scalars().size(), 1u);
+}
+
+TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
+  const struct {
+    const char* name;
+    std::function<void()> spoil;
+    const char* reason;
+  } cases[] = {
+      {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
+      {"zeros", [&] { put("data/TBDataStore.sqlitedb", std::string(9000, '\0')); },
+       "not a database"},
+      {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
+      {"newer", [&] { sql("PRAGMA user_version = 2"); }, "newer version"},
+      {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
+      {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE chunks"); }, "no such table"},
+      {"folder",
+       [&] {
+         std::filesystem::remove(path);
+         std::filesystem::create_directories(path);
+       },
+       "not a regular file"},
+      {"pipe",
+       [&] {
+         std::filesystem::remove(path);
+         ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
+       },
+       "not a regular file"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("data"));
+    store()->TBClientSetValueForScalarKey("a", 1);
+    c.spoil();
+    const std::string before = get("data/TBDataStore.sqlitedb");
+    log->lines.clear();
+    const auto spoiled = store();
+    spoiled->TBClientCheckpoint();
+    spoiled->openHistory()->enumerateScalars(
+        "", kFirst, kLast, [](std::string_view, std::int32_t, std::int64_t, bool&) { FAIL(); });
+    spoiled->TBClientSetValueForScalarKey("b", 2);
+    ASSERT_EQ(errors().size(), 1u) << testing::PrintToString(errors());
+    EXPECT_THAT(errors()[0], testing::HasSubstr(path));
+    EXPECT_THAT(errors()[0], testing::HasSubstr(c.reason));
+    EXPECT_EQ(get("data/TBDataStore.sqlitedb"), before);
+  }
+}
+
+TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
+  ASSERT_TRUE(push(1, "good", {1, 2, 3}, true) && push(1, "good", {4}));
+  store()->TBClientSetValueForScalarKey("good", 1);
+  const char* const damage[] = {
+      "INSERT INTO scalars VALUES (1, 'text', 'x')",
+      "INSERT INTO scalars VALUES (1, 'real', 1.5)",
+      "INSERT INTO scalars VALUES (1, '', 1)",
+      "INSERT INTO scalars VALUES (1, CAST(x'61ff' AS TEXT), 1)",
+      "INSERT INTO chunks VALUES (1, 'good', 5, 2, zeroblob(16), zeroblob(4))",
+      "INSERT INTO chunks VALUES (1, 'lie', 0, 3, zeroblob(16), zeroblob(8))",
+      "INSERT INTO chunks VALUES (1, 'negative', 0, -1, x'', x'')",
+      "INSERT INTO chunks VALUES (1, 'huge', 0, 1152921504606846976, zeroblob(8), zeroblob(4))",
+      "INSERT INTO chunks VALUES (1, 'numbers', 0, 'two', 3, 4.5)",
+      "INSERT INTO chunks VALUES (1, 'last', 2147483647, 1, zeroblob(8), zeroblob(4))",
+      "INSERT INTO recent VALUES (1, 'odd', 0, 1, zeroblob(7), zeroblob(4))",
+      "INSERT INTO recent VALUES (1, 'good', -7, 1, zeroblob(8), x'')",
+      "INSERT INTO recent VALUES (9223372036854775807, 'far', 0, 1, zeroblob(8), zeroblob(4))",
+  };
+  for (const char* text : damage) sql(text);
+  clock->setDay(1);
+  const auto check = [&] {
+    log->lines.clear();
+    EXPECT_THAT(scalars(), ElementsAre("20514 good=1"));
+    EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1"));
+    ASSERT_EQ(errors().size(), 2u) << "one line for each enumeration";
+    EXPECT_THAT(errors()[0], testing::HasSubstr("damaged rows are left out"));
+  };
+  check();
+  store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "3") << "the damaged ones and the far day stay";
+  check();
+}
+
+TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
+  ASSERT_TRUE(push(1, "d", sequence(0, 9000), true) && push(1, "e", sequence(0, 300)));
+  for (int i = 0; i < 41; ++i) {
+    ASSERT_TRUE(write([&](StoreWriter& w) { return w.setScalar(1, std::to_string(i), i); }));
+  }
+  const std::string whole = get("data/TBDataStore.sqlitedb");
+  std::minstd_rand random(11);
+  for (int round = 0; round < 120; ++round) {
+    std::string spoiled = whole;
+    for (int i = 0; i < 12; ++i) spoiled[random() % whole.size()] = static_cast<char>(random());
+    if (round % 3 == 0) spoiled.resize(random() % whole.size());
+    for (const auto& file : names("data")) std::filesystem::remove(at("data/" + file));
+    put("data/TBDataStore.sqlitedb", spoiled);
+    const auto rows = scalars();
+    EXPECT_LE(rows.size(), 41u);
+    (void)lengths();
+    store()->TBClientCheckpoint();
+    listStoreKeys(
+        path, [](const StoreKey&) {}, [](const std::string&) {});
+  }
+}
+
+TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {
+  runTogether(6, [&](int number) {
+    const auto mine = makeSqliteMetricsStore(path, log, clock);
+    for (int i = 0; i < 20; ++i) {
+      mine->TBClientSetValueForScalarKey(std::to_string(number) + "." + std::to_string(i), i);
+      if (!push(kToday, "d", {1.0 * number})) return false;
+      if (i % 5 == 0) mine->TBClientCheckpoint();
+    }
+    return log->lines.empty();
+  });
+  EXPECT_EQ(scalars().size(), 120u);
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x120"));
+}
+
+TEST_F(StoreTest, AReaderSeesOneStateWhileOthersCommit) {
+  // Every transaction keeps the scalar and the number of samples equal.
+  const auto commit = [&](std::int64_t count) {
+    return write([&](StoreWriter& writer) -> Status {
+      if (auto set = writer.setScalar(1, "count", count); !set) return set;
+      const double value = 1;
+      const std::uint32_t offset = 0;
+      if (auto pushed = writer.pushSamples(1, "d", {&value, 1}, {&offset, 1}); !pushed) {
+        return pushed;
+      }
+      return count % 7 == 0 ? writer.foldRecent() : Status(Done{});
+    });
+  };
+  ASSERT_TRUE(commit(1));
+  clock->setDay(1);
+  runTogether(2, [&](int number) {
+    for (std::int64_t i = 2; i < 150; ++i) {
+      if (number == 0 && !commit(i)) return false;
+      if (number == 0) continue;
+      std::int64_t counted = 0, expected = -1;
+      const auto history = store()->openHistory();
+      history->enumerateDistributions("", 0, 1, [&](auto, auto, DistributionValues& values, bool&) {
+        double value = 0;
+        while (values.nextValue(&value, nullptr)) ++counted;
+      });
+      history->enumerateScalars("", 0, 1,
+                                [&](auto, auto, std::int64_t value, bool&) { expected = value; });
+      if (counted != expected || !log->lines.empty()) return false;
+    }
+    return true;
+  });
+}
+
+TEST_F(StoreTest, AKillLeavesAllOfATransactionOrNothing) {
+  constexpr std::int64_t kEach = 20000;
+  ASSERT_TRUE(push(kToday, "first", {1}));
+  std::minstd_rand random(3);
+  std::int64_t before = 0;
+  for (int round = 0; round < 25; ++round) {
+    const bool import = round % 2 == 0;
+    ASSERT_TRUE(import || push(kToday, "second", sequence(0, 5000)));
+    before = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
+    runAndKill(random() % 30'000, [&] {
+      if (!import) return store()->TBClientCheckpoint();
+      StoreImporter importer(path);
+      for (std::int64_t i = 0; i < kEach; ++i) {
+        (void)importer.addSample(kToday, "k" + std::to_string(i % 50), 0, 1);
+        (void)importer.addScalar(kToday, "s" + std::to_string(i % 50), round);
+      }
+      (void)importer.finish();
+    });
+    ASSERT_EQ(sql("PRAGMA integrity_check"), "ok");
+    if (import) {
+      const auto recent = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM recent"));
+      const auto after = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
+      const bool nothing = after == before, all = recent == 0 && after >= before + kEach;
+      ASSERT_TRUE(nothing || all) << before << " became " << after;
+    } else {
+      std::int64_t samples = 0;
+      for (const auto& row : distributions("second")) samples += std::ssize(row.values);
+      ASSERT_EQ(samples, (round + 1) / 2 * 5000);
+    }
+  }
+}
+
+TEST_F(StoreTest, AFullVolumeUndoesTheTransactionAndAReadOnlyOneCanBeRead) {
+  const TinyVolume volume(at("data"), "size=1m");
+  if (!volume) GTEST_SKIP() << "needs the right to mount";
+  ASSERT_TRUE(push(kToday, "d", {1, 2, 3}));
+  {
+    StoreImporter importer(path);
+    Status imported = Done{};
+    for (int i = 0; imported && i < 2'000'000; ++i) {
+      imported = importer.addSample(kToday, "big" + std::to_string(i % 9), 0, 1);
+    }
+    EXPECT_FALSE(imported && importer.finish()) << "2 million samples in 1 MiB";
+  }
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
+  ASSERT_EQ(::mount("tally", at("data").c_str(), "tmpfs", MS_REMOUNT | MS_RDONLY, ""), 0);
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
+  EXPECT_THAT(errors(), IsEmpty());
+  store()->TBClientSetValueForScalarKey("a", 1);
+  EXPECT_EQ(errors().size(), 1u);
 }
 
 }  // namespace

@@ -45,7 +45,8 @@ Result<Presence> examine(const std::string& path) {
   return Presence::Present;
 }
 
-// False for a database in which nothing was ever made.
+// False for a database in which nothing was ever made. REQUIRES: a transaction, since another
+// process may be making the store right now.
 Result<bool> isStore(Database& database) {
   const auto application = database.integer("PRAGMA application_id");
   if (!application) return application.error();
@@ -137,8 +138,10 @@ Result<std::optional<Database>> openStoreForWriting(const std::string& path, IfM
       Database::open(path, create ? Database::Access::Create : Database::Access::ReadWrite);
   if (!database) return database.error();
   database->foldLogOnClose(false);  // not a byte of a file that turns out to be another's changes
+  if (auto begun = database->execute("BEGIN"); !begun) return begun.error();
   const auto store = isStore(*database);
   if (!store) return store.error();
+  if (auto ended = database->execute("COMMIT"); !ended) return ended.error();
   if (!*store) {
     if (!create) return std::optional<Database>();
     if (auto made = makeTables(*database); !made) return made.error();
