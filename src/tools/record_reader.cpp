@@ -6,25 +6,56 @@
 namespace tally::tools {
 namespace {
 
-bool hasOddQuotes(std::string_view text) {
-  return std::count(text.begin(), text.end(), '"') % 2 != 0;
-}
+// Whether text, so far, ends inside a quoted field. A quote elsewhere than at a field's begin is an
+// ordinary character.
+class QuoteState {
+ public:
+  void add(std::string_view text) {
+    for (const char character : text) {
+      switch (state_) {
+        case State::FieldStart:
+          state_ = character == '"' ? State::Quoted : character == ',' ? state_ : State::Plain;
+          break;
+        case State::Plain:
+          if (character == ',') state_ = State::FieldStart;
+          break;
+        case State::Quoted:
+          if (character == '"') state_ = State::AfterQuote;
+          break;
+        case State::AfterQuote:
+          state_ = character == '"'   ? State::Quoted
+                   : character == ',' ? State::FieldStart
+                                      : State::Plain;
+          break;
+      }
+    }
+  }
+  bool isOpen() const { return state_ == State::Quoted; }
+
+ private:
+  enum class State { FieldStart, Plain, Quoted, AfterQuote } state_ = State::FieldStart;
+};
 
 struct Extent {
   std::size_t end = 0, lines = 0;
 };
 
-// Where the record ends whose first line, up to lineEnd, leaves a quote open; no lines when the
-// quote is not closed before the end of the text.
-Extent extentOfQuoted(std::string_view text, std::size_t lineEnd) {
+// Where the record ends that the text begins with; its first line ends at lineEnd. A quoted field
+// that is not closed before the end of the text ends with its line.
+Extent extentOfRecord(std::string_view text, std::size_t lineEnd) {
+  const std::string_view line = text.substr(0, lineEnd);
+  if (line.find('"') == std::string_view::npos) return {lineEnd, 1};
+  QuoteState quotes;
+  quotes.add(line);
   Extent extent{lineEnd, 1};
-  while (extent.end < text.size()) {
+  while (quotes.isOpen()) {
+    if (extent.end == text.size()) return {lineEnd, 1};
     const std::size_t begin = extent.end + 1;
     extent.end = std::min(text.find('\n', begin), text.size());
     ++extent.lines;
-    if (hasOddQuotes(text.substr(begin, extent.end - begin))) return extent;
+    quotes.add(text.substr(begin, extent.end - begin));
   }
-  return {};
+  return extent;
 }
 
 }  // namespace
@@ -53,16 +84,11 @@ bool RecordReader::next(Record& record) {
     }
     end = window.size();  // the last line has no line end
   }
-  std::size_t lines = 1;
-  if (hasOddQuotes(window.substr(0, end))) {
-    if (const Extent whole = extentOfQuoted(window, end); whole.lines > 0) {
-      end = whole.end;
-      lines = whole.lines;
-    }
-  }
+  const Extent extent = extentOfRecord(window, end);
+  end = extent.end;
   record.text = window.substr(0, end);
   if (record.text.ends_with('\r')) record.text.remove_suffix(1);
-  line_ += lines;
+  line_ += extent.lines;
   take(std::min(end + 1, window.size()));
   return true;
 }

@@ -4,6 +4,7 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <functional>
@@ -350,6 +351,27 @@ TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
     listStoreKeys(
         path, [](const StoreKey&) {}, [](const std::string&) {});
   }
+}
+
+TEST_F(StoreTest, AnImportAboveItsBuffersKeepsTheOrderOfEachKey) {
+  constexpr int kSamples = 1'300'000, kKeys = 7;
+  for (int key = 0; key < kKeys; ++key) ASSERT_TRUE(push(1, std::to_string(key), {-1}));
+  StoreImporter importer(path);
+  for (int i = 0; i < kSamples; ++i) {
+    ASSERT_TRUE(importer.addSample(1, std::to_string(i % kKeys), 0, i));
+  }
+  EXPECT_EQ(lengths().size(), std::size_t{kKeys}) << "not seen before the end";
+  EXPECT_EQ(distributions()[0].values.size(), 1u);
+  ASSERT_TRUE(importer.finish());
+  const auto rows = distributions();
+  ASSERT_EQ(rows.size(), std::size_t{kKeys});
+  std::size_t samples = 0;
+  for (const auto& row : rows) {
+    samples += row.values.size();
+    EXPECT_EQ(row.values[0], -1) << "what was pushed before comes first";
+    EXPECT_TRUE(std::is_sorted(row.values.begin(), row.values.end()));
+  }
+  EXPECT_EQ(samples, std::size_t{kSamples + kKeys});
 }
 
 TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {

@@ -1,0 +1,205 @@
+// tallyctl store: what import takes and refuses, and that a dump can be imported again.
+#include <gmock/gmock.h>
+
+#include <nlohmann/json.hpp>
+
+#include "linux/temporary_root.h"
+#include "tools/tool.h"
+
+namespace tally::tools {
+namespace {
+
+using testing::HasSubstr;
+
+constexpr const char* kStore = "var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
+
+class StoreCommands : public TemporaryRoot {
+ protected:
+  struct Outcome {
+    int status = -1;
+    std::string out, err;
+  };
+  Outcome run(std::vector<std::string> arguments, const std::string& device = "device") {
+    arguments.insert(arguments.begin(), {"tallyctl", "--root", at(device)});
+    std::vector<const char*> pointers;
+    for (const std::string& argument : arguments) pointers.push_back(argument.c_str());
+    ToolContext context;
+    const auto open = [&](const char* name) { return std::fopen(at(name).c_str(), "w"); };
+    std::FILE* const out = context.out = open("out");
+    std::FILE* const err = context.err = open("err");
+    Outcome outcome;
+    outcome.status = runTool(context, pointers, [](const std::string&) {
+      const auto fake = fakes::makeFakePlatform();
+      fake.clock->setDay(20000, 3661.5);
+      return fake.services();
+    });
+    std::fclose(out);
+    std::fclose(err);
+    outcome.out = get("out");
+    outcome.err = get("err");
+    return outcome;
+  }
+  Outcome import(std::string_view csv, const std::string& device = "device") {
+    put("day.csv", csv);
+    return run({"store", "import", at("day.csv"), "--json"}, device);
+  }
+  std::string dump(const std::string& device = "device") {
+    return run({"store", "dump"}, device).out;
+  }
+  void forget() { std::filesystem::remove_all(at("device")); }
+};
+
+TEST_F(StoreCommands, ImportKeepsTheGoodLinesAndNamesTheBadOnes) {
+  const std::string longKey(513, 'k'), header = "kind,key,day,offset,value\n";
+  const struct {
+    std::string csv;
+    int scalars, samples;
+    std::vector<int> bad;  // line numbers
+    const char* reason;    // of the first
+  } cases[] = {
+      {"", 0, 0, {}, nullptr},
+      {header, 0, 0, {}, nullptr},
+      {"scalar,a,1,,5\n", 1, 0, {}, nullptr},
+      {"\xef\xbb\xbf" + header + "scalar,a,1,,5\r\n\r\ndistribution,b,1,0,2.5", 1, 1, {}, nullptr},
+      {header + "scalar,a,1,,5\n" + header + "scalar,b,-3,,-6\n", 2, 0, {}, nullptr},
+      {header + "scalar,a,1,,1.5\nscalar,a,1,,5\n", 1, 0, {2}, "whole number of 64 bits"},
+      {"scalar,a,1,,9223372036854775808\nscalar,a,1,,-9223372036854775808\n", 1, 0, {1}, "64 bits"},
+      {"scalar,a,2147483648,,1\nscalar,a,-2147483649,,1\nscalar,a,,,1\n",
+       0,
+       0,
+       {1, 2, 3},
+       "the day"},
+      {"scalar,a,1,0,1\n", 0, 0, {1}, "no offset"},
+      {"distribution,a,1,,1\ndistribution,a,1,-1,1\ndistribution,a,1,86400,1\n"
+       "distribution,a,1,86399,1\n",
+       0,
+       1,
+       {1, 2, 3},
+       "0 to 86399"},
+      {"distribution,a,1,0,nan\ndistribution,a,1,0,-inf\ndistribution,a,1,0,1e999\n"
+       "distribution,a,1,0,1x\ndistribution,a,1,0,\n",
+       0,
+       2,
+       {3, 4, 5},
+       "a double"},
+      {"gauge,a,1,,1\nscalar,a,1,,\n,,,,\n", 0, 0, {1, 2, 3}, "the kind"},
+      {"scalar,a,1,1\nscalar,a,1,,1,\nscalar\n", 0, 0, {1, 2, 3}, "fewer than five"},
+      {"scalar,,1,,1\nscalar,\xff,1,,1\nscalar," + longKey + ",1,,1\n" +
+           std::string("scalar,a\0b,1,,1\n", 16),
+       0,
+       0,
+       {1, 2, 3, 4},
+       "valid UTF-8"},
+      {"\"scalar\",\"a,\"\"\n\",\"1\",\"\",\"5\"\nscalar,b,1,,1\n", 2, 0, {}, nullptr},
+      {"scalar,\"a,1,,1\nscalar,b,1,,1\n", 1, 0, {1}, "not closed"},
+      {"scalar,\"a\"x,1,,1\nscalar,b\"c,1,,1\nscalar,d\"e,1,,1\n", 2, 0, {1}, "follows a closing"},
+      {"scalar,a,1,,1\n" + std::string(600'000, 'x') + "\nscalar,b,1,,1\n", 2, 0, {2}, "longer"},
+      {std::string(9000, '"') + "\nscalar,b,1,,1", 1, 0, {1}, "longer"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.csv.substr(0, 80));
+    forget();
+    const Outcome outcome = import(c.csv);
+    const auto document = nlohmann::json::parse(outcome.out);
+    EXPECT_EQ(document["scalars"], c.scalars);
+    EXPECT_EQ(document["samples"], c.samples);
+    std::vector<int> bad;
+    for (const auto& entry : document["firstRejected"]) bad.push_back(entry["line"]);
+    EXPECT_EQ(bad, c.bad);
+    EXPECT_EQ(document["rejected"], c.bad.size());
+    EXPECT_EQ(outcome.status, c.bad.empty() ? kSuccess : kWrong);
+    if (c.reason != nullptr) {
+      EXPECT_THAT(outcome.err, HasSubstr("line " + std::to_string(c.bad[0]) + ": "));
+      EXPECT_THAT(document["firstRejected"][0]["reason"], HasSubstr(c.reason));
+    }
+    EXPECT_EQ(std::filesystem::exists(at(std::string("device/") + kStore)),
+              c.scalars + c.samples > 0);
+  }
+}
+
+TEST_F(StoreCommands, OnlyTheFirstOfManyBadLinesAreShown) {
+  std::string csv = "scalar,a,1,,1\n";
+  for (int i = 0; i < 5000; ++i) csv += "bad\n";
+  const Outcome outcome = import(csv);
+  EXPECT_EQ(std::count(outcome.err.begin(), outcome.err.end(), '\n'), 21);
+  EXPECT_THAT(outcome.err, HasSubstr("and 4980 more bad lines"));
+}
+
+TEST_F(StoreCommands, ADumpCanBeImportedAgain) {
+  const std::string rows =
+      "kind,key,day,offset,value\n"
+      "scalar,zeta,-1,,-9223372036854775808\n"
+      "scalar,\" a,\"\"b\"\"\r\n\",20000,,7\n"
+      "scalar,caf\xc3\xa9 \x07,20000,,0\n"
+      "distribution,\"d,\",19999,86399,0.1\n"
+      "distribution,\"d,\",19999,0,-0\n"
+      "distribution,d,20000,5,1e+300\n"
+      "distribution,d,20000,5,nan\n"
+      "distribution,d,20000,4,-inf\n"
+      "distribution,d,20000,4,5e-324\n";
+  ASSERT_EQ(import(rows).status, kSuccess);
+  EXPECT_EQ(dump(), rows);
+  ASSERT_EQ(import(dump(), "copy").status, kSuccess);
+  EXPECT_EQ(dump("copy"), rows);
+  EXPECT_EQ(run({"store", "dump", "--day", "19999", "--prefix", "d"}).out,
+            "kind,key,day,offset,value\ndistribution,\"d,\",19999,86399,0.1\n"
+            "distribution,\"d,\",19999,0,-0\n");
+  const auto document = nlohmann::json::parse(run({"store", "dump", "--json"}).out);
+  EXPECT_EQ(document["scalars"][1]["key"], " a,\"b\"\r\n");
+  EXPECT_EQ(document["distributions"][1]["samples"][2], nlohmann::json::parse("[4, \"-inf\"]"));
+  const auto keys = nlohmann::json::parse(run({"store", "keys", "--json"}).out);
+  ASSERT_EQ(keys.size(), 5u);
+  EXPECT_EQ(keys[3], nlohmann::json::parse(R"({"kind": "distribution", "key": "d", "days": 1,
+                       "firstDay": 20000, "lastDay": 20000, "samples": 4})"));
+}
+
+TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
+  const struct {
+    std::vector<std::string> arguments;
+    int status;
+    std::string row;  // of the dump
+  } cases[] = {
+      {{"set", "a", "-5"}, kSuccess, "scalar,a,20000,,-5\n"},
+      {{"set", "a", "6", "--day", "-7"}, kSuccess, "scalar,a,-7,,6\n"},
+      {{"push", "d", "-2.5"}, kSuccess, "distribution,d,20000,3661,-2.5\n"},
+      {{"push", "d", "nan", "1", "--day", "3", "--offset", "9"},
+       kSuccess,
+       "distribution,d,3,9,nan\ndistribution,d,3,9,1\n"},
+      {{"set", "a", "1.5"}, kBadUsage, ""},
+      {{"set", "", "1"}, kBadUsage, ""},
+      {{"set", "a"}, kBadUsage, ""},
+      {{"set", "a", "1", "--day", "x"}, kBadUsage, ""},
+      {{"push", "d", "much"}, kBadUsage, ""},
+      {{"push", "d", "1", "--offset", "86400"}, kBadUsage, ""},
+  };
+  for (const auto& c : cases) {
+    forget();
+    std::vector<std::string> arguments{"store"};
+    arguments.insert(arguments.end(), c.arguments.begin(), c.arguments.end());
+    const Outcome outcome = run(arguments);
+    EXPECT_EQ(outcome.status, c.status) << testing::PrintToString(c.arguments);
+    EXPECT_EQ(outcome.err.empty(), c.status == kSuccess) << outcome.err;
+    EXPECT_EQ(dump(), "kind,key,day,offset,value\n" + c.row);
+  }
+}
+
+TEST_F(StoreCommands, AStoreThatCannotBeUsedIsToldAndLeftAlone) {
+  const std::string garbage(4096, 'g');
+  put(std::string("device/") + kStore, garbage);
+  for (const std::vector<std::string>& arguments :
+       std::vector<std::vector<std::string>>{{"store", "dump"},
+                                             {"store", "keys"},
+                                             {"store", "set", "a", "1"},
+                                             {"store", "push", "a", "1"}}) {
+    const Outcome outcome = run(arguments);
+    EXPECT_EQ(outcome.status, kWrong);
+    EXPECT_THAT(outcome.err, HasSubstr("not a database"));
+  }
+  EXPECT_EQ(import("scalar,a,1,,1\n").status, kWrong);
+  EXPECT_EQ(get(std::string("device/") + kStore), garbage);
+  EXPECT_EQ(run({"store", "import", at("missing.csv")}).status, kWrong);
+  EXPECT_EQ(run({"store", "import", root}).status, kWrong) << "a folder";
+}
+
+}  // namespace
+}  // namespace tally::tools
