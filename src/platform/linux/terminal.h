@@ -24,6 +24,7 @@ struct TerminalEnvironment {
 // COLUMNS, else 80, and always from 40 to 200, where tables stay readable.
 Terminal terminalOf(int descriptor);
 // The same from what was found; columns is 0 when the descriptor is no terminal or hides its width.
-Terminal makeTerminal(bool interactive, std::size_t columns, const TerminalEnvironment& environment);
+Terminal makeTerminal(bool interactive, std::size_t columns,
+                      const TerminalEnvironment& environment);
 
 }  // namespace tally
