@@ -4,20 +4,13 @@
 #include <memory>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "config/key_table.h"
 #include "config/scalar_options.h"
+#include "config/whitelist_file.h"
 #include "kv/value.h"
 
 namespace tally {
-
-constexpr std::string_view kWhitelistPath =
-    "/Library/Application Support/Tallybook/Whitelist_Nimbus.plist";
-// The group that exists on internal devices only.
-constexpr std::string_view kInternalTestingGroup = "InternalTesting";
-// Boolean preferences named like a group switch that group on or off in this domain.
-constexpr std::string_view kGroupSwitchDomain = "vellum.da";
 
 // How a key came to be admitted.
 enum class WhitelistMatchKind { None, Exact, Prefix, InternalDevice };
@@ -25,12 +18,6 @@ struct WhitelistMatch {
   WhitelistMatchKind kind = WhitelistMatchKind::None;
   const WhitelistEntry* entry = nullptr;   // for Exact and Prefix
   const ScalarOptions* options = nullptr;  // null for None; borrowed from the TBConfig
-};
-
-// Why a group of the file is not in force.
-struct SkippedGroup {
-  std::string name;
-  std::string reason;
 };
 
 class TBConfig {
@@ -49,19 +36,11 @@ class TBConfig {
   // The same answers with their reasons, for tools; nothing is logged.
   WhitelistMatch matchScalarKey(std::string_view key) const;
   WhitelistMatch matchDistributionKey(std::string_view key) const;
-  const std::vector<SkippedGroup>& skippedGroups() const { return _skippedGroups; }
-  const KeyTable& scalarKeys() const { return _scalarKeys; }
-  const KeyTable& scalarPrefixes() const { return _scalarPrefixes; }
-  const KeyTable& distributionKeys() const { return _distributionKeys; }
-  const KeyTable& distributionPrefixes() const { return _distributionPrefixes; }
+  bool isInternalDevice() const { return _isInternalDevice; }
 
  private:
   TBConfig() = default;
-  void addGroups(const KvDictionary& root);
-  bool groupIsInForce(std::string_view group);
-  void addGroup(const KvRef<KvString>& group, const KvDictionary& sections);
-  void addSection(const KvRef<KvString>& group, std::string_view section, const KvDictionary& keys,
-                  KeyTable& table);
+  class Loader;
   WhitelistMatch match(std::string_view key, const KeyTable& keys, const KeyTable& prefixes) const;
 
   KeyTable _scalarKeys;
@@ -70,7 +49,6 @@ class TBConfig {
   KeyTable _distributionPrefixes;
   bool _isInternalDevice = false;
   std::string _configFileDigest;
-  std::vector<SkippedGroup> _skippedGroups;
   KvRef<KvDictionary> _noOptions = KvDictionary::create();
 };
 

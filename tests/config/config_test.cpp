@@ -118,7 +118,6 @@ TEST_F(ConfigTest, TheLastGroupOfTheFileWins) {
                            group("A", section("ScalarKeys", entry("k", 2))));
   EXPECT_EQ(figureOf(config->configOptionsForScalarKey("k")), "2");
   EXPECT_EQ(config->matchScalarKey("k").entry->group->view(), "A");
-  EXPECT_EQ(config->scalarKeys().entries().size(), 1u);
 }
 
 TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {

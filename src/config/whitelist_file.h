@@ -1,0 +1,76 @@
+// The whitelist file: how it is read, and what in it is well formed.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "config/key_table.h"
+#include "kv/value.h"
+
+namespace tally {
+
+constexpr std::string_view kWhitelistPath =
+    "/Library/Application Support/Tallybook/Whitelist_Nimbus.plist";
+// The group that exists on internal devices only.
+constexpr std::string_view kInternalTestingGroup = "InternalTesting";
+// Boolean preferences named like a group switch that group on or off in this domain.
+constexpr std::string_view kGroupSwitchDomain = "vellum.da";
+
+// A whitelist file as far as it could be loaded.
+struct WhitelistFile {
+  bool read = false;         // its bytes could be read
+  std::string digest;        // MD5 of the bytes, 32 lowercase hexadecimal digits
+  KvRef<KvDictionary> root;  // null when it could not be read or parsed
+  std::string fault;         // why; empty when root is there
+};
+WhitelistFile loadWhitelistFile();
+WhitelistFile parseWhitelistFile(std::string_view bytes);
+
+enum class WhitelistSection {
+  ScalarKeys,
+  DistributionKeys,
+  ScalarKeyPrefixes,
+  DistributionKeyPrefixes
+};
+constexpr int kWhitelistSections = 4;
+std::string_view sectionName(WhitelistSection section);
+// Empty when there is no section of that name.
+std::optional<WhitelistSection> sectionOfName(std::string_view name);
+constexpr bool isPrefixSection(WhitelistSection section) {
+  return section >= WhitelistSection::ScalarKeyPrefixes;
+}
+constexpr bool isScalarSection(WhitelistSection section) {
+  return section == WhitelistSection::ScalarKeys || section == WhitelistSection::ScalarKeyPrefixes;
+}
+
+// Where in the file something stands; an inner level that does not apply is absent.
+struct WhitelistPlace {
+  std::string_view group;
+  std::optional<std::string_view> section, key, option;
+};
+
+// Takes a whitelist piece by piece, in the file's order.
+class WhitelistVisitor {
+ public:
+  virtual ~WhitelistVisitor() = default;
+  // False: the group's content is passed over, well formed or not.
+  virtual bool beginGroup(std::string_view name) = 0;
+  // So many entries of a section follow at most.
+  virtual void beginSection(WhitelistSection, std::size_t) {}
+  // An entry with those of its options that are well formed.
+  virtual void entry(WhitelistSection section, WhitelistEntry entry) = 0;
+  // A piece of the wrong type, which is left out.
+  virtual void malformed(const WhitelistPlace& place) = 0;
+  // A section that nobody reads.
+  virtual void unknownSection(std::string_view, std::string_view) {}
+};
+void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
+
+// Whether a group of the file counts on this device.
+enum class GroupState { InForce, InternalOnly, DisabledByTasking };
+GroupState groupState(std::string_view group);
+// "it is for internal devices only", "it is disabled by tasking"; empty when it is in force.
+std::string_view whyNotInForce(GroupState state);
+
+}  // namespace tally
