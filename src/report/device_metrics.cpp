@@ -1,5 +1,6 @@
 // What the report measures itself: applications, languages, the store's file, uptime, kernel
 // counters.
+#include <algorithm>
 #include <cstring>
 #include <string>
 
@@ -25,6 +26,12 @@ constexpr std::string_view kStoreDomain = "vellum.tallyd";
 constexpr std::string_view kCorruptionCount = "DatabaseCorruptionCount";
 constexpr std::string_view kCrashSupportPath =
     "/System/Library/PrivateFrameworks/FaultDeskSupport.framework/FaultDeskSupport";
+
+constexpr std::string_view kAllApps = "vellum.dockyard.numAllInstalledApps";
+constexpr std::string_view kThirdPartyApps = "vellum.dockyard.numThirdPartyApps";
+constexpr std::string_view kStoreSize = "vellum.sysmetra.tlyd.database.size";
+constexpr std::string_view kStoreCorruptions = "vellum.sysmetra.tlyd.database.corruptions";
+constexpr std::string_view kUptime = "vellum.usage.cur_boot_session_cpu_uptime";
 
 constexpr KernelCounter kFreezerCounters[] = {
     {"vellum.kernel.memorystatus_freeze_count", "kern.memorystatus_freeze_count", 4, 4},
@@ -98,11 +105,26 @@ bool loadAccessors() {
   return found.getIntegerValue && found.setValue;
 }
 
+constexpr std::string_view kKeyWord = "vellum.";
+constexpr std::string_view kKernelWord = "kern.";
+
 }  // namespace
 
+bool isMeasuredByReport(std::string_view key) {
+  const auto named = [key](const KernelCounter& counter) { return counter.key == key; };
+  const auto isShare = [key](std::string_view name) {
+    return key.starts_with(kKeyWord) && key.substr(kKeyWord.size()) == name;
+  };
+  const std::string_view single[] = {kAllApps, kThirdPartyApps, kStoreSize, kStoreCorruptions,
+                                     kUptime};
+  return std::ranges::find(single, key) != std::end(single) ||
+         std::ranges::any_of(kFreezerCounters, named) ||
+         std::ranges::any_of(kFreezerShares, named) ||
+         std::ranges::any_of(kErrorCounters, isShare) ||
+         std::ranges::any_of(kSkippedCounters, isShare);
+}
+
 void TBReport::addInstalledAppInfo() {
-  static constexpr std::string_view kAllApps = "vellum.dockyard.numAllInstalledApps";
-  static constexpr std::string_view kThirdPartyApps = "vellum.dockyard.numThirdPartyApps";
   const auto* allOptions = scalarOptions(kAllApps);
   const auto* thirdPartyOptions = scalarOptions(kThirdPartyApps);
   if (allOptions == nullptr && thirdPartyOptions == nullptr) return;
@@ -134,26 +156,24 @@ void TBReport::addMetadataKeys() {
 }
 
 void TBReport::reportDatabaseSize() {
-  static constexpr std::string_view kSize = "vellum.sysmetra.tlyd.database.size";
-  static constexpr std::string_view kCorruptions = "vellum.sysmetra.tlyd.database.corruptions";
-  if (const auto* options = scalarOptions(kSize)) {
+  if (const auto* options = scalarOptions(kStoreSize)) {
     const auto size = platform().files->fileSize(kStorePath);
-    addScalarForKeyWithOptions(size ? static_cast<std::int64_t>(*size) / kMebibyte : -1, kSize,
+    addScalarForKeyWithOptions(size ? static_cast<std::int64_t>(*size) / kMebibyte : -1, kStoreSize,
                                *options);
   }
-  if (const auto* options = scalarOptions(kCorruptions)) {
+  if (const auto* options = scalarOptions(kStoreCorruptions)) {
     std::int64_t corruptions = 0;
     if (loadAccessors()) {
       Preferences& preferences = *platform().preferences;
       corruptions = preferences.SMAPreferencesGetIntegerValue(kCorruptionCount, kStoreDomain);
       preferences.SMAPreferencesSetValue(kCorruptionCount, KvNumber::int32(0), kStoreDomain);
     }
-    addScalarForKeyWithOptions(corruptions, kCorruptions, *options);
+    addScalarForKeyWithOptions(corruptions, kStoreCorruptions, *options);
   }
 }
 
 void TBReport::reportCPUUptime() {
-  addScalarForKeyByExecutingBlock("vellum.usage.cur_boot_session_cpu_uptime", []() {
+  addScalarForKeyByExecutingBlock(kUptime, []() {
     KernelValues& kernel = *platform().kernelValues;
     const auto ticks = static_cast<double>(kernel.MonotonicTicks());
     const auto timebase = kernel.TimebaseInfo();
@@ -185,8 +205,8 @@ void TBReport::recordPercentages(std::string_view denominator,
   const auto total = readUnsigned(denominator, 8, 8);
   if (!total) return;
   for (const std::string_view name : names) {
-    addScalarForKeyByExecutingBlock("vellum." + std::string(name), [&]() {
-      const auto count = readUnsigned("kern." + std::string(name), 8, 8);
+    addScalarForKeyByExecutingBlock(std::string(kKeyWord) + std::string(name), [&]() {
+      const auto count = readUnsigned(std::string(kKernelWord) + std::string(name), 8, 8);
       // A share of nothing, or of a counter that could not be read, has no meaning.
       if (!count || *total == 0) return std::optional<std::int64_t>();
       return std::optional(

@@ -3,7 +3,6 @@
 
 #include "platform/platform.h"
 #include "report/distribution_summary.h"
-#include "report/scalar_rounding.h"
 
 namespace tally {
 TBReport::TBReport() : _config(TBConfig::init()) {}
@@ -36,7 +35,13 @@ void TBReport::readHistory(std::int32_t day) {
 
 std::int64_t TBReport::addScalarForKeyWithOptions(std::int64_t value, std::string_view key,
                                                   const ScalarOptions& options) {
-  const std::int64_t rounded = roundScalar(value, options);
+  std::vector<RoundingStep>* steps = nullptr;
+  if (_trace != nullptr && _trace->key == key) {
+    _trace->scalarBefore = value;
+    _trace->steps.clear();
+    steps = &_trace->steps;
+  }
+  const std::int64_t rounded = roundScalar(value, options, steps);
   _scalarsOutput->set(key, KvNumber::int64(rounded));
   return rounded;
 }

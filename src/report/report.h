@@ -6,12 +6,15 @@
 #include <memory>
 #include <optional>
 #include <span>
+#include <string>
 #include <string_view>
+#include <vector>
 
 #include "config/config.h"
 #include "kv/value.h"
 #include "platform/metrics_store.h"
 #include "report/histogram.h"
+#include "report/scalar_rounding.h"
 
 namespace tally {
 
@@ -21,11 +24,25 @@ constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 constexpr std::string_view kDailyLogTypeCode = "193";
 constexpr std::string_view kDailyLogName = "log-tallyd";
 
+// True for the scalars that the report measures itself instead of reading them from the store.
+bool isMeasuredByReport(std::string_view key);
+
+// What became of one key on its way into a log, for those who want to follow it.
+struct KeyTrace {
+  std::string key;
+  // The scalar as it was handed to the report, and each step of its rounding.
+  std::optional<std::int64_t> scalarBefore;
+  std::vector<RoundingStep> steps;
+};
+
 // Used for one day: create, call writeLogForYesterdayWithAppInfo once, discard.
 class TBReport {
  public:
   // Loads the whitelist; one that cannot be loaded admits no key.
   TBReport();
+
+  // Fills the trace while the log is built; it must outlive the report.
+  void follow(KeyTrace& trace) { _trace = &trace; }
 
   // Reads the history of the day, builds the log and submits it. appInfo may be null. Nothing is
   // submitted when no key of the day is whitelisted. Failures are logged.
@@ -62,6 +79,7 @@ class TBReport {
   KvRef<KvDictionary> makeDocument(std::int32_t day, const KvArray* appInfo);
 
   std::unique_ptr<TBConfig> _config;
+  KeyTrace* _trace = nullptr;
   KvRef<KvDictionary> _scalarsOutput = KvDictionary::create();
   KvRef<KvDictionary> _distributionsOutput = KvDictionary::create();
   KvRef<KvDictionary> _histogramsOutput = KvDictionary::create();
