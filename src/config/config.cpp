@@ -58,17 +58,18 @@ class TBConfig::Loader final : public WhitelistVisitor {
   KeyTable* const tables_[kWhitelistSections];  // in the order of WhitelistSection
 };
 
-std::unique_ptr<TBConfig> TBConfig::init() {
+std::unique_ptr<TBConfig> TBConfig::init() { return initWithFile(loadWhitelistFile()); }
+
+std::unique_ptr<TBConfig> TBConfig::initWithFile(const WhitelistFile& file) {
   auto config = std::unique_ptr<TBConfig>(new TBConfig());
   config->_isInternalDevice = TBIsInternalDevice();
-  WhitelistFile file = loadWhitelistFile();
   if (!file.read) {
     logMessage(LogLevel::Error, "Couldn't load whitelist");
     // The fixed text does not say why, and an operator needs to know.
     logMessage(LogLevel::Info, "whitelist: {}", file.fault);
     return nullptr;
   }
-  config->_configFileDigest = std::move(file.digest);
+  config->_configFileDigest = file.digest;
   if (!file.root) {
     logMessage(LogLevel::Error, "Couldn't parse the contents of the config file. Error: {}",
                file.fault);

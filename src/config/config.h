@@ -25,6 +25,8 @@ class TBConfig {
   // Reads the whitelist file. Null when it cannot be read or parsed; the reason is logged. A group,
   // section or option that is malformed is left out with one error line that names it.
   static std::unique_ptr<TBConfig> init();
+  // The same with a file that was loaded already.
+  static std::unique_ptr<TBConfig> initWithFile(const WhitelistFile& file);
 
   // Null: the key must not be reported. Any dictionary, empty or not: report it with these options.
   // The dictionary lives as long as the TBConfig and must not be changed.

@@ -84,6 +84,8 @@ WhitelistFile parseWhitelistFile(std::string_view bytes) {
   return file;
 }
 
+std::span<const std::string_view> sectionNames() { return kSectionNames; }
+
 std::string_view sectionName(WhitelistSection section) {
   return kSectionNames[static_cast<std::size_t>(section)];
 }
@@ -129,9 +131,9 @@ GroupState groupState(std::string_view group) {
 std::string_view whyNotInForce(GroupState state) {
   switch (state) {
     case GroupState::InternalOnly:
-      return "it is for internal devices only";
+      return "the group is for internal devices only";
     case GroupState::DisabledByTasking:
-      return "it is disabled by tasking";
+      return "the group is disabled by tasking";
     default:
       return "";
   }

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -34,6 +35,8 @@ enum class WhitelistSection {
   DistributionKeyPrefixes
 };
 constexpr int kWhitelistSections = 4;
+// The sections' names, in the order of WhitelistSection.
+std::span<const std::string_view> sectionNames();
 std::string_view sectionName(WhitelistSection section);
 // Empty when there is no section of that name.
 std::optional<WhitelistSection> sectionOfName(std::string_view name);
@@ -70,7 +73,8 @@ void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
 // Whether a group of the file counts on this device.
 enum class GroupState { InForce, InternalOnly, DisabledByTasking };
 GroupState groupState(std::string_view group);
-// "it is for internal devices only", "it is disabled by tasking"; empty when it is in force.
+// "the group is for internal devices only", "the group is disabled by tasking"; empty when it is in
+// force.
 std::string_view whyNotInForce(GroupState state);
 
 }  // namespace tally

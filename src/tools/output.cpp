@@ -130,14 +130,15 @@ Json jsonOf(const KvObject* value) {
     for (const auto& item : *array) items.push_back(jsonOf(item.get()));
     return items;
   }
-  // Straight into the object's list: looking every key up would take quadratic time.
   Json object = Json::object();
-  auto& entries = object.get_ref<Json::object_t&>();
   for (const auto& entry : static_cast<const KvDictionary&>(*value)) {
-    entries.Json::object_t::Container::emplace_back(std::string(entry.key->view()),
-                                                    jsonOf(entry.value.get()));
+    addMember(object, std::string(entry.key->view()), jsonOf(entry.value.get()));
   }
   return object;
+}
+
+void addMember(Json& object, std::string name, Json value) {
+  object.get_ref<Json::object_t&>().Container::emplace_back(std::move(name), std::move(value));
 }
 
 void printJson(const ToolContext& context, const Json& document) {

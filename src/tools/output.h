@@ -40,6 +40,9 @@ std::string dayName(std::int32_t day);
 // as the strings "inf", "-inf" and "nan". Null gives null.
 Json jsonOf(const KvObject* value);
 Json jsonOfReal(double value);
+// Adds a member that the object does not have yet, without looking for it: an ordered object would
+// compare the name with every other.
+void addMember(Json& object, std::string name, Json value);
 void printJson(const ToolContext& context, const Json& document);
 
 // Says on standard error why the command ends, and passes the status on.

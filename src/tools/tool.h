@@ -37,6 +37,11 @@ struct ToolContext {
 using CommandFamily = void (*)(CLI::App& app, ToolContext& context);
 std::span<const CommandFamily> commandFamilies();
 
+// Adds a command to a family. Its options are added to what is returned; run is called when the
+// arguments chose it.
+CLI::App* addCommand(CLI::App* family, ToolContext& context, const char* name,
+                     const char* description, std::function<int()> run);
+
 // Makes the platform of a device root.
 using PlatformFactory = std::function<Platform(const std::string& root)>;
 

@@ -1,0 +1,22 @@
+// The log that would be submitted, made without leaving a trace.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+#include "kv/value.h"
+#include "report/report.h"
+
+namespace tally::tools {
+
+struct Preview {
+  KvRef<KvDictionary> document;  // null when no log would be submitted
+  KvRef<KvDictionary> options;   // of the submission; null when there are none
+  std::string body;              // the document as its bytes
+};
+
+// Builds the day's log by the very steps of the daily job, with preferences that forget what is
+// written to them and a submission that keeps the log here. Follows a key when a trace is given.
+Preview previewLog(std::int32_t day, KeyTrace* trace = nullptr);
+
+}  // namespace tally::tools

@@ -1,0 +1,214 @@
+#include "tools/report_commands.h"
+
+#include <memory>
+
+#include "base/file.h"
+#include "base/time_text.h"
+#include "kv/plist_codec.h"
+#include "platform/platform.h"
+#include "tools/daily_log.h"
+#include "tools/day_argument.h"
+#include "tools/log_diff.h"
+#include "tools/log_view.h"
+#include "tools/preview.h"
+#include "tools/table.h"
+
+namespace tally::tools {
+namespace {
+
+struct ReportArguments {
+  std::string day = "yesterday";
+  bool diff = false;
+  std::string name;
+};
+
+std::string timeText(std::optional<double> seconds) {
+  std::string text;
+  if (seconds) appendTimestamp(text, *seconds);
+  return text;
+}
+
+Json dayJson(const DailyLog& log) {
+  const auto day = log.day();
+  return day ? Json(*day) : Json(nullptr);
+}
+
+std::string dayDate(const DailyLog& log) {
+  const auto day = log.day();
+  return day ? dayText(*day) : "-";
+}
+
+int previewDiff(const ToolContext& context, const DailyLog& next) {
+  const auto last = SubmittedLogs(context).newest();
+  const DailyLog empty =
+      *DailyLog::of(KvDictionary::create({{"TBCrashLogVersion", KvNumber::int32(1)}}));
+  const DailyLog& before = last ? last->content : empty;
+  if (context.json) {
+    Json json = jsonOfLogDiff(before, next);
+    json["before"] = last ? Json({{"file", last->log.fileName}, {"day", dayJson(last->content)}})
+                          : Json(nullptr);
+    json["after"] = {{"day", dayJson(next)}};
+    printJson(context, json);
+    return kSuccess;
+  }
+  printLine(context,
+            "Before: " + (last ? fmt::format("{}, {}", last->log.fileName, dayDate(last->content))
+                               : std::string("no log was submitted yet")));
+  printLine(context, "After:  the next log, " + dayDate(next));
+  printLogDiff(context, before, next);
+  return kSuccess;
+}
+
+int preview(const ToolContext& context, const ReportArguments& arguments) {
+  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
+  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const Preview made = previewLog(*day);
+  const auto log = DailyLog::of(made.document);
+  if (!log) {
+    return complain(context,
+                    fmt::format("no log would be submitted for {}: the store has no value of that "
+                                "day that the whitelist admits",
+                                dayName(*day)),
+                    kWrong);
+  }
+  const bool allowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
+  if (!allowed) {
+    print(context.err,
+          "tallyctl: submission is not allowed on this device, so the daily job "
+          "would not make this log\n");
+  }
+  if (arguments.diff) return previewDiff(context, *log);
+  if (context.json) {
+    Json json = jsonOf(*log, made.options.get());
+    json["submissionAllowed"] = allowed;
+    printJson(context, json);
+  } else {
+    printDailyLog(context, *log, made.options.get());
+  }
+  return kSuccess;
+}
+
+int list(const ToolContext& context, const ReportArguments&) {
+  const SubmittedLogs logs(context);
+  const auto all = logs.list();
+  if (!all) return complain(context, all.error().message, kWrong);
+  Json document = Json::array();
+  Table table({{"log", Align::Left, true},
+               {"type", Align::Right},
+               {"day"},
+               {"created"},
+               {"size", Align::Right},
+               {"keys", Align::Right}});
+  for (const SpooledLog& log : *all) {
+    const auto body = logs.read(log);
+    const auto content = body ? DailyLog::parse(*body) : Result<DailyLog>(body.error());
+    if (context.json) {
+      Json item = {{"file", log.fileName},
+                   {"sequence", log.sequence},
+                   {"name", log.name},
+                   {"typeCode", log.typeCode},
+                   {"bytes", log.bytes}};
+      item["created"] = log.creationTime ? Json(timeText(log.creationTime)) : Json(nullptr);
+      item["day"] = content ? dayJson(*content) : Json(nullptr);
+      item["keys"] = content ? Json(content->keyCount()) : Json(nullptr);
+      document.push_back(std::move(item));
+      continue;
+    }
+    const bool damaged = !content && (isDailyLog(log) || !body);
+    table.add({log.fileName, log.typeCode,
+               damaged ? Cell("damaged", Ink::Bad) : Cell(content ? dayDate(*content) : "-"),
+               timeText(log.creationTime), byteText(log.bytes),
+               content ? integerText(static_cast<std::int64_t>(content->keyCount())) : "-"});
+  }
+  if (context.json) {
+    printJson(context, document);
+  } else if (table.empty()) {
+    printLine(context, "no log was submitted yet");
+  } else {
+    table.print(context);
+  }
+  return kSuccess;
+}
+
+// A log of another kind: its lines as they are, made safe to show.
+int showText(const ToolContext& context, const std::string& title, std::string_view body) {
+  if (context.json) {
+    printJson(context, {{"file", title}, {"text", std::string(body)}});
+    return kSuccess;
+  }
+  printLine(context, title, Ink::Strong);
+  for (std::size_t begin = 0; begin < body.size();) {
+    const std::size_t end = std::min(body.find('\n', begin), body.size());
+    printLine(context, body.substr(begin, end - begin));
+    begin = end + 1;
+  }
+  return kSuccess;
+}
+
+int showBody(const ToolContext& context, const std::string& title, std::string_view body,
+             const SpooledLog* spooled) {
+  const auto content = DailyLog::parse(body);
+  if (!content) {
+    if (spooled != nullptr && !isDailyLog(*spooled) && !spooled->typeCode.empty()) {
+      return showText(context, title, body);
+    }
+    return complain(context, fmt::format("{} is damaged: {}", title, content.error().message),
+                    kWrong);
+  }
+  const KvDictionary* options = spooled != nullptr ? spooled->options.get() : nullptr;
+  if (context.json) {
+    Json json = {{"file", title}, {"bytes", body.size()}};
+    json.update(jsonOf(*content, options));
+    printJson(context, json);
+    return kSuccess;
+  }
+  printDailyLog(context, *content, options);
+  print(context.out, "\n");
+  printLine(context, fmt::format("{}, {}", title, byteText(body.size())), Ink::Faint);
+  return kSuccess;
+}
+
+int show(const ToolContext& context, const ReportArguments& arguments) {
+  if (arguments.name.find('/') != std::string::npos) {
+    const auto body = readFile(arguments.name, kPlistMaximumBytes);
+    if (!body) return complain(context, body.error().message, kWrong);
+    return showBody(context, arguments.name, *body, nullptr);
+  }
+  const SubmittedLogs logs(context);
+  const auto found = logs.find(arguments.name);
+  if (!found) return complain(context, found.error().message, kWrong);
+  if (!*found) {
+    return complain(context,
+                    arguments.name.empty() ? "no daily log was submitted yet"
+                                           : "there is no log " + arguments.name,
+                    kWrong);
+  }
+  const SpooledLog& log = **found;
+  const auto body = logs.read(log);
+  if (!body) return complain(context, body.error().message, kWrong);
+  return showBody(context, log.fileName, *body, &log);
+}
+
+}  // namespace
+
+void addReportCommands(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<ReportArguments>();
+  CLI::App* const report = app.add_subcommand("report", "Look at the next log and at earlier ones");
+  report->require_subcommand(1);
+  const auto add = [&](const char* name, const char* description, auto run) {
+    return addCommand(report, context, name, description,
+                      [&context, arguments, run] { return run(context, *arguments); });
+  };
+  CLI::App* command =
+      add("preview", "The log that would be submitted; changes nothing on the device", preview);
+  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
+  command->add_flag("--diff", arguments->diff, "Only what differs from the last submitted log");
+
+  add("list", "The logs that were submitted", list);
+
+  command = add("show", "A submitted log: statistics, histograms, scalars", show);
+  command->add_option("NAME", arguments->name,
+                      "Its number or name, or a path with a /; the last daily log when left out");
+}
+
+}  // namespace tally::tools
