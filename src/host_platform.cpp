@@ -1,12 +1,11 @@
 #include "host_platform.h"
 
 #include "platform/device/device_platform.h"
-#include "platform/linux/linux_platform.h"
 
 namespace tally {
 
-Platform makeHostPlatform(const std::string& root) {
-  Platform services = makeLinuxPlatform(root);
+Platform makeHostPlatform(const std::string& root, const LinuxPlatformOptions& options) {
+  Platform services = makeLinuxPlatform(root, options);
   addDeviceRegistry(services, devicePrefix(root));
   return services;
 }

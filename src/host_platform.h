@@ -3,12 +3,13 @@
 
 #include <string>
 
+#include "platform/linux/linux_platform.h"
 #include "platform/platform.h"
 
 namespace tally {
 
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
 // service is used.
-Platform makeHostPlatform(const std::string& root);
+Platform makeHostPlatform(const std::string& root, const LinuxPlatformOptions& options = {});
 
 }  // namespace tally

@@ -4,6 +4,7 @@
 #include "host_platform.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/tool.h"
+#include "tools/tool_log.h"
 
 int main(int count, char** arguments) {
   using namespace tally;
@@ -11,6 +12,9 @@ int main(int count, char** arguments) {
   context.root = deviceRootFromEnvironment();
   context.output = terminalOf(1);
   context.errors = terminalOf(2);
-  return tools::runTool(std::move(context), {arguments, static_cast<std::size_t>(count)},
-                        makeHostPlatform);
+  return tools::runTool(
+      std::move(context), {arguments, static_cast<std::size_t>(count)},
+      [](const std::string& root) {
+        return makeHostPlatform(root, {tools::makeToolLog(stderr), /*readOnlyPreferences=*/true});
+      });
 }

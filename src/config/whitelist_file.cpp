@@ -131,9 +131,9 @@ GroupState groupState(std::string_view group) {
 std::string_view whyNotInForce(GroupState state) {
   switch (state) {
     case GroupState::InternalOnly:
-      return "the group is for internal devices only";
+      return "is for internal devices only";
     case GroupState::DisabledByTasking:
-      return "the group is disabled by tasking";
+      return "is disabled by tasking";
     default:
       return "";
   }

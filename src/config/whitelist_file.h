@@ -73,8 +73,8 @@ void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
 // Whether a group of the file counts on this device.
 enum class GroupState { InForce, InternalOnly, DisabledByTasking };
 GroupState groupState(std::string_view group);
-// "the group is for internal devices only", "the group is disabled by tasking"; empty when it is in
-// force.
+// What is to be said of the group: "is for internal devices only", "is disabled by tasking"; empty
+// when it is in force.
 std::string_view whyNotInForce(GroupState state);
 
 }  // namespace tally

@@ -1,4 +1,6 @@
 // The table of all commands, in the order of the help.
+#include "tools/explain_command.h"
+#include "tools/prefs_commands.h"
 #include "tools/report_commands.h"
 #include "tools/store_commands.h"
 #include "tools/tool.h"
@@ -11,6 +13,8 @@ std::span<const CommandFamily> commandFamilies() {
       addStoreCommands,
       addWhitelistCommands,
       addReportCommands,
+      addExplainCommand,
+      addPrefsCommands,
   };
   return kFamilies;
 }

@@ -39,7 +39,7 @@ class Checker final : public WhitelistVisitor {
     inForce_ = state == GroupState::InForce;
     if (state != GroupState::InForce) {
       add(Severity::Surprise, {name, {}, {}, {}},
-          fmt::format("not in force here: {}", whyNotInForce(state)));
+          fmt::format("does not count here: it {}", whyNotInForce(state)));
     }
     const auto value = platform().preferences->SMAPreferencesGetValue(name, kGroupSwitchDomain);
     if (value && value->type() != KvType::Boolean && value->type() != KvType::Number) {

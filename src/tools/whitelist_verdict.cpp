@@ -35,7 +35,7 @@ std::string entryText(WhitelistSection section, const WhitelistEntry& entry) {
 std::string whyRefused(const std::vector<KeyCandidate>& candidates, KeyKind kind) {
   for (const KeyCandidate& candidate : candidates) {
     if (isScalarSection(candidate.section) != (kind == KeyKind::Scalar)) continue;
-    return fmt::format("{} would admit it, but {}", entryText(candidate.section, candidate.entry),
+    return fmt::format("named only by {}, which {}", entryText(candidate.section, candidate.entry),
                        whyNotInForce(candidate.state));
   }
   return "it is not listed";

@@ -39,16 +39,20 @@ std::string userDataFolder(const std::string& prefix) {
 
 }  // namespace
 
-Platform makeLinuxPlatform(const std::string& root) {
+Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& options) {
   const std::string prefix = devicePrefix(root);
   const std::string data = prefix + "/var/mobile/Library/Tallybook";
-  const auto log = makeLinuxSystemLog(
-      systemLogSettings(std::getenv("TALLYRUN_LOG"), std::getenv("TALLYRUN_LOG_LEVEL")));
+  const auto log = options.log
+                       ? options.log
+                       : makeLinuxSystemLog(systemLogSettings(std::getenv("TALLYRUN_LOG"),
+                                                              std::getenv("TALLYRUN_LOG_LEVEL")));
   const auto clock = std::make_shared<LinuxClock>();
   const auto description =
       std::make_shared<DeviceDescription>(prefix + "/device/device.plist", log);
   const auto preferences = std::make_shared<PropertyListPreferences>(
-      userPreferencesFolder(prefix, "mobile").value(), log);
+      userPreferencesFolder(prefix, kProgramUser).value(), log, 0600,
+      options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
+                                  : PropertyListPreferences::Access::ReadWrite);
 
   Platform services;
   services.log = log;

@@ -9,9 +9,15 @@
 
 namespace tally {
 
+// How a platform differs from that of the daily job.
+struct LinuxPlatformOptions {
+  std::shared_ptr<SystemLog> log;  // null: the journal or standard error
+  bool readOnlyPreferences = false;
+};
+
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
 // service is used.
-Platform makeLinuxPlatform(const std::string& root);
+Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& options = {});
 
 // TALLYRUN_ROOT; "/" when it is unset or empty.
 std::string deviceRootFromEnvironment();

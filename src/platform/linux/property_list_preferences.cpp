@@ -17,6 +17,7 @@ constexpr int kDamagedFilesKept = 8;
 }  // namespace
 
 PropertyListPreferences::~PropertyListPreferences() {
+  if (access_ == Access::ReadOnly) return;
   for (auto& [domain, state] : domains_) {
     if (!state.pending.empty()) writePending(state, domain);
   }
@@ -40,7 +41,8 @@ void PropertyListPreferences::SMAPreferencesSetValue(std::string_view key, KvRef
 
 bool PropertyListPreferences::SMAPreferencesSynchronize(std::string_view domain) {
   Domain* const state = find(domain);
-  return state != nullptr && (state->pending.empty() || writePending(*state, domain));
+  if (state == nullptr || access_ == Access::ReadOnly) return state != nullptr;
+  return state->pending.empty() || writePending(*state, domain);
 }
 
 KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain) {
@@ -116,6 +118,11 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain, boo
 // Makes room for a new file where there is a damaged one.
 void PropertyListPreferences::recover(Domain& state, std::string_view domain,
                                       const std::string& fault, bool locked) {
+  if (access_ == Access::ReadOnly) {
+    state.stored = KvDictionary::create();
+    report(domain, "damaged: " + fault);
+    return;
+  }
   if (!locked) {
     // Another process may be at the same, or may just have put a sound file in its place.
     const auto lock = lockFolder();

@@ -21,8 +21,12 @@ namespace tally {
 // object is destroyed. Values are shared, not copied: a value given or got must not be changed.
 class PropertyListPreferences final : public Preferences {
  public:
-  PropertyListPreferences(std::string folder, std::shared_ptr<SystemLog> log, unsigned mode = 0600)
-      : folder_(std::move(folder)), log_(std::move(log)), mode_(mode) {}
+  // With ReadOnly no file is touched: a damaged one stays in its place, and what is written is
+  // forgotten at the end.
+  enum class Access { ReadWrite, ReadOnly };
+  PropertyListPreferences(std::string folder, std::shared_ptr<SystemLog> log, unsigned mode = 0600,
+                          Access access = Access::ReadWrite)
+      : folder_(std::move(folder)), log_(std::move(log)), mode_(mode), access_(access) {}
   ~PropertyListPreferences() override;
   PropertyListPreferences(const PropertyListPreferences&) = delete;
   PropertyListPreferences& operator=(const PropertyListPreferences&) = delete;
@@ -59,10 +63,13 @@ class PropertyListPreferences final : public Preferences {
   std::string folder_;
   std::shared_ptr<SystemLog> log_;
   unsigned mode_;
+  Access access_;
   bool swept_ = false;
   std::map<std::string, Domain, std::less<>> domains_;
 };
 
+// The user whose preferences are the program's own.
+constexpr std::string_view kProgramUser = "mobile";
 // Where a user's preferences lie below a root; empty when the name cannot be a folder's.
 std::optional<std::string> userPreferencesFolder(const std::string& prefix, std::string_view user);
 std::string systemPreferencesFolder(const std::string& prefix);

@@ -1,0 +1,243 @@
+#include "tools/explain_command.h"
+
+#include <memory>
+
+#include "base/time_text.h"
+#include "platform/platform.h"
+#include "tools/day_argument.h"
+#include "tools/key_story.h"
+#include "tools/log_view.h"
+#include "tools/table.h"
+
+namespace tally::tools {
+namespace {
+
+struct ExplainArguments {
+  std::string key;
+  std::string day = "yesterday";
+};
+
+void printRows(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, "In the store");
+  if (story.scalarRows.empty() && story.distributionRows.empty()) {
+    printLine(context, story.measured
+                           ? "  no rows: the report measures this key itself when it is written"
+                           : "  no rows of this key");
+    return;
+  }
+  const auto dayCell = [&](std::int32_t day) {
+    return Cell(dayText(day), day == story.day ? Ink::Strong : Ink::Faint);
+  };
+  if (!story.scalarRows.empty()) {
+    Table table({{"day"}, {"scalar", Align::Right}});
+    for (const ScalarRow& row : story.scalarRows) {
+      table.add({dayCell(row.day), integerText(row.value)});
+    }
+    table.print(context);
+  }
+  if (!story.distributionRows.empty()) {
+    Table table({{"day"},
+                 {"samples", Align::Right},
+                 {"min", Align::Right},
+                 {"mean", Align::Right},
+                 {"max", Align::Right}});
+    for (const auto& [day, summary] : story.distributionRows) {
+      table.add({dayCell(day), integerText(summary.count), realText(summary.minimum),
+                 realText(summary.mean), realText(summary.maximum)});
+    }
+    table.print(context);
+  }
+}
+
+void printVerdict(const ToolContext& context, const KeyVerdict& verdict) {
+  const bool admitted = verdict.admitted();
+  print(context.out, "  " + inked(context.output, admitted ? Ink::Good : Ink::Doubtful,
+                                  admitted ? "admitted" : "refused "));
+  printLine(context, fmt::format("  as a {}: {}", kindName(verdict.kind), verdict.reason));
+  if (!admitted) return;
+  printLine(context, "            options: " + optionsText(*verdict.match.options));
+  for (const KeyCandidate& other : verdict.others) {
+    const std::string_view off = whyNotInForce(other.state);
+    printLine(
+        context,
+        fmt::format("            passed over: {} {} of the group {}, which {}",
+                    isPrefixSection(other.section) ? "prefix" : "entry", other.entry.key->view(),
+                    other.entry.group->view(), !off.empty() ? off : "is less specific or earlier"),
+        Ink::Faint);
+  }
+}
+
+void printRounding(const ToolContext& context, const KeyStory& story) {
+  if (!story.trace.scalarBefore) return;
+  printHeading(context, "Rounding");
+  printLine(context, fmt::format("  {}  {}", story.measured ? "measured now" : "stored",
+                                 integerText(*story.trace.scalarBefore)));
+  for (const RoundingStep& step : story.trace.steps) {
+    printLine(context, fmt::format("  {} {}: {} becomes {}", step.option, step.setting,
+                                   integerText(step.before), integerText(step.after)));
+  }
+  if (story.trace.steps.empty()) printLine(context, "  no step: the value is reported unchanged");
+}
+
+void printValue(const ToolContext& context, const DailyLog& log, const std::string& key,
+                KeyKind kind) {
+  const KvObject* value = loggedValue(log, key, kind);
+  if (value == nullptr) {
+    printLine(context, fmt::format("  not there as a {}", kindName(kind)), Ink::Doubtful);
+    return;
+  }
+  if (kind == KeyKind::Scalar) {
+    const auto* number = kvCast<KvNumber>(value);
+    printLine(context, "  scalar " +
+                           (number != nullptr ? integerText(number->asInt64()) : valueText(value)));
+    return;
+  }
+  if (const auto statistics = statisticsOf(value)) {
+    printLine(context, fmt::format("  distribution of {}: min {}, mean {}, std dev {}, max {}",
+                                   counted(static_cast<std::uint64_t>(statistics->count), "sample"),
+                                   realText(statistics->minimum), realText(statistics->mean),
+                                   realText(statistics->standardDeviation()),
+                                   realText(statistics->maximum)));
+  } else {
+    printLine(context, "  distribution: damaged", Ink::Bad);
+  }
+  if (const auto* histogram = log.histograms().getAs<KvDictionary>(key)) {
+    printHistogram(context, *histogram, 4);
+  }
+}
+
+// The kinds that a key is of: those it has rows of, is admitted as, or is measured as.
+std::vector<KeyKind> kindsOf(const KeyStory& story) {
+  const bool scalar = story.measured || !story.scalarRows.empty();
+  const bool distribution = !story.distributionRows.empty();
+  std::vector<KeyKind> kinds;
+  if (scalar || !distribution) kinds.push_back(KeyKind::Scalar);
+  if (distribution || !scalar) kinds.push_back(KeyKind::Distribution);
+  return kinds;
+}
+
+void printLogs(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, fmt::format("In a log of {}, made now", dayText(story.day)));
+  const auto next = DailyLog::of(story.next);
+  for (const KeyKind kind : kindsOf(story)) {
+    const std::string reason = story.whyAbsent(kind);
+    if (reason.empty() && next) {
+      printValue(context, *next, story.key, kind);
+    } else {
+      printLine(context, fmt::format("  not there as a {}: {}", kindName(kind), reason),
+                Ink::Doubtful);
+    }
+  }
+  if (!story.submissionAllowed) {
+    printLine(context, "  the daily job makes no log at all: submission is not allowed",
+              Ink::Doubtful);
+  }
+  if (!story.submitted) {
+    printHeading(context, "In the submitted log");
+    printLine(context, "  no log of that day was submitted", Ink::Doubtful);
+    return;
+  }
+  printHeading(context, "In the submitted log " + story.submitted->log.fileName);
+  for (const KeyKind kind : kindsOf(story)) {
+    const DailyLog& log = story.submitted->content;
+    const KvObject* submitted = loggedValue(log, story.key, kind);
+    const bool same = submitted != nullptr && next &&
+                      kvEqual(submitted, loggedValue(*next, story.key, kind)) &&
+                      kvEqual(log.histograms().get(story.key), next->histograms().get(story.key));
+    if (same && kind == KeyKind::Distribution) {
+      printLine(context, "  the same distribution");
+    } else {
+      printValue(context, log, story.key, kind);
+    }
+  }
+  const auto* digest = story.submitted->content.document().getAs<KvString>("TBWhitelistDigest");
+  if (digest != nullptr && digest->view() != story.judge.file().digest) {
+    printLine(context, "  it was made with another whitelist", Ink::Doubtful);
+  }
+}
+
+Json storyJson(const KeyStory& story) {
+  Json scalars = Json::array();
+  for (const ScalarRow& row : story.scalarRows) {
+    scalars.push_back({{"day", row.day}, {"value", row.value}});
+  }
+  Json distributions = Json::array();
+  for (const auto& [day, summary] : story.distributionRows) {
+    distributions.push_back({{"day", day},
+                             {"samples", summary.count},
+                             {"minimum", jsonOfReal(summary.minimum)},
+                             {"mean", jsonOfReal(summary.mean)},
+                             {"maximum", jsonOfReal(summary.maximum)}});
+  }
+  Json json = {{"key", story.key},
+               {"day", story.day},
+               {"scalarRows", std::move(scalars)},
+               {"distributionRows", std::move(distributions)},
+               {"measuredByReport", story.measured},
+               {"whitelist",
+                {{"scalar", jsonOf(story.scalar)}, {"distribution", jsonOf(story.distribution)}}}};
+  if (story.trace.scalarBefore) {
+    Json steps = Json::array();
+    for (const RoundingStep& step : story.trace.steps) {
+      steps.push_back({{"option", step.option},
+                       {"setting", step.setting},
+                       {"before", step.before},
+                       {"after", step.after}});
+    }
+    json["rounding"] = {{"value", *story.trace.scalarBefore}, {"steps", std::move(steps)}};
+  }
+  const auto logged = [&](const DailyLog& log) {
+    return Json{{"scalar", jsonOf(loggedValue(log, story.key, KeyKind::Scalar))},
+                {"distribution", jsonOf(loggedValue(log, story.key, KeyKind::Distribution))},
+                {"histogram", jsonOf(log.histograms().get(story.key))}};
+  };
+  const auto next = DailyLog::of(story.next);
+  json["nextLog"] = next ? logged(*next) : Json(nullptr);
+  for (const KeyKind kind : kindsOf(story)) {
+    const std::string reason = story.whyAbsent(kind);
+    if (!reason.empty()) json["whyAbsent"][std::string(kindName(kind))] = reason;
+  }
+  json["submittedLog"] = nullptr;
+  if (story.submitted) {
+    json["submittedLog"] = logged(story.submitted->content);
+    json["submittedLog"]["file"] = story.submitted->log.fileName;
+  }
+  return json;
+}
+
+int explain(const ToolContext& context, const ExplainArguments& arguments) {
+  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
+  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const KeyStory story = tellStory(context, arguments.key, *day);
+  bool present = false;
+  for (const KeyKind kind : kindsOf(story)) present = present || story.whyAbsent(kind).empty();
+  if (context.json) {
+    printJson(context, storyJson(story));
+    return present ? kSuccess : kWrong;
+  }
+  printLine(context, fmt::format("{} on {}", story.key, dayName(story.day)), Ink::Strong);
+  printRows(context, story);
+  printHeading(context, "In the whitelist");
+  for (const KeyKind kind : kindsOf(story)) {
+    printVerdict(context, kind == KeyKind::Scalar ? story.scalar : story.distribution);
+  }
+  printRounding(context, story);
+  printLogs(context, story);
+  return present ? kSuccess : kWrong;
+}
+
+}  // namespace
+
+void addExplainCommand(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<ExplainArguments>();
+  CLI::App* const command =
+      addCommand(&app, context, "explain", "Follow one key from the store to the log",
+                 [&context, arguments] { return explain(context, *arguments); });
+  command
+      ->add_option("KEY", arguments->key,
+                   "A key of the metrics store, or one that the report measures")
+      ->required();
+  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
+}
+
+}  // namespace tally::tools
