@@ -8,7 +8,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kLastProcessedDay = "LastCrashLogSerializationDateInDaysSince1970";
 // The scheduled mode ends when no event came for this long.
 constexpr double kQuietSeconds = 10.0;
 

@@ -21,6 +21,12 @@ class CrashReporting {
   virtual void rollFixlineLogs() = 0;
 };
 
+constexpr std::string_view kCrashSupportPath =
+    "/System/Library/PrivateFrameworks/FaultDeskSupport.framework/FaultDeskSupport";
+// The entry points that the program uses of it.
+constexpr std::string_view kCrashSupportSymbols[] = {"SMAPreferencesGetIntegerValue",
+                                                     "SMAPreferencesSetValue"};
+
 // The crash-reporting support library, which a product may ship without. Its entry points give
 // access to the preferences.
 class CrashSupportLibrary {

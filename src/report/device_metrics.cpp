@@ -24,8 +24,6 @@ constexpr std::string_view kStorePath = "/var/mobile/Library/Tallybook/TBDataSto
 constexpr std::int64_t kMebibyte = 1048576;
 constexpr std::string_view kStoreDomain = "vellum.tallyd";
 constexpr std::string_view kCorruptionCount = "DatabaseCorruptionCount";
-constexpr std::string_view kCrashSupportPath =
-    "/System/Library/PrivateFrameworks/FaultDeskSupport.framework/FaultDeskSupport";
 
 constexpr std::string_view kAllApps = "vellum.dockyard.numAllInstalledApps";
 constexpr std::string_view kThirdPartyApps = "vellum.dockyard.numThirdPartyApps";
@@ -94,11 +92,11 @@ bool loadAccessors() {
     logMessage(LogLevel::Error, "Failed to dynamically load the FaultDeskSupport framework");
     return false;
   }
-  found.getIntegerValue = library.hasSymbol("SMAPreferencesGetIntegerValue");
+  found.getIntegerValue = library.hasSymbol(kCrashSupportSymbols[0]);
   if (!found.getIntegerValue) {
     logMessage(LogLevel::Error, "Failed to dyanmically link SMAPreferencesGetIntegerValue");
   }
-  found.setValue = library.hasSymbol("SMAPreferencesSetValue");
+  found.setValue = library.hasSymbol(kCrashSupportSymbols[1]);
   if (!found.setValue) {
     logMessage(LogLevel::Error, "Failed to dynamically link SMAPreferencesSetValue");
   }
@@ -122,6 +120,26 @@ bool isMeasuredByReport(std::string_view key) {
          std::ranges::any_of(kFreezerShares, named) ||
          std::ranges::any_of(kErrorCounters, isShare) ||
          std::ranges::any_of(kSkippedCounters, isShare);
+}
+
+std::vector<KernelValueName> kernelValuesOfReport() {
+  std::vector<KernelValueName> names;
+  for (const auto& counters : {std::span<const KernelCounter>(kFreezerCounters),
+                               std::span<const KernelCounter>(kFreezerShares)}) {
+    for (const KernelCounter& counter : counters) {
+      names.push_back({std::string(counter.name), counter.width});
+    }
+  }
+  for (const auto& shares : {std::span<const std::string_view>(kErrorCounters),
+                             std::span<const std::string_view>(kSkippedCounters)}) {
+    for (const std::string_view name : shares) {
+      names.push_back({std::string(kKernelWord) + std::string(name), 8});
+    }
+  }
+  for (const std::string_view name : {kConsideredCount, kBelowThresholdCount}) {
+    names.push_back({std::string(name), 8});
+  }
+  return names;
 }
 
 void TBReport::addInstalledAppInfo() {

@@ -20,12 +20,21 @@ namespace tally {
 
 // The preference domain of the program.
 constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
+// The integer preference that holds the last day that the day check processed.
+constexpr std::string_view kLastProcessedDay = "LastCrashLogSerializationDateInDaysSince1970";
 // What log submission knows the daily log by.
 constexpr std::string_view kDailyLogTypeCode = "193";
 constexpr std::string_view kDailyLogName = "log-tallyd";
 
 // True for the scalars that the report measures itself instead of reading them from the store.
 bool isMeasuredByReport(std::string_view key);
+
+// The kernel values that those are made from, with the bytes that are read of each.
+struct KernelValueName {
+  std::string name;
+  std::size_t width;
+};
+std::vector<KernelValueName> kernelValuesOfReport();
 
 // What became of one key on its way into a log, for those who want to follow it.
 struct KeyTrace {

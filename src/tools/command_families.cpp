@@ -1,4 +1,5 @@
 // The table of all commands, in the order of the help.
+#include "tools/doctor_command.h"
 #include "tools/explain_command.h"
 #include "tools/prefs_commands.h"
 #include "tools/report_commands.h"
@@ -10,11 +11,8 @@ namespace tally::tools {
 
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
-      addStoreCommands,
-      addWhitelistCommands,
-      addReportCommands,
-      addExplainCommand,
-      addPrefsCommands,
+      addStoreCommands,  addWhitelistCommands, addReportCommands,
+      addExplainCommand, addPrefsCommands,     addDoctorCommand,
   };
   return kFamilies;
 }

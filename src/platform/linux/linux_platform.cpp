@@ -42,10 +42,7 @@ std::string userDataFolder(const std::string& prefix) {
 Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& options) {
   const std::string prefix = devicePrefix(root);
   const std::string data = prefix + "/var/mobile/Library/Tallybook";
-  const auto log = options.log
-                       ? options.log
-                       : makeLinuxSystemLog(systemLogSettings(std::getenv("TALLYRUN_LOG"),
-                                                              std::getenv("TALLYRUN_LOG_LEVEL")));
+  const auto log = options.log ? options.log : makeLinuxSystemLog(systemLogEnvironment().settings);
   const auto clock = std::make_shared<LinuxClock>();
   const auto description =
       std::make_shared<DeviceDescription>(prefix + "/device/device.plist", log);

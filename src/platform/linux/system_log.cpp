@@ -7,6 +7,7 @@
 
 #include <array>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <optional>
 
@@ -67,7 +68,7 @@ class LinuxSystemLog final : public SystemLog {
  private:
   bool useJournal() {
     if (!useJournal_) {
-      useJournal_ = !settings_.forceStandardError && ::access(kJournalSocket, W_OK) == 0;
+      useJournal_ = !settings_.forceStandardError && journalIsThere();
     }
     return *useJournal_;
   }
@@ -95,6 +96,23 @@ SystemLogSettings systemLogSettings(const char* destination, const char* level) 
   }
   return settings;
 }
+
+SystemLogEnvironment systemLogEnvironment() {
+  const char* const destination = std::getenv("TALLYRUN_LOG");
+  const char* const level = std::getenv("TALLYRUN_LOG_LEVEL");
+  SystemLogEnvironment found{systemLogSettings(destination, level), ""};
+  const auto isSet = [](const char* value) { return value != nullptr && *value != '\0'; };
+  if (isSet(destination) && !found.settings.forceStandardError) {
+    found.fault = "TALLYRUN_LOG is neither empty nor stderr";
+  } else if (isSet(level) && levelText(found.settings.lowest) != level) {
+    found.fault = "TALLYRUN_LOG_LEVEL is no level";
+  }
+  return found;
+}
+
+std::string_view levelText(LogLevel level) { return levelName(level).name; }
+
+bool journalIsThere() { return ::access(kJournalSocket, W_OK) == 0; }
 
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings) {
   return std::make_shared<LinuxSystemLog>(settings);

@@ -18,6 +18,17 @@ struct SystemLogSettings {
 // counts as unset.
 SystemLogSettings systemLogSettings(const char* destination, const char* level);
 
+// The settings that this process runs with, and what of the two variables is not understood.
+struct SystemLogEnvironment {
+  SystemLogSettings settings;
+  std::string fault;  // empty when both are understood or unset
+};
+SystemLogEnvironment systemLogEnvironment();
+// "debug", "info", "default", "error".
+std::string_view levelText(LogLevel level);
+// Whether the machine's journal takes messages.
+bool journalIsThere();
+
 // Whether there is a journal is found out at the first message.
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings);
 

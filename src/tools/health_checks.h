@@ -1,0 +1,29 @@
+// The checks of `tallyctl doctor`.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tools/tool.h"
+
+namespace tally::tools {
+
+enum class Health {
+  Ok,
+  Missing,  // not there; the program does without
+  Wrong,    // there, and not as it should be
+};
+
+struct HealthLine {
+  Health health;
+  std::string subject, text;
+};
+
+// Every check, in the order in which a day's run meets what they look at. Nothing is changed.
+std::vector<HealthLine> examineDevice(const ToolContext& context);
+
+// Those of the files below the root, and those of the services.
+void examineFiles(const ToolContext& context, std::vector<HealthLine>& lines);
+void examineServices(std::vector<HealthLine>& lines);
+
+}  // namespace tally::tools
