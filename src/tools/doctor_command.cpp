@@ -1,6 +1,7 @@
 #include "tools/doctor_command.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 
 #include "tools/health_checks.h"
 #include "tools/table.h"

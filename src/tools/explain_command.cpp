@@ -1,6 +1,8 @@
 #include "tools/explain_command.h"
 
+#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "base/time_text.h"
 #include "platform/platform.h"

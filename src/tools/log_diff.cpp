@@ -1,6 +1,7 @@
 #include "tools/log_diff.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <optional>
 
 #include "tools/log_view.h"

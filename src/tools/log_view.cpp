@@ -1,6 +1,7 @@
 #include "tools/log_view.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 
 #include "base/printable.h"
 #include "base/time_text.h"

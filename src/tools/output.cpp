@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 #include <cstdlib>
+#include <nlohmann/json.hpp>
 
 #include "base/number_text.h"
 #include "base/printable.h"
@@ -69,7 +70,7 @@ std::string bar(const Terminal& terminal, double share, std::size_t width) {
 std::string integerText(std::int64_t value) { return grouped(std::to_string(value)); }
 
 std::string realText(double value) {
-  constexpr double kWhole = 1000, kLargest = 1e15;
+  constexpr double kWhole = 999.95, kLargest = 1e15;  // from here four digits leave no fraction
   if (!std::isfinite(value) || std::fabs(value) >= kLargest) {
     std::string text;
     appendDouble(text, value);

@@ -1,7 +1,9 @@
 #include "tools/prefs_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <cmath>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "base/file.h"
 #include "base/number_text.h"

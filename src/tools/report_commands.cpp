@@ -1,6 +1,8 @@
 #include "tools/report_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "base/file.h"
 #include "base/time_text.h"

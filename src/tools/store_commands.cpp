@@ -1,5 +1,6 @@
 #include "tools/store_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <limits>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -12,14 +13,13 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store_history.h"
 #include "platform/linux/store_writer.h"
+#include "tools/output.h"
 #include "tools/store_csv.h"
 #include "tools/store_dump.h"
 #include "tools/store_import.h"
 
 namespace tally::tools {
 namespace {
-
-using Json = nlohmann::ordered_json;
 
 // What the arguments of a store command were.
 struct StoreArguments {
@@ -32,15 +32,6 @@ struct StoreArguments {
 
 std::string storePath(const ToolContext& context) {
   return metricsStorePath(devicePrefix(context.root));
-}
-
-int complain(const ToolContext& context, std::string_view message, ExitStatus status) {
-  print(context.err, fmt::format("tallyctl: {}\n", message));
-  return status;
-}
-
-void printJson(const ToolContext& context, const Json& document) {
-  print(context.out, document.dump(2, ' ', false, Json::error_handler_t::replace) + "\n");
 }
 
 template <class Work>

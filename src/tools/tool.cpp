@@ -1,5 +1,6 @@
 #include "tools/tool.h"
 
+#include <CLI/CLI.hpp>
 #include <sstream>
 
 namespace tally::tools {

@@ -7,10 +7,12 @@
 #include <string>
 #include <string_view>
 
-#include <CLI/CLI.hpp>
-
 #include "platform/linux/terminal.h"
 #include "platform/platform.h"
+
+namespace CLI {
+class App;
+}
 
 namespace tally::tools {
 

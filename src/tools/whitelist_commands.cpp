@@ -1,7 +1,9 @@
 #include "tools/whitelist_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "base/file.h"
 #include "kv/plist_codec.h"

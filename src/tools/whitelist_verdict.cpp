@@ -1,6 +1,7 @@
 #include "tools/whitelist_verdict.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 
 namespace tally::tools {
 namespace {

@@ -13,6 +13,7 @@
 #include "base/byte_reader.h"
 #include "base/file.h"
 #include "base/number_text.h"
+#include "base/printable.h"
 #include "base/time_text.h"
 #include "base/utf8.h"
 
@@ -40,6 +41,32 @@ TEST(Utf8, RepairAndXmlTable) {
     EXPECT_EQ(isValidUtf8(c.text), repairUtf8(c.text) == c.text) << c.repaired;
     EXPECT_EQ(replaceNonXmlCharacters(repairUtf8(c.text)), c.forXml);
   }
+}
+
+TEST(Printable, ShowsWithoutObeyingAndKnowsItsWidth) {
+  const struct {
+    std::string_view text;
+    const char* shown;
+    std::size_t width;
+  } cases[] = {
+      {"plain \\n", "plain \\n", 8},
+      {"\x1b[31m\n\t\r\x7f", "\\x1b[31m\\n\\t\\x0d\\x7f", 20},
+      {"\xC2\x9B\xC2\xA0", "\\x9b\u00A0", 5},
+      {"a\xE2\x80\xAE"
+       "b\xEF\xBB\xBF",
+       "a\\u202eb\\ufeff", 14},
+      {"\xFF\xC3", "\uFFFD\uFFFD", 2},
+      {"日本 café", "日本 café", 9},
+      {"e\u0301", "e\u0301", 1},
+      {"😀", "😀", 2},
+  };
+  for (const auto& c : cases) {
+    EXPECT_EQ(printable(c.text), c.shown);
+    EXPECT_EQ(displayWidth(c.shown), c.width) << c.shown;
+  }
+  EXPECT_EQ(fitted("日本日本", 5, "~"), "日本~");
+  EXPECT_EQ(fitted("日本日本", 8, "~"), "日本日本");
+  EXPECT_EQ(fitted("abc", 0, "~"), "");
 }
 
 TEST(NumberText, RealsReadBackEqual) {

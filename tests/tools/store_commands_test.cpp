@@ -1,10 +1,5 @@
 // tallyctl store: what import takes and refuses, and that a dump can be imported again.
-#include <gmock/gmock.h>
-
-#include <nlohmann/json.hpp>
-
-#include "linux/temporary_root.h"
-#include "tools/tool.h"
+#include "tools/tool_fixture.h"
 
 namespace tally::tools {
 namespace {
@@ -13,31 +8,12 @@ using testing::HasSubstr;
 
 constexpr const char* kStore = "var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
 
-class StoreCommands : public TemporaryRoot {
+class StoreCommands : public ToolTest {
  protected:
-  struct Outcome {
-    int status = -1;
-    std::string out, err;
-  };
-  Outcome run(std::vector<std::string> arguments, const std::string& device = "device") {
-    arguments.insert(arguments.begin(), {"tallyctl", "--root", at(device)});
-    std::vector<const char*> pointers;
-    for (const std::string& argument : arguments) pointers.push_back(argument.c_str());
-    ToolContext context;
-    const auto open = [&](const char* name) { return std::fopen(at(name).c_str(), "w"); };
-    std::FILE* const out = context.out = open("out");
-    std::FILE* const err = context.err = open("err");
-    Outcome outcome;
-    outcome.status = runTool(context, pointers, [](const std::string&) {
-      const auto fake = fakes::makeFakePlatform();
-      fake.clock->setDay(20000, 3661.5);
-      return fake.services();
-    });
-    std::fclose(out);
-    std::fclose(err);
-    outcome.out = get("out");
-    outcome.err = get("err");
-    return outcome;
+  Platform makePlatform(const std::string&, std::FILE*) override {
+    const auto fake = fakes::makeFakePlatform();
+    fake.clock->setDay(20000, 3661.5);
+    return fake.services();
   }
   Outcome import(std::string_view csv, const std::string& device = "device") {
     put("day.csv", csv);

@@ -113,7 +113,11 @@ Result<std::optional<Database>> openStoreForReading(const std::string& path) {
   const auto presence = examine(path);
   if (!presence) return presence.error();
   if (*presence == Presence::Missing) return std::optional<Database>();
-  auto store = readFrom(Database::open(path, Database::Access::ReadOnly));
+  // A reader that may not write leaves the empty files of a write-ahead log behind. One that may
+  // removes them when it ends as the last; and with nothing in that log, it has nothing to fold.
+  const bool logIsEmpty = fileSize(path + "-wal").value_or(0) == 0;
+  auto store = readFrom(
+      Database::open(path, logIsEmpty ? Database::Access::ReadWrite : Database::Access::ReadOnly));
   if (store) return store;
   // Where no lock file can be made, nobody can be writing either; but what a writer has left in its
   // log could not be read this way, and without that the file may be half old, half new.

@@ -1,0 +1,87 @@
+// Tables, bars and numbers for people.
+#include "tools/output.h"
+
+#include <gtest/gtest.h>
+
+#include <limits>
+
+#include "tools/day_argument.h"
+#include "tools/table.h"
+
+namespace tally::tools {
+namespace {
+
+TEST(Output, NumbersForPeople) {
+  constexpr double kInfinity = std::numeric_limits<double>::infinity();
+  const std::pair<double, const char*> reals[] = {{0, "0"},
+                                                  {-0.0, "0"},
+                                                  {2.5, "2.5"},
+                                                  {29.0234, "29.02"},
+                                                  {0.00012345, "0.0001234"},
+                                                  {999.96, "1,000"},
+                                                  {1000.4, "1,000"},
+                                                  {-48731904, "-48,731,904"},
+                                                  {1e15, "1e+15"},
+                                                  {kInfinity, "inf"},
+                                                  {-kInfinity, "-inf"},
+                                                  {std::nan(""), "nan"}};
+  for (const auto& [value, text] : reals) EXPECT_EQ(realText(value), text) << value;
+  const std::pair<std::int64_t, const char*> integers[] = {
+      {0, "0"},
+      {-999, "-999"},
+      {1000, "1,000"},
+      {-1234567, "-1,234,567"},
+      {std::numeric_limits<std::int64_t>::min(), "-9,223,372,036,854,775,808"}};
+  for (const auto& [value, text] : integers) EXPECT_EQ(integerText(value), text);
+  EXPECT_EQ(byteText(1023), "1,023 bytes");
+  EXPECT_EQ(byteText(1536), "1.5 KiB");
+  EXPECT_EQ(byteText(UINT64_MAX), "16777216.0 TiB");
+}
+
+TEST(Output, BarsAreProportionalAndNeverInvisible) {
+  const Terminal plain{80, false, false, false};
+  const Terminal unicode{80, false, false, true};
+  EXPECT_EQ(bar(plain, 0.5, 10), "#####");
+  EXPECT_EQ(bar(plain, 0.001, 10), "#");
+  EXPECT_EQ(bar(unicode, 0.001, 10), "▏");
+  EXPECT_EQ(bar(unicode, 0.25, 10), "██▌");
+  EXPECT_EQ(bar(unicode, 0, 10), "");
+  EXPECT_EQ(bar(unicode, std::nan(""), 10), "");
+  EXPECT_EQ(bar(unicode, 7, 2), "██");
+}
+
+TEST(Output, TablesAlignByDisplayWidthAndGiveWayOnTerminals) {
+  Table table({{"key", Align::Left, true}, {"n", Align::Right}, {"x"}});
+  table.add({"日本", "1"});
+  table.add({"a very long key indeed", "12", Cell("end", Ink::Good)});
+  table.add({"e\xcc\x81\x1b", "", "z"});
+  EXPECT_EQ(table.render({40, false, false, true}),
+            "  key                      n  x\n"
+            "  日本                     1\n"
+            "  a very long key indeed  12  end\n"
+            "  e\xcc\x81\\x1b                     z\n");
+  EXPECT_EQ(table.render({26, true, true, false}, 0),
+            "\x1b[2mkey\x1b[0m                 \x1b[2mn\x1b[0m  \x1b[2mx\x1b[0m\n"
+            "日本                1\n"
+            "a very long key~   12  \x1b[32mend\x1b[0m\n"
+            "e\xcc\x81\\x1b                  z\n");
+}
+
+TEST(Output, DaysAsArguments) {
+  const std::pair<const char*, std::optional<std::int32_t>> cases[] = {{"today", 20000},
+                                                                       {"yesterday", 19999},
+                                                                       {"20513", 20513},
+                                                                       {"-1", -1},
+                                                                       {"2026-03-01", 20513},
+                                                                       {"2024-02-29", 19782},
+                                                                       {"2026-02-29", std::nullopt},
+                                                                       {"2026-3-1", std::nullopt},
+                                                                       {"0000-01-01", std::nullopt},
+                                                                       {"2147483648", std::nullopt},
+                                                                       {"", std::nullopt},
+                                                                       {"12x", std::nullopt}};
+  for (const auto& [text, day] : cases) EXPECT_EQ(parseDay(text, 20000), day) << text;
+}
+
+}  // namespace
+}  // namespace tally::tools

@@ -1,0 +1,172 @@
+// tallyctl prefs and doctor: typed values in and out, and what is found wrong.
+#include "tools/tool_fixture.h"
+
+namespace tally::tools {
+namespace {
+
+using testing::HasSubstr;
+using testing::Not;
+
+constexpr const char* kFolder = "device/var/mobile/Library/Preferences/";
+
+using PrefsCommands = ToolTest;
+
+TEST_F(PrefsCommands, ValuesKeepTheirTypes) {
+  put("list.plist",
+      "<plist version=\"1.0\"><array><dict><key>n</key><data>AP8=</data></dict></array></plist>");
+  const struct {
+    std::vector<std::string> value;
+    const char* type;
+    nlohmann::json read;
+    const char* stored;
+  } cases[] = {
+      {{"true"}, "boolean", true, "<true/>"},
+      {{"no"}, "boolean", false, "<false/>"},
+      {{"-12"}, "integer", -12, "<integer>-12</integer>"},
+      {{"9223372036854775808"}, "real", 9223372036854775808.0, "<real>"},
+      {{"2.5"}, "real", 2.5, "<real>2.5"},
+      {{"12 apples"}, "string", "12 apples", "<string>12 apples</string>"},
+      {{""}, "string", "", "<string></string>"},
+      {{"12", "--type", "string"}, "string", "12", "<string>12</string>"},
+      {{"12", "--type", "real"}, "real", 12.0, "<real>12"},
+      {{"--file", at("list.plist")}, "array", {{{"n", "AP8="}}}, "<data>"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.stored);
+    std::vector<std::string> arguments{"prefs", "set", "k"};
+    arguments.insert(arguments.end(), c.value.begin(), c.value.end());
+    EXPECT_EQ(run(arguments).status, kSuccess);
+    const auto json = run({"prefs", "get", "k", "--json"}).json();
+    EXPECT_EQ(json["type"], c.type);
+    EXPECT_EQ(json["value"], c.read);
+    EXPECT_THAT(get(kFolder + std::string("vellum.tallyd.tallyrun.plist")), HasSubstr(c.stored));
+  }
+}
+
+TEST_F(PrefsCommands, MissingKeysBadValuesAndNames) {
+  put("broken.plist", "<plist>");
+  EXPECT_EQ(run({"prefs", "set", "a", "1", "--domain", "x.y"}).status, kSuccess);
+  const struct {
+    std::vector<std::string> arguments;
+    int status;
+  } cases[] = {
+      {{"get", "b", "--domain", "x.y"}, kWrong},
+      {{"get", "a"}, kWrong},
+      {{"get", "a", "--domain", "x.y"}, kSuccess},
+      {{"delete", "b", "--domain", "x.y"}, kWrong},
+      {{"set", "a", "x", "--type", "integer"}, kBadUsage},
+      {{"set", "a", "1.5", "--type", "integer"}, kBadUsage},
+      {{"set", "a", "1", "--type", "boolean"}, kBadUsage},
+      {{"set", "a", "1", "--type", "date"}, kBadUsage},
+      {{"set", "a"}, kBadUsage},
+      {{"set", "a", "1", "--file", at("broken.plist")}, kBadUsage},
+      {{"set", "a", "--file", at("broken.plist")}, kBadUsage},
+      {{"set", "a", "1", "--domain", "../x"}, kBadUsage},
+      {{"list", "--domain", "x/y"}, kBadUsage},
+      {{"list", "--domain", "none"}, kWrong},
+      {{"list"}, kSuccess},
+      {{"delete", "a", "--domain", "x.y"}, kSuccess},
+      {{"get", "a", "--domain", "x.y"}, kWrong},
+  };
+  for (const auto& c : cases) {
+    std::vector<std::string> arguments{"prefs"};
+    arguments.insert(arguments.end(), c.arguments.begin(), c.arguments.end());
+    EXPECT_EQ(run(arguments).status, c.status) << testing::PrintToString(c.arguments);
+  }
+  EXPECT_EQ(names(kFolder), std::vector<std::string>{"x.y.plist"});
+}
+
+class DoctorCommand : public ToolTest {
+ protected:
+  // "health subject: text" for each line about the subject.
+  std::vector<std::string> linesAbout(const std::string& subject) {
+    const Outcome outcome = run({"doctor", "--json"});
+    std::vector<std::string> lines;
+    bool wrong = false;
+    const auto document = outcome.json();
+    for (const auto& line : document) {
+      wrong = wrong || line["health"] == "wrong";
+      if (line["subject"] != subject) continue;
+      lines.push_back(line["health"].get<std::string>() + ": " + line["text"].get<std::string>());
+    }
+    EXPECT_EQ(outcome.status, wrong ? kWrong : kSuccess);
+    return lines;
+  }
+};
+
+TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
+  const std::string domain = kFolder + std::string("vellum.tallyd.tallyrun.plist");
+  const auto setLastDay = [&](const char* day) {
+    putPlist(domain,
+             "<dict>" + integer("LastCrashLogSerializationDateInDaysSince1970", day) + "</dict>");
+  };
+  const struct {
+    const char* subject;
+    std::function<void()> prepare;
+    std::vector<const char*> parts;  // of each line about it
+  } cases[] = {
+      {"device root", [] {}, {"wrong: "}},
+      {"device root", [&] { std::filesystem::create_directories(at("device")); }, {"ok: "}},
+      {"whitelist", [] {}, {"missing: none"}},
+      {"whitelist", [&] { putWhitelist("<key>"); }, {"wrong: "}},
+      {"whitelist", [&] { putWhitelist("<key>G</key><true/>"); }, {"wrong: 1 fault"}},
+      {"whitelist", [&] { putWhitelist(dict("G", dict("ScalarKeys", dict("a", "")))); }, {"ok: 0"}},
+      {"whitelist",
+       [&] {
+         putPlist(kFolder + std::string("vellum.da.plist"), "<dict><key>G</key><false/></dict>");
+       },
+       {"ok: 0 faults, 1 surprise", "missing: the group G is disabled by tasking"}},
+      {"metrics store", [] {}, {"missing: none yet"}},
+      {"metrics store",
+       [&] { putRows("scalar,a,20000,,1\ndistribution,d,20000,1,1\n"); },
+       {"ok: 1 scalar, 1 distribution, up to day 20000"}},
+      {"metrics store", [&] { putRows("scalar,a,999999,,1\n"); }, {"ok: ", "wrong: it has days"}},
+      {"metrics store",
+       [&] {
+         put("device/var/mobile/Library/Tallybook/TBDataStore.sqlitedb", "no database at all");
+       },
+       {"wrong: "}},
+      {"preferences", [] {}, {"ok: 1 domain"}},
+      {"preferences",
+       [&] { put(domain, "damaged"); },
+       {"wrong: preferences vellum.tallyd.tallyrun"}},
+      {"preferences",
+       [&] {
+         putPlist(domain, "<dict/>");
+         put(domain + ".damaged-1", "x");
+       },
+       {"ok: 2 domains", "wrong: 1 damaged file set aside"}},
+      {"last day", [] {}, {"missing: "}},
+      {"last day", [&] { setLastDay("20000"); }, {"missing: day 20000 (2024-10-04) was processed"}},
+      {"last day", [&] { setLastDay("999999"); }, {"wrong: "}},
+      {"device description", [] {}, {"missing: none"}},
+      {"device description",
+       [&] {
+         putPlist("device/device/device.plist",
+                  "<dict><key>RegionCode</key><true/><key>Kernelvalues</key><dict/>"
+                  "<key>Notes</key><string>x</string></dict>");
+       },
+       {"ok: 3 entries", "wrong: RegionCode is of the wrong type",
+        "wrong: Kernelvalues is not known; KernelValues may be meant"}},
+      {"device description", [&] { put("device/device/device.plist", "x"); }, {"wrong: "}},
+      {"kernel values", [] {}, {"missing: "}},
+      {"submitted logs", [] {}, {"missing: none yet"}},
+      {"clock", [] {}, {"ok: "}},
+      {"crash support",
+       [&] {
+         putPlist("device/device/device.plist",
+                  "<dict>" + dict("CrashSupport", "<key>Absent</key><true/>") + "</dict>");
+       },
+       {"missing: the library is not there"}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(std::string(c.subject) + " " + testing::PrintToString(c.parts));
+    c.prepare();
+    std::vector<testing::Matcher<std::string>> wanted;
+    for (const char* part : c.parts) wanted.push_back(testing::StartsWith(part));
+    EXPECT_THAT(linesAbout(c.subject), testing::ElementsAreArray(wanted));
+  }
+}
+
+}  // namespace
+}  // namespace tally::tools
