@@ -1,12 +1,13 @@
-// tallyrun: the daily job. The one place where the Linux platform is built and installed.
+// tallyrun: the daily job. The one place where the platform is built and installed.
 #include <span>
 
 #include "driver/daily_job.h"
+#include "host_platform.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/platform.h"
 
 int main(int count, char** arguments) {
-  const tally::PlatformScope scope(tally::makeLinuxPlatform(tally::deviceRootFromEnvironment()));
+  const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
   tally::DailyJob job({});
   return job.run({arguments, static_cast<std::size_t>(count)});
 }

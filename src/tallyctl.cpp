@@ -1,6 +1,7 @@
 // tallyctl: the operator's tool.
 #include <span>
 
+#include "host_platform.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/tool.h"
 
@@ -11,5 +12,5 @@ int main(int count, char** arguments) {
   context.output = terminalOf(1);
   context.errors = terminalOf(2);
   return tools::runTool(std::move(context), {arguments, static_cast<std::size_t>(count)},
-                        makeLinuxPlatform);
+                        makeHostPlatform);
 }

@@ -5,6 +5,8 @@
 #include "platform/linux/applications.h"
 #include "platform/linux/clock.h"
 #include "platform/linux/crash_reporting.h"
+#include "platform/linux/described_purgeable_space.h"
+#include "platform/linux/described_stackshot.h"
 #include "platform/linux/device_information.h"
 #include "platform/linux/event_loop.h"
 #include "platform/linux/files.h"
@@ -70,6 +72,8 @@ Platform makeLinuxPlatform(const std::string& root) {
                                                       variable("LC_MESSAGES"), variable("LANG")},
                                     description);
   services.kernelValues = std::make_shared<LinuxKernelValues>(description);
+  services.stackshot = std::make_shared<DescribedStackshot>(prefix + "/device", description);
+  services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   return services;
 }
 

@@ -1,0 +1,36 @@
+// The files that a device description names, below the folder it lies in.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "kv/value.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// No described buffer is larger.
+constexpr std::size_t kDescribedBytesLimit = 64u << 20;
+
+class DescribedFiles {
+ public:
+  DescribedFiles(std::string folder, std::shared_ptr<SystemLog> log)
+      : folder_(std::move(folder)), log_(std::move(log)) {}
+
+  // What a description gives as bytes: a data value itself, or the content of the file that a
+  // string names. Empty, with one error line, when that is missing, leads out of the folder, or is
+  // too large.
+  std::optional<std::vector<std::byte>> bytes(const KvObject& described);
+  // One error line about the description.
+  void report(std::string_view fault) const;
+
+ private:
+  std::string folder_;
+  std::shared_ptr<SystemLog> log_;
+};
+
+}  // namespace tally

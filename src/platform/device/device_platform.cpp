@@ -1,0 +1,14 @@
+#include "platform/device/device_platform.h"
+
+#include "platform/device/registry_description.h"
+#include "platform/device/source_registry.h"
+
+namespace tally {
+
+void addDeviceRegistry(Platform& services, const std::string& prefix) {
+  std::vector<std::unique_ptr<RegistrySource>> sources;
+  sources.push_back(std::make_unique<RegistryDescription>(prefix + "/device", services.log));
+  services.deviceRegistry = std::make_shared<SourceRegistry>(std::move(sources));
+}
+
+}  // namespace tally
