@@ -1,7 +1,7 @@
 // KvDictionary: a vector of entries in insertion order, with a hash index once it is large.
 #include <bit>
 
-#include "kv/hash.h"
+#include "base/hash.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -38,6 +38,20 @@ std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const n
     if (entry.key->hash_ == hash && entry.key->view() == key) return index_[slot] - 1;
   }
   return kNotFound;
+}
+
+std::size_t KvDictionary::find(const KvString& key) const noexcept {
+  if (!index_.empty()) return find(key.view(), key.hash_);
+  for (std::size_t i = 0; i < entries_.size(); ++i) {
+    const KvString* const other = entries_[i].key.get();
+    if (other == &key || (other->hash_ == key.hash_ && other->view() == key.view())) return i;
+  }
+  return kNotFound;
+}
+
+KvObject* KvDictionary::get(const KvString& key) const noexcept {
+  const std::size_t found = find(key);
+  return found == kNotFound ? nullptr : entries_[found].value.get();
 }
 
 KvObject* KvDictionary::get(std::string_view key) const noexcept {
@@ -87,7 +101,7 @@ void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
 }
 
 void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
-  const std::size_t found = find(key->view(), key->hash_);
+  const std::size_t found = find(*key);
   if (!value) {
     if (found != kNotFound) remove(key->view());
   } else if (found != kNotFound) {
@@ -110,9 +124,9 @@ void KvDictionary::merge(const KvDictionary& other) {
   for (const Entry& entry : other.entries_) set(entry.key, entry.value);
 }
 
-KvRef<KvDictionary> KvDictionary::copy() const {
-  auto dictionary = create(0);
-  dictionary->entries_ = entries_;
+KvRef<KvDictionary> KvDictionary::copy(std::size_t more) const {
+  auto dictionary = create(entries_.size() + more);
+  dictionary->entries_.assign(entries_.begin(), entries_.end());
   dictionary->index_ = index_;
   return dictionary;
 }

@@ -8,12 +8,11 @@
 #include <new>
 
 #include "base/utf8.h"
-#include "kv/hash.h"
+#include "base/hash.h"
 
 namespace tally {
 
-void KvObject::release() const noexcept {
-  if (references_.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
+void KvObject::destroy() const noexcept {
   auto* self = const_cast<KvObject*>(this);
   switch (type_) {
     case KvType::String:
@@ -30,7 +29,8 @@ void KvObject::release() const noexcept {
       delete static_cast<KvDate*>(self);
       return;
     case KvType::Data:
-      delete static_cast<KvData*>(self);
+      static_cast<KvData*>(self)->~KvData();
+      ::operator delete(self);
       return;
     case KvType::Array:
       delete static_cast<KvArray*>(self);
@@ -126,7 +126,10 @@ KvRef<KvDate> KvDate::create(double secondsSince1970) {
 }
 
 KvRef<KvData> KvData::create(std::span<const std::byte> bytes) {
-  return KvRef<KvData>::adopt(new KvData(bytes));
+  void* memory = ::operator new(sizeof(KvData) + bytes.size());
+  auto* data = new (memory) KvData(bytes.size());
+  if (!bytes.empty()) std::memcpy(static_cast<void*>(data + 1), bytes.data(), bytes.size());
+  return KvRef<KvData>::adopt(data);
 }
 
 KvRef<KvArray> KvArray::create(std::size_t capacity) {
@@ -147,6 +150,20 @@ void KvArray::append(KvRef<KvObject> item) {
 
 void KvArray::removeAt(std::size_t index) {
   if (index < items_.size()) items_.erase(items_.begin() + static_cast<std::ptrdiff_t>(index));
+}
+
+void KvArray::replaceAt(std::size_t index, KvRef<KvObject> item) {
+  if (index < items_.size() && item) items_[index] = std::move(item);
+}
+
+void KvArray::removeAt(std::span<const std::size_t> indexes) {
+  std::size_t index = 0;
+  std::erase_if(items_, [&](const auto&) {
+    const bool removed = !indexes.empty() && indexes.front() == index;
+    ++index;
+    if (removed) indexes = indexes.subspan(1);
+    return removed;
+  });
 }
 
 KvRef<KvArray> KvArray::copy() const {

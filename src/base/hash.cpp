@@ -1,4 +1,4 @@
-#include "kv/hash.h"
+#include "base/hash.h"
 
 #include <cstring>
 #include <random>

@@ -1,4 +1,4 @@
-// The hash of dictionary keys.
+// The hash of tables whose keys came from outside.
 #pragma once
 
 #include <cstdint>
