@@ -196,7 +196,8 @@ class TALLY_API KvArray final : public KvObject {
   // Puts an item in the place of another; an index past the end or a null item changes nothing.
   void replaceAt(std::size_t index, KvRef<KvObject> item);
   void removeAt(std::size_t index);
-  // Removes many at once, in one pass. REQUIRES: the indexes ascend; those past the end are ignored.
+  // Removes many at once, in one pass. REQUIRES: the indexes ascend; those past the end are
+  // ignored.
   void removeAt(std::span<const std::size_t> indexes);
   auto begin() const noexcept { return items_.begin(); }
   auto end() const noexcept { return items_.end(); }

@@ -7,8 +7,8 @@
 #include <limits>
 #include <new>
 
-#include "base/utf8.h"
 #include "base/hash.h"
+#include "base/utf8.h"
 
 namespace tally {
 
