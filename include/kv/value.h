@@ -17,7 +17,9 @@
 #include <ext/atomicity.h>
 #endif
 
+#include "kv/arena.h"
 #include "kv/export.h"
+#include "kv/items.h"
 #include "kv/ref.h"
 
 namespace tally {
@@ -67,6 +69,8 @@ class TALLY_API KvObject {
   void destroy() const noexcept;
   mutable std::atomic<std::uint32_t> references_{1};
   const KvType type_;
+  bool inArena_ = false;
+  friend class KvMaker;
 };
 
 // The value as a T, or null when it is null or of another type.
@@ -91,6 +95,7 @@ class TALLY_API KvString final : public KvObject {
  private:
   friend class KvObject;
   friend class KvDictionary;
+  friend class KvMaker;
   KvString() noexcept : KvObject(kType) {}
   std::uint32_t hash_ = 0;
   std::size_t size_ = 0;
@@ -164,13 +169,14 @@ class TALLY_API KvDate final : public KvObject {
 class TALLY_API KvData final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Data;
-  static KvRef<KvData> create(std::span<const std::byte> bytes);
+  static KvRef<KvData> create(std::span<const std::byte> bytes, KvArena* arena = nullptr);
   std::span<const std::byte> bytes() const noexcept {
     return {reinterpret_cast<const std::byte*>(this + 1), size_};  // they follow the object
   }
 
  private:
   friend class KvObject;
+  friend class KvMaker;
   explicit KvData(std::size_t size) noexcept : KvObject(kType), size_(size) {}
   const std::size_t size_;
 };
@@ -206,8 +212,9 @@ class TALLY_API KvArray final : public KvObject {
 
  private:
   friend class KvObject;
-  KvArray() noexcept : KvObject(kType) {}
-  std::vector<KvRef<KvObject>> items_;
+  friend class KvMaker;
+  explicit KvArray(std::uint32_t capacity) noexcept : KvObject(kType), items_(this + 1, capacity) {}
+  KvItems<KvRef<KvObject>> items_;
 };
 
 // String keys to values, enumerated in the order of first insertion. A small dictionary is a flat
@@ -220,7 +227,7 @@ class TALLY_API KvDictionary final : public KvObject {
     KvRef<KvObject> value;
   };
 
-  static KvRef<KvDictionary> create(std::size_t capacity = 0);
+  static KvRef<KvDictionary> create(std::size_t capacity = 0, KvArena* arena = nullptr);
   static KvRef<KvDictionary> create(
       std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries);
 
@@ -255,24 +262,29 @@ class TALLY_API KvDictionary final : public KvObject {
   // Removes every entry of which the predicate is true, in one pass.
   template <class Predicate>
   void removeIf(Predicate predicate) {
-    if (std::erase_if(entries_, predicate) != 0) rebuildIndex();
+    if (entries_.removeIf(predicate) != 0) rebuildIndex();
   }
   // Sets every entry of other in this dictionary.
   void merge(const KvDictionary& other);
   auto begin() const noexcept { return entries_.begin(); }
   auto end() const noexcept { return entries_.end(); }
   // A new dictionary of the same keys and values, with room for some more.
-  KvRef<KvDictionary> copy(std::size_t more = 0) const;
+  KvRef<KvDictionary> copy(std::size_t more = 0, KvArena* arena = nullptr) const;
 
  private:
   friend class KvObject;
-  KvDictionary() noexcept : KvObject(kType) {}
+  friend class KvMaker;
+  explicit KvDictionary(std::uint32_t capacity) noexcept
+      : KvObject(kType), entries_(this + 1, capacity) {}
   std::size_t find(std::string_view key, std::uint32_t hash) const noexcept;
+  std::size_t find(std::string_view key) const noexcept;
   std::size_t find(const KvString& key) const noexcept;
+  void addToIndex(std::size_t number);
   void append(KvRef<KvString> key, KvRef<KvObject> value);
   void rebuildIndex();
-  std::vector<Entry> entries_;
-  std::vector<std::uint32_t> index_;  // open addressing: entry number + 1, 0 = free
+  KvItems<Entry> entries_;
+  // Open addressing: entry number + 1, 0 = free. Null while the dictionary is small.
+  std::unique_ptr<std::vector<std::uint32_t>> index_;
 };
 
 // Same type and same content, at any depth to 512. Numbers compare by value, whatever their width.

@@ -2,6 +2,7 @@
 #include <bit>
 
 #include "base/hash.h"
+#include "kv/maker.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -12,8 +13,8 @@ constexpr std::size_t kNotFound = static_cast<std::size_t>(-1);
 
 }  // namespace
 
-KvRef<KvDictionary> KvDictionary::create(std::size_t capacity) {
-  auto dictionary = KvRef<KvDictionary>::adopt(new KvDictionary());
+KvRef<KvDictionary> KvDictionary::create(std::size_t capacity, KvArena* arena) {
+  auto dictionary = KvMaker::makeContainer<KvDictionary, Entry>(arena, capacity);
   dictionary->entries_.reserve(capacity);
   return dictionary;
 }
@@ -26,22 +27,27 @@ KvRef<KvDictionary> KvDictionary::create(
 }
 
 std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const noexcept {
-  if (index_.empty()) {
+  if (!index_) {
     for (std::size_t i = 0; i < entries_.size(); ++i) {
       if (entries_[i].key->view() == key) return i;
     }
     return kNotFound;
   }
-  const std::size_t mask = index_.size() - 1;
-  for (std::size_t slot = hash & mask; index_[slot] != 0; slot = (slot + 1) & mask) {
-    const Entry& entry = entries_[index_[slot] - 1];
-    if (entry.key->hash_ == hash && entry.key->view() == key) return index_[slot] - 1;
+  const auto& index = *index_;
+  const std::size_t mask = index.size() - 1;
+  for (std::size_t slot = hash & mask; index[slot] != 0; slot = (slot + 1) & mask) {
+    const Entry& entry = entries_[index[slot] - 1];
+    if (entry.key->hash_ == hash && entry.key->view() == key) return index[slot] - 1;
   }
   return kNotFound;
 }
 
+std::size_t KvDictionary::find(std::string_view key) const noexcept {
+  return find(key, index_ ? hashBytes(key) : 0);
+}
+
 std::size_t KvDictionary::find(const KvString& key) const noexcept {
-  if (!index_.empty()) return find(key.view(), key.hash_);
+  if (index_) return find(key.view(), key.hash_);
   for (std::size_t i = 0; i < entries_.size(); ++i) {
     const KvString* const other = entries_[i].key.get();
     if (other == &key || (other->hash_ == key.hash_ && other->view() == key.view())) return i;
@@ -55,35 +61,36 @@ KvObject* KvDictionary::get(const KvString& key) const noexcept {
 }
 
 KvObject* KvDictionary::get(std::string_view key) const noexcept {
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key);
   return found == kNotFound ? nullptr : entries_[found].value.get();
 }
 
 void KvDictionary::rebuildIndex() {
   if (entries_.size() <= kFlatEntries) {
-    index_.clear();
+    index_.reset();
     return;
   }
-  index_.assign(std::bit_ceil(entries_.size() * 2), 0);
-  const std::size_t mask = index_.size() - 1;
-  for (std::size_t i = 0; i < entries_.size(); ++i) {
-    std::size_t slot = entries_[i].key->hash_ & mask;
-    while (index_[slot] != 0) slot = (slot + 1) & mask;
-    index_[slot] = static_cast<std::uint32_t>(i + 1);
-  }
+  if (!index_) index_ = std::make_unique<std::vector<std::uint32_t>>();
+  index_->assign(std::bit_ceil(entries_.size() * 2), 0);
+  for (std::size_t i = 0; i < entries_.size(); ++i) addToIndex(i);
+}
+
+void KvDictionary::addToIndex(std::size_t number) {
+  auto& index = *index_;
+  const std::size_t mask = index.size() - 1;
+  std::size_t slot = entries_[number].key->hash_ & mask;
+  while (index[slot] != 0) slot = (slot + 1) & mask;
+  index[slot] = static_cast<std::uint32_t>(number + 1);
 }
 
 void KvDictionary::append(KvRef<KvString> key, KvRef<KvObject> value) {
-  const std::uint32_t hash = key->hash_;
   entries_.push_back({std::move(key), std::move(value)});
   // At most three quarters full, so that a search stays short.
-  if (entries_.size() > kFlatEntries && entries_.size() * 4 > index_.size() * 3) {
+  const std::size_t indexed = index_ ? index_->size() : 0;
+  if (entries_.size() > kFlatEntries && entries_.size() * 4 > indexed * 3) {
     rebuildIndex();
-  } else if (!index_.empty()) {
-    const std::size_t mask = index_.size() - 1;
-    std::size_t slot = hash & mask;
-    while (index_[slot] != 0) slot = (slot + 1) & mask;
-    index_[slot] = static_cast<std::uint32_t>(entries_.size());
+  } else if (index_) {
+    addToIndex(entries_.size() - 1);
   }
 }
 
@@ -92,7 +99,7 @@ void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
     remove(key);
     return;
   }
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key);
   if (found != kNotFound) {
     entries_[found].value = std::move(value);
   } else {
@@ -112,9 +119,9 @@ void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
 }
 
 bool KvDictionary::remove(std::string_view key) {
-  const std::size_t found = find(key, index_.empty() ? 0 : hashBytes(key));
+  const std::size_t found = find(key);
   if (found == kNotFound) return false;
-  entries_.erase(entries_.begin() + static_cast<std::ptrdiff_t>(found));
+  entries_.removeAt(found);
   rebuildIndex();
   return true;
 }
@@ -124,10 +131,10 @@ void KvDictionary::merge(const KvDictionary& other) {
   for (const Entry& entry : other.entries_) set(entry.key, entry.value);
 }
 
-KvRef<KvDictionary> KvDictionary::copy(std::size_t more) const {
-  auto dictionary = create(entries_.size() + more);
-  dictionary->entries_.assign(entries_.begin(), entries_.end());
-  dictionary->index_ = index_;
+KvRef<KvDictionary> KvDictionary::copy(std::size_t more, KvArena* arena) const {
+  auto dictionary = create(entries_.size() + more, arena);
+  dictionary->entries_.appendWithinRoom(entries_);
+  if (index_) dictionary->index_ = std::make_unique<std::vector<std::uint32_t>>(*index_);
   return dictionary;
 }
 
