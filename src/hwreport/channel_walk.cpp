@@ -5,6 +5,7 @@
 
 #include "hwreport/keys.h"
 #include "hwreport/pairing.h"
+#include "hwreport/type_word.h"
 
 namespace tally {
 namespace {
@@ -98,12 +99,34 @@ int walkLevel(Mode& mode, KvDictionary* collection, const KvDictionary* other, i
   return result;
 }
 
+// Channels lie all over the memory of a large collection, and a walk would mostly wait for them. So
+// it asks early: for the dictionaries first, then, when they have come, for their values, and then
+// for the type word, beside which the id lies.
+constexpr std::size_t kDictionariesAhead = 32;
+constexpr std::size_t kValuesAhead = 24;
+constexpr std::size_t kLegendAhead = 20;
+constexpr std::size_t kCallbackAhead = 16;
+constexpr std::size_t kCacheLine = 64;
+
+void fetchAhead(const KvArray& channels, std::size_t i) {
+  if (const KvObject* const later = channels.get(i + kDictionariesAhead)) {
+    const auto* const start = reinterpret_cast<const char*>(later);
+    for (std::size_t line = 0; line < 3; ++line) __builtin_prefetch(start + line * kCacheLine);
+  }
+  if (const auto* const next = channels.getAs<KvDictionary>(i + kValuesAhead)) {
+    for (const auto& entry : *next) __builtin_prefetch(entry.value.get());
+  }
+  __builtin_prefetch(
+      legendElement(channels.getAs<KvDictionary>(i + kLegendAhead), kLegendTypeWord));
+}
+
 // The items of an array one after the other, as long as it is now. step(channel, index) gives a
 // result.
 template <class Step>
 int eachChannel(const KvArray& channels, Step step) {
   int result = HwIterContinue;
   for (std::size_t i = 0; i < channels.size(); ++i) {
+    fetchAhead(channels, i);
     auto* const channel = channels.getAs<KvDictionary>(i);
     const int one = channel != nullptr ? step(channel, i) : HwIterFailed;
     if (walkFailed(one)) return one;
@@ -146,11 +169,16 @@ class Prune final : public Mode {
 
 class Transform final : public Mode {
  public:
-  explicit Transform(const TransformCallback& callback)
-      : Mode({.makesOutput = true}), callback_(callback) {}
+  Transform(KvArena& arena, const TransformCallback& callback,
+            const std::function<void(const KvDictionary&)>& ahead)
+      : Mode({.makesOutput = true}), arena_(arena), callback_(callback), ahead_(ahead) {}
   int visit(KvArray& channels, const KvArray*, KvArray* output) override {
-    return eachChannel(channels, [&](KvDictionary* channel, std::size_t) {
-      auto copy = channel->copy(1);  // room for the elements
+    return eachChannel(channels, [&](KvDictionary* channel, std::size_t i) {
+      if (ahead_) {
+        const auto* const next = channels.getAs<KvDictionary>(i + kCallbackAhead);
+        if (next != nullptr) ahead_(*next);
+      }
+      auto copy = channel->copy(1, &arena_);  // room for the elements
       const int one = callback_(channel, copy.get());
       if (one == HwIterContinue) output->append(std::move(copy));
       return one;
@@ -158,19 +186,21 @@ class Transform final : public Mode {
   }
 
  private:
+  KvArena& arena_;
   const TransformCallback& callback_;
+  const std::function<void(const KvDictionary&)>& ahead_;
 };
 
 class Delta final : public Mode {
  public:
-  explicit Delta(const DeltaCallback& callback)
-      : Mode({.makesOutput = true, .needsOther = true}), callback_(callback) {}
+  Delta(KvArena& arena, const DeltaCallback& callback)
+      : Mode({.makesOutput = true, .needsOther = true}), arena_(arena), callback_(callback) {}
   int visit(KvArray& channels, const KvArray* others, KvArray* output) override {
     EarlierChannels earlier(*others);
     return eachChannel(channels, [&](KvDictionary* channel, std::size_t i) -> int {
       const auto counterpart = earlier.counterpartOf(*channel, i);
       if (!counterpart) return HwIterFailed;
-      auto copy = channel->copy();
+      auto copy = channel->copy(0, &arena_);
       const int one =
           *counterpart != nullptr ? callback_(*counterpart, channel, copy.get()) : HwIterContinue;
       if (one == HwIterContinue) output->append(std::move(copy));
@@ -179,6 +209,7 @@ class Delta final : public Mode {
   }
 
  private:
+  KvArena& arena_;
   const DeltaCallback& callback_;
 };
 
@@ -194,15 +225,16 @@ int pruneChannels(KvDictionary* collection, const HwReportCallback& callback) {
   return walkLevel(mode, collection, nullptr, 0, nullptr);
 }
 
-int transformChannels(KvDictionary* collection, const TransformCallback& callback,
-                      KvRef<KvDictionary>* output) {
-  Transform mode(callback);
+int transformChannels(KvDictionary* collection, KvArena& arena, const TransformCallback& callback,
+                      KvRef<KvDictionary>* output,
+                      const std::function<void(const KvDictionary&)>& ahead) {
+  Transform mode(arena, callback, ahead);
   return walkLevel(mode, collection, nullptr, 0, output);
 }
 
-int deltaChannels(KvDictionary* later, KvDictionary* earlier, const DeltaCallback& callback,
-                  KvRef<KvDictionary>* output) {
-  Delta mode(callback);
+int deltaChannels(KvDictionary* later, KvDictionary* earlier, KvArena& arena,
+                  const DeltaCallback& callback, KvRef<KvDictionary>* output) {
+  Delta mode(arena, callback);
   return walkLevel(mode, later, earlier, 0, output);
 }
 

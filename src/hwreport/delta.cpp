@@ -25,8 +25,8 @@ class Elements {
     std::memcpy(bytes_.data() + index * element::kSize + element::slot(number), &value,
                 sizeof(value));
   }
-  void storeIn(KvDictionary& channel) const {
-    channel.set(keys().rawElements, KvData::create(bytes_));
+  void storeIn(KvDictionary& channel, KvArena* arena) const {
+    channel.set(keys().rawElements, KvData::create(bytes_, arena));
   }
 
  private:
@@ -40,6 +40,7 @@ struct Pair {
   const KvDictionary* earlier;
   const KvDictionary* later;
   KvDictionary* result;  // its elements are taken to be the earlier's
+  KvArena* arena;        // for the result's; may be null
 };
 
 bool subtractSimple(const Pair& pair, OtherSlots others) {
@@ -56,7 +57,7 @@ bool subtractSimple(const Pair& pair, OtherSlots others) {
     }
   }
   elements.setSlot(0, simple_slot::kValue, laterBits - earlierBits);
-  elements.storeIn(*pair.result);
+  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
@@ -83,7 +84,7 @@ bool subtractStates(const Pair& pair) {
       elements.setSlot(i, slot, after - before);
     }
   }
-  elements.storeIn(*pair.result);
+  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
@@ -103,7 +104,7 @@ bool subtractBuckets(const Pair& pair) {
       elements.setSlot(i, bucket_slot::kSum, sum - earlier.slot(i, bucket_slot::kSum));
     }
   }
-  elements.storeIn(*pair.result);
+  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
@@ -118,7 +119,7 @@ bool subtractArrays(const Pair& pair) {
       if (isValid(before)) elements.setSlot(i, slot, isValid(after) ? after - before : before);
     }
   }
-  elements.storeIn(*pair.result);
+  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
@@ -158,11 +159,12 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
     return nullptr;
   }
   bool explained = false;
+  KvArena arena;
   KvRef<KvDictionary> delta;
   const int result = deltaChannels(
-      later, earlier,
+      later, earlier, arena,
       [&](KvDictionary* before, KvDictionary* after, KvDictionary* made) {
-        explained = subtract({before, after, made}, OtherSlots::Invalidate, error) != 0;
+        explained = subtract({before, after, made, &arena}, OtherSlots::Invalidate, error) != 0;
         return explained ? 1 : HwIterContinue;  // a code may be even; any failure ends the walk
       },
       &delta);
@@ -174,7 +176,8 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
 KvRef<KvDictionary> HwReportSampleCreateDelta(KvDictionary* earlier, KvDictionary* later,
                                               KvRef<HwReportError>* error) {
   auto result = earlier != nullptr ? earlier->copy() : nullptr;
-  if (subtract({earlier, later, result.get()}, OtherSlots::KeepEarlier, error) != 0) return nullptr;
+  if (subtract({earlier, later, result.get(), nullptr}, OtherSlots::KeepEarlier, error) != 0)
+    return nullptr;
   return result;
 }
 

@@ -2,9 +2,11 @@
 #pragma once
 
 #include <cstddef>
-#include <optional>
+#include <cstdint>
+#include <span>
 #include <vector>
 
+#include "base/large_memory.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -12,8 +14,21 @@ namespace tally {
 // The hub's limit, which keeps the list's size within its 32 bits.
 constexpr std::size_t kMaximumInterests = 0x555554D;
 
-// The list as the hub takes it, in walk order. Empty when a channel has no driver id, channel id or
-// type word, or when the channels are not exactly the count.
-std::optional<std::vector<std::byte>> createInterestList(KvDictionary* desired, std::size_t count);
+// Filled in one walk over the desired channels.
+class InterestList {
+ public:
+  // -1 for a malformed collection, else the number of channels.
+  std::int32_t fill(KvDictionary* desired);
+  // True when every channel has a driver id, a channel id and a type word, and they are not too
+  // many.
+  bool complete() const noexcept { return complete_; }
+  // The list as the hub takes it, in walk order.
+  std::span<const std::byte> bytes() const noexcept { return std::as_bytes(std::span(words_)); }
+
+ private:
+  // Little-endian 64-bit words: the count with 32 reserved bits, and three for each channel.
+  std::vector<std::uint64_t, LargeAllocator<std::uint64_t>> words_;
+  bool complete_ = true;
+};
 
 }  // namespace tally

@@ -1,10 +1,13 @@
 // Finding the runs of channels in a buffer of raw elements.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <optional>
 #include <span>
 #include <vector>
+
+#include "base/large_memory.h"
 
 namespace tally {
 
@@ -19,23 +22,32 @@ class RunIndex {
   // Empty when the scan would end without finding the channel. Ask stopped() what ended it.
   std::optional<std::span<const std::byte>> find(std::uint64_t driverID,
                                                  std::uint64_t channelID) const;
+  // Has the channel's run fetched into the cache for a find() to come, 2 kFetching calls later:
+  // first its slot, and the run when the slot has come.
+  void fetch(std::uint64_t driverID, std::uint64_t channelID);
+  static constexpr std::size_t kFetching = 8;
   // True when the scan meets a run of no elements.
   bool stopped() const noexcept { return stopped_; }
 
  private:
-  struct Run {
-    std::uint64_t driverID = 0;
-    std::uint64_t channelID = 0;
-    std::size_t offset = 0;
-    std::size_t size = 0;
+  // Elements are counted from 1; 0 is a free slot. The hash stands beside, so that another run of
+  // the buffer is hardly ever looked at.
+  struct Slot {
+    std::uint32_t element = 0;
+    std::uint32_t hash = 0;
   };
-  // The slot that holds the channel's run, or the free one where it belongs.
-  std::size_t slotOf(std::uint64_t driverID, std::uint64_t channelID) const;
+  // The slot of the channel's run, or the free one where it belongs.
+  std::size_t slotOf(std::uint64_t driverID, std::uint64_t channelID, std::uint32_t hash) const;
+  void add(std::size_t offset);
+  void grow();
 
   std::span<const std::byte> buffer_;
   bool stopped_ = false;
-  std::vector<Run> runs_;
-  std::vector<std::uint32_t> slots_;  // run number plus 1; 0 is free
+  using Slots = std::vector<Slot, LargeAllocator<Slot>>;
+  Slots slots_;  // at most half full; a power of two
+  std::size_t runs_ = 0;
+  std::array<std::uint32_t, kFetching> fetching_{};  // hashes whose slots are on their way
+  std::size_t fetched_ = 0;
 };
 
 }  // namespace tally

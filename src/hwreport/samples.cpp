@@ -32,11 +32,12 @@ KvRef<KvDictionary> cutSamples(KvDictionary* subscribed, std::span<const std::by
     reportError(error, HwErrBadArgument, kMessage);
     return nullptr;
   }
-  const RunIndex index(buffer);
+  RunIndex index(buffer);
   HwResult pending = HwErrGeneral;
+  KvArena arena;
   KvRef<KvDictionary> samples;
   const int result = transformChannels(
-      subscribed,
+      subscribed, arena,
       [&](KvDictionary* channel, KvDictionary* copy) {
         const auto run =
             index.find(HwReportChannelGetDriverID(channel), HwReportChannelGetChannelID(channel));
@@ -48,10 +49,13 @@ KvRef<KvDictionary> cutSamples(KvDictionary* subscribed, std::span<const std::by
         if (HwReportChannelGetFormat(channel) == kHwReportFormatUnknown) {
           learnType(*channel, ElementRun(*run));
         }
-        copy->set(keys().rawElements, KvData::create(*run));
+        copy->set(keys().rawElements, KvData::create(*run, &arena));
         return HwIterContinue;
       },
-      &samples);
+      &samples,
+      [&](const KvDictionary& channel) {
+        index.fetch(HwReportChannelGetDriverID(&channel), HwReportChannelGetChannelID(&channel));
+      });
   if (!walkFailed(result)) return samples;
   reportError(error, pending, kMessage);
   return nullptr;

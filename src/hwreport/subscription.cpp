@@ -80,21 +80,22 @@ KvRef<HwReportSubscription> HwReportCreateSubscription(const void*, KvDictionary
     reportError(error, HwErrBadArgument, "bad arguments");
     return nullptr;
   }
-  const std::int32_t count = HwReportGetChannelCount(desired);
+  InterestList interests;
+  const std::int32_t count = interests.fill(desired);
   if (count <= 0) {
     reportError(error, HwErrBadArgument, count < 0 ? "iteration error" : "no channels");
     return nullptr;
   }
-  const auto interests = createInterestList(desired, static_cast<std::size_t>(count));
-  if (!interests) {
+  if (!interests.complete()) {
     reportError(error, HwErrNoMemory, "createInterestList() failed");
     return nullptr;
   }
   const auto subscription = KvRef<Subscription>::adopt(new Subscription(platform().deviceRegistry));
-  if (subscription->connect(*interests, error) != 0) return nullptr;
+  if (subscription->connect(interests.bytes(), error) != 0) return nullptr;
   KvRef<KvDictionary> copy;
+  KvArena arena;
   const auto keep = [](KvDictionary*, KvDictionary*) { return HwIterContinue; };
-  if (walkFailed(transformChannels(desired, keep, &copy))) {
+  if (walkFailed(transformChannels(desired, arena, keep, &copy))) {
     reportError(error, HwErrGeneral);
     return nullptr;
   }
