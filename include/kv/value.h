@@ -1,6 +1,7 @@
 // The property value model: dynamically typed, reference-counted values shared by reference.
 #pragma once
 
+#include <algorithm>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
@@ -12,30 +13,64 @@
 #include <string_view>
 #include <vector>
 
+#if __has_include(<ext/atomicity.h>)
+#include <ext/atomicity.h>
+#endif
+
+#include "kv/arena.h"
+#include "kv/export.h"
+#include "kv/items.h"
 #include "kv/ref.h"
 
 namespace tally {
 
 enum class KvType : std::uint8_t { String, Number, Boolean, Date, Data, Array, Dictionary };
 
+// True while the process has had one thread only, so that counting references needs no locked
+// instruction, which would be half the cost of copying a small dictionary.
+inline bool kvSingleThreaded() noexcept {
+#if __has_include(<ext/atomicity.h>)
+  return __gnu_cxx::__is_single_threaded();
+#else
+  return false;
+#endif
+}
+
 // Base of all values. Created only through the create functions of the concrete types, which
 // return an owning KvRef. Reference counting is safe from any thread; changing a container is not.
-class KvObject {
+class TALLY_API KvObject {
  public:
   KvObject(const KvObject&) = delete;
   KvObject& operator=(const KvObject&) = delete;
 
   KvType type() const noexcept { return type_; }
-  void retain() const noexcept { references_.fetch_add(1, std::memory_order_relaxed); }
-  void release() const noexcept;
+  void retain() const noexcept {
+    if (kvSingleThreaded()) {
+      references_.store(references_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+    } else {
+      references_.fetch_add(1, std::memory_order_relaxed);
+    }
+  }
+  void release() const noexcept {
+    if (kvSingleThreaded()) {
+      const std::uint32_t left = references_.load(std::memory_order_relaxed) - 1;
+      references_.store(left, std::memory_order_relaxed);
+      if (left == 0) destroy();
+    } else if (references_.fetch_sub(1, std::memory_order_acq_rel) == 1) {
+      destroy();
+    }
+  }
 
  protected:
   explicit KvObject(KvType type) noexcept : type_(type) {}
   ~KvObject() = default;
 
  private:
+  void destroy() const noexcept;
   mutable std::atomic<std::uint32_t> references_{1};
   const KvType type_;
+  bool inArena_ = false;
+  friend class KvMaker;
 };
 
 // The value as a T, or null when it is null or of another type.
@@ -49,7 +84,7 @@ const T* kvCast(const KvObject* object) noexcept {
 }
 
 // Immutable text. Always valid UTF-8: bytes that are not become U+FFFD when it is created.
-class KvString final : public KvObject {
+class TALLY_API KvString final : public KvObject {
  public:
   static constexpr KvType kType = KvType::String;
   static KvRef<KvString> create(std::string_view text);
@@ -60,6 +95,7 @@ class KvString final : public KvObject {
  private:
   friend class KvObject;
   friend class KvDictionary;
+  friend class KvMaker;
   KvString() noexcept : KvObject(kType) {}
   std::uint32_t hash_ = 0;
   std::size_t size_ = 0;
@@ -68,7 +104,7 @@ class KvString final : public KvObject {
 // The width and signedness that a number was created with; kept through copies and documents.
 enum class KvNumberKind : std::uint8_t { Int8, Int32, Int64, UInt32, UInt64, Float, Double };
 
-class KvNumber final : public KvObject {
+class TALLY_API KvNumber final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Number;
   static KvRef<KvNumber> int8(std::int8_t value);
@@ -104,7 +140,7 @@ class KvNumber final : public KvObject {
   };
 };
 
-class KvBoolean final : public KvObject {
+class TALLY_API KvBoolean final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Boolean;
   // One of the two shared values.
@@ -117,7 +153,7 @@ class KvBoolean final : public KvObject {
   const bool value_;
 };
 
-class KvDate final : public KvObject {
+class TALLY_API KvDate final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Date;
   // Seconds since 1970-01-01 00:00 UTC.
@@ -130,20 +166,22 @@ class KvDate final : public KvObject {
   const double seconds_;
 };
 
-class KvData final : public KvObject {
+class TALLY_API KvData final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Data;
-  static KvRef<KvData> create(std::span<const std::byte> bytes);
-  std::span<const std::byte> bytes() const noexcept { return bytes_; }
+  static KvRef<KvData> create(std::span<const std::byte> bytes, KvArena* arena = nullptr);
+  std::span<const std::byte> bytes() const noexcept {
+    return {reinterpret_cast<const std::byte*>(this + 1), size_};  // they follow the object
+  }
 
  private:
   friend class KvObject;
-  explicit KvData(std::span<const std::byte> bytes)
-      : KvObject(kType), bytes_(bytes.begin(), bytes.end()) {}
-  const std::vector<std::byte> bytes_;
+  friend class KvMaker;
+  explicit KvData(std::size_t size) noexcept : KvObject(kType), size_(size) {}
+  const std::size_t size_;
 };
 
-class KvArray final : public KvObject {
+class TALLY_API KvArray final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Array;
   static KvRef<KvArray> create(std::size_t capacity = 0);
@@ -161,7 +199,12 @@ class KvArray final : public KvObject {
   }
   // A null item is not added: an array never holds an absent value.
   void append(KvRef<KvObject> item);
+  // Puts an item in the place of another; an index past the end or a null item changes nothing.
+  void replaceAt(std::size_t index, KvRef<KvObject> item);
   void removeAt(std::size_t index);
+  // Removes many at once, in one pass. REQUIRES: the indexes ascend; those past the end are
+  // ignored.
+  void removeAt(std::span<const std::size_t> indexes);
   auto begin() const noexcept { return items_.begin(); }
   auto end() const noexcept { return items_.end(); }
   // A new array of the same items.
@@ -169,13 +212,14 @@ class KvArray final : public KvObject {
 
  private:
   friend class KvObject;
-  KvArray() noexcept : KvObject(kType) {}
-  std::vector<KvRef<KvObject>> items_;
+  friend class KvMaker;
+  explicit KvArray(std::uint32_t capacity) noexcept : KvObject(kType), items_(this + 1, capacity) {}
+  KvItems<KvRef<KvObject>> items_;
 };
 
 // String keys to values, enumerated in the order of first insertion. A small dictionary is a flat
 // vector; a larger one carries a hash index.
-class KvDictionary final : public KvObject {
+class TALLY_API KvDictionary final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Dictionary;
   struct Entry {
@@ -183,18 +227,24 @@ class KvDictionary final : public KvObject {
     KvRef<KvObject> value;
   };
 
-  static KvRef<KvDictionary> create(std::size_t capacity = 0);
+  static KvRef<KvDictionary> create(std::size_t capacity = 0, KvArena* arena = nullptr);
   static KvRef<KvDictionary> create(
       std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries);
 
   std::size_t size() const noexcept { return entries_.size(); }
   bool empty() const noexcept { return entries_.empty(); }
   bool contains(std::string_view key) const noexcept { return get(key) != nullptr; }
-  // Borrowed; null when the key is missing.
+  // Borrowed; null when the key is missing. The second is faster where the dictionaries' own keys
+  // are the same object.
   KvObject* get(std::string_view key) const noexcept;
+  KvObject* get(const KvString& key) const noexcept;
   // Null when the key is missing or its value is of another type.
   template <class T>
   T* getAs(std::string_view key) const noexcept {
+    return kvCast<T>(get(key));
+  }
+  template <class T>
+  T* getAs(const KvString& key) const noexcept {
     return kvCast<T>(get(key));
   }
   // Empty when the key is missing or its value is not a number (string, boolean).
@@ -209,30 +259,38 @@ class KvDictionary final : public KvObject {
   void set(const KvRef<KvString>& key, KvRef<KvObject> value);
   // Keeps the order of the others; costs the length of the dictionary.
   bool remove(std::string_view key);
+  // Removes every entry of which the predicate is true, in one pass.
+  template <class Predicate>
+  void removeIf(Predicate predicate) {
+    if (entries_.removeIf(predicate) != 0) rebuildIndex();
+  }
   // Sets every entry of other in this dictionary.
   void merge(const KvDictionary& other);
   auto begin() const noexcept { return entries_.begin(); }
   auto end() const noexcept { return entries_.end(); }
-  // A new dictionary of the same keys and values.
-  KvRef<KvDictionary> copy() const;
+  // A new dictionary of the same keys and values, with room for some more.
+  KvRef<KvDictionary> copy(std::size_t more = 0, KvArena* arena = nullptr) const;
 
  private:
   friend class KvObject;
-  KvDictionary() noexcept;
+  friend class KvMaker;
+  explicit KvDictionary(std::uint32_t capacity) noexcept;
   ~KvDictionary();
   std::size_t find(std::string_view key, std::uint32_t hash) const noexcept;
+  std::size_t find(std::string_view key) const noexcept;
+  std::size_t find(const KvString& key) const noexcept;
   void append(KvRef<KvString> key, KvRef<KvObject> value);
   void rebuildIndex();
-  std::vector<Entry> entries_;
+  KvItems<Entry> entries_;
   std::unique_ptr<class HashIndex> index_;  // null while the dictionary is small
 };
 
 // Same type and same content, at any depth to 512. Numbers compare by value, whatever their width.
-bool kvEqual(const KvObject* a, const KvObject* b);
+TALLY_API bool kvEqual(const KvObject* a, const KvObject* b);
 
 // The one text form of a value, as messages and labels show it: a string is itself, integers are
 // decimal, reals the shortest text that reads back equal ("inf", "-inf", "nan"), booleans "1" and
 // "0", containers indented over several lines. Null gives "(null)".
-std::string kvText(const KvObject* value);
+TALLY_API std::string kvText(const KvObject* value);
 
 }  // namespace tally

@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-#include "kv/hash.h"
+#include "base/hash.h"
 #include "kv/value.h"
 
 namespace tally {

@@ -1,7 +1,8 @@
 // KvDictionary: a vector of entries in insertion order, with a hash index once it is large.
 #include <algorithm>
 
-#include "kv/hash.h"
+#include "base/hash.h"
+#include "kv/maker.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -12,11 +13,12 @@ constexpr std::size_t kNotFound = static_cast<std::size_t>(-1);
 
 }  // namespace
 
-KvDictionary::KvDictionary() noexcept : KvObject(kType) {}
+KvDictionary::KvDictionary(std::uint32_t capacity) noexcept
+    : KvObject(kType), entries_(this + 1, capacity) {}
 KvDictionary::~KvDictionary() = default;
 
-KvRef<KvDictionary> KvDictionary::create(std::size_t capacity) {
-  auto dictionary = KvRef<KvDictionary>::adopt(new KvDictionary());
+KvRef<KvDictionary> KvDictionary::create(std::size_t capacity, KvArena* arena) {
+  auto dictionary = KvMaker::makeContainer<KvDictionary, Entry>(arena, capacity);
   dictionary->entries_.reserve(capacity);
   return dictionary;
 }
@@ -40,8 +42,26 @@ std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const n
   return kNotFound;
 }
 
+std::size_t KvDictionary::find(std::string_view key) const noexcept {
+  return find(key, index_ ? hashBytes(key) : 0);
+}
+
+std::size_t KvDictionary::find(const KvString& key) const noexcept {
+  if (index_) return find(key.view(), key.hash_);
+  for (std::size_t i = 0; i < entries_.size(); ++i) {
+    const KvString* const other = entries_[i].key.get();
+    if (other == &key || (other->hash_ == key.hash_ && other->view() == key.view())) return i;
+  }
+  return kNotFound;
+}
+
+KvObject* KvDictionary::get(const KvString& key) const noexcept {
+  const std::size_t found = find(key);
+  return found == kNotFound ? nullptr : entries_[found].value.get();
+}
+
 KvObject* KvDictionary::get(std::string_view key) const noexcept {
-  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
+  const std::size_t found = find(key);
   return found == kNotFound ? nullptr : entries_[found].value.get();
 }
 
@@ -49,7 +69,7 @@ void KvDictionary::rebuildIndex() {
   index_.reset();
   if (entries_.size() <= kFlatEntries) return;
   index_ = std::make_unique<HashIndex>();
-  index_->reserve(std::max(entries_.size(), entries_.capacity()));
+  index_->reserve(std::max<std::size_t>(entries_.size(), entries_.capacity()));
   for (std::size_t i = 0; i < entries_.size(); ++i) {
     index_->add(entries_[i].key->hash_, static_cast<std::uint32_t>(i));
   }
@@ -70,7 +90,7 @@ void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
     remove(key);
     return;
   }
-  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
+  const std::size_t found = find(key);
   if (found != kNotFound) {
     entries_[found].value = std::move(value);
   } else {
@@ -79,7 +99,7 @@ void KvDictionary::set(std::string_view key, KvRef<KvObject> value) {
 }
 
 void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
-  const std::size_t found = find(key->view(), key->hash_);
+  const std::size_t found = find(*key);
   if (!value) {
     if (found != kNotFound) remove(key->view());
   } else if (found != kNotFound) {
@@ -90,9 +110,9 @@ void KvDictionary::set(const KvRef<KvString>& key, KvRef<KvObject> value) {
 }
 
 bool KvDictionary::remove(std::string_view key) {
-  const std::size_t found = find(key, index_ ? hashBytes(key) : 0);
+  const std::size_t found = find(key);
   if (found == kNotFound) return false;
-  entries_.erase(entries_.begin() + static_cast<std::ptrdiff_t>(found));
+  entries_.removeAt(found);
   rebuildIndex();
   return true;
 }
@@ -102,9 +122,9 @@ void KvDictionary::merge(const KvDictionary& other) {
   for (const Entry& entry : other.entries_) set(entry.key, entry.value);
 }
 
-KvRef<KvDictionary> KvDictionary::copy() const {
-  auto dictionary = create(0);
-  dictionary->entries_ = entries_;
+KvRef<KvDictionary> KvDictionary::copy(std::size_t more, KvArena* arena) const {
+  auto dictionary = create(entries_.size() + more, arena);
+  dictionary->entries_.appendWithinRoom(entries_);
   if (index_) dictionary->index_ = std::make_unique<HashIndex>(*index_);
   return dictionary;
 }

@@ -7,49 +7,58 @@
 #include <limits>
 #include <new>
 
+#include "base/hash.h"
+#include "base/large_memory.h"
 #include "base/utf8.h"
-#include "kv/hash.h"
+#include "kv/maker.h"
 
 namespace tally {
 
-void KvObject::release() const noexcept {
-  if (references_.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
+void KvObject::destroy() const noexcept {
   auto* self = const_cast<KvObject*>(this);
+  const bool inArena = inArena_;
   switch (type_) {
     case KvType::String:
       static_cast<KvString*>(self)->~KvString();
-      ::operator delete(self);
-      return;
+      break;
     case KvType::Number:
-      delete static_cast<KvNumber*>(self);
-      return;
+      static_cast<KvNumber*>(self)->~KvNumber();
+      break;
     case KvType::Boolean:
-      delete static_cast<KvBoolean*>(self);
-      return;
+      static_cast<KvBoolean*>(self)->~KvBoolean();
+      break;
     case KvType::Date:
-      delete static_cast<KvDate*>(self);
-      return;
+      static_cast<KvDate*>(self)->~KvDate();
+      break;
     case KvType::Data:
-      delete static_cast<KvData*>(self);
-      return;
+      static_cast<KvData*>(self)->~KvData();
+      break;
     case KvType::Array:
-      delete static_cast<KvArray*>(self);
-      return;
+      static_cast<KvArray*>(self)->~KvArray();
+      break;
     case KvType::Dictionary:
-      delete static_cast<KvDictionary*>(self);
-      return;
+      static_cast<KvDictionary*>(self)->~KvDictionary();
+      break;
+  }
+  if (inArena) {
+    KvArena::release(self);
+  } else {
+    ::operator delete(self);
   }
 }
+
+void* kvAllocateItems(std::size_t size) { return allocateSized(size); }
+
+void kvFreeItems(void* memory, std::size_t size) noexcept { freeSized(memory, size); }
 
 KvRef<KvString> KvString::create(std::string_view text) {
   std::string repaired;
   if (!isValidUtf8(text)) text = repaired = repairUtf8(text);
-  void* memory = ::operator new(sizeof(KvString) + text.size());
-  auto* string = new (memory) KvString();
+  auto string = KvMaker::make<KvString>(nullptr, text.size());
   string->hash_ = hashBytes(text);
   string->size_ = text.size();
-  if (!text.empty()) std::memcpy(reinterpret_cast<char*>(string + 1), text.data(), text.size());
-  return KvRef<KvString>::adopt(string);
+  if (!text.empty()) std::memcpy(static_cast<void*>(string.get() + 1), text.data(), text.size());
+  return string;
 }
 
 KvRef<KvNumber> KvNumber::makeInteger(KvNumberKind kind, std::int64_t bits) {
@@ -125,12 +134,14 @@ KvRef<KvDate> KvDate::create(double secondsSince1970) {
   return KvRef<KvDate>::adopt(new KvDate(secondsSince1970));
 }
 
-KvRef<KvData> KvData::create(std::span<const std::byte> bytes) {
-  return KvRef<KvData>::adopt(new KvData(bytes));
+KvRef<KvData> KvData::create(std::span<const std::byte> bytes, KvArena* arena) {
+  auto data = KvMaker::make<KvData>(arena, bytes.size(), bytes.size());
+  if (!bytes.empty()) std::memcpy(static_cast<void*>(data.get() + 1), bytes.data(), bytes.size());
+  return data;
 }
 
 KvRef<KvArray> KvArray::create(std::size_t capacity) {
-  auto array = KvRef<KvArray>::adopt(new KvArray());
+  auto array = KvMaker::makeContainer<KvArray, KvRef<KvObject>>(nullptr, capacity);
   array->items_.reserve(capacity);
   return array;
 }
@@ -146,12 +157,26 @@ void KvArray::append(KvRef<KvObject> item) {
 }
 
 void KvArray::removeAt(std::size_t index) {
-  if (index < items_.size()) items_.erase(items_.begin() + static_cast<std::ptrdiff_t>(index));
+  if (index < items_.size()) items_.removeAt(index);
+}
+
+void KvArray::replaceAt(std::size_t index, KvRef<KvObject> item) {
+  if (index < items_.size() && item) items_[index] = std::move(item);
+}
+
+void KvArray::removeAt(std::span<const std::size_t> indexes) {
+  std::size_t index = 0;
+  items_.removeIf([&](const auto&) {
+    const bool removed = !indexes.empty() && indexes.front() == index;
+    ++index;
+    if (removed) indexes = indexes.subspan(1);
+    return removed;
+  });
 }
 
 KvRef<KvArray> KvArray::copy() const {
   auto array = create(items_.size());
-  array->items_ = items_;
+  array->items_.appendWithinRoom(items_);
   return array;
 }
 

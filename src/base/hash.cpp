@@ -1,4 +1,4 @@
-#include "kv/hash.h"
+#include "base/hash.h"
 
 #include <cstring>
 #include <random>
@@ -19,10 +19,20 @@ std::uint64_t mix(std::uint64_t state, std::uint64_t word) {
   return static_cast<std::uint64_t>(product) ^ static_cast<std::uint64_t>(product >> 64);
 }
 
+std::uint64_t hashSeed() {
+  static const std::uint64_t seed = processSeed();
+  return seed;
+}
+
+std::uint32_t finish(std::uint64_t state, std::uint64_t seed) {
+  state = mix(state, seed);
+  return static_cast<std::uint32_t>(state ^ (state >> 32));
+}
+
 }  // namespace
 
 std::uint32_t hashBytes(std::string_view bytes) noexcept {
-  static const std::uint64_t seed = processSeed();
+  const std::uint64_t seed = hashSeed();
   std::uint64_t state = seed ^ bytes.size();
   while (bytes.size() >= 8) {
     std::uint64_t word;
@@ -32,8 +42,14 @@ std::uint32_t hashBytes(std::string_view bytes) noexcept {
   }
   std::uint64_t rest = 0;
   if (!bytes.empty()) std::memcpy(&rest, bytes.data(), bytes.size());
-  state = mix(mix(state, rest), seed);
-  return static_cast<std::uint32_t>(state ^ (state >> 32));
+  return finish(mix(state, rest), seed);
+}
+
+std::uint32_t hashWords(std::span<const std::uint64_t> words) noexcept {
+  const std::uint64_t seed = hashSeed();
+  std::uint64_t state = seed;
+  for (const std::uint64_t word : words) state = mix(state, word);
+  return finish(state, seed);
 }
 
 }  // namespace tally

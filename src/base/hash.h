@@ -1,9 +1,10 @@
-// Hashing of dictionary keys.
+// The hash of tables whose keys came from outside.
 #pragma once
 
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string_view>
 #include <vector>
 
@@ -11,6 +12,7 @@ namespace tally {
 
 // Seeded once per process, so that a document made to collide costs no more than any other.
 std::uint32_t hashBytes(std::string_view bytes) noexcept;
+std::uint32_t hashWords(std::span<const std::uint64_t> words) noexcept;
 
 // Finds entries, kept elsewhere under the numbers 0, 1, …, by their hashes. The hashes lie in the
 // index itself, so that neither a miss nor growing touches an entry.
