@@ -63,7 +63,7 @@ bool appendStates(const Sample& sample, std::string* out) {
                                  ? std::string(upToNul(*state))
                                  : printfHex(HwReportStateGetIDForIndex(sample.channel, i));
     const std::uint64_t residency = HwReportStateGetResidency(sample.channel, i);
-    *out += fmt::format("{}{}[{}] = {{ # {:<8} {:9.3e} s / {:4.1f}% }}\n", sample.prefix, name,
+    *out += fmt::format("{}{}[{}] = {{ # {:<8} {:>9.3e} s / {:>4.1f}% }}\n", sample.prefix, name,
                         rightAligned(text, 8), HwReportStateGetInTransitions(sample.channel, i),
                         HwReportScaleValue(residency, unit, kUnitSeconds),
                         dutyCycle(residency, total) * 100);

@@ -1,0 +1,254 @@
+// Subscribing and sampling.
+#include "hwreport/channel_world.h"
+#include "hwreport/naive_samples.h"
+
+namespace tally {
+namespace {
+
+using namespace tests;
+
+class Samples : public RegistryTest {
+ protected:
+  void addHub() { registry().entries.push_back({"HwReportHub", "hub", 1}); }
+  KvRef<HwReportSubscription> subscribe(KvDictionary* desired, std::string* error = nullptr) {
+    KvRef<HwReportError> object;
+    auto subscription = HwReportCreateSubscription(nullptr, desired, &subscribed_, 0, &object);
+    EXPECT_EQ(!subscription, !!object);
+    if (error != nullptr) *error = errorText(object);
+    return subscription;
+  }
+  KvRef<KvDictionary> subscribed_;
+};
+
+TEST_F(Samples, SubscribingFailsStepByStep) {
+  const auto good = flat({channel(1, 1, "a")});
+  const auto driverless = channel(2, 1, "b");
+  driverless->remove("DriverID");
+  const std::string none = kNoReason;
+  const struct {
+    const char* what;
+    KvRef<KvDictionary> desired;
+    std::function<void(fakes::FakeRegistry&)> fault;
+    std::string error;
+    std::vector<std::string> calls;
+  } cases[] = {
+      {"null", nullptr, {}, "E00002C2 bad arguments", {}},
+      {"malformed", flat({text("x"), driverless}), {}, "E00002C2 iteration error", {}},
+      {"malformed behind a bad channel",
+       flat({driverless, text("x")}),
+       {},
+       "E00002C2 iteration error",
+       {}},
+      {"empty", HwReportCreateAggregate(0), {}, "E00002C2 no channels", {}},
+      {"no driver id",
+       flat({channel(1, 1), driverless}),
+       {},
+       "E00002BD createInterestList() failed",
+       {}},
+      {"no channel id",
+       flat({channel(kInvalid, 1)}),
+       {},
+       "E00002BD createInterestList() failed",
+       {}},
+      {"no type", flat({channel(1, kInvalid)}), {}, "E00002BD createInterestList() failed", {}},
+      {"no hub", good, [](auto& r) { r.entries.clear(); }, "E00002F0 " + none, {}},
+      {"hub does not open",
+       good,
+       [](auto& r) { r.openResult = 0xE1; },
+       "000000E1 Could not open HwReportHub",
+       {"open 0"}},
+      {"start fails",
+       good,
+       [](auto& r) { r.callResults[0] = 0xE2; },
+       "000000E2 kHwReportUserClientOpen failed",
+       {"open 0", "call 0", "close"}},
+      {"interests are refused",
+       good,
+       [](auto& r) { r.callResults[2] = 0xE3; },
+       "000000E3 kHwReportUserClientConfigureInterests failed",
+       {"open 0", "call 0", "call 2", "close"}},
+      {"no token",
+       good,
+       [](auto& r) { r.tokensWritten = 0; },
+       "E00002BC kHwReportUserClientConfigureInterests failed",
+       {"open 0", "call 0", "call 2", "close"}},
+      {"no memory",
+       good,
+       [](auto& r) { r.mapResult = 0xE4; },
+       "000000E4 HwConnectMapMemory() failed",
+       {"open 0", "call 0", "call 2", "map 7 1", "close"}},
+      {"memory nowhere",
+       good,
+       [](auto& r) {
+         r.region.clear();
+         r.region.shrink_to_fit();
+       },
+       "E00002BC HwConnectMapMemory() failed",
+       {"open 0", "call 0", "call 2", "map 7 1", "close"}},
+      {"good", good, {}, "", {"open 0", "call 0", "call 2", "map 7 1", "unmap 7", "close"}},
+  };
+  for (const auto& c : cases) {
+    registry() = fakes::FakeRegistry();
+    addHub();
+    registry().region.resize(64);
+    if (c.fault) c.fault(registry());
+    std::string error;
+    subscribed_ = nullptr;
+    subscribe(c.desired.get(), &error);  // and releases it
+    EXPECT_EQ(error, c.error) << c.what;
+    EXPECT_EQ(!subscribed_, !c.error.empty()) << c.what;
+    EXPECT_EQ(registry().calls, c.calls) << c.what;
+    EXPECT_EQ(registry().openHandles(), 0) << c.what;
+  }
+  KvRef<HwReportError> error;
+  EXPECT_FALSE(HwReportCreateSubscription(nullptr, good.get(), nullptr, 0, &error));
+  EXPECT_EQ(errorText(error), "E00002C2 bad arguments");
+}
+
+TEST_F(Samples, TheHubGetsTheInterestsAndTheSampleItsElements) {
+  addHub();
+  const auto desired = flat({channel(0x41, typeWord(1, 1), "a"), channel(0x42, 0, "b")});
+  const auto type = typeWord(4, 2, 0x100);
+  registry().region =
+      run(0x42, type, {{{1, 2, 3, 4}}, {{5, 6, 7, 8}}}) + run(0x41, typeWord(1, 1), {{{9}}});
+  const auto subscription = subscribe(desired.get());
+  const std::uint64_t interests[] = {2, 0x10, 0x41, typeWord(1, 1), 0x10, 0x42, 0};
+  ASSERT_EQ(registry().structure.size(), sizeof(interests));
+  EXPECT_EQ(std::memcmp(registry().structure.data(), interests, sizeof(interests)), 0);
+  const auto* const subscribed = subscribed_->getAs<KvArray>("HwReportChannels");
+  EXPECT_NE(subscribed->get(0), desired->getAs<KvArray>("HwReportChannels")->get(0)) << "a copy";
+
+  const auto samples = HwReportCreateSamples(subscription.get(), subscribed_.get());
+  EXPECT_EQ(registry().scalars, std::vector<std::uint64_t>{0x1'0000'0007}) << "the whole token";
+  const auto* const channels = samples->getAs<KvArray>("HwReportChannels");
+  EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 9u);
+  EXPECT_EQ(HwReportArrayGetValueAtIndex(channels->getAs<KvDictionary>(1), 6), 7);
+  // The channel without a format has learnt it, in every copy of it.
+  EXPECT_EQ(
+      HwReportChannelGetFormat(desired->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(1)),
+      4);
+  EXPECT_EQ(HwReportChannelGetCategories(channels->getAs<KvDictionary>(1)), 0x100);
+  // A sample is its own.
+  registry().region[32 + 128] = std::byte{99};
+  EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 9u);
+
+  KvRef<HwReportError> error;
+  registry().callResults[3] = 0xE5;
+  EXPECT_FALSE(HwReportCreateSamples(subscription.get(), subscribed_.get(), &error));
+  EXPECT_EQ(errorText(error), "000000E5 " + std::string(kNoReason));
+  EXPECT_FALSE(HwReportCreateSamples(nullptr, subscribed_.get(), &error));
+  EXPECT_EQ(errorText(error), "E00002C2 " + std::string(kNoReason));
+  EXPECT_FALSE(HwReportCreateSamples(subscription.get(), nullptr, &error));
+  EXPECT_EQ(errorText(error), "E00002C2 " + std::string(kNoReason));
+}
+
+TEST(SamplesRaw, BuffersOfEveryShape) {
+  const auto wanted = flat({channel(1, typeWord(1, 1), "a"), channel(2, typeWord(1, 1), "b")});
+  const auto one = run(1, typeWord(1, 1), {{{10}}}), two = run(2, typeWord(1, 1), {{{20}}});
+  const auto again = run(1, typeWord(1, 1), {{{11}}}), zero = run(3, typeWord(1, 0), {{{}}});
+  const auto lies = run(2, typeWord(1, 3), {{{21}, {}}, {{22}, {}}});
+  auto cut = one;
+  cut.resize(100);
+  const std::string failed = "E00002BC couldn't create samples";
+  const struct {
+    const char* what;
+    std::vector<std::byte> buffer;
+    const char* names;  // null: failure
+    std::string error = {};
+  } cases[] = {
+      {"both, in another order", two + one, "a b"},
+      {"the first of two runs counts", one + again + two, "a b"},
+      {"one is missing", one, "a"},
+      {"all are missing", run(9, typeWord(1, 1), {{{1}}}), ""},
+      {"100 bytes are one element", cut, "a"},
+      {"63 bytes are none", std::vector<std::byte>(63), nullptr,
+       "E00002C2 couldn't create samples"},
+      {"a zero count before one of them", one + zero + two, nullptr, failed},
+      {"a zero count after all of them", one + two + zero, "a b"},
+      {"a run longer than the rest", one + lies, "a"},
+      {"a zero count after a missing one", zero, nullptr, failed},
+  };
+  for (const auto& c : cases) {
+    KvRef<HwReportError> error;
+    const auto samples =
+        HwReportCreateSamplesRaw(wanted.get(), KvData::create(c.buffer).get(), &error);
+    EXPECT_EQ(errorText(error), c.error) << c.what;
+    ASSERT_EQ(!samples, c.names == nullptr) << c.what;
+    EXPECT_EQ(namesOf(samples.get()), c.names != nullptr ? c.names : "") << c.what;
+    const auto* channels = samples ? samples->getAs<KvArray>("HwReportChannels") : nullptr;
+    if (channels != nullptr && !channels->empty()) {
+      EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 10u) << c.what;
+    }
+  }
+  KvRef<HwReportError> error;
+  EXPECT_FALSE(HwReportCreateSamplesRaw(nullptr, KvData::create(one).get(), &error));
+  EXPECT_EQ(errorText(error), "E00002C2 couldn't create samples");
+  EXPECT_FALSE(HwReportCreateSamplesRaw(wanted.get(), nullptr, &error));
+  EXPECT_FALSE(
+      HwReportCreateSamplesRaw(flat({text("x")}).get(), KvData::create(one).get(), &error));
+  EXPECT_EQ(errorText(error), failed);
+}
+
+// Random buffers whose ids and counts are likely to collide, to be cut short and to be zero.
+TEST(SamplesRaw, AgreeWithTheScanForEveryChannelOnHostileBuffers) {
+  Random random(11);
+  std::size_t stopped = 0, sampledSome = 0;
+  for (int round = 0; round < 3000; ++round) {
+    const unsigned ids = 1 + random() % 40;
+    std::vector<std::byte> buffer;
+    const unsigned runs = random() % 60;
+    for (unsigned i = 0; i < runs; ++i) {
+      const unsigned count = random() % (round % 4 == 0 ? 4 : 40) == 0 ? 0 : 1 + random() % 3;
+      std::vector<Element> elements(count == 0 ? 1 : count, Element{{random(), i}});
+      if (random() % 16 == 0) elements.resize(1);  // the count lies
+      buffer = buffer + run(random() % ids, typeWord(1, count), elements, random() % 2);
+    }
+    buffer.resize(buffer.size() + 64 + random() % 64,
+                  std::byte{static_cast<unsigned char>(random() % 2)});
+    auto channels = KvArray::create();
+    for (unsigned i = 0; i < 1 + random() % 30; ++i) {
+      channels->append(
+          channel(random() % (ids + 3), typeWord(1, 1), nullptr, nullptr, nullptr, random() % 2));
+    }
+    const auto wanted = KvDictionary::create({{"HwReportChannels", channels}});
+    const auto raw = KvData::create(buffer);
+    const auto expected = naive::createSamples(*wanted, raw->bytes());
+    const auto samples = HwReportCreateSamplesRaw(wanted.get(), raw.get());
+    ASSERT_TRUE(kvEqual(samples.get(), expected.get())) << round;
+    stopped += !expected;
+    sampledSome += expected && !expected->getAs<KvArray>("HwReportChannels")->empty();
+  }
+  EXPECT_GT(stopped, 300u);
+  EXPECT_GT(sampledSome, 300u);
+}
+
+TEST(SamplesRaw, ManyChannelsOutliveTheirSampleOneByOne) {
+  // Enough for chunks of shared memory; one channel is kept and the rest let go.
+  constexpr std::size_t kCount = 20'000;
+  auto channels = KvArray::create();
+  std::vector<std::byte> buffer;
+  buffer.reserve(kCount * 64);
+  for (std::size_t i = 0; i < kCount; ++i) {
+    channels->append(channel(i, typeWord(1, 1)));
+    const auto bytes = run(i, typeWord(1, 1), {{{i * 3}}});
+    buffer.insert(buffer.end(), bytes.begin(), bytes.end());
+  }
+  const auto wanted = KvDictionary::create({{"HwReportChannels", channels}});
+  KvRef<KvDictionary> kept;
+  for (int round = 0; round < 3; ++round) {
+    auto samples = HwReportCreateSamplesRaw(wanted.get(), KvData::create(buffer).get());
+    const auto* sampledChannels = samples->getAs<KvArray>("HwReportChannels");
+    ASSERT_EQ(sampledChannels->size(), kCount);
+    if (round == 0) kept = KvRef<KvDictionary>::share(sampledChannels->getAs<KvDictionary>(15'000));
+    for (std::size_t i = 0; i < kCount; i += 997) {
+      ASSERT_EQ(slotOf(*sampledChannels->getAs<KvDictionary>(i), 0, 0), i * 3);
+    }
+  }
+  HwReportChannelGetUnitLabel(kept.get());
+  kept->set("One", text("more"));
+  kept->set("Two", text("more"));
+  EXPECT_EQ(slotOf(*kept, 0, 0), 45'000u);
+}
+
+}  // namespace
+}  // namespace tally

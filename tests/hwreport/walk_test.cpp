@@ -1,0 +1,192 @@
+// The walk over collections: order, results, what malformed ones come to.
+#include <gmock/gmock.h>
+
+#include "hwreport/channel_walk.h"
+#include "hwreport/channel_world.h"
+
+namespace tally {
+namespace {
+
+using namespace tests;
+
+// Every level holds channels: a b at the top, c d below a driver, e below its group G, f below S.
+KvRef<KvDictionary> nested() {
+  const auto named = [](const char* name) { return channel(1, 1, name); };
+  const auto subgroup = flat({named("f")});
+  const auto group = flat({named("e")});
+  group->set("HwReportChannelGroups", KvDictionary::create({{"S", subgroup}}));
+  const auto driver = flat({named("c"), named("d")});
+  driver->set("HwReportChannelGroups", KvDictionary::create({{"G", group}}));
+  auto collection = flat({named("a"), named("b")});
+  // The groups come after the drivers, wherever they stand.
+  collection->set("HwReportChannelGroups", KvDictionary::create({{"T", flat({named("g")})}}));
+  collection->set("HwReportDrivers", KvDictionary::create({{"D", driver}}));
+  return collection;
+}
+
+std::string nameOf(KvDictionary* one) {
+  return std::string(HwReportChannelGetChannelName(one)->view());
+}
+
+enum class Mode { Iterate, Prune, Transform, Delta };
+
+// Walks in a mode with the result that each name asks for; the names visited, in order.
+int walk(Mode mode, KvDictionary* collection, const std::map<std::string, int>& results,
+         std::string* visited, KvRef<KvDictionary>* output) {
+  const auto answer = [&](KvDictionary* one) {
+    *visited += nameOf(one);
+    const auto found = results.find(nameOf(one));
+    return found != results.end() ? found->second : 0;
+  };
+  KvArena arena;
+  switch (mode) {
+    case Mode::Iterate:
+      return iterateChannels(collection, answer);
+    case Mode::Prune:
+      return pruneChannels(collection, answer);
+    case Mode::Transform:
+      return transformChannels(
+          collection, arena, [&](KvDictionary* one, KvDictionary*) { return answer(one); }, output);
+    case Mode::Delta:
+      return deltaChannels(
+          collection, nested().get(), arena,
+          [&](KvDictionary*, KvDictionary* one, KvDictionary*) { return answer(one); }, output);
+  }
+  return -1;
+}
+
+TEST(Walk, ResultsInEveryMode) {
+  constexpr int kDrop = HwIterDrop;
+  const struct {
+    std::map<std::string, int> results;
+    int result;
+    const char* visited;
+    const char* kept;    // in the output of a transform or delta
+    const char* pruned;  // what a prune leaves
+  } cases[] = {
+      {{}, 0, "abcdefg", "a b c d e f g", "a b c d e f g"},
+      {{{"a", kDrop}, {"b", kDrop}}, kDrop, "abcdefg", "c d e f g", "c d e f g"},
+      {{{"c", kDrop}, {"e", 2}, {"f", kDrop}}, kDrop | 2, "abcdefg", "a b d g", "a b d e g"},
+      {{{"a", kDrop}, {"c", kDrop}, {"d", 1}}, 1, "abcd", nullptr, "b d e f g"},
+      {{{"b", kDrop | 1}}, kDrop | 1, "ab", nullptr, "a b c d e f g"},
+      {{{"a", 4}, {"f", HwIterFailed}}, HwIterFailed, "abcdef", nullptr, "a b c d e f g"},
+      {{{"c", kDrop}, {"d", kDrop}, {"e", kDrop}, {"f", kDrop}},
+       kDrop,
+       "abcdefg",
+       "a b g",
+       "a b g"},
+  };
+  for (const auto& c : cases) {
+    for (const Mode mode : {Mode::Iterate, Mode::Prune, Mode::Transform, Mode::Delta}) {
+      const auto collection = nested();
+      std::string visited;
+      KvRef<KvDictionary> output;
+      EXPECT_EQ(walk(mode, collection.get(), c.results, &visited, &output), c.result);
+      EXPECT_EQ(visited, c.visited);
+      EXPECT_EQ(namesOf(collection.get()), mode == Mode::Prune ? c.pruned : "a b c d e f g");
+      const bool makes = mode == Mode::Transform || mode == Mode::Delta;
+      ASSERT_EQ(!!output, makes && c.kept != nullptr);
+      if (output) {
+        EXPECT_EQ(namesOf(output.get()), c.kept);
+      }
+    }
+  }
+}
+
+TEST(Walk, PruningRemovesWhatEndsEmpty) {
+  const auto collection = nested();
+  EXPECT_EQ(HwReportPrune(collection.get(), [](KvDictionary*) { return HwIterDrop; }), HwIterDrop);
+  EXPECT_TRUE(collection->empty());
+  const auto driverLeft = nested();
+  HwReportPrune(driverLeft.get(),
+                [](KvDictionary* one) { return nameOf(one) == "d" ? HwIterContinue : HwIterDrop; });
+  EXPECT_EQ(driverLeft->size(), 1u);
+  EXPECT_EQ(driverLeft->getAs<KvDictionary>("HwReportDrivers")->getAs<KvDictionary>("D")->size(),
+            1u);
+}
+
+TEST(Walk, CopiesAreMutableAndKeepTheLevels) {
+  const auto collection = nested();
+  KvRef<KvDictionary> output;
+  KvArena arena;
+  transformChannels(
+      collection.get(), arena,
+      [](KvDictionary*, KvDictionary* copy) {
+        copy->set("Mark", KvBoolean::of(true));
+        return 0;
+      },
+      &output);
+  EXPECT_EQ(HwReportIterate(output.get(),
+                            [](KvDictionary* one) { return one->contains("Mark") ? 0 : 1; }),
+            0);
+  EXPECT_EQ(HwReportIterate(collection.get(),
+                            [](KvDictionary* one) { return one->contains("Mark") ? 1 : 0; }),
+            0);
+}
+
+TEST(Walk, MalformedCollectionsFailInEveryMode) {
+  const auto with = [](const char* key, KvRef<KvObject> value) {
+    auto collection = nested();
+    collection->set(key, value);
+    return collection;
+  };
+  const auto cyclic = with("HwReportDrivers", nullptr);
+  cyclic->set("HwReportDrivers", KvDictionary::create({{"D", cyclic}}));
+  const auto empty = KvDictionary::create();
+  const struct {
+    const char* what;
+    KvRef<KvDictionary> collection;
+    bool fails;
+  } cases[] = {
+      {"null", nullptr, true},
+      {"channels are no array", with("HwReportChannels", text("x")), true},
+      {"a channel is no dictionary", with("HwReportChannels", KvArray::create({text("x")})), true},
+      {"drivers are no dictionary", with("HwReportDrivers", KvArray::create()), true},
+      {"no driver", with("HwReportDrivers", empty), true},
+      {"no driver is a dictionary",
+       with("HwReportDrivers", KvDictionary::create({{"D", text("x")}})), true},
+      {"groups are no dictionary", with("HwReportChannelGroups", text("x")), true},
+      {"a nested one", with("HwReportDrivers", KvDictionary::create({{"D", flat({text("x")})}})),
+       true},
+      {"it contains itself", cyclic, true},
+      {"what is no dictionary is passed over",
+       with("HwReportDrivers",
+            KvDictionary::create({{"x", text("x")}, {"D", flat({channel(1, 1, "n")})}})),
+       false},
+      {"nothing", KvDictionary::create(), false},
+  };
+  for (const auto& c : cases) {
+    EXPECT_EQ(HwReportGetChannelCount(c.collection.get()) == -1, c.fails) << c.what;
+    for (const Mode mode : {Mode::Iterate, Mode::Prune, Mode::Transform, Mode::Delta}) {
+      std::string visited;
+      KvRef<KvDictionary> output;
+      const auto copy = c.collection ? c.collection->copy() : nullptr;
+      const int result = walk(mode, copy.get(), {}, &visited, &output);
+      if (c.fails) {
+        EXPECT_EQ(result, HwIterFailed) << c.what;
+        EXPECT_FALSE(output);
+      } else {
+        EXPECT_EQ(result, 0) << c.what;
+      }
+    }
+  }
+  cyclic->set("HwReportDrivers", nullptr);  // so that it is freed
+}
+
+TEST(Walk, DroppingManyDriversKeepsTheOthersReachable) {
+  const auto collection = HwReportCreateAggregate(kHwReportByDriver);
+  for (std::uint64_t i = 0; i < 300; ++i) {
+    HwReportAddChannelDescription(collection.get(), i, text("D" + std::to_string(i)).get(), i, 1,
+                                  nullptr, nullptr, nullptr, nullptr);
+  }
+  HwReportPrune(collection.get(), [](KvDictionary* one) {
+    return HwReportChannelGetChannelID(one) % 3 == 0 ? HwIterContinue : HwIterDrop;
+  });
+  const auto* const drivers = collection->getAs<KvDictionary>("HwReportDrivers");
+  EXPECT_EQ(drivers->size(), 100u);
+  EXPECT_TRUE(drivers->contains("D297"));
+  EXPECT_FALSE(drivers->contains("D298"));
+}
+
+}  // namespace
+}  // namespace tally
