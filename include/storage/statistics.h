@@ -1,0 +1,73 @@
+// The driver's statistics buffer: what is parsed from it, and how its counters are reported.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
+namespace tally {
+
+// A node of a counter list. In the name list the text is the counter's name and the value is 0; in
+// the value list the text is the value in decimal. The text ends in a zero byte beyond its length.
+struct SPXCounterNode {
+  std::string_view text;
+  std::uint64_t value;
+  SPXCounterNode* next;  // null at the end
+};
+
+// What a parse leaves behind. The caller owns it, starts with an empty one ({}) and gives it to
+// SPXReleaseContext at the end; a copy would own the same memory twice.
+struct SPXParseContext {
+  std::uint32_t exportVersion = 0;  // 0 after a parse that failed
+  std::uint32_t driverVersion = 0;  // all ones after a parse: no record carries it
+  std::array<std::uint32_t, 2> reserved{};
+
+  std::uint32_t numVirtualBlocks = 0;
+  std::uint32_t blocksPerVirtualBlock = 0;
+  std::uint32_t pagesPerVirtualBlock = 0;
+  std::uint32_t bytesPerPage = 0;
+
+  std::uint64_t hostReads = 0;
+  std::uint64_t hostWrites = 0;
+  std::uint64_t numFreeVirtualBlocks = 0;
+  std::uint64_t wearLevMoves = 0;
+  std::uint64_t nandReads = 0;
+  std::uint64_t nandWrites = 0;
+  std::uint64_t bandErases = 0;
+  std::uint64_t indPoolFree = 0;
+  std::uint64_t indPoolCount = 0;
+  std::uint64_t utilFormatTime = 0;  // seconds since 1970
+  std::uint64_t numSleepOps = 0;
+  std::uint64_t maxHighEnduranceBlockErases = 0;
+  std::array<std::uint64_t, 5> readCountHisto{};
+
+  // Every counter of the buffer, in its order: the n-th name belongs to the n-th value.
+  SPXCounterNode* nameHead = nullptr;
+  SPXCounterNode* nameTail = nullptr;
+  SPXCounterNode* valueHead = nullptr;
+  SPXCounterNode* valueTail = nullptr;
+  void* memory = nullptr;  // what the nodes and the decimal texts lie in
+};
+
+// Parses a statistics buffer: little-endian records of a 32-bit key, a 32-bit count and that many
+// 64-bit values, without gaps. Counters are appended to the lists, the other fields overwritten.
+// Returns 1, or 0 when the buffer holds no record, a key is out of range, a record runs past the
+// end, or memory runs out; exportVersion is then 0 (a buffer of less than 8 bytes leaves it alone)
+// and the counters before the fault stay.
+int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_t length);
+
+// Frees the lists and empties the whole context.
+void SPXReleaseContext(SPXParseContext* context);
+
+// A counter's name, and the key it is reported under.
+struct SPXKeyMapRow {
+  std::string_view name;
+  std::string_view key;
+};
+
+// The rows, and an end row whose name is empty. Where a name occurs twice the first row holds.
+constexpr std::size_t kKeyMapRows = 679;
+extern const std::array<SPXKeyMapRow, kKeyMapRows + 1> keyMap;
+
+}  // namespace tally
