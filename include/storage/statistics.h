@@ -8,13 +8,25 @@
 
 namespace tally {
 
-// A node of a counter list. In the name list the text is the counter's name and the value is 0; in
-// the value list the text is the value in decimal. The text ends in a zero byte beyond its length.
-struct SPXCounterNode {
-  std::string_view text;
-  std::uint64_t value;
-  SPXCounterNode* next;  // null at the end
+// Counters of a context, in the order of the buffer: `count` values, and for each the number of its
+// name. capacity values and as many numbers lie behind the block's head, in one piece of memory.
+struct SPXCounterBlock {
+  SPXCounterBlock* next;  // null at the end
+  std::uint32_t count;
+  std::uint32_t capacity;
+
+  std::uint64_t* values() noexcept { return reinterpret_cast<std::uint64_t*>(this + 1); }
+  const std::uint64_t* values() const noexcept {
+    return reinterpret_cast<const std::uint64_t*>(this + 1);
+  }
+  std::uint16_t* names() noexcept { return reinterpret_cast<std::uint16_t*>(values() + capacity); }
+  const std::uint16_t* names() const noexcept {
+    return reinterpret_cast<const std::uint16_t*>(values() + capacity);
+  }
 };
+
+// The counter's name of that number; a zero byte follows. It lives as long as the program.
+std::string_view SPXCounterName(std::uint16_t number) noexcept;
 
 // What a parse leaves behind. The caller owns it, starts with an empty one ({}) and gives it to
 // SPXReleaseContext at the end; a copy would own the same memory twice.
@@ -42,22 +54,30 @@ struct SPXParseContext {
   std::uint64_t maxHighEnduranceBlockErases = 0;
   std::array<std::uint64_t, 5> readCountHisto{};
 
-  // Every counter of the buffer, in its order: the n-th name belongs to the n-th value.
-  SPXCounterNode* nameHead = nullptr;
-  SPXCounterNode* nameTail = nullptr;
-  SPXCounterNode* valueHead = nullptr;
-  SPXCounterNode* valueTail = nullptr;
-  void* memory = nullptr;  // what the nodes and the decimal texts lie in
+  // Every counter of the buffer, in its order.
+  SPXCounterBlock* firstBlock = nullptr;
+  SPXCounterBlock* lastBlock = nullptr;
 };
 
+// Calls visit(name, value) for every counter, in the order of the buffer.
+template <class Visit>
+void SPXForEachCounter(const SPXParseContext& context, const Visit& visit) {
+  for (const SPXCounterBlock* block = context.firstBlock; block != nullptr; block = block->next) {
+    for (std::uint32_t i = 0; i < block->count; ++i) {
+      visit(SPXCounterName(block->names()[i]), block->values()[i]);
+    }
+  }
+}
+
 // Parses a statistics buffer: little-endian records of a 32-bit key, a 32-bit count and that many
-// 64-bit values, without gaps. Counters are appended to the lists, the other fields overwritten.
+// 64-bit values, without gaps. Counters are appended to those that
+// are there, the other fields overwritten.
 // Returns 1, or 0 when the buffer holds no record, a key is out of range, a record runs past the
 // end, or memory runs out; exportVersion is then 0 (a buffer of less than 8 bytes leaves it alone)
 // and the counters before the fault stay.
 int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_t length);
 
-// Frees the lists and empties the whole context.
+// Frees the counters and empties the whole context.
 void SPXReleaseContext(SPXParseContext* context);
 
 // A counter's name, and the key it is reported under.

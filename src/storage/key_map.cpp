@@ -1,12 +1,12 @@
-// keyMap is laid out from its families at compile time, beside an index of its names.
+// keyMap is laid out from its families at compile time, beside the row of every name.
 #include "storage/key_map.h"
 
 #include <array>
 #include <vector>
 
+#include "storage/counter_names.h"
 #include "storage/decimal_names.h"
 #include "storage/key_map_families.h"
-#include "storage/name_index.h"
 #include "storage/statistics.h"
 
 namespace tally {
@@ -96,13 +96,23 @@ constexpr std::array<SPXKeyMapRow, kKeyMapRows + 1> keyMap = makeRows();
 
 namespace {
 
-// A third of the slots are taken.
-constexpr NameIndex<2048> kIndex(keyMap, kKeyMapRows);
+using RowsOfNames = std::array<std::uint16_t, kCounterNames>;
+
+constexpr RowsOfNames makeRowsOfNames() {
+  constexpr NameIndex<2048> index(keyMap, kKeyMapRows);
+  RowsOfNames rows{};
+  for (std::size_t name = 0; name < rows.size(); ++name) {
+    rows[name] = index.find(keyMap, kNames.name(name));
+  }
+  return rows;
+}
+
+constexpr RowsOfNames kRowsOfNames = makeRowsOfNames();
 
 }  // namespace
 
-std::size_t keyMapRowOfName(std::string_view name, std::uint32_t hash) noexcept {
-  return kIndex.find(keyMap, name, hash);
+std::uint16_t keyMapRowOfName(std::uint16_t number) noexcept {
+  return number < kRowsOfNames.size() ? kRowsOfNames[number] : kNoRow;
 }
 
 const KvRef<KvString>& keyMapKey(std::size_t row) {

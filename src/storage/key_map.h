@@ -3,14 +3,14 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <string_view>
 
 #include "kv/value.h"
+#include "storage/name_index.h"
 
 namespace tally {
 
-// The first row of that name, or kNoRow; in constant time. hash is the name's nameHash.
-std::size_t keyMapRowOfName(std::string_view name, std::uint32_t hash) noexcept;
+// The first row of keyMap whose name is that of the number, or kNoRow.
+std::uint16_t keyMapRowOfName(std::uint16_t number) noexcept;
 
 // The row's report key, made once and shared by all dictionaries.
 const KvRef<KvString>& keyMapKey(std::size_t row);

@@ -1,11 +1,11 @@
 // From a parsed context to the NAND info dictionary.
-#include <iterator>
+#include <array>
 #include <optional>
 #include <string_view>
 
 #include "platform/platform.h"
+#include "storage/counter_names.h"
 #include "storage/key_map.h"
-#include "storage/name_index.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info_failure.h"
 
@@ -87,8 +87,9 @@ std::uint32_t threeSignificantDigits(std::uint32_t value) {
   return (kept + (step > 1 && rest >= step / 2 ? 1 : 0)) * step;
 }
 
-// What becomes of a counter beside its row, if it has one.
+// Counters that are not reported themselves but go into a derived figure.
 enum class Role : std::uint8_t {
+  None,
   UserPartitionStart,
   IntermediatePartitionStart,
   MaintenanceRequest,
@@ -115,11 +116,31 @@ constexpr RoleOfName kRoles[] = {
     {"mspBootBlockEraseFail1", Role::FailedErase},
     {"mspBootBlockEraseFail2", Role::FailedErase},
 };
-constexpr NameIndex<64> kRoleIndex(kRoles, std::size(kRoles));
 
-bool isRoundedDuration(std::string_view name) {
-  return name == "maxMemLowDuration" || name == "maxMemChokeDuration";
+constexpr std::string_view kRoundedDurations[] = {"maxMemLowDuration", "maxMemChokeDuration"};
+
+// What is done with the counter of each name number.
+struct Treatment {
+  Role role = Role::None;
+  bool isRounded = false;
+};
+using Treatments = std::array<Treatment, kCounterNames>;
+
+constexpr Treatments makeTreatments() {
+  Treatments treatments{};
+  for (std::size_t number = 0; number < kCounterNames; ++number) {
+    const std::string_view name = kNames.name(number);
+    for (const RoleOfName& row : kRoles) {
+      if (row.name == name) treatments[number].role = row.role;
+    }
+    for (const std::string_view rounded : kRoundedDurations) {
+      if (rounded == name) treatments[number].isRounded = true;
+    }
+  }
+  return treatments;
 }
+
+constexpr Treatments kTreatments = makeTreatments();
 
 // The figures that are derived from several counters.
 struct DerivedFigures {
@@ -129,6 +150,8 @@ struct DerivedFigures {
   void take(Role role, std::uint64_t value) {
     const std::uint64_t failed = value != 0 ? 1 : 0;
     switch (role) {
+      case Role::None:
+        break;
       case Role::UserPartitionStart:
         userPartitionStart = value;
         break;
@@ -151,23 +174,26 @@ struct DerivedFigures {
   }
 };
 
+void addCounter(KvDictionary& info, DerivedFigures& derived, std::uint16_t name,
+                std::uint64_t value) {
+  const Treatment treatment = kTreatments[name];
+  if (treatment.role != Role::None) {
+    derived.take(treatment.role, value);
+    return;
+  }
+  const std::uint16_t row = keyMapRowOfName(name);
+  if (row == kNoRow) return;
+  if (treatment.isRounded) value = threeSignificantDigits(static_cast<std::uint32_t>(value));
+  info.set(keyMapKey(row), wideNumber(value));
+}
+
 DerivedFigures addCounters(KvDictionary& info, const SPXParseContext& context) {
   DerivedFigures derived;
-  const SPXCounterNode* value = context.valueHead;
-  for (const SPXCounterNode* name = context.nameHead; name != nullptr && value != nullptr;
-       name = name->next, value = value->next) {
-    const std::uint32_t hash = nameHash(name->text);
-    if (const std::size_t role = kRoleIndex.find(kRoles, name->text, hash); role != kNoRow) {
-      derived.take(kRoles[role].role, value->value);
-      continue;
+  for (const SPXCounterBlock* block = context.firstBlock; block != nullptr; block = block->next) {
+    for (std::uint32_t i = 0; i < block->count; ++i) {
+      const std::uint16_t name = block->names()[i];
+      if (name < kCounterNames) addCounter(info, derived, name, block->values()[i]);
     }
-    const std::size_t row = keyMapRowOfName(name->text, hash);
-    if (row == kNoRow) continue;
-    const std::uint64_t reported =
-        isRoundedDuration(name->text)
-            ? threeSignificantDigits(static_cast<std::uint32_t>(value->value))
-            : value->value;
-    info.set(keyMapKey(row), wideNumber(reported));
   }
   return derived;
 }

@@ -1,13 +1,9 @@
 // The statistics buffer: one pass over its records, which become fixed fields and counters.
 #include <algorithm>
-#include <array>
-#include <charconv>
-#include <cstring>
-#include <new>
 #include <span>
 
 #include "base/byte_reader.h"
-#include "storage/counter_memory.h"
+#include "storage/counter_list.h"
 #include "storage/statistic_keys.h"
 #include "storage/statistics.h"
 
@@ -19,7 +15,6 @@ constexpr std::size_t kCountOffset = 4;
 constexpr std::uint32_t kHighestKey = 0x30000000;
 constexpr std::uint32_t kUnset = 0xFFFFFFFF;
 constexpr std::uint32_t kReadCountHistoKey = 265;
-constexpr std::size_t kDecimalRoom = 21;  // 20 digits and a zero byte
 
 // The statistics that also have a field of their own.
 struct NarrowField {
@@ -61,28 +56,6 @@ void storeField(SPXParseContext& context, std::uint32_t key, std::uint64_t value
   }
 }
 
-void linkNode(SPXCounterNode*& head, SPXCounterNode*& tail, SPXCounterNode* node) {
-  (tail == nullptr ? head : tail->next) = node;
-  tail = node;
-}
-
-// False when memory runs out; then neither list has grown.
-bool appendCounter(SPXParseContext& context, std::string_view name, std::uint64_t value) {
-  std::array<char, kDecimalRoom> decimal{};
-  const auto end = std::to_chars(decimal.begin(), decimal.end() - 1, value).ptr;
-  const auto digits = static_cast<std::size_t>(end - decimal.begin());
-  // Both nodes and the decimal text in one piece.
-  void* room = allocateInContext(context, 2 * sizeof(SPXCounterNode) + digits + 1);
-  if (room == nullptr) return false;
-  auto* nodes = static_cast<SPXCounterNode*>(room);
-  auto* text = reinterpret_cast<char*>(nodes + 2);
-  std::memcpy(text, decimal.data(), digits + 1);
-  linkNode(context.nameHead, context.nameTail, new (nodes) SPXCounterNode{name, 0, nullptr});
-  linkNode(context.valueHead, context.valueTail,
-           new (nodes + 1) SPXCounterNode{{text, digits}, value, nullptr});
-  return true;
-}
-
 // The values of one record, all of which lie in the buffer.
 class Values {
  public:
@@ -97,17 +70,19 @@ class Values {
 };
 
 bool appendRecord(SPXParseContext& context, std::uint32_t key, const Values& values) {
-  const Statistic* statistic = findStatistic(key);
-  const std::size_t taken =
-      statistic == nullptr ? 0 : std::min<std::size_t>(values.size(), statistic->maximum);
+  Statistic statistic;
+  if (!findStatistic(key, &statistic)) return true;
+  const std::size_t taken = std::min<std::size_t>(values.size(), statistic.maximum);
   if (taken == 0) return true;
-  if (!statistic->isArray) storeField(context, key, values.at(0));
+  if (!statistic.isArray) storeField(context, key, values.at(0));
   if (key == kReadCountHistoKey) {
     for (std::size_t i = 0; i < taken; ++i) context.readCountHisto[i] = values.at(i);
   }
-  if (taken == 1) return appendCounter(context, statisticName(*statistic), values.at(0));
+  // A single value goes by the plain name, several by those of the elements.
+  const std::size_t firstName = statistic.name + (taken == 1 ? 0u : 1u);
   for (std::size_t i = 0; i < taken; ++i) {
-    if (!appendCounter(context, statisticElementName(*statistic, i), values.at(i))) return false;
+    const auto name = static_cast<std::uint16_t>(firstName + i);
+    if (!appendCounter(context, name, values.at(i))) return false;
   }
   return true;
 }
@@ -136,7 +111,7 @@ int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_
 }
 
 void SPXReleaseContext(SPXParseContext* context) {
-  freeContextMemory(*context);
+  freeCounters(*context);
   *context = {};
 }
 

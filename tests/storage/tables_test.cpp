@@ -3,17 +3,28 @@
 
 #include <algorithm>
 #include <iterator>
+#include <map>
 #include <set>
 #include <string>
 
+#include "storage/counter_names.h"
 #include "storage/key_map.h"
-#include "storage/name_index.h"
 #include "storage/statistic_key_table.h"
 #include "storage/statistic_keys.h"
 #include "storage/statistics.h"
 
 namespace tally {
 namespace {
+
+std::uint16_t numberOfName(std::string_view name) {
+  static const auto* numbers = [] {
+    auto* made = new std::map<std::string_view, std::uint16_t>;
+    for (std::uint16_t i = 0; i < kCounterNames; ++i) (*made)[SPXCounterName(i)] = i;
+    return made;
+  }();
+  const auto found = numbers->find(name);
+  return found == numbers->end() ? std::uint16_t{0xFFFF} : found->second;
+}
 
 TEST(KeyTable, CountsAndSpotValues) {
   std::set<std::uint16_t> keys;
@@ -52,24 +63,25 @@ TEST(KeyTable, CountsAndSpotValues) {
   };
   for (const auto& spot : spots) {
     SCOPED_TRACE(spot.key);
-    const Statistic* found = findStatistic(spot.key);
-    ASSERT_EQ(found != nullptr, !spot.name.empty());
-    if (found == nullptr) continue;
-    EXPECT_EQ(statisticName(*found), spot.name);
-    EXPECT_EQ(found->isArray, spot.maximum != 0);
-    EXPECT_EQ(found->maximum, std::max<std::uint16_t>(spot.maximum, 1));
+    Statistic found;
+    ASSERT_EQ(findStatistic(spot.key, &found), !spot.name.empty());
+    if (spot.name.empty()) continue;
+    EXPECT_EQ(SPXCounterName(found.name), spot.name);
+    EXPECT_EQ(found.isArray, spot.maximum != 0);
+    EXPECT_EQ(found.maximum, std::max<std::uint16_t>(spot.maximum, 1));
   }
 }
 
 TEST(KeyTable, EveryNameIsItsBaseAndNumberAndEndsInAZeroByte) {
   for (const StatisticKey& row : kStatisticKeys) {
-    const Statistic* statistic = findStatistic(row.key);
-    ASSERT_NE(statistic, nullptr) << row.name;
-    const std::string_view plain = statisticName(*statistic);
+    Statistic statistic;
+    ASSERT_TRUE(findStatistic(row.key, &statistic)) << row.name;
+    const std::string_view plain = SPXCounterName(statistic.name);
     EXPECT_EQ(plain, row.name);
     EXPECT_EQ(plain.data()[plain.size()], '\0');
     for (unsigned i = 0; row.maximum > 1 && i < row.maximum; ++i) {
-      const std::string_view element = statisticElementName(*statistic, i);
+      const std::string_view element =
+          SPXCounterName(static_cast<std::uint16_t>(statistic.name + 1 + i));
       EXPECT_EQ(element, row.name + std::to_string(i));
       EXPECT_EQ(element.data()[element.size()], '\0');
     }
@@ -90,7 +102,7 @@ TEST(KeyMap, CountsAndSpotRows) {
   EXPECT_EQ(keys.size(), 678u);
 
   const struct {
-    std::size_t row;  // kNoRow: no such name
+    std::uint16_t row;  // kNoRow: no such name
     std::string_view name, report;
   } spots[] = {
       {0, "staticSizeInMB", "StaticDataSizeInMB"},
@@ -111,28 +123,21 @@ TEST(KeyMap, CountsAndSpotRows) {
   };
   for (const auto& spot : spots) {
     SCOPED_TRACE(spot.name);
-    EXPECT_EQ(keyMapRowOfName(spot.name, nameHash(spot.name)), spot.row);
+    EXPECT_EQ(keyMapRowOfName(numberOfName(spot.name)), spot.row);
     if (spot.row == kNoRow) continue;
     EXPECT_EQ(keyMap[spot.row].key, "vellum.NANDInfo." + std::string(spot.report));
   }
 }
 
-TEST(KeyMap, EveryRowIsFoundAndIsACounterThatAParseCanYield) {
-  std::set<std::string, std::less<>> counters;
-  for (const StatisticKey& row : kStatisticKeys) {
-    counters.insert(row.name);
-    for (unsigned i = 0; row.maximum > 1 && i < row.maximum; ++i) {
-      counters.insert(row.name + std::to_string(i));
-    }
-  }
+TEST(KeyMap, EveryRowIsFoundByTheNameOfACounter) {
   std::set<std::string_view> seen;
   for (std::size_t row = 0; row < kKeyMapRows; ++row) {
     const std::string_view name = keyMap[row].name;
-    EXPECT_TRUE(counters.contains(name)) << name;
-    const std::size_t found = keyMapRowOfName(name, nameHash(name));
+    const std::uint16_t found = keyMapRowOfName(numberOfName(name));
+    ASSERT_LT(found, kKeyMapRows) << name;
+    EXPECT_EQ(keyMap[found].name, name);
     // The first row of a name holds.
     EXPECT_EQ(found == row, seen.insert(name).second) << name;
-    EXPECT_EQ(keyMap[found].name, name);
     EXPECT_EQ(keyMapKey(row)->view(), keyMap[row].key);
   }
 }
