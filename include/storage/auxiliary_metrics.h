@@ -37,34 +37,34 @@ constexpr std::string_view kNANDInfoHealthIsNANDRetirableKey =
     "vellum.NANDInfo.Health.IsNANDRetirable";
 
 // The bytes that the memory freezer wrote, or its failure pair. Never null.
-KvRef<KvDictionary> CopyVMFreezerNANDInfo();
+TALLY_API KvRef<KvDictionary> CopyVMFreezerNANDInfo();
 // The same figure from a stackshot that is taken now. False leaves *result alone.
-bool measureFreezerWrites(std::uint64_t* result);
+TALLY_API bool measureFreezerWrites(std::uint64_t* result);
 
 // Searches kcdata for the first container with a thread of that name. 1 with its I/O statistics
 // (no bytes, null, when it has none), or 0. Nothing outside [begin, end) is read; containers nested
 // deeper than any thread's are not followed and end the search.
-int getIOStatsWithThreadnameFromKCData(const std::byte* begin, const std::byte* end,
-                                       const char* threadName,
-                                       std::span<const std::byte>* ioStatsOut);
+TALLY_API int getIOStatsWithThreadnameFromKCData(const std::byte* begin, const std::byte* end,
+                                                 const char* threadName,
+                                                 std::span<const std::byte>* ioStatsOut);
 // The same in the first container alone, whatever is nested in it included. *positionOut, when
 // given, is where the search stopped; null when the data ended first.
-int getIOStatsWithThreadnameFromKCDataHelper(const std::byte* begin, const std::byte* end,
-                                             const char* threadName,
-                                             std::span<const std::byte>* ioStatsOut,
-                                             const std::byte** positionOut);
+TALLY_API int getIOStatsWithThreadnameFromKCDataHelper(const std::byte* begin, const std::byte* end,
+                                                       const char* threadName,
+                                                       std::span<const std::byte>* ioStatsOut,
+                                                       const std::byte** positionOut);
 
 // The purgeable and the non-purgeable space, or the failure pair. Never null.
-KvRef<KvDictionary> CopyReclaimNANDInfo();
+TALLY_API KvRef<KvDictionary> CopyReclaimNANDInfo();
 // Adds what is known of them. True only when both figures are.
-bool addReclaimFigures(KvDictionary& dictionary);
+TALLY_API bool addReclaimFigures(KvDictionary& dictionary);
 
 // The wear, end-to-end and host-read counters with the largest of each group; the extracts of it
 // for the repair service, the internal lab and the over-the-air update. A counter that the driver
 // does not export is 0. One that is no number is 0 too, and the error key is the number 1.
-KvRef<KvDictionary> CopyNANDHealthInfo();
-KvRef<KvDictionary> CopyFixlineNANDInfo();
-KvRef<KvDictionary> CopyInternalLabNANDInfo();
-KvRef<KvDictionary> CopyOTANANDInfo();
+TALLY_API KvRef<KvDictionary> CopyNANDHealthInfo();
+TALLY_API KvRef<KvDictionary> CopyFixlineNANDInfo();
+TALLY_API KvRef<KvDictionary> CopyInternalLabNANDInfo();
+TALLY_API KvRef<KvDictionary> CopyOTANANDInfo();
 
 }  // namespace tally

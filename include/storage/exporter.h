@@ -36,26 +36,26 @@ struct NandExporter {
 };
 
 // In the order in which they are looked for; the last one is the terminator, all zero.
-extern const std::array<NandExporter, 3> nand_exporters;
+TALLY_API extern const std::array<NandExporter, 3> nand_exporters;
 
-const std::uint32_t* SPXGetStatsSelectors();
-const std::uint32_t* SPXGetDefectsListSelectors();
-const std::uint32_t* SPXGetTelemetryListSelectors();
-const std::uint32_t* SPXGetTaskSchedulerSelectors();
-const std::uint32_t* SPXGetSnapshotSelectors();
-const std::uint32_t* SPXGetSnapshotHeaderSelectors();
-const std::uint32_t* SPXGetBandStatsSelectors();
+TALLY_API const std::uint32_t* SPXGetStatsSelectors();
+TALLY_API const std::uint32_t* SPXGetDefectsListSelectors();
+TALLY_API const std::uint32_t* SPXGetTelemetryListSelectors();
+TALLY_API const std::uint32_t* SPXGetTaskSchedulerSelectors();
+TALLY_API const std::uint32_t* SPXGetSnapshotSelectors();
+TALLY_API const std::uint32_t* SPXGetSnapshotHeaderSelectors();
+TALLY_API const std::uint32_t* SPXGetBandStatsSelectors();
 
 // Handles of the device registry: a service is given back with HandleRelease, a connection with
 // FNDDisconnect; 0 is none. Every failure below is one line on standard error.
 
 // The service of the first exporter whose driver the device has, or 0. *exporterOut always points
 // into nand_exporters afterwards: at the terminator when there is none.
-std::uint32_t findNandExporter(const NandExporter** exporterOut);
+TALLY_API std::uint32_t findNandExporter(const NandExporter** exporterOut);
 
 // Opens a connection to that driver; 0 on failure.
-std::uint32_t FNDConnect(const NandExporter** exporterOut);
-void FNDDisconnect(std::uint32_t connection);
+TALLY_API std::uint32_t FNDConnect(const NandExporter** exporterOut);
+TALLY_API void FNDDisconnect(std::uint32_t connection);
 
 // An open connection, owned by the caller.
 struct SPXConnection {
@@ -66,16 +66,17 @@ struct SPXConnection {
 
 // 1 on success; 0 when there is no driver, no connection, or no statistics. *connection is then
 // closed.
-int openSPXConnection(SPXConnection* connection);
+TALLY_API int openSPXConnection(SPXConnection* connection);
 // Gives back what is open and sets it to 0.
-void closeSPXConnection(SPXConnection* connection);
+TALLY_API void closeSPXConnection(SPXConnection* connection);
 
 // Fetches the driver's statistics and hands them to the exporter's parser. *context must be empty
 // at the call. On true the caller gives it to the exporter's releaseContext, if there is one; on
 // false it is empty.
-KvRef<KvBoolean> loadNandStatistics(const NandExporter** exporterOut, SPXParseContext* context);
+TALLY_API KvRef<KvBoolean> loadNandStatistics(const NandExporter** exporterOut,
+                                              SPXParseContext* context);
 
 // Whether the driver recommends to delete content. False also when it cannot be asked.
-KvRef<KvBoolean> NandRecommendsContentDeletion();
+TALLY_API KvRef<KvBoolean> NandRecommendsContentDeletion();
 
 }  // namespace tally

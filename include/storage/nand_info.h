@@ -61,31 +61,33 @@ constexpr std::int32_t kMinusOne = -1;
 constexpr std::int32_t kZero = 0;
 
 // The write amplification last measured; 0 until the structured-log dump measures it.
-extern double gCurrentUserWamp;
-extern double gCurrentSysWamp;
+TALLY_API extern double gCurrentUserWamp;
+TALLY_API extern double gCurrentSysWamp;
 
 // A fresh fetch, with the purgeable space added. Never null; a failure is in the dictionary: the
 // pair above, or the pair of the purgeable space (auxiliary_metrics.h), which leaves the rest.
-KvRef<KvDictionary> CopyNANDInfo();
+TALLY_API KvRef<KvDictionary> CopyNANDInfo();
 
 // On every other day of a boot session the figures belong to the analytics service: with this bit
 // they are sent there, without it the result is null on that day. On the days between it is
 // CopyNANDInfo's result.
 constexpr std::uint32_t kNANDInfoAnalyticsOption = 1;
-KvRef<KvDictionary> CopyNANDInfoWithOptions(std::uint32_t options);
+TALLY_API KvRef<KvDictionary> CopyNANDInfoWithOptions(std::uint32_t options);
 
 // The dictionary of a parsed context; for a dump without versions and demo mode. With an export
 // version of 0 the failure pair, and null for a dump.
-KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump);
+TALLY_API KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump);
 
 // The value, or a new number 0 (a string "empty") when the key is absent.
-KvRef<KvObject> GetNumberFromDictionarySafe(const KvDictionary& dictionary, std::string_view key);
-KvRef<KvObject> GetStringFromDictionarySafe(const KvDictionary& dictionary, std::string_view key);
+TALLY_API KvRef<KvObject> GetNumberFromDictionarySafe(const KvDictionary& dictionary,
+                                                      std::string_view key);
+TALLY_API KvRef<KvObject> GetStringFromDictionarySafe(const KvDictionary& dictionary,
+                                                      std::string_view key);
 
 // Stores the number that valuePointer points to, of the given type. No number can be made of
 // another type or of a null pointer; then a line on standard error says so and nothing is stored.
 enum class NumberType { SInt32, SInt64 };
-void setNumberInDictionary(KvDictionary& dictionary, std::string_view key, const void* valuePointer,
-                           NumberType numberType);
+TALLY_API void setNumberInDictionary(KvDictionary& dictionary, std::string_view key,
+                                     const void* valuePointer, NumberType numberType);
 
 }  // namespace tally

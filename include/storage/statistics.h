@@ -6,6 +6,8 @@
 #include <cstdint>
 #include <string_view>
 
+#include "kv/export.h"
+
 namespace tally {
 
 // Counters of a context, in the order of the buffer: `count` values, and for each the number of its
@@ -26,7 +28,7 @@ struct SPXCounterBlock {
 };
 
 // The counter's name of that number; a zero byte follows. It lives as long as the program.
-std::string_view SPXCounterName(std::uint16_t number) noexcept;
+TALLY_API std::string_view SPXCounterName(std::uint16_t number) noexcept;
 
 // What a parse leaves behind. The caller owns it, starts with an empty one ({}) and gives it to
 // SPXReleaseContext at the end; a copy would own the same memory twice.
@@ -75,10 +77,10 @@ void SPXForEachCounter(const SPXParseContext& context, const Visit& visit) {
 // Returns 1, or 0 when the buffer holds no record, a key is out of range, a record runs past the
 // end, or memory runs out; exportVersion is then 0 (a buffer of less than 8 bytes leaves it alone)
 // and the counters before the fault stay.
-int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_t length);
+TALLY_API int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_t length);
 
 // Frees the counters and empties the whole context.
-void SPXReleaseContext(SPXParseContext* context);
+TALLY_API void SPXReleaseContext(SPXParseContext* context);
 
 // A counter's name, and the key it is reported under.
 struct SPXKeyMapRow {
@@ -88,6 +90,6 @@ struct SPXKeyMapRow {
 
 // The rows, and an end row whose name is empty. Where a name occurs twice the first row holds.
 constexpr std::size_t kKeyMapRows = 679;
-extern const std::array<SPXKeyMapRow, kKeyMapRows + 1> keyMap;
+TALLY_API extern const std::array<SPXKeyMapRow, kKeyMapRows + 1> keyMap;
 
 }  // namespace tally

@@ -5,8 +5,8 @@
 
 #include <bit>
 
+#include "fakes/fake_storage.h"
 #include "storage/exporter.h"
-#include "storage/fake_storage.h"
 
 namespace tally {
 namespace {

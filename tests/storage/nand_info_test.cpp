@@ -2,9 +2,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "fakes/fake_storage.h"
+#include "fakes/kcdata.h"
 #include "storage/analytics_route.h"
 #include "storage/auxiliary_metrics.h"
-#include "storage/fake_storage.h"
 #include "storage/nand_info.h"
 #include "storage/statistic_key_table.h"
 
@@ -220,21 +221,10 @@ TEST_F(NandInfoTest, PurgeableSpace) {
 }
 
 TEST_F(NandInfoTest, Freezer) {
-  Bytes item, noFigure, shortFigure;
-  for (Bytes* bytes : {&item, &noFigure, &shortFigure}) {
-    for (const std::uint64_t word : {0x400000013ull, 1ull}) fakes::appendValue(*bytes, word);
-    fakes::appendValue(*bytes, std::uint32_t{0});
-    for (const std::uint64_t word : {0xA00000909ull, 0ull}) fakes::appendValue(*bytes, word);
-    for (const char letter : std::string_view("VM_swapout")) fakes::appendValue(*bytes, letter);
-  }
-  for (const std::uint64_t word : {0x2000000901ull, 0ull, 1ull, 2ull, 3ull, ~0ull}) {
-    fakes::appendValue(item, word);
-  }
-  for (const std::uint64_t word : {0x800000901ull, 0ull, 1ull})
-    fakes::appendValue(shortFigure, word);
-  for (Bytes* bytes : {&item, &noFigure, &shortFigure}) {
-    for (const std::uint64_t word : {0x14ull, 1ull}) fakes::appendValue(*bytes, word);
-  }
+  const Bytes figure = fakes::Kcdata().thread(1, "VM_swapout", ~0ull).bytes;
+  const Bytes none = fakes::Kcdata().begin(1).name("VM_swapout").end(1).bytes;
+  const Bytes tooShort =
+      fakes::Kcdata().begin(1).name("VM_swapout").item(fakes::kIo, 0, Bytes(31)).end(1).bytes;
   const std::string failed =
       "VMFreezer.Error='1' VMFreezer.ErrorMessage='Unable parse snapshot for VMFreezer NAND "
       "writes.'";
@@ -245,14 +235,14 @@ TEST_F(NandInfoTest, Freezer) {
     Bytes buffer;
     std::string figures;
   } cases[] = {
-      {"figure", true, 0, 0, item, "VMFreezer.NumPhysicalWrites=-1L"},
-      {"no statistics", true, 0, 0, noFigure, "VMFreezer.NumPhysicalWrites=0L"},
-      {"statistics that end before it", true, 0, 0, shortFigure, failed},
+      {"figure", true, 0, 0, figure, "VMFreezer.NumPhysicalWrites=-1L"},
+      {"no statistics", true, 0, 0, none, "VMFreezer.NumPhysicalWrites=0L"},
+      {"statistics that end before it", true, 0, 0, tooShort, failed},
       {"no thread", true, 0, 0, Bytes(100), failed},
       {"no buffer", true, 0, 0, {}, failed},
-      {"no service", false, 0, 0, item, failed},
-      {"flags", true, 22, 0, item, failed},
-      {"capture", true, 0, 1, item, failed},
+      {"no service", false, 0, 0, figure, failed},
+      {"flags", true, 22, 0, figure, failed},
+      {"capture", true, 0, 1, figure, failed},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);

@@ -6,8 +6,8 @@
 #include <memory>
 #include <string>
 
+#include "fakes/statistics_buffer.h"
 #include "storage/statistics.h"
-#include "storage/statistics_buffer.h"
 
 namespace tally {
 namespace {

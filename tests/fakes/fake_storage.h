@@ -11,11 +11,11 @@
 #include <vector>
 
 #include "fakes/fake_platform.h"
-#include "storage/statistics_buffer.h"
+#include "fakes/statistics_buffer.h"
 
 namespace tally::fakes {
 
-struct FakeStorageRegistry final : DeviceRegistry {
+struct FakeStorageRegistry : DeviceRegistry {
   struct Reply {
     Bytes bytes;
     RegistryResult status = 0;
@@ -132,8 +132,12 @@ struct FakePurgeableSpace final : PurgeableSpace {
 
 // The fakes in force, and what goes to standard error.
 struct FakeStorage {
+  explicit FakeStorage(
+      std::shared_ptr<FakeStorageRegistry> drivers = std::make_shared<FakeStorageRegistry>())
+      : registry(std::move(drivers)) {}
+
   FakePlatform platform = makeFakePlatform();
-  std::shared_ptr<FakeStorageRegistry> registry = std::make_shared<FakeStorageRegistry>();
+  std::shared_ptr<FakeStorageRegistry> registry;
   std::shared_ptr<FakeStackshot> stackshot = std::make_shared<FakeStackshot>();
   std::shared_ptr<FakePurgeableSpace> purgeableSpace = std::make_shared<FakePurgeableSpace>();
 

@@ -1,4 +1,4 @@
-// Writes statistics buffers and kcdata for tests.
+// Writes statistics buffers for tests.
 #pragma once
 
 #include <cstdint>
