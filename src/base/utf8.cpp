@@ -1,8 +1,5 @@
 #include "base/utf8.h"
 
-#include <cstddef>
-#include <cstdint>
-
 namespace tally {
 namespace {
 
@@ -47,6 +44,18 @@ bool isValidUtf8(std::string_view text) {
     i += length;
   }
   return true;
+}
+
+std::uint32_t takeCharacter(std::string_view text, std::size_t& position) {
+  const std::size_t length = sequenceLength(text, position);
+  const auto lead = static_cast<std::uint8_t>(text[position++]);
+  if (length == 0) return 0xFFFD;
+  if (length == 1) return lead;
+  std::uint32_t character = lead & (0xFFu >> (length + 1));
+  for (std::size_t i = 1; i < length; ++i) {
+    character = character << 6 | (static_cast<std::uint8_t>(text[position++]) & 0x3Fu);
+  }
+  return character;
 }
 
 std::string repairUtf8(std::string_view text) {

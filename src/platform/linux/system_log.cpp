@@ -10,6 +10,7 @@
 #include <cstring>
 #include <optional>
 
+#include "base/printable.h"
 #include "base/utf8.h"
 
 namespace tally {
@@ -33,28 +34,6 @@ constexpr std::array kLevels{
 const LevelName& levelName(LogLevel level) { return kLevels[static_cast<std::size_t>(level)]; }
 
 iovec field(std::string_view text) { return {const_cast<char*>(text.data()), text.size()}; }
-
-void appendEscaped(std::string& out, std::string_view text) {
-  constexpr char kDigits[] = "0123456789abcdef";
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    auto byte = static_cast<unsigned char>(text[i]);
-    // U+0080 to U+009F, which terminals obey as they obey the controls below U+0020.
-    const bool upperControl =
-        byte == 0xC2 && i + 1 < text.size() && static_cast<unsigned char>(text[i + 1]) < 0xA0;
-    if (upperControl) byte = static_cast<unsigned char>(text[++i]);
-    if (byte == '\n') {
-      out += "\\n";
-    } else if (byte == '\t') {
-      out += "\\t";
-    } else if (upperControl || byte < 0x20 || byte == 0x7F) {
-      out += "\\x";
-      out += kDigits[byte >> 4];
-      out += kDigits[byte & 15];
-    } else {
-      out += static_cast<char>(byte);
-    }
-  }
-}
 
 // The message as valid UTF-8 of bounded length.
 std::string readable(std::string_view message) {
@@ -125,7 +104,7 @@ std::string standardErrorLine(LogLevel level, std::string_view message) {
   std::string line = "tallyrun[";
   line += levelName(level).name;
   line += "]: ";
-  appendEscaped(line, readable(message));
+  line += printable(readable(message));
   line += '\n';
   return line;
 }

@@ -1,0 +1,22 @@
+// Text from outside in a form that is safe to show, and how much room it takes.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+namespace tally {
+
+// One line that a terminal shows and never obeys: control characters are written as escapes ("\n",
+// "\x1b"), so are characters that reorder or end a line ("\u202e"), and bytes that are not UTF-8
+// become U+FFFD. Everything else stays.
+std::string printable(std::string_view text);
+
+// The terminal columns that printable text takes: 2 for each wide character, none for a combining
+// one.
+std::size_t displayWidth(std::string_view text);
+
+// The text within so many columns: what does not fit is cut from the end, where the mark says so.
+std::string fitted(std::string_view text, std::size_t columns, std::string_view mark);
+
+}  // namespace tally
