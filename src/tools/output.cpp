@@ -1,0 +1,152 @@
+#include "tools/output.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+
+#include "base/number_text.h"
+#include "base/printable.h"
+#include "base/time_text.h"
+#include "kv/base64.h"
+
+namespace tally::tools {
+namespace {
+
+std::string_view sequenceOf(Ink ink) {
+  switch (ink) {
+    case Ink::Strong:
+      return "\x1b[1m";
+    case Ink::Faint:
+      return "\x1b[2m";
+    case Ink::Good:
+      return "\x1b[32m";
+    case Ink::Doubtful:
+      return "\x1b[33m";
+    case Ink::Bad:
+      return "\x1b[1;31m";
+    default:
+      return "";
+  }
+}
+
+// Digits in groups of three.
+std::string grouped(std::string digits) {
+  const std::size_t first = digits.find_first_of("0123456789");
+  for (std::size_t i = digits.size(); i > first + 3;) digits.insert(i -= 3, 1, ',');
+  return digits;
+}
+
+}  // namespace
+
+std::string inked(const Terminal& terminal, Ink ink, std::string_view text) {
+  const std::string_view begin = sequenceOf(ink);
+  if (!terminal.colour || begin.empty() || text.empty()) return std::string(text);
+  return fmt::format("{}{}\x1b[0m", begin, text);
+}
+
+void printHeading(const ToolContext& context, std::string_view title) {
+  print(context.out, "\n" + inked(context.output, Ink::Strong, printable(title)) + "\n");
+}
+
+void printLine(const ToolContext& context, std::string_view text, Ink ink) {
+  print(context.out, inked(context.output, ink, printable(text)) + "\n");
+}
+
+std::string bar(const Terminal& terminal, double share, std::size_t width) {
+  constexpr std::size_t kSteps = 8;  // of a column
+  static constexpr std::string_view kPart[kSteps] = {"", "▏", "▎", "▍", "▌", "▋", "▊", "▉"};
+  if (!(share > 0)) return "";
+  const double columns = std::min(share, 1.0) * static_cast<double>(width);
+  if (!terminal.unicode) {
+    return std::string(static_cast<std::size_t>(std::max(1.0, std::round(columns))), '#');
+  }
+  const auto steps = static_cast<std::size_t>(std::max(1.0, std::round(columns * kSteps)));
+  std::string text;
+  for (std::size_t i = 0; i < steps / kSteps; ++i) text += "█";
+  return text.append(kPart[steps % kSteps]);
+}
+
+std::string integerText(std::int64_t value) { return grouped(std::to_string(value)); }
+
+std::string realText(double value) {
+  constexpr double kWhole = 1000, kLargest = 1e15;
+  if (!std::isfinite(value) || std::fabs(value) >= kLargest) {
+    std::string text;
+    appendDouble(text, value);
+    return text;
+  }
+  if (std::trunc(value) == value || std::fabs(value) >= kWhole) {
+    return grouped(fmt::format("{:.0f}", value + 0.0));
+  }
+  return fmt::format("{:.4g}", value);
+}
+
+std::string byteText(std::uint64_t bytes) {
+  constexpr double kStep = 1024;
+  if (bytes < 1024) return counted(bytes, "byte");
+  auto value = static_cast<double>(bytes);
+  std::string_view unit;
+  for (const std::string_view next : {"KiB", "MiB", "GiB", "TiB"}) {
+    if (value < kStep) break;
+    value /= kStep;
+    unit = next;
+  }
+  return fmt::format("{:.1f} {}", value, unit);
+}
+
+std::string counted(std::uint64_t count, std::string_view noun) {
+  return fmt::format("{} {}{}", grouped(std::to_string(count)), noun, count == 1 ? "" : "s");
+}
+
+std::string dayName(std::int32_t day) { return fmt::format("day {} ({})", day, dayText(day)); }
+
+Json jsonOfReal(double value) {
+  if (std::isfinite(value)) return value;
+  std::string text;
+  appendDouble(text, value);
+  return text;
+}
+
+Json jsonOf(const KvObject* value) {
+  if (value == nullptr) return nullptr;
+  if (const auto* text = kvCast<KvString>(value)) return std::string(text->view());
+  if (const auto* boolean = kvCast<KvBoolean>(value)) return boolean->value();
+  if (const auto* number = kvCast<KvNumber>(value)) {
+    if (number->isReal()) return jsonOfReal(number->asDouble());
+    return number->isUnsigned() ? Json(number->asUInt64()) : Json(number->asInt64());
+  }
+  if (const auto* date = kvCast<KvDate>(value)) {
+    std::string text;
+    appendTimestamp(text, date->secondsSince1970());
+    return text;
+  }
+  if (const auto* data = kvCast<KvData>(value)) {
+    std::string text;
+    appendBase64(text, data->bytes());
+    return text;
+  }
+  if (const auto* array = kvCast<KvArray>(value)) {
+    Json items = Json::array();
+    for (const auto& item : *array) items.push_back(jsonOf(item.get()));
+    return items;
+  }
+  // Straight into the object's list: looking every key up would take quadratic time.
+  Json object = Json::object();
+  auto& entries = object.get_ref<Json::object_t&>();
+  for (const auto& entry : static_cast<const KvDictionary&>(*value)) {
+    entries.Json::object_t::Container::emplace_back(std::string(entry.key->view()),
+                                                    jsonOf(entry.value.get()));
+  }
+  return object;
+}
+
+void printJson(const ToolContext& context, const Json& document) {
+  print(context.out, document.dump(2, ' ', false, Json::error_handler_t::replace) + "\n");
+}
+
+int complain(const ToolContext& context, std::string_view message, ExitStatus status) {
+  print(context.err, fmt::format("tallyctl: {}\n", printable(message)));
+  return status;
+}
+
+}  // namespace tally::tools
