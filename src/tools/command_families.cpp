@@ -1,4 +1,5 @@
 // The table of all commands, in the order of the help.
+#include "tools/nand_commands.h"
 #include "tools/store_commands.h"
 #include "tools/tool.h"
 
@@ -7,6 +8,7 @@ namespace tally::tools {
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
       addStoreCommands,
+      addNandCommands,
   };
   return kFamilies;
 }
