@@ -34,7 +34,7 @@ std::string familyText(const NandFigure& figure) {
   }
   const auto [least, most] = std::minmax_element(values.begin(), values.end());
   return fmt::format("{} values, {} to {}, most at {}{}", values.size(), integerText(*least),
-                     integerText(*most), figure.name, most - values.begin());
+                     integerText(*most), figure.name, *figure.first + (most - values.begin()));
 }
 
 void printInfo(const ToolContext& context, const KvDictionary& info, const std::string& text) {
@@ -42,9 +42,9 @@ void printInfo(const ToolContext& context, const KvDictionary& info, const std::
     printHeading(context, group.title);
     Table table({{""}, {"", Align::Left, true}});
     for (const NandFigure& figure : group.figures) {
-      if (figure.isFamily) {
-        table.add(
-            {fmt::format("{}0-{}", figure.name, figure.values.size() - 1), familyText(figure)});
+      if (figure.first) {
+        const std::size_t last = static_cast<std::size_t>(*figure.first) + figure.values.size() - 1;
+        table.add({fmt::format("{}{}-{}", figure.name, *figure.first, last), familyText(figure)});
       } else {
         table.add({figure.name, integerText(figure.values.front())});
       }

@@ -1,7 +1,8 @@
 #include "tools/nand_groups.h"
 
 #include <algorithm>
-#include <map>
+
+#include "base/number_text.h"
 
 namespace tally::tools {
 namespace {
@@ -59,10 +60,35 @@ std::size_t groupOf(std::string_view name) {
   return groups.size() - 1;
 }
 
-// The name without the number at its end.
-std::string_view baseOf(std::string_view name) {
-  const std::size_t last = name.find_last_not_of("0123456789");
-  return last == std::string_view::npos ? name : name.substr(0, last + 1);
+// A name that ends in a number, and the number.
+struct Numbered {
+  std::string_view base;
+  std::int64_t number;
+};
+std::optional<Numbered> numberedName(std::string_view name) {
+  const std::size_t start = name.find_last_not_of("0123456789") + 1;
+  const auto number = parseInt64(name.substr(start));
+  if (!number) return std::nullopt;
+  return Numbered{name.substr(0, start), *number};
+}
+
+// The figures of a group as they come; those that count on from the former one join it.
+void addFigure(std::vector<NandFigure>& figures, std::string_view name, std::int64_t value) {
+  const auto numbered = numberedName(name);
+  if (numbered) {
+    for (NandFigure& figure : figures) {
+      const auto former = figure.first ? std::nullopt : numberedName(figure.name);
+      const std::string_view base = former ? former->base : std::string_view(figure.name);
+      const std::int64_t first = figure.first.value_or(former ? former->number : -1);
+      const auto next = first + static_cast<std::int64_t>(figure.values.size());
+      if (first < 0 || base != numbered->base || next != numbered->number) continue;
+      figure.first = first;
+      figure.name = std::string(numbered->base);
+      figure.values.push_back(value);
+      return;
+    }
+  }
+  figures.push_back({std::string(name), {value}});
 }
 
 }  // namespace
@@ -70,31 +96,12 @@ std::string_view baseOf(std::string_view name) {
 std::vector<NandGroup> groupNandInfo(const KvDictionary& info, std::string_view text) {
   std::vector<NandGroup> groups;
   for (const NamesOfGroup& group : groupsOfNames()) groups.push_back({group.title, {}});
-  std::map<std::string, std::pair<std::size_t, std::size_t>, std::less<>> families;
   for (const auto& [key, value] : info) {
     const auto* number = kvCast<KvNumber>(value.get());
     if (number == nullptr || key->view().find(text) == std::string_view::npos) continue;
     std::string_view name = key->view();
     if (name.starts_with(kNandPrefix)) name.remove_prefix(kNandPrefix.size());
-    const std::string base(baseOf(name));
-    const std::size_t group = groupOf(name);
-    auto& figures = groups[group].figures;
-    if (base.size() != name.size()) {
-      const auto found = families.find(base);
-      if (found != families.end()) {
-        groups[found->second.first].figures[found->second.second].values.push_back(
-            number->asInt64());
-        continue;
-      }
-      families[base] = {group, figures.size()};
-    }
-    figures.push_back({std::string(name), {number->asInt64()}, false});
-  }
-  for (const auto& [base, place] : families) {
-    NandFigure& figure = groups[place.first].figures[place.second];
-    if (figure.values.size() < 2) continue;  // a single number is part of the name
-    figure.isFamily = true;
-    figure.name = base;
+    addFigure(groups[groupOf(name)].figures, name, number->asInt64());
   }
   std::erase_if(groups, [](const NandGroup& group) { return group.figures.empty(); });
   return groups;

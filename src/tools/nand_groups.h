@@ -1,6 +1,8 @@
 // The NAND info dictionary as people read it: in groups, numbered keys on one line.
 #pragma once
 
+#include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -15,7 +17,7 @@ constexpr std::string_view kNandPrefix = "vellum.NANDInfo.";
 struct NandFigure {
   std::string name;  // without the prefix
   std::vector<std::int64_t> values;
-  bool isFamily = false;
+  std::optional<std::int64_t> first = {};  // of a family: the number of its first value
 };
 
 struct NandGroup {
