@@ -4,6 +4,7 @@
 #include <span>
 
 #include "driver/daily_job.h"
+#include "driver/telemetry_sweep.h"
 #include "host_platform.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/platform.h"
@@ -15,6 +16,8 @@ int main(int count, char** arguments) {
   ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
   ::mallopt(M_MMAP_THRESHOLD, kKeptBytes / 2);
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
-  tally::DailyJob job({});
+  tally::DailyJob job({.startListener = {},
+                       .runTelemetrySweep = [] { tally::runTelemetrySweep(); },
+                       .updateTaskingState = {}});
   return job.run({arguments, static_cast<std::size_t>(count)});
 }

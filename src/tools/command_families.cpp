@@ -1,6 +1,7 @@
 // The table of all commands, in the order of the help.
 #include "tools/doctor_command.h"
 #include "tools/explain_command.h"
+#include "tools/nand_commands.h"
 #include "tools/prefs_commands.h"
 #include "tools/report_commands.h"
 #include "tools/store_commands.h"
@@ -11,8 +12,8 @@ namespace tally::tools {
 
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
-      addStoreCommands,  addWhitelistCommands, addReportCommands,
-      addExplainCommand, addPrefsCommands,     addDoctorCommand,
+      addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
+      addNandCommands,  addPrefsCommands,     addDoctorCommand,
   };
   return kFamilies;
 }

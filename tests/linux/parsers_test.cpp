@@ -147,6 +147,12 @@ TEST(SwapUsage, ReadsTheTwoFigures) {
   }
 }
 
+TEST(BootSession, IsTheBootIdInUpperCase) {
+  EXPECT_EQ(parseBootSession("3f0c9a1e-77aa-4b0d-9f7e-0123456789ab\n"),
+            "3F0C9A1E-77AA-4B0D-9F7E-0123456789AB");
+  EXPECT_FALSE(parseBootSession("\n"));
+}
+
 TEST(InverseDeviceID, HidesTheMachineId) {
   const std::string machine = "0123456789abcdef0123456789abcdef";
   const std::string identifier = inverseDeviceID(machine + "\n");

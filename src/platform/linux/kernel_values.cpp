@@ -77,6 +77,15 @@ std::optional<SwapUsage> parseSwapUsage(std::string_view meminfo, std::uint32_t 
   return SwapUsage{*total, *available, *total - *available, pageSize, 0};
 }
 
+std::optional<std::string> parseBootSession(std::string_view bootId) {
+  std::string session(trimmed(bootId.substr(0, bootId.find('\n'))));
+  if (session.empty()) return std::nullopt;
+  for (char& letter : session) {
+    if (letter >= 'a' && letter <= 'z') letter = static_cast<char>(letter - 'a' + 'A');
+  }
+  return session;
+}
+
 int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byte> buffer,
                                        std::size_t* length) {
   const std::size_t room = std::min(buffer.size(), *length);
@@ -86,6 +95,13 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
     const auto pageSize = static_cast<std::uint32_t>(::sysconf(_SC_PAGESIZE));
     if (const auto usage = meminfo ? parseSwapUsage(*meminfo, pageSize) : std::nullopt) {
       answer = Answer{0, bytesOf(*usage)};
+    }
+  }
+  if (!answer && name == "kern.bootsessionuuid") {
+    const auto text = readFile("/proc/sys/kernel/random/boot_id", kLargestProcFile);
+    if (const auto session = text ? parseBootSession(*text) : std::nullopt) {
+      const auto bytes = std::as_bytes(std::span(*session));
+      answer = Answer{0, {bytes.begin(), bytes.end()}};
     }
   }
   if (!answer) return ENOENT;

@@ -25,6 +25,9 @@ static_assert(sizeof(SwapUsage) == 32);
 // From the text of /proc/meminfo; empty unless it tells both the total and the free space.
 std::optional<SwapUsage> parseSwapUsage(std::string_view meminfo, std::uint32_t pageSize);
 
+// From the text of the kernel's boot id: the same in upper case; empty when there is none.
+std::optional<std::string> parseBootSession(std::string_view bootId);
+
 class LinuxKernelValues final : public KernelValues {
  public:
   explicit LinuxKernelValues(std::shared_ptr<DeviceDescription> description)

@@ -1,0 +1,146 @@
+#include "driver/telemetry_sweep.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "base/byte_reader.h"
+#include "hwreport/hwreport.h"
+#include "platform/platform.h"
+#include "storage/auxiliary_metrics.h"
+#include "storage/nand_info.h"
+
+namespace tally {
+namespace {
+
+constexpr std::uint16_t kSweptCategories = 0x100;
+
+constexpr std::size_t kEccRecordSize = 72;
+constexpr std::size_t kEccCountOffset = 1, kEccRegistersOffset = 8;
+constexpr std::size_t kEccRegisterSlots = (kEccRecordSize - kEccRegistersOffset) / 8;
+constexpr std::uint32_t kEccRecordType = 172;
+constexpr int kEccRecordsPerSweep = 10;
+constexpr int kNoSuchValue = 2, kBusy = 16;  // nothing is pending
+
+// Scalars set while it lives reach the store together.
+class StoreBatch {
+ public:
+  StoreBatch() { platform().metricsStore->beginBatch(); }
+  ~StoreBatch() { platform().metricsStore->endBatch(); }
+  StoreBatch(const StoreBatch&) = delete;
+  StoreBatch& operator=(const StoreBatch&) = delete;
+};
+
+void setScalar(std::string_view key, std::int64_t value) {
+  platform().metricsStore->TBClientSetValueForScalarKey(key, value);
+}
+
+// Bytes as whole MiB; -1 when the answer lacks the entry.
+std::int64_t mebibytes(const KvDictionary* usage, std::string_view entry) {
+  const auto bytes = usage != nullptr ? usage->getInt64(entry) : std::nullopt;
+  return bytes ? *bytes >> 20 : -1;
+}
+
+void sweepDiskUsage() {
+  const auto answer = platform().deviceInformation->DeviceQuery("DiskUsage");
+  const auto* usage = kvCast<KvDictionary>(answer.get());
+  setScalar("vellum.dockyard.DiskUsageUserTotalBlocks",
+            mebibytes(usage, kDOQDiskUsageTotalDiskCapacity));
+  setScalar("vellum.dockyard.DiskUsageUserBlocksFree",
+            mebibytes(usage, kDOQDiskUsageTotalDataAvailable));
+}
+
+void sweepStorage() {
+  const auto info = CopyNANDInfoWithOptions(kNANDInfoAnalyticsOption);
+  if (!info) {
+    logMessage(LogLevel::Default, "failed to get NAND info dict");
+    return;
+  }
+  if (const auto freezer = CopyVMFreezerNANDInfo()) info->merge(*freezer);
+  if (const KvObject* error = info->get(kNANDInfoErrorKey)) {
+    logMessage(LogLevel::Default, "error reading nand info, error {} with message {}",
+               kvText(error), kvText(info->get(kNANDInfoErrorMessageKey)));
+    return;
+  }
+  for (const auto& [key, value] : *info) {
+    if (const auto* number = kvCast<KvNumber>(value.get())) {
+      setScalar(key->view(), number->asInt64());
+    }
+  }
+}
+
+void logEccRecord(const ByteReader& record) {
+  const std::uint8_t count = record.read<std::uint8_t>(kEccCountOffset).value_or(0);
+  auto entry = KvDictionary::create(2 + kEccRegisterSlots);
+  entry->set("id", KvNumber::int32(record.read<std::uint8_t>(0).value_or(0)));
+  entry->set("count", KvNumber::int32(count));
+  // The count may promise more registers than the record has.
+  for (std::size_t i = 0; i < count; ++i) {
+    const auto value = record.read<std::int64_t>(kEccRegistersOffset + 8 * i);
+    if (!value) break;
+    entry->set("reg" + std::to_string(i), KvNumber::int64(*value));
+  }
+  platform().crashReporting->FDLogStructuredData(kEccRecordType, *entry);
+}
+
+void forwardEccEvents() {
+  std::array<std::byte, kEccRecordSize> buffer;
+  // Not reset between reads: the kernel is given the length that its last record had.
+  std::size_t length = buffer.size();
+  const auto readNext = [&] {
+    const int error =
+        platform().kernelValues->readKernelValue("kern.next_ecc_event", buffer, &length);
+    length = std::min(length, buffer.size());
+    return error;
+  };
+  int error = readNext();
+  for (int logged = 0; error == 0 && logged < kEccRecordsPerSweep; ++logged) {
+    logEccRecord(ByteReader({buffer.data(), length}));
+    error = readNext();
+  }
+  if (error != 0 && error != kNoSuchValue && error != kBusy) {
+    logMessage(LogLevel::Default, "Unexpected errno ({}) reading ECC events from kernel", error);
+  }
+}
+
+bool isSimple(const KvDictionary* channel) {
+  return HwReportChannelGetFormat(channel) == kHwReportFormatSimple;
+}
+
+int recordChannel(KvDictionary* channel) {
+  if (!isSimple(channel)) return HwIterContinue;
+  const KvString* name = HwReportChannelGetChannelName(channel);
+  if (name != nullptr) {
+    setScalar(std::string("vellum.hwreport.").append(name->view()),
+              HwReportSimpleGetIntegerValue(channel));
+  }
+  return HwIterContinue;
+}
+
+void sweepChannels() {
+  const auto channels = HwReportCopyChannelsInCategories(kSweptCategories, kHwReportByDriver);
+  if (!channels) return;
+  HwReportPrune(channels.get(), [](KvDictionary* channel) {
+    return isSimple(channel) ? HwIterContinue : HwIterDrop;
+  });
+  KvRef<KvDictionary> subscribed;
+  const auto subscription = HwReportCreateSubscription(nullptr, channels.get(), &subscribed, 0);
+  if (!subscription) return;
+  const auto samples = HwReportCreateSamples(subscription.get(), subscribed.get());
+  if (samples) HwReportIterate(samples.get(), recordChannel);
+}
+
+}  // namespace
+
+void runTelemetrySweep(const SweepCapabilities& capabilities) {
+  const StoreBatch batch;
+  sweepDiskUsage();
+  if (capabilities.dumpStorageStructuredLog) capabilities.dumpStorageStructuredLog(false);
+  sweepStorage();
+  forwardEccEvents();
+  sweepChannels();
+}
+
+}  // namespace tally

@@ -1,0 +1,237 @@
+// The exporter table, connections, the fetch and the content-deletion query, with every call
+// failing once. What is printed is compared to the letter.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <bit>
+
+#include "fakes/fake_storage.h"
+#include "storage/exporter.h"
+
+namespace tally {
+namespace {
+
+using fakes::Bytes;
+using fakes::statisticsBuffer;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Calls = std::vector<std::string>;
+
+constexpr char kNvme[] = "OrreryEmbeddedNVMeController";
+const Bytes kBuffer = statisticsBuffer({{53, {2}}, {7, {11}}});  // 32 bytes
+const Calls kFetch = {"find SPXStorage", "open 7 type 0", "call 8 in 24 13 1 room 4",
+                      "call 8 in 24 13 room 32", "close 9"};
+
+class StorageConnectionTest : public testing::Test {
+ protected:
+  // Runs and returns what went to standard error; nothing may stay open.
+  template <class Run>
+  std::string printed(const Run& run) {
+    testing::internal::CaptureStderr();
+    run();
+    EXPECT_EQ(storage.registry->services, 0);
+    EXPECT_EQ(storage.registry->connections, 0);
+    return testing::internal::GetCapturedStderr();
+  }
+  fakes::FakeStorage storage;
+  fakes::FakeStorageRegistry& registry = *storage.registry;
+};
+
+TEST_F(StorageConnectionTest, TheFirstKnownClassIsTaken) {
+  const struct {
+    std::set<std::string> classes;
+    std::size_t exporter;
+  } cases[] = {{{"SPXStorage", kNvme}, 0}, {{kNvme, "Other"}, 1}, {{"Other"}, 2}};
+  for (const auto& c : cases) {
+    registry.classes = c.classes;
+    const NandExporter* exporter = nullptr;
+    const std::uint32_t service = findNandExporter(&exporter);
+    EXPECT_EQ(exporter, &nand_exporters[c.exporter]);
+    EXPECT_EQ(service != 0, exporter->className != nullptr);
+  }
+}
+
+TEST_F(StorageConnectionTest, TheTable) {
+  std::string table;
+  for (const NandExporter& e : nand_exporters) {
+    if (e.className == nullptr) continue;
+    table += fmt::format("{}|{}|{}|{}|{}", e.className, e.characteristicsKey,
+                         e.contentDeletionMethod, e.sizeMethod, e.dataMethod);
+    for (const SelectorGetter get :
+         {e.statsSelectors, e.defectsListSelectors, e.telemetryListSelectors,
+          e.taskSchedulerSelectors, e.snapshotSelectors, e.snapshotHeaderSelectors,
+          e.bandStatsSelectors}) {
+      table += fmt::format(" {}/{}", get()[0], get()[1]);
+    }
+    table += "\n";
+  }
+  EXPECT_EQ(table,
+            "SPXStorage|Device Characteristics|5|8|8"
+            " 13/13 15/15 17/17 39/39 22/22 145/145 11/11\n"
+            "OrreryEmbeddedNVMeController|Controller Characteristics|-1|9|9"
+            " 13/13 15/15 17/17 39/39 22/22 145/145 11/11\n");
+  EXPECT_EQ(nand_exporters[2].contentDeletionMethod, 0);
+  EXPECT_EQ(nand_exporters[2].parseBuffer, nullptr);
+}
+
+TEST_F(StorageConnectionTest, Fetch) {
+  const Bytes size{std::byte{32}, std::byte{0}, std::byte{0}, std::byte{0}};
+  Bytes longer = kBuffer;
+  longer.resize(100);
+  const Bytes cut(kBuffer.begin(), kBuffer.begin() + 16);
+  const Bytes torn(kBuffer.begin(), kBuffer.begin() + 24);
+  const Calls untilOpen(kFetch.begin(), kFetch.begin() + 2);
+  Calls withoutData = kFetch, withoutRoom = kFetch;
+  withoutData.erase(withoutData.begin() + 3);
+  withoutRoom[3] = "call 8 in 24 13 room 0";
+  const struct {
+    const char* name;
+    std::deque<fakes::FakeStorageRegistry::Reply> replies;
+    RegistryResult openStatus, closeStatus;
+    bool result;
+    std::string printed;
+    Calls calls;
+    std::uint64_t hostReads;
+  } cases[] = {
+      {"all well", {{size}, {kBuffer}}, 0, 0, true, "", kFetch, 11},
+      {"shorter than announced", {{size}, {cut}}, 0, 0, true, "", kFetch, 0},
+      {"cut in a record", {{size}, {torn}}, 0, 0, false, "", kFetch, 0},
+      {"empty", {{size}, {Bytes{}}}, 0, 0, false, "", kFetch, 0},
+      {"says more than announced", {{size}, {longer}}, 0, 0, true, "", kFetch, 11},
+      {"nothing announced", {{Bytes(4)}, {kBuffer}}, 0, 0, false, "", withoutRoom, 0},
+      {"no size at all", {{Bytes{}}, {kBuffer}}, 0, 0, false, "", withoutRoom, 0},
+      {"no connection", {}, 5, 0, false, "Could not get connection to service\n", untilOpen, 0},
+      {"size query fails",
+       {{size, 0xE00002C2}},
+       0,
+       0,
+       false,
+       "HwConnectCallStructMethod: -536870206",
+       withoutData,
+       0},
+      {"data call fails",
+       {{size}, {kBuffer, 1}},
+       0,
+       0,
+       false,
+       "Could not retrieve data from driver for selector d\n",
+       kFetch,
+       0},
+      {"close fails",
+       {{size}, {kBuffer}},
+       0,
+       1,
+       true,
+       "Could not close connection to service\n",
+       kFetch,
+       11},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    registry.calls.clear();
+    registry.replies = c.replies;
+    registry.openStatus = c.openStatus;
+    registry.closeStatus = c.closeStatus;
+    const NandExporter* exporter = nullptr;
+    SPXParseContext context;
+    bool result = !c.result;
+    EXPECT_EQ(printed([&] { result = loadNandStatistics(&exporter, &context)->value(); }),
+              c.printed);
+    EXPECT_EQ(result, c.result);
+    EXPECT_EQ(registry.calls, c.calls);
+    EXPECT_EQ(exporter, &nand_exporters[0]);
+    EXPECT_EQ(context.hostReads, c.hostReads);
+    EXPECT_EQ(context.firstBlock != nullptr, c.result);  // nothing is left behind by a failure
+    SPXReleaseContext(&context);
+  }
+}
+
+TEST_F(StorageConnectionTest, WithoutADriver) {
+  registry.classes.clear();
+  const NandExporter* exporter = nullptr;
+  SPXParseContext context;
+  EXPECT_EQ(printed([&] { EXPECT_FALSE(loadNandStatistics(&exporter, &context)->value()); }),
+            "Could not get matching HwKit service for exporting classes\n");
+  EXPECT_EQ(exporter, &nand_exporters[2]);
+  EXPECT_EQ(printed([&] { EXPECT_FALSE(NandRecommendsContentDeletion()->value()); }),
+            "_load_nand_infoCould not get matching HwKit service for exporting classes\n");
+  EXPECT_EQ(printed([&] { EXPECT_EQ(FNDConnect(&exporter), 0u); }), "No class found");
+  SPXConnection connection;
+  EXPECT_EQ(printed([&] { EXPECT_EQ(openSPXConnection(&connection), 0); }),
+            "Can't get SPX Connection, no matching service!\n");
+  EXPECT_THAT(registry.calls, IsEmpty());
+}
+
+TEST_F(StorageConnectionTest, ContentDeletion) {
+  const auto reply = [](std::size_t length, std::byte last) {
+    Bytes bytes(length);
+    if (length > 0) bytes.back() = last;
+    return bytes;
+  };
+  const Calls asked = {"find SPXStorage", "open 7 type 0", "call 5 in 0 room 4", "close 9"};
+  const struct {
+    const char* className;
+    fakes::FakeStorageRegistry::Reply reply;
+    RegistryResult openStatus, closeStatus;
+    bool answer;
+    std::string printed;
+    Calls calls;
+  } cases[] = {
+      {"SPXStorage", {reply(4, std::byte{1})}, 0, 0, true, "", asked},
+      {"SPXStorage", {reply(9, std::byte{1})}, 0, 0, false, "", asked},
+      {"SPXStorage", {reply(4, std::byte{0})}, 0, 0, false, "", asked},
+      {"SPXStorage", {reply(3, std::byte{1})}, 0, 0, false, "", asked},
+      {"SPXStorage", {reply(4, std::byte{1}), 1}, 0, 0, false, "", asked},
+      {"SPXStorage",
+       {reply(4, std::byte{1})},
+       0,
+       1,
+       true,
+       "Could not close connection to service\n",
+       asked},
+      {"SPXStorage",
+       {},
+       1,
+       0,
+       false,
+       "Could not get connection to service\n",
+       {"find SPXStorage", "open 7 type 0"}},
+      {kNvme, {reply(4, std::byte{1})}, 0, 0, false, "", {std::string("find ") + kNvme}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(&c - cases);
+    registry.calls.clear();
+    registry.classes = {c.className};
+    registry.replies = {c.reply};
+    registry.openStatus = c.openStatus;
+    registry.closeStatus = c.closeStatus;
+    bool answer = !c.answer;
+    EXPECT_EQ(printed([&] { answer = NandRecommendsContentDeletion()->value(); }), c.printed);
+    EXPECT_EQ(answer, c.answer);
+    EXPECT_EQ(registry.calls, c.calls);
+  }
+}
+
+TEST_F(StorageConnectionTest, OpenConnections) {
+  SPXConnection connection;
+  EXPECT_EQ(openSPXConnection(&connection), 1);
+  EXPECT_NE(connection.service, 0u);
+  EXPECT_NE(connection.connection, 0u);
+  EXPECT_EQ(printed([&] { closeSPXConnection(&connection); }), "");
+  EXPECT_EQ(connection.connection, 0u);
+  EXPECT_EQ(connection.service, 0u);
+  EXPECT_EQ(printed([&] { closeSPXConnection(&connection); }), "");
+
+  registry.openStatus = 0xE00002C5;
+  EXPECT_EQ(printed([&] { EXPECT_EQ(openSPXConnection(&connection), 0); }),
+            "HwServiceOpen failed for class 'SPXStorage', result 0xe00002c5\n"
+            "Can't get SPX Connection!\n");
+  registry.openStatus = 0;
+  registry.closeStatus = 1;
+  const NandExporter* exporter = nullptr;
+  EXPECT_EQ(printed([&] { FNDDisconnect(FNDConnect(&exporter)); }),
+            "closing connection to service failed\n");
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,316 @@
+// The NAND info dictionary from driver to caller, and the figures that are added to it.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "fakes/fake_storage.h"
+#include "fakes/kcdata.h"
+#include "storage/analytics_route.h"
+#include "storage/auxiliary_metrics.h"
+#include "storage/nand_info.h"
+#include "storage/statistic_key_table.h"
+
+namespace tally {
+namespace {
+
+using fakes::Bytes;
+using fakes::Record;
+using fakes::statisticsBuffer;
+
+constexpr std::string_view kPrefix = "vellum.NANDInfo.";
+constexpr std::uint64_t kFull = 0x20002;
+
+// "name=value"; a wide number carries an L, a string quotes.
+std::string text(const KvDictionary& dictionary) {
+  std::string all;
+  for (const auto& [key, value] : dictionary) {
+    EXPECT_TRUE(key->view().starts_with(kPrefix)) << key->view();
+    const auto* number = kvCast<KvNumber>(value.get());
+    const std::string quote = kvCast<KvString>(value.get()) != nullptr ? "'" : "";
+    all.append(all.empty() ? "" : " ").append(key->view().substr(kPrefix.size())).append("=");
+    all.append(quote).append(kvText(value.get())).append(quote);
+    if (number != nullptr && number->kind() == KvNumberKind::Int64) all.append("L");
+  }
+  return all;
+}
+
+class NandInfoTest : public testing::Test {
+ protected:
+  NandInfoTest() {
+    storage.purgeableSpace->answer =
+        KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", KvNumber::int64(5)},
+                              {"RECLAIM_NONPURGEABLE_AMOUNT", KvNumber::int64(6)}});
+  }
+  KvRef<KvDictionary> infoOf(std::uint64_t exportVersion, std::vector<Record> records) {
+    records.insert(records.begin(), {53, {exportVersion}});
+    storage.registry->serve(statisticsBuffer(records));
+    return CopyNANDInfo();
+  }
+  // One figure of a full export, as text; "(null)" when it is not there.
+  std::string figure(std::string_view name, std::vector<Record> records) {
+    return kvText(infoOf(kFull, std::move(records))->get(std::string(kPrefix).append(name)));
+  }
+  fakes::FakeStorage storage;
+};
+
+const char* const kReclaim = " Reclaim.TotalPurgeableBytes=5L Reclaim.TotalNonPurgeableBytes=6L";
+
+TEST_F(NandInfoTest, AnOldExportHasTheFirstFiguresOnly) {
+  EXPECT_EQ(text(*infoOf(0x20001, {{49, {4096}},
+                                   {50, {128}},
+                                   {52, {0x1FFFFFFFF}},
+                                   {7, {1}},
+                                   {4, {2}},
+                                   {48, {3}},
+                                   {17, {4}},
+                                   {19, {5}},
+                                   {18, {6}},
+                                   {20, {7}},
+                                   {12, {8}},
+                                   {13, {~0ull}},
+                                   {56, {1u << 30}},
+                                   {37, {9}}})),
+            std::string("ExportVersion=131073 DriverVersion=-1 DemoMode=0L NumVirtualBlocks=-1 "
+                        "PagesPerVirtualBlock=128 BytesPerPage=4096 NumLogicalReads=1L "
+                        "NumLogicalWrites=2L NumFreeVirtualBlocks=3L NumWearLevelOps=4L "
+                        "NumPhysicalReads=5L NumPhysicalWrites=6L NumPhysicalErases=7L "
+                        "NodesFree=8L NodesTotal=-1L") +
+                kReclaim);
+}
+
+TEST_F(NandInfoTest, AFullExport) {
+  EXPECT_EQ(text(*infoOf(kFull, {{37, {9}},
+                                 {28, {1}},
+                                 {45, {2}},
+                                 {51, {3}},
+                                 {265, {4, 5}},
+                                 {86, {100}},
+                                 {85, {40}},
+                                 {2, {1}},
+                                 {42, {1}}})),
+            std::string("ExportVersion=131074 DriverVersion=-1 DemoMode=0L NumVirtualBlocks=0 "
+                        "PagesPerVirtualBlock=0 BytesPerPage=0 NumLogicalReads=0L "
+                        "NumLogicalWrites=0L NumFreeVirtualBlocks=0L NumWearLevelOps=0L "
+                        "NumPhysicalReads=0L NumPhysicalWrites=0L NumPhysicalErases=0L "
+                        "NodesFree=0L NodesTotal=0L formatDaysSince2000=0L NumSleepOps=1L "
+                        "HighEnduranceBlockEraseCount=2L BlocksPerVirtualBlock=3 "
+                        "ReadsBeforeErasure0=4L ReadsBeforeErasure50000=5L "
+                        "ReadsBeforeErasure100000=0L ReadsBeforeErasure150000=0L "
+                        "ReadsBeforeErasure200000=0L NumFlushes=9L IntermediatePartitionSize=60L "
+                        "NumMaintenanceRequests=0L MaintenanceRequestsFailedRead=0L "
+                        "MaintenanceRequestsFailedProg=0L MaintenanceRequestsFailedErase=0L") +
+                kReclaim);
+}
+
+TEST_F(NandInfoTest, DerivedFigures) {
+  constexpr std::uint64_t k2000 = 946'684'800, kWeek = 604'800;
+  const struct {
+    const char* figure;
+    std::vector<Record> records;
+    const char* value;
+  } cases[] = {
+      {"formatDaysSince2000", {{56, {0}}}, "0"},
+      {"formatDaysSince2000", {{56, {k2000}}}, "0"},
+      {"formatDaysSince2000", {{56, {k2000 + kWeek - 1}}}, "0"},
+      {"formatDaysSince2000", {{56, {k2000 + kWeek}}}, "1"},
+      {"maxMemChokeDuration", {{142, {0}}}, "0"},
+      {"maxMemChokeDuration", {{142, {999}}}, "999"},
+      {"maxMemChokeDuration", {{142, {1234}}}, "1230"},
+      {"maxMemChokeDuration", {{142, {1235}}}, "1240"},
+      {"maxMemChokeDuration", {{142, {9995}}}, "10000"},
+      {"maxMemChokeDuration", {{142, {0x500000001}}}, "1"},
+      {"maxMemChokeDuration", {{142, {0xFFFFFFFF}}}, "4290000000"},
+      {"maxMemExtremeDuration", {{188, {123'499}}}, "123000"},
+      {"maxMemExtremeDuration", {{188, {123'500}}}, "124000"},
+      {"memExtremeDuration", {{189, {123'456}}}, "123456"},
+      {"memChokeDuration", {{143, {123'456}}}, "123456"},
+      {"IntermediatePartitionSize", {{86, {100}}}, "(null)"},
+      {"IntermediatePartitionSize", {{85, {100}}}, "(null)"},
+      {"IntermediatePartitionSize", {{86, {1}}, {85, {3}}}, "-2"},
+      {"userPartitionStart", {{86, {1}}}, "(null)"},
+      {"NumMaintenanceRequests", {{269, {3, 100}}, {270, {4, 100}}}, "7"},
+      {"NumMaintenanceRequests", {{269, {3}}}, "0"},
+      {"MaintenanceRequestsFailedRead", {{289, {0, 5, 0, 9}}}, "1"},
+      {"MaintenanceRequestsFailedProg", {{290, {2, 5, 1, 9}}}, "3"},
+      {"MaintenanceRequestsFailedErase", {{291, {0, 0}}}, "0"},
+      {"BandsPerInternalFlow3", {{114, {1, 2, 3, 4, 5}}}, "5"},
+      {"IntermediateHottestCycle", {{125, {7, 8}}}, "8"},
+      {"ColdestCycle", {{124, {7}}}, "(null)"},
+      {"clogProgram", {{41, {1}}, {41, {~0ull}}}, "-1"},
+      {"DemoMode", {}, "0"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.figure);
+    EXPECT_EQ(figure(c.figure, c.records), c.value);
+  }
+}
+
+TEST_F(NandInfoTest, DemoModeIsAPreferenceThatIsTrue) {
+  const struct {
+    KvRef<KvObject> preference;
+    const char* mode;
+  } cases[] = {{KvBoolean::of(true), "1"},
+               {KvBoolean::of(false), "0"},
+               {KvNumber::int32(1), "1"},
+               {KvString::create("1"), "0"}};
+  for (const auto& c : cases) {
+    storage.platform.preferences->put("StoreDemoMode", c.preference, "vellum.demo-settings");
+    EXPECT_EQ(figure("DemoMode", {}), c.mode);
+  }
+}
+
+TEST_F(NandInfoTest, EveryKeyOfTheTable) {
+  std::vector<Record> records;
+  for (const StatisticKey& row : kStatisticKeys) {
+    std::vector<std::uint64_t> values(std::max<std::size_t>(row.maximum, 1), row.key);
+    if (row.key == 53) values = {kFull};
+    records.push_back({row.key, values});
+  }
+  storage.registry->serve(statisticsBuffer(records));
+  const auto info = CopyNANDInfo();
+  // 15 first figures, 9 of a full export, 678 rows, 5 derived, 2 of the purgeable space.
+  EXPECT_EQ(info->size(), 15u + 9 + 678 + 5 + 2);
+  EXPECT_EQ(info->getInt64("vellum.NANDInfo.CacheDepthVsThroughput255"), 460);
+}
+
+TEST_F(NandInfoTest, Failures) {
+  const std::string unparsable = "Error='1' ErrorMessage='Unable to parse buffer'";
+  storage.registry->serve(statisticsBuffer({{53, {kFull}}, {7, {1}, 2}}));
+  EXPECT_EQ(text(*CopyNANDInfo()), unparsable + kReclaim);
+  EXPECT_EQ(text(*infoOf(0, {{7, {1}}})),
+            std::string("Error='1' ErrorMessage='Unsupported export version'") + kReclaim);
+
+  SPXParseContext context;
+  EXPECT_FALSE(buildNandInfo(context, true));
+  context.exportVersion = 1;
+  EXPECT_TRUE(text(*buildNandInfo(context, true)).starts_with("NumVirtualBlocks=0 "));
+
+  storage.purgeableSpace->available = false;
+  storage.registry->serve({});
+  EXPECT_EQ(text(*CopyNANDInfo()), unparsable +
+                                       " Reclaim.Error='1' Reclaim.ErrorMessage='Unable to parse "
+                                       "reclaim counters'");
+}
+
+TEST_F(NandInfoTest, PurgeableSpace) {
+  const std::string failed =
+      "Reclaim.Error='1' Reclaim.ErrorMessage='Unable to parse reclaim "
+      "counters.'";
+  const auto number = [](std::int64_t value) { return KvNumber::int64(value); };
+  const struct {
+    KvRef<KvDictionary> answer;
+    std::string figures;
+  } cases[] = {
+      {storage.purgeableSpace->answer, kReclaim + 1},
+      {nullptr, failed},
+      {KvDictionary::create(), failed},
+      {KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", number(5)}}),
+       "Reclaim.TotalPurgeableBytes=5L " + failed},
+      {KvDictionary::create({{"RECLAIM_NONPURGEABLE_AMOUNT", number(5)}}),
+       "Reclaim.TotalNonPurgeableBytes=5L " + failed},
+      {KvDictionary::create({{"RECLAIM_ERROR", number(7)}, {"RECLAIM_TOTAL_AVAILABLE", number(5)}}),
+       failed},
+  };
+  for (const auto& c : cases) {
+    storage.purgeableSpace->answer = c.answer;
+    EXPECT_EQ(text(*CopyReclaimNANDInfo()), c.figures);
+    EXPECT_EQ(storage.purgeableSpace->asked, "/private/var");
+  }
+  auto figures = KvDictionary::create();
+  EXPECT_FALSE(addReclaimFigures(*figures));
+  EXPECT_EQ(text(*figures), "Reclaim.Error=7L");
+}
+
+TEST_F(NandInfoTest, Freezer) {
+  const Bytes figure = fakes::Kcdata().thread(1, "VM_swapout", ~0ull).bytes;
+  const Bytes none = fakes::Kcdata().begin(1).name("VM_swapout").end(1).bytes;
+  const Bytes tooShort =
+      fakes::Kcdata().begin(1).name("VM_swapout").item(fakes::kIo, 0, Bytes(31)).end(1).bytes;
+  const std::string failed =
+      "VMFreezer.Error='1' VMFreezer.ErrorMessage='Unable parse snapshot for VMFreezer NAND "
+      "writes.'";
+  const struct {
+    const char* name;
+    bool exists;
+    int flagsStatus, captureStatus;
+    Bytes buffer;
+    std::string figures;
+  } cases[] = {
+      {"figure", true, 0, 0, figure, "VMFreezer.NumPhysicalWrites=-1L"},
+      {"no statistics", true, 0, 0, none, "VMFreezer.NumPhysicalWrites=0L"},
+      {"statistics that end before it", true, 0, 0, tooShort, failed},
+      {"no thread", true, 0, 0, Bytes(100), failed},
+      {"no buffer", true, 0, 0, {}, failed},
+      {"no service", false, 0, 0, figure, failed},
+      {"flags", true, 22, 0, figure, failed},
+      {"capture", true, 0, 1, figure, failed},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    fakes::FakeStackshot& stackshot = *storage.stackshot;
+    stackshot.exists = c.exists;
+    stackshot.flagsStatus = c.flagsStatus;
+    stackshot.captureStatus = c.captureStatus;
+    stackshot.buffer = c.buffer;
+    EXPECT_EQ(text(*CopyVMFreezerNANDInfo()), c.figures);
+    EXPECT_EQ(stackshot.configs, 0);
+  }
+}
+
+TEST_F(NandInfoTest, EveryOtherDayOfABootSessionBelongsToAnalytics) {
+  const struct {
+    std::string session;
+    bool oddDay;  // is the analytics day, of an even and an odd one
+  } cases[] = {{"0", false}, {"1", true},  {"9F", true}, {"8F", false}, {"A", false}, {"B", true},
+               {"F", true},  {"a", false}, {"b", false}, {"", false},   {"-", false}, {"G", false}};
+  for (const auto& c : cases) {
+    auto& answers = storage.platform.kernelValues->answers["kern.bootsessionuuid"];
+    answers = {{Bytes(c.session.size()), 0}};
+    std::memcpy(answers[0].bytes.data(), c.session.data(), c.session.size());
+    for (const int day : {20000, 20001, 20002, 20003}) {
+      SCOPED_TRACE(c.session + " " + std::to_string(day));
+      storage.platform.clock->setDay(day, 86399);
+      const bool analytics = (day % 2 != 0) == c.oddDay;
+      std::uint32_t sentOptions = 0;
+      const AnalyticsRoute route = [&](std::uint32_t options) {
+        sentOptions = options;
+        return KvDictionary::create();
+      };
+      storage.registry->serve(statisticsBuffer({{53, {1}}}));
+      const auto info = copyNandInfoWithRoute(3, route);
+      EXPECT_EQ(sentOptions, analytics ? 3u : 0u);
+      EXPECT_EQ(info->empty(), analytics);
+      // Without the option, or without the route, the day's figures go nowhere.
+      storage.registry->serve(statisticsBuffer({{53, {1}}}));
+      EXPECT_NE(bool(copyNandInfoWithRoute(2, route)), analytics);
+      storage.registry->serve(statisticsBuffer({{53, {1}}}));
+      EXPECT_NE(bool(CopyNANDInfoWithOptions(1)), analytics);
+    }
+  }
+  storage.platform.kernelValues->answers.clear();
+  for (const int day : {20000, 20001}) {
+    storage.platform.clock->setDay(day);
+    storage.registry->serve(statisticsBuffer({{53, {1}}}));
+    EXPECT_TRUE(CopyNANDInfoWithOptions(1)) << day;
+  }
+}
+
+TEST_F(NandInfoTest, DictionaryHelpers) {
+  auto dictionary = KvDictionary::create({{"n", KvNumber::int64(7)}, {"s", KvString::create("x")}});
+  EXPECT_EQ(kvText(GetNumberFromDictionarySafe(*dictionary, "n").get()), "7");
+  EXPECT_EQ(kvText(GetNumberFromDictionarySafe(*dictionary, "z").get()), "0");
+  EXPECT_EQ(kvText(GetStringFromDictionarySafe(*dictionary, "s").get()), "x");
+  EXPECT_EQ(kvText(GetStringFromDictionarySafe(*dictionary, "z").get()), "empty");
+
+  const std::int64_t wide = -5'000'000'000;
+  setNumberInDictionary(*dictionary, "wide", &wide, NumberType::SInt64);
+  setNumberInDictionary(*dictionary, "narrow", &kMinusOne, NumberType::SInt32);
+  EXPECT_EQ(dictionary->getInt64("wide"), wide);
+  EXPECT_EQ(dictionary->getAs<KvNumber>("narrow")->kind(), KvNumberKind::Int32);
+  testing::internal::CaptureStderr();
+  setNumberInDictionary(*dictionary, "none", nullptr, NumberType::SInt32);
+  EXPECT_EQ(testing::internal::GetCapturedStderr(), "Failed to create KvNumber from value: (nil)");
+  EXPECT_FALSE(dictionary->contains("none"));
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,175 @@
+// The statistics parser, record by record, and against buffers that lie.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <memory>
+#include <string>
+
+#include "fakes/statistics_buffer.h"
+#include "storage/statistics.h"
+
+namespace tally {
+namespace {
+
+using fakes::Bytes;
+using fakes::Record;
+using fakes::statisticsBuffer;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Counters = std::vector<std::string>;
+
+// "name=value"
+Counters counters(const SPXParseContext& context) {
+  Counters found;
+  SPXForEachCounter(context, [&](std::string_view name, std::uint64_t value) {
+    found.push_back(std::string(name) + "=" + std::to_string(value));
+  });
+  return found;
+}
+
+struct Parse {
+  explicit Parse(const Bytes& bytes) { add(bytes); }
+  ~Parse() { SPXReleaseContext(&context); }
+  Parse(const Parse&) = delete;
+  Parse& operator=(const Parse&) = delete;
+  void add(const Bytes& bytes) {
+    // Exactly as long as the data, so that a sanitizer sees a read beyond it.
+    const std::unique_ptr<std::byte[]> copy(new std::byte[bytes.size()]);
+    std::copy(bytes.begin(), bytes.end(), copy.get());
+    result = SPXParseBufferToCxt(&context, copy.get(), bytes.size());
+  }
+  SPXParseContext context;
+  int result = 0;
+};
+
+constexpr std::uint32_t kHighestKey = 0x30000000;
+constexpr std::uint64_t kMax = 0xFFFFFFFFFFFFFFFF;
+
+TEST(StatisticsParser, RecordsBecomeCounters) {
+  const struct {
+    const char* name;
+    std::vector<Record> records;
+    int result;
+    Counters counters;
+  } cases[] = {
+      {"unknown key without values", {{21, {}}}, 1, {}},
+      {"scalar", {{2, {kMax}}}, 1, {"hostWriteXacts=18446744073709551615"}},
+      {"values beyond a scalar's first",
+       {{2, {5, 6, 7}}, {3, {8}}},
+       1,
+       {"hostWriteXacts=5", "hostReadXacts=8"}},
+      {"scalar without a value", {{2, {}}, {3, {8}}}, 1, {"hostReadXacts=8"}},
+      {"array", {{91, {1, 2, 3}}}, 1, {"maxQosPerCmdQ0=1", "maxQosPerCmdQ1=2", "maxQosPerCmdQ2=3"}},
+      {"array of one", {{265, {9}}}, 1, {"readCountHisto=9"}},
+      {"array of none", {{265, {}}}, 1, {}},
+      {"array that takes one",
+       {{184, {4, 5, 6}}, {185, {7}}},
+       1,
+       {"TempSensorMax=4", "TempSensorMin=7"}},
+      {"elements beyond the maximum",
+       {{93, {1, 2, 3, 4, 5}}, {2, {6}}},
+       1,
+       {"numBandsRefreshedForAgePerTier0=1", "numBandsRefreshedForAgePerTier1=2",
+        "numBandsRefreshedForAgePerTier2=3", "hostWriteXacts=6"}},
+      {"a key twice", {{2, {1}}, {2, {2}}}, 1, {"hostWriteXacts=1", "hostWriteXacts=2"}},
+      {"highest key", {{kHighestKey, {1}}, {2, {1}}}, 1, {"hostWriteXacts=1"}},
+      {"key above it", {{2, {1}}, {kHighestKey + 1, {1}}, {3, {1}}}, 0, {"hostWriteXacts=1"}},
+      {"one value too many announced", {{2, {1}}, {3, {1}, 2}}, 0, {"hostWriteXacts=1"}},
+      {"count far beyond the buffer", {{2, {1}, 0xFFFFFFFF}}, 0, {}},
+      {"unknown key beyond the buffer", {{21, {}, 1}}, 0, {}},
+      {"header alone at the end", {{2, {1}}, {3, {}}}, 1, {"hostWriteXacts=1"}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::vector<Record> records = c.records;
+    records.insert(records.begin(), {53, {0x20002}});
+    Parse parse(statisticsBuffer(records));
+    EXPECT_EQ(parse.result, c.result);
+    Counters expected = c.counters;
+    expected.insert(expected.begin(), "exportVersion=131074");
+    EXPECT_EQ(counters(parse.context), expected);
+    EXPECT_EQ(parse.context.exportVersion, c.result == 1 ? 0x20002u : 0u);
+    EXPECT_EQ(parse.context.driverVersion, 0xFFFFFFFFu);
+  }
+}
+
+TEST(StatisticsParser, FixedFields) {
+  std::vector<Record> records;
+  for (std::uint32_t key = 1; key <= 60; ++key) records.push_back({key, {0x500000000u + key, 99}});
+  records.push_back({265, {1, 2, 3, 4, 5, 6}});
+  Parse parse(statisticsBuffer(records));
+  const SPXParseContext& c = parse.context;
+  EXPECT_EQ(parse.result, 1);
+  EXPECT_THAT((std::vector{c.exportVersion, c.numVirtualBlocks, c.blocksPerVirtualBlock,
+                           c.pagesPerVirtualBlock, c.bytesPerPage}),
+              ElementsAre(53u, 52u, 51u, 50u, 49u));
+  std::vector<std::uint64_t> wide{c.hostReads,      c.hostWrites,  c.numFreeVirtualBlocks,
+                                  c.wearLevMoves,   c.nandReads,   c.nandWrites,
+                                  c.bandErases,     c.indPoolFree, c.indPoolCount,
+                                  c.utilFormatTime, c.numSleepOps, c.maxHighEnduranceBlockErases};
+  for (std::uint64_t& value : wide) value -= 0x500000000;
+  EXPECT_THAT(wide, ElementsAre(7, 4, 48, 17, 19, 18, 20, 12, 13, 56, 28, 45));
+  EXPECT_THAT(c.readCountHisto, ElementsAre(1, 2, 3, 4, 5));
+
+  SPXReleaseContext(&parse.context);
+  EXPECT_EQ(c.exportVersion, 0u);
+  EXPECT_EQ(c.hostReads, 0u);
+  EXPECT_EQ(c.firstBlock, nullptr);
+}
+
+TEST(StatisticsParser, AShortBufferLeavesTheVersionAlone) {
+  Parse parse(statisticsBuffer({{53, {7}}}));
+  for (std::size_t length = 0; length < 8; ++length) {
+    parse.add(Bytes(length));
+    EXPECT_EQ(parse.result, 0) << length;
+    EXPECT_EQ(parse.context.exportVersion, 7u) << length;
+  }
+}
+
+TEST(StatisticsParser, ASecondBufferAppends) {
+  Parse parse(statisticsBuffer({{2, {1}}, {265, {1, 2, 3, 4, 5}}}));
+  parse.add(statisticsBuffer({{3, {2}}, {265, {9}}}));
+  EXPECT_THAT(
+      counters(parse.context),
+      ElementsAre("hostWriteXacts=1", "readCountHisto0=1", "readCountHisto1=2", "readCountHisto2=3",
+                  "readCountHisto3=4", "readCountHisto4=5", "hostReadXacts=2", "readCountHisto=9"));
+  EXPECT_THAT(parse.context.readCountHisto, ElementsAre(9, 2, 3, 4, 5));
+}
+
+// Every cut either falls between two records, and then what stands before it is whole, or fails.
+TEST(StatisticsParser, EveryCutOfABuffer) {
+  const std::vector<Record> records{{53, {1}}, {90, {1, 2, 3}}, {999, {1, 2}}, {2, {}}, {3, {4}}};
+  const Bytes whole = statisticsBuffer(records);
+  std::vector<std::size_t> ends{0};
+  for (const Record& record : records) ends.push_back(ends.back() + 8 + 8 * record.values.size());
+  for (std::size_t length = 8; length <= whole.size(); ++length) {
+    Parse parse(Bytes(whole.begin(), whole.begin() + static_cast<std::ptrdiff_t>(length)));
+    // Bytes that do not fill a unit are not looked at.
+    const bool isEnd = std::find(ends.begin(), ends.end(), length / 8 * 8) != ends.end();
+    EXPECT_EQ(parse.result, isEnd ? 1 : 0) << length;
+    EXPECT_EQ(parse.context.exportVersion, isEnd ? 1u : 0u) << length;
+  }
+}
+
+TEST(StatisticsParser, ManyCountersKeepTheirOrder) {
+  std::vector<Record> records;
+  for (std::uint64_t i = 0; i < 20'000; ++i) records.push_back({2, {i}});
+  Parse parse(statisticsBuffer(records));
+  std::uint64_t next = 0;
+  SPXForEachCounter(parse.context, [&](std::string_view name, std::uint64_t value) {
+    EXPECT_EQ(name, "hostWriteXacts");
+    EXPECT_EQ(value, next++);
+  });
+  EXPECT_EQ(next, 20'000u);
+}
+
+TEST(StatisticsParser, ReleasingAnEmptyContextIsSafe) {
+  SPXParseContext context;
+  SPXReleaseContext(&context);
+  SPXReleaseContext(&context);
+  EXPECT_EQ(context.firstBlock, nullptr);
+}
+
+}  // namespace
+}  // namespace tally
