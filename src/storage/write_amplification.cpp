@@ -10,7 +10,7 @@ namespace {
 constexpr unsigned kHostUnitShift = 12;  // the host's writes are counted in units of 4 KiB
 constexpr double kUsualThreshold = 2.0, kThresholdLimit = 10.0;
 
-double ratio(std::uint64_t written, std::uint64_t hostWrites) {
+float ratio(std::uint64_t written, std::uint64_t hostWrites) {
   if (hostWrites == 0) return 0;
   return static_cast<float>(static_cast<double>(written) / static_cast<double>(hostWrites));
 }
@@ -38,7 +38,7 @@ WriteAmplification writeAmplificationOf(const SPXParseContext& context) {
           ratio(band.erases * (intermediateBytes >> kHostUnitShift), context.hostWrites)};
 }
 
-bool isHighWriteAmplification(double user) {
+bool isHighWriteAmplification(float user) {
   const auto preference =
       platform().preferences->SMAPreferencesGetValue("userWAmp", "vellum.NANDInfo");
   const auto* const number = kvCast<KvNumber>(preference.get());
