@@ -1,4 +1,6 @@
 // The NAND log writer: a dictionary as one line of text below a header.
+#include "storage/log_writer.h"
+
 #include <cmath>
 #include <exception>
 #include <optional>
@@ -14,15 +16,13 @@ namespace {
 constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 constexpr std::string_view kLastLoggedKey = "SSLastLoggedAt";
 constexpr std::string_view kLogName = "StorageStatus";
-constexpr double kSecondsBetweenLogs = 604800;  // seven days
 
 // A clock that was set back counts as too early, so that it cannot bring a second log.
 bool isTooEarly(double now) {
-  const auto value = platform().preferences->SMAPreferencesGetValue(kLastLoggedKey, kProgramDomain);
-  const auto* const last = kvCast<KvDate>(value.get());
-  if (last == nullptr || !(now - last->secondsSince1970() < kSecondsBetweenLogs)) return false;
+  const auto last = lastStorageLog();
+  if (!last || !(now - *last < kSecondsBetweenStorageLogs)) return false;
   logMessage(LogLevel::Default, "NANDLogWriter:Last written at {} current {} :skipped",
-             kvText(last), kvText(KvDate::create(now).get()));
+             kvText(KvDate::create(*last).get()), kvText(KvDate::create(now).get()));
   return true;
 }
 
@@ -87,6 +87,13 @@ void writeLog(std::string_view logTypeCode, const KvDictionary* values) {
 }
 
 }  // namespace
+
+std::optional<double> lastStorageLog() {
+  const auto value = platform().preferences->SMAPreferencesGetValue(kLastLoggedKey, kProgramDomain);
+  const auto* const date = kvCast<KvDate>(value.get());
+  if (date == nullptr) return std::nullopt;
+  return date->secondsSince1970();
+}
 
 void NLW_WriteLog(std::string_view logTypeCode, const KvDictionary* values) {
   try {

@@ -1,8 +1,6 @@
 // The daily dump: from the write amplification to the handlers of the lists.
 #include "storage/storage_log.h"
 
-#include <string>
-
 #include "platform/platform.h"
 #include "storage/exporter.h"
 #include "storage/storage_lists.h"
@@ -17,15 +15,6 @@ std::uint8_t gNeedValidityList = 0;
 namespace {
 
 constexpr std::string_view kStorageStatusTypeCode = "165";
-
-WriteAmplification measureWriteAmplification() {
-  SPXParseContext context;
-  const NandExporter* exporter = nullptr;
-  if (!loadNandStatistics(&exporter, &context)->value()) return {};
-  const WriteAmplification measured = writeAmplificationOf(context);
-  if (exporter->releaseContext != nullptr) exporter->releaseContext(&context);
-  return measured;
-}
 
 bool handleValidityList(const StorageList& list) {
   if (gNeedValidityList == 0) return true;
@@ -51,7 +40,8 @@ KvRef<KvBoolean> DumpStorageStructuredLog(const KvBoolean& requestFlag) {
   const WriteAmplification measured = measureWriteAmplification();
   gCurrentSysWamp = measured.intermediate;
   gCurrentUserWamp = measured.user;
-  gNeedValidityList = gForceCollectionSet != 0 || isHighWriteAmplification(measured.user) ? 1 : 0;
+  gNeedValidityList =
+      gForceCollectionSet != 0 || measured.user > writeAmplificationThreshold() ? 1 : 0;
 
   const ListRequest requests[] = {
       {kValidityList, handleValidityList},      {kTelemetryList, handleTelemetryList, 0},

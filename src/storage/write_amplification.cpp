@@ -3,6 +3,7 @@
 #include <cstdint>
 
 #include "platform/platform.h"
+#include "storage/exporter.h"
 
 namespace tally {
 namespace {
@@ -38,13 +39,21 @@ WriteAmplification writeAmplificationOf(const SPXParseContext& context) {
           ratio(band.erases * (intermediateBytes >> kHostUnitShift), context.hostWrites)};
 }
 
-bool isHighWriteAmplification(float user) {
+WriteAmplification measureWriteAmplification() {
+  SPXParseContext context;
+  const NandExporter* exporter = nullptr;
+  if (!loadNandStatistics(&exporter, &context)->value()) return {};
+  const WriteAmplification measured = writeAmplificationOf(context);
+  if (exporter->releaseContext != nullptr) exporter->releaseContext(&context);
+  return measured;
+}
+
+double writeAmplificationThreshold() {
   const auto preference =
       platform().preferences->SMAPreferencesGetValue("userWAmp", "vellum.NANDInfo");
   const auto* const number = kvCast<KvNumber>(preference.get());
   const double threshold = number != nullptr && number->isReal() ? number->asDouble() : 0;
-  const bool usable = threshold > 0 && threshold < kThresholdLimit;
-  return user > (usable ? threshold : kUsualThreshold);
+  return threshold > 0 && threshold < kThresholdLimit ? threshold : kUsualThreshold;
 }
 
 }  // namespace tally

@@ -12,9 +12,10 @@ struct WriteAmplification {
   float intermediate = 0;  // of the intermediate band
 };
 WriteAmplification writeAmplificationOf(const SPXParseContext& context);
+// Of a fresh fetch; 0 when it fails.
+WriteAmplification measureWriteAmplification();
 
-// Whether so high a user write amplification asks for the validity list. The threshold is a
-// preference.
-bool isHighWriteAmplification(float user);
+// The user write amplification above which the validity list is collected: a preference, or 2.
+double writeAmplificationThreshold();
 
 }  // namespace tally
