@@ -9,8 +9,9 @@
 
 int main(int count, char** arguments) {
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
-  tally::DailyJob job({.startListener = {},
-                       .runTelemetrySweep = [] { tally::runTelemetrySweep(); },
-                       .updateTaskingState = {}});
+  tally::DailyJob job(
+      {.startListener = {},
+       .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
+       .updateTaskingState = {}});
   return job.run({arguments, static_cast<std::size_t>(count)});
 }
