@@ -16,8 +16,9 @@ int main(int count, char** arguments) {
   ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
   ::mallopt(M_MMAP_THRESHOLD, kKeptBytes / 2);
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
-  tally::DailyJob job({.startListener = {},
-                       .runTelemetrySweep = [] { tally::runTelemetrySweep(); },
-                       .updateTaskingState = {}});
+  tally::DailyJob job(
+      {.startListener = {},
+       .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
+       .updateTaskingState = {}});
   return job.run({arguments, static_cast<std::size_t>(count)});
 }

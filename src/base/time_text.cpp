@@ -43,6 +43,14 @@ void appendTimestamp(std::string& out, double secondsSince1970) {
   out.append(text, static_cast<std::size_t>(length));
 }
 
+std::string dateAndTimeText(double secondsSince1970) {
+  std::string text;
+  appendTimestamp(text, secondsSince1970);
+  text[text.find('T')] = ' ';
+  text.pop_back();
+  return text + " +0000";
+}
+
 std::string dayText(std::int32_t day) {
   std::string text;
   appendTimestamp(text, double{kSecondsPerDay} * day);

@@ -13,6 +13,8 @@ std::int32_t dayOfSeconds(double secondsSince1970);
 // "2026-03-01T12:30:00Z", whole seconds, rounded down. Instants outside the years 1 to 9999 are
 // shown at the nearer end.
 void appendTimestamp(std::string& out, double secondsSince1970);
+// "2026-03-01 12:30:00 +0000", likewise.
+std::string dateAndTimeText(double secondsSince1970);
 // "2026-03-01".
 std::string dayText(std::int32_t day);
 

@@ -11,6 +11,7 @@
 #include "platform/platform.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
+#include "storage/storage_log.h"
 
 namespace tally {
 namespace {
@@ -133,6 +134,10 @@ void sweepChannels() {
 }
 
 }  // namespace
+
+SweepCapabilities programSweepCapabilities() {
+  return {[](bool requested) { DumpStorageStructuredLog(*KvBoolean::of(requested)); }};
+}
 
 void runTelemetrySweep(const SweepCapabilities& capabilities) {
   const StoreBatch batch;

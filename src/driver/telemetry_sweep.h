@@ -11,6 +11,9 @@ struct SweepCapabilities {
   std::function<void(bool)> dumpStorageStructuredLog;
 };
 
+// What the program joins to its sweep.
+SweepCapabilities programSweepCapabilities();
+
 // Reads them and sets each as a scalar of the day in progress, all in one transaction; forwards the
 // kernel's error-correction events to the structured log. No failure stops what follows it.
 void runTelemetrySweep(const SweepCapabilities& capabilities = {});

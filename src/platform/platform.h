@@ -16,6 +16,7 @@
 #include "platform/event_loop.h"
 #include "platform/files.h"
 #include "platform/kernel_values.h"
+#include "platform/log_header_facts.h"
 #include "platform/log_submission.h"
 #include "platform/metrics_store.h"
 #include "platform/preferences.h"
@@ -52,6 +53,7 @@ struct Platform {
   std::shared_ptr<DeviceRegistry> deviceRegistry;
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
+  std::shared_ptr<LogHeaderFacts> logHeaderFacts;
   std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 

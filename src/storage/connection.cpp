@@ -1,9 +1,9 @@
-// Connections to the storage driver, for callers that keep one open.
+// Connections to the storage driver: for the length of one query, and to keep open.
 #include <algorithm>
 #include <cstdio>
 
 #include "platform/platform.h"
-#include "storage/driver_call.h"
+#include "storage/driver_query.h"
 #include "storage/exporter.h"
 
 namespace tally {
@@ -17,6 +17,22 @@ StructReply callStructMethod(std::uint32_t connection, std::uint32_t method,
   reply.status = platform().deviceRegistry->ConnectionCallMethod(connection, method, call);
   reply.length = std::min(call.structOutputSize, output.size());
   return reply;
+}
+
+QueryConnection::QueryConnection(RegistryHandle service) : service_(service) {
+  if (platform().deviceRegistry->ServiceOpenConnection(service, 0, &connection_) != 0) {
+    std::fputs("Could not get connection to service\n", stderr);
+    return;
+  }
+  open_ = true;
+}
+
+QueryConnection::~QueryConnection() {
+  DeviceRegistry& registry = *platform().deviceRegistry;
+  if (open_ && registry.ServiceCloseConnection(connection_) != 0) {
+    std::fputs("Could not close connection to service\n", stderr);
+  }
+  registry.HandleRelease(service_);
 }
 
 std::uint32_t FNDConnect(const NandExporter** exporterOut) {

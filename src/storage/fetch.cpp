@@ -1,70 +1,14 @@
 // The two-call fetch of the statistics, and the content-deletion query.
-#include <bit>
+#include <array>
 #include <cstdio>
-#include <new>
 
 #include "base/byte_reader.h"
 #include "platform/platform.h"
-#include "storage/driver_call.h"
+#include "storage/driver_query.h"
 #include "storage/exporter.h"
 
 namespace tally {
 namespace {
-
-constexpr std::uint32_t kSizeQueryFlag = 1;
-constexpr std::align_val_t kPage{4096};
-
-// The input of both calls, as the driver reads it: selector, flags, and 16 bytes of zero.
-using FetchRequest = std::array<std::uint32_t, 6>;
-static_assert(sizeof(FetchRequest) == 24 && std::endian::native == std::endian::little);
-
-FetchRequest fetchRequest(std::uint32_t selector, std::uint32_t flags) {
-  return {selector, flags, 0, 0, 0, 0};
-}
-
-// A buffer that drivers can map: page-aligned, of the size asked for.
-class PageBuffer {
- public:
-  explicit PageBuffer(std::size_t size) noexcept
-      : size_(size), memory_(::operator new(size, kPage, std::nothrow)) {}
-  ~PageBuffer() { ::operator delete(memory_, kPage); }
-  PageBuffer(const PageBuffer&) = delete;
-  PageBuffer& operator=(const PageBuffer&) = delete;
-  bool allocated() const noexcept { return memory_ != nullptr; }
-  std::span<std::byte> bytes() const noexcept { return {static_cast<std::byte*>(memory_), size_}; }
-
- private:
-  std::size_t size_;
-  void* memory_;
-};
-
-// A connection for the length of one query. It is open, or the reason why not was printed.
-class QueryConnection {
- public:
-  explicit QueryConnection(RegistryHandle service) : service_(service) {
-    if (registry_.ServiceOpenConnection(service, 0, &connection_) != 0) {
-      std::fputs("Could not get connection to service\n", stderr);
-      return;
-    }
-    open_ = true;
-  }
-  ~QueryConnection() {
-    if (open_ && registry_.ServiceCloseConnection(connection_) != 0) {
-      std::fputs("Could not close connection to service\n", stderr);
-    }
-    registry_.HandleRelease(service_);
-  }
-  QueryConnection(const QueryConnection&) = delete;
-  QueryConnection& operator=(const QueryConnection&) = delete;
-  bool isOpen() const { return open_; }
-  ConnectionHandle handle() const { return connection_; }
-
- private:
-  DeviceRegistry& registry_ = *platform().deviceRegistry;
-  RegistryHandle service_;
-  ConnectionHandle connection_ = 0;
-  bool open_ = false;
-};
 
 bool fetchAndParse(ConnectionHandle connection, const NandExporter& exporter,
                    SPXParseContext* context) {

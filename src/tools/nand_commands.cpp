@@ -8,6 +8,7 @@
 #include "storage/health.h"
 #include "storage/nand_info.h"
 #include "tools/nand_groups.h"
+#include "tools/nand_list_commands.h"
 #include "tools/output.h"
 #include "tools/table.h"
 
@@ -166,6 +167,8 @@ void addNandCommands(CLI::App& app, ToolContext& context) {
   CLI::App* health = nand->add_subcommand(
       "health", "Wear, errors and spare blocks; exit status 1 when the storage should be retired");
   health->callback([&context] { context.command = [&context] { return runHealth(context); }; });
+
+  addNandListCommands(*nand, context);
 }
 
 }  // namespace tally::tools

@@ -202,6 +202,20 @@ TEST_F(TelemetrySweepTest, TheOrderOfASweep) {
   EXPECT_THAT(messages(), IsEmpty());
 }
 
+// The lists of the driver come before its figures, and cost them nothing when they fail.
+TEST_F(TelemetrySweepTest, TheListsOfTheStorageDriver) {
+  const Bytes figures = fakes::statisticsBuffer({{53, {1}}});
+  serve({{53, {1}}});
+  for (int call = 0; call < 4; ++call) storage.registry->replies.push_back({{}, 1});
+  storage.registry->serveNext(Bytes(12));  // defects: none
+  storage.registry->serveNext(figures);
+  storage.registry->properties["Device Characteristics"] = KvDictionary::create();
+  const Lines calls = sweep(programSweepCapabilities());
+  ASSERT_GT(calls.size(), 4u);
+  EXPECT_EQ(calls[2], "FDLogStructuredData 176");
+  EXPECT_EQ(calls[3], "scalar vellum.NANDInfo.ExportVersion=1");
+}
+
 TEST_F(TelemetrySweepTest, WithoutStorageFigures) {
   const std::string noDriver =
       "error reading nand info, error 1 with message Unable to parse buffer";

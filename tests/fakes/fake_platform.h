@@ -281,6 +281,17 @@ struct FakeKernelValues final : KernelValues {
   std::optional<Timebase> TimebaseInfo() override { return timebase; }
 };
 
+struct FakeLogHeaderFacts final : LogHeaderFacts {
+  int incidents = 0;
+
+  std::string SysIdDescription() override { return "test system"; }
+  std::string HardwareModelString() override { return "Model,1"; }
+  std::string SystemVersionString() override { return "Test OS 1.0 (1A1)"; }
+  std::string NewIncidentID() override { return "INCIDENT-" + std::to_string(++incidents); }
+  std::string processName() override { return "tallyrun"; }
+  std::int32_t processIdentifier() override { return 321; }
+};
+
 // One fake of each service.
 struct FakePlatform {
   std::shared_ptr<CallLog> calls = std::make_shared<CallLog>();
@@ -300,6 +311,7 @@ struct FakePlatform {
   std::shared_ptr<FakeAppRegistry> appRegistry = std::make_shared<FakeAppRegistry>();
   std::shared_ptr<FakeLocale> locale = std::make_shared<FakeLocale>();
   std::shared_ptr<FakeKernelValues> kernelValues = std::make_shared<FakeKernelValues>();
+  std::shared_ptr<FakeLogHeaderFacts> logHeaderFacts = std::make_shared<FakeLogHeaderFacts>();
 
   Platform services() const {
     Platform services;
@@ -317,6 +329,7 @@ struct FakePlatform {
     services.appRegistry = appRegistry;
     services.locale = locale;
     services.kernelValues = kernelValues;
+    services.logHeaderFacts = logHeaderFacts;
     return services;
   }
   // Puts the fakes in force until the returned scope ends.

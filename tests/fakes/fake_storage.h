@@ -22,6 +22,7 @@ struct FakeStorageRegistry : DeviceRegistry {
   };
   std::set<std::string> classes{"SPXStorage"};
   std::deque<Reply> replies;  // of the method calls, in order; then 0xE00002C2
+  std::map<std::string, KvRef<KvObject>, std::less<>> properties;  // of the service
   RegistryResult openStatus = 0, closeStatus = 0;
   std::vector<std::string> calls;
   int services = 0, connections = 0;  // handed out and not given back
@@ -72,7 +73,10 @@ struct FakeStorageRegistry : DeviceRegistry {
   RegistryHandle RegistryIteratorNext(RegistryHandle) override { return 0; }
   bool RegistryIteratorIsValid(RegistryHandle) override { return false; }
   KvRef<KvObject> RegistryCopyProperty(RegistryHandle, std::string_view) override { return {}; }
-  KvRef<KvObject> RegistrySearchProperty(RegistryHandle, std::string_view) override { return {}; }
+  KvRef<KvObject> RegistrySearchProperty(RegistryHandle, std::string_view key) override {
+    const auto found = properties.find(key);
+    return found == properties.end() ? nullptr : found->second;
+  }
   RegistryResult RegistryGetEntryID(RegistryHandle, std::uint64_t*) override { return 1; }
   RegistryResult RegistryGetName(RegistryHandle, std::string*) override { return 1; }
   std::uint32_t RegistryHandleIsValid(RegistryHandle) override { return 1; }
@@ -87,10 +91,17 @@ struct FakeStorageRegistry : DeviceRegistry {
 
   // The next fetch gets this buffer, of an announced size.
   void serve(const Bytes& buffer, std::size_t announced) {
+    replies.clear();
+    serveNext(buffer, announced);
+  }
+  // The fetch after those that are served already.
+  void serveNext(const Bytes& buffer, std::size_t announced) {
     Bytes size;
     appendValue(size, static_cast<std::uint32_t>(announced));
-    replies = {{size}, {buffer}};
+    replies.push_back({size});
+    replies.push_back({buffer});
   }
+  void serveNext(const Bytes& buffer) { serveNext(buffer, buffer.size()); }
   void serve(const Bytes& buffer) { serve(buffer, buffer.size()); }
 };
 

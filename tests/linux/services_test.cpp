@@ -1,6 +1,7 @@
 // The smaller services on a device root: description, device, applications, kernel values, files,
 // turns, the event loop and the lines of the log.
 #include <fcntl.h>
+#include <gmock/gmock.h>
 #include <sys/file.h>
 
 #include <chrono>
@@ -14,6 +15,7 @@
 #include "platform/linux/kernel_values.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/locale.h"
+#include "platform/linux/log_header_facts.h"
 #include "platform/linux/run_lock.h"
 #include "platform/linux/system_log.h"
 
@@ -113,6 +115,32 @@ TEST_F(ServicesTest, DeviceAnswersComeFromTheDescriptionThenTheRootThenLinux) {
   EXPECT_TRUE(kvCast<KvBoolean>(described.DeviceQuery("InternalBuild").get())->value());
   EXPECT_EQ(kvCast<KvData>(described.DeviceQuery("ConfigNumber").get())->bytes().size(), 3u);
   EXPECT_TRUE(described.DeviceQuery("DiskUsage"));
+}
+
+TEST_F(ServicesTest, LogHeaderFactsAreLines) {
+  const auto facts = [this](const std::string& dictionary) {
+    const auto description = describe(dictionary);
+    return LinuxLogHeaderFacts(std::make_shared<LinuxDeviceInformation>(root, description),
+                               description);
+  };
+  auto described = facts(
+      "<key>SystemID</key><string>a\nb</string><key>HardwareModel</key><string>M,1</string>"
+      "<key>OSVersion</key><string>OS 1</string>");
+  EXPECT_EQ(described.SysIdDescription(), "a\\nb");
+  EXPECT_EQ(described.HardwareModelString(), "M,1");
+  EXPECT_EQ(described.SystemVersionString(), "OS 1");
+  auto wrong =
+      facts("<key>SystemID</key><string></string><key>HardwareModel</key><integer>1</integer>");
+  EXPECT_EQ(errors().size(), 0u);
+  EXPECT_THAT(wrong.SysIdDescription(), testing::StartsWith("Linux "));
+  EXPECT_FALSE(wrong.HardwareModelString().empty());
+  EXPECT_EQ(errors().size(), 2u);
+  EXPECT_EQ(wrong.processIdentifier(), ::getpid());
+  EXPECT_EQ(wrong.processName(), "linux_test");
+  const std::string incident = wrong.NewIncidentID();
+  EXPECT_THAT(incident, testing::MatchesRegex(
+                            "[0-9A-F]{8}-[0-9A-F]{4}-4[0-9A-F]{3}-[89AB][0-9A-F]{3}-[0-9A-F]{12}"));
+  EXPECT_NE(incident, wrong.NewIncidentID());
 }
 
 TEST_F(ServicesTest, ApplicationsAreCountedOnceAndTheUsersHideTheSystems) {

@@ -12,6 +12,7 @@
 #include "platform/linux/files.h"
 #include "platform/linux/kernel_values.h"
 #include "platform/linux/locale.h"
+#include "platform/linux/log_header_facts.h"
 #include "platform/linux/log_spool.h"
 #include "platform/linux/metrics_store.h"
 #include "platform/linux/property_list_preferences.h"
@@ -75,6 +76,8 @@ Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& 
   services.kernelValues = std::make_shared<LinuxKernelValues>(description);
   services.stackshot = std::make_shared<DescribedStackshot>(prefix + "/device", description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
+  services.logHeaderFacts =
+      std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
   return services;
 }
 

@@ -1,0 +1,13 @@
+// When the NAND log writer may write.
+#pragma once
+
+#include <optional>
+
+namespace tally {
+
+constexpr double kSecondsBetweenStorageLogs = 604800;  // seven days
+
+// When it last submitted a log, in seconds since 1970; empty when it never did.
+std::optional<double> lastStorageLog();
+
+}  // namespace tally

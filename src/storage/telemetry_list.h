@@ -1,0 +1,23 @@
+// The telemetry list: a raw counter block and a summary for each flash bus.
+#pragma once
+
+#include <cstddef>
+#include <cstdio>
+#include <functional>
+#include <span>
+
+#include "kv/value.h"
+
+namespace tally {
+
+// Hands the record of each bus to the sink, bus after bus. False, with a line on standard error
+// before anything was handed over, when the characteristics or the list's length do not allow it.
+// A digit that is none is named in `notices`.
+using RecordSink = std::function<void(const KvDictionary&)>;
+bool readTelemetryList(std::span<const std::byte> list, const KvObject* characteristics,
+                       std::FILE* notices, const RecordSink& sink);
+
+// The record type of structured data that storage lists give.
+constexpr std::uint32_t kStorageRecordType = 176;
+
+}  // namespace tally

@@ -1,0 +1,26 @@
+// A variant of the platform in which a run of the daily job's steps leaves no trace.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "platform/platform.h"
+
+namespace tally::tools {
+
+// What the steps would have left behind.
+struct DryRun {
+  struct Log {
+    std::string typeCode, name, body;
+  };
+  std::vector<Log> logs;
+  std::size_t records = 0;  // of structured data
+
+  // The platform in force, with preferences that forget what is written to them and a submission
+  // and a structured-data log that keep it here. The run outlives the platform.
+  Platform platform();
+};
+
+}  // namespace tally::tools

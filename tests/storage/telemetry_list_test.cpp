@@ -1,0 +1,208 @@
+// Telemetry lists: which layout and which names a controller gets, and lists that lie.
+#include <gtest/gtest.h>
+
+#include "fakes/fake_storage.h"
+#include "storage/vendor_counters.h"
+
+namespace tally {
+namespace {
+
+using fakes::appendValue;
+using fakes::Bytes;
+
+constexpr std::size_t kBlock = 4096, kSummary = 32;
+
+// Word n of bus b's block holds 10000 * b + n + 1; word n of its summary -(100 * b + n + 1).
+Bytes telemetryList(std::uint32_t buses) {
+  Bytes bytes;
+  for (std::uint32_t bus = 0; bus < buses; ++bus) {
+    for (std::uint32_t word = 0; word < kBlock / 4; ++word) {
+      appendValue(bytes, 10000 * bus + word + 1);
+    }
+  }
+  for (std::int32_t bus = 0; bus < static_cast<std::int32_t>(buses); ++bus) {
+    for (std::int32_t word = 0; word < 8; ++word) appendValue(bytes, -(100 * bus + word + 1));
+  }
+  return bytes;
+}
+
+KvRef<KvDictionary> characteristics(std::string_view chip, std::string_view manufacturer,
+                                    std::int32_t buses) {
+  return KvDictionary::create({{"chip-id", KvString::create(chip)},
+                               {"manufacturer-id", KvString::create(manufacturer)},
+                               {"num-bus", KvNumber::int32(buses)}});
+}
+
+class TelemetryListTest : public testing::Test {
+ protected:
+  // The result, and what went to standard error.
+  std::pair<bool, std::string> parse(const Bytes& list, const KvObject* known) {
+    testing::internal::CaptureStderr();
+    const bool result = parseTelemetryList(list.data(), list.size(), known)->value();
+    return {result, testing::internal::GetCapturedStderr()};
+  }
+  // "name=value ..." of a record.
+  std::string figures(std::size_t record, std::initializer_list<std::string_view> names) {
+    std::string all;
+    for (const std::string_view name : names) {
+      const KvDictionary& dictionary = *records[record].second;
+      all.append(name).append("=").append(kvText(dictionary.get(name))).append(" ");
+    }
+    return all;
+  }
+  fakes::FakeStorage storage;
+  std::vector<std::pair<std::uint32_t, KvRef<KvDictionary>>>& records =
+      storage.platform.crashReporting->records;
+};
+
+// Where the layouts differ: the words that are out of step with their neighbours.
+TEST_F(TelemetryListTest, EveryControllerHasItsLayoutAndItsNames) {
+  const struct {
+    const char *chip, *manufacturer;
+    std::size_t entries;  // 7 of the summary and those of the arrays
+    const char* figures;
+  } cases[] = {
+      {"Q5M", "4582000000", 7 + 120 + 8,
+       "readStage[8]=266 readStage[16]=275 readStage[19]=304 readStage[22]=373 "
+       "initialReadStage[8]=278 initialReadStage[12]=393 nandStageOfLife[7]=300 "
+       "dspExceptionParameter[11]=533 readStage9NumOfErrorsBin[7]=338 "
+       "readStage9NumOfErrorsBin[8]=0 readStage17NumOfErrorsBin[9]=358 "
+       "readStage19NumOfErrorsBin[11]=385 algoNANDAccessesBin[7]=0 retentionIndication[2]=(null) "},
+      {"Q5M", "4582603A57FF", 7 + 120 + 8,
+       "readStage[8]=266 readStage[16]=0 readStage[19]=302 readStage[22]=0 initialReadStage[8]=278 "
+       "initialReadStage[12]=0 nandStageOfLife[7]=298 dspExceptionParameter[11]=0 "
+       "readStage9NumOfErrorsBin[7]=0 readStage9NumOfErrorsBin[8]=0 "
+       "readStage17NumOfErrorsBin[9]=0 readStage19NumOfErrorsBin[11]=0 algoNANDAccessesBin[7]=0 "
+       "retentionIndication[2]=(null) "},
+      {"q7m", "ad82522321ff", 7 + 120 + 8,
+       "readStage[8]=264 readStage[16]=0 readStage[19]=298 readStage[22]=0 initialReadStage[8]=276 "
+       "initialReadStage[12]=0 nandStageOfLife[7]=294 dspExceptionParameter[11]=0 "
+       "readStage9NumOfErrorsBin[7]=0 readStage9NumOfErrorsBin[8]=0 "
+       "readStage17NumOfErrorsBin[9]=0 readStage19NumOfErrorsBin[11]=0 algoNANDAccessesBin[7]=0 "
+       "retentionIndication[2]=(null) "},
+      {"Q7M", "AD82522321FF", 7 + 120,
+       "readStage[8]=9 readStage[16]=17 readStage[19]=38 readStage[22]=92 initialReadStage[8]=20 "
+       "initialReadStage[12]=120 nandStageOfLife[7]=36 dspExceptionParameter[11]=116 "
+       "readStage9NumOfErrorsBin[7]=65 readStage9NumOfErrorsBin[8]=0 "
+       "readStage17NumOfErrorsBin[9]=87 readStage19NumOfErrorsBin[11]=104 "
+       "algoNANDAccessesBin[7]=(null) retentionIndication[2]=(null) "},
+      {"Q9M", "", 7 + 120 + 10 + 26 + 12 + 8,
+       "readStage[8]=0 readStage[16]=17 readStage[19]=28 readStage[22]=80 initialReadStage[8]=20 "
+       "initialReadStage[12]=108 nandStageOfLife[7]=0 dspExceptionParameter[11]=104 "
+       "readStage9NumOfErrorsBin[7]=0 readStage9NumOfErrorsBin[8]=0 "
+       "readStage17NumOfErrorsBin[9]=75 readStage19NumOfErrorsBin[11]=92 algoNANDAccessesBin[7]=0 "
+       "retentionIndication[2]=76 "},
+  };
+  for (const auto& c : cases) {
+    records.clear();
+    const auto known = characteristics(c.chip, c.manufacturer, 1);
+    EXPECT_EQ(parse(telemetryList(1), known.get()), std::pair(true, std::string()));
+    ASSERT_EQ(records.size(), 1u);
+    EXPECT_EQ(records[0].first, 176u);
+    EXPECT_EQ(records[0].second->size(), c.entries) << c.chip << c.manufacturer;
+    EXPECT_EQ(figures(0, {"readStage[8]", "readStage[16]", "readStage[19]", "readStage[22]",
+                          "initialReadStage[8]", "initialReadStage[12]", "nandStageOfLife[7]",
+                          "dspExceptionParameter[11]", "readStage9NumOfErrorsBin[7]",
+                          "readStage9NumOfErrorsBin[8]", "readStage17NumOfErrorsBin[9]",
+                          "readStage19NumOfErrorsBin[11]", "algoNANDAccessesBin[7]",
+                          "retentionIndication[2]"}),
+              c.figures)
+        << c.chip << c.manufacturer;
+  }
+  EXPECT_EQ(figures(0, {"readStage[29]", "readStage[32]", "initialReadStage[13]",
+                        "dspExceptionParameter[20]", "dspExceptionParameter[37]"}),
+            "readStage[29]=9 readStage[32]=111 initialReadStage[13]=123 "
+            "dspExceptionParameter[20]=127 dspExceptionParameter[37]=27 ");
+}
+
+TEST_F(TelemetryListTest, EveryBusIsARecordOfItsOwn) {
+  ASSERT_TRUE(parse(telemetryList(3), characteristics("Q7M", "AD82", 3).get()).first);
+  ASSERT_EQ(records.size(), 3u);
+  EXPECT_EQ(figures(2, {"RD", "PE", "Max_PE_rate", "t0", "Ret", "block_type", "num_pages",
+                        "readStage[0]", "initialReadStage[22]"}),
+            "RD=-201 PE=-202 Max_PE_rate=-203 t0=-204 Ret=-205 block_type=-206 num_pages=-207 "
+            "readStage[0]=20001 initialReadStage[22]=0 ");
+}
+
+// Nothing is logged before everything was checked.
+TEST_F(TelemetryListTest, WhatIsRefused) {
+  const std::string refusedLength = "ERROR: Attempting to parse beyond the bounds of the buffer\n";
+  const auto with = [](std::string_view key, KvRef<KvObject> value) {
+    auto known = characteristics("Q7M", "AD82", 2);
+    known->set(key, std::move(value));
+    return known;
+  };
+  const auto buses = [&](KvRef<KvObject> count) { return with("num-bus", std::move(count)); };
+  const std::string noCount = "ERROR: could not determine the number of channels\n";
+  const struct {
+    KvRef<KvObject> known;
+    std::size_t missing;  // bytes at the end of a list of two buses
+    std::string line;
+  } cases[] = {
+      {nullptr, 0, "ERROR: Could not parse the Device Characteristics dictionary\n"},
+      {KvArray::create(), 0, "ERROR: Could not parse the Device Characteristics dictionary\n"},
+      {with("chip-id", nullptr), 0, "ERROR: Could not determine the chip-id\n"},
+      {with("chip-id", KvNumber::int32(7)), 0,
+       "ERROR: chip-id is not stored as a KvStringTypeID\n"},
+      {with("chip-id", KvString::create(std::string(64, 'Q'))), 0,
+       "ERROR: Unable to obtain chip-id as conversion from the UniChar contents of KvString "
+       "failed, or the buffer of 64 bytes is too small\n"},
+      {with("manufacturer-id", nullptr), 0, "ERROR: Could not determine the manufacturer-id\n"},
+      {with("manufacturer-id", KvData::create({})), 0,
+       "ERROR: manufacturer-id is not stored as a KvStringTypeID\n"},
+      {buses(nullptr), 0, noCount},
+      {buses(KvString::create("2")), 0, noCount},
+      {buses(KvBoolean::of(true)), 0, noCount},
+      {buses(KvNumber::int32(2)), 1, refusedLength},
+      {buses(KvNumber::int32(3)), 0, refusedLength},
+      {buses(KvNumber::int32(-1)), 0, refusedLength},
+      {buses(KvNumber::int32(INT32_MIN)), 0, refusedLength},
+      {buses(KvNumber::int32(INT32_MAX)), 0, refusedLength},
+      {buses(KvNumber::int32(1040448)), 0, refusedLength},  // * 4128 is 32768 in 32 bits
+      {buses(KvNumber::float64(1e300)), 0, refusedLength},
+      {buses(KvNumber::int32(1)), 2 * (kBlock + kSummary), refusedLength},
+  };
+  for (const auto& c : cases) {
+    Bytes list = telemetryList(2);
+    list.resize(list.size() - c.missing);
+    EXPECT_EQ(parse(list, c.known.get()), std::pair(false, c.line));
+    EXPECT_TRUE(records.empty()) << c.line;
+  }
+  const auto none = buses(KvNumber::int64(0));
+  EXPECT_EQ(parse({}, none.get()), std::pair(true, std::string()));
+  EXPECT_TRUE(records.empty());
+}
+
+TEST(VendorCounters, HexTexts) {
+  const struct {
+    const char* text;
+    std::size_t length;
+    std::uint32_t number;
+    const char* noted;
+  } cases[] = {
+      {"AD82", 4, 0xAD82, ""},   {"52232145", 8, 0x52232145, ""},
+      {"abc", 3, 0xAB0C, ""},    {"522321450", 9, 0x52232145, ""},
+      {"AD82", 2, 0xAD, ""},     {"", 8, 0, ""},
+      {"12", 0, 0, ""},          {"1x2", 3, 0x1002, "unrecognized hex character: x"},
+      {"ff", SIZE_MAX, 255, ""},
+  };
+  for (const auto& c : cases) {
+    testing::internal::CaptureStdout();
+    EXPECT_EQ(hexStringToInt32(c.text, c.length), c.number) << c.text;
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), c.noted);
+  }
+  EXPECT_EQ(hexStringToByte("f10", 3), 0xF1);
+}
+
+TEST(VendorCounters, ABlockThatIsShortLeavesWordsAlone) {
+  Bytes block;
+  for (std::uint32_t word = 0; word < 39; ++word) appendValue(block, word + 1);
+  NandAlgoCounters counters;
+  counters.fill(7);
+  EXPECT_EQ(parseOnlyAlgoGenericCounters(block, counters), 39u);
+  EXPECT_EQ(counters[66], 39u);
+  EXPECT_EQ(counters[67], 7u);
+}
+
+}  // namespace
+}  // namespace tally
