@@ -8,6 +8,7 @@
 
 #include <fmt/format.h>
 
+#include "platform/analytics_events.h"
 #include "platform/applications.h"
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
@@ -52,6 +53,7 @@ struct Platform {
   std::shared_ptr<DeviceRegistry> deviceRegistry;
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
+  std::shared_ptr<AnalyticsEvents> analyticsEvents;
   std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 

@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 
+#include "platform/linux/analytics_events.h"
 #include "platform/linux/applications.h"
 #include "platform/linux/clock.h"
 #include "platform/linux/crash_reporting.h"
@@ -74,6 +75,8 @@ Platform makeLinuxPlatform(const std::string& root) {
   services.kernelValues = std::make_shared<LinuxKernelValues>(description);
   services.stackshot = std::make_shared<DescribedStackshot>(prefix + "/device", description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
+  services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
+      analyticsEventsFolder(prefix), log, clock, preferences, description);
   return services;
 }
 
