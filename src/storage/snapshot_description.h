@@ -31,7 +31,7 @@ class SnapshotDescription {
   std::string_view parse(std::span<const std::byte> block);
 
   std::uint32_t recordBytes() const noexcept { return recordBytes_; }
-  // As the block says. The last one that is counted is the one that the processor still fills.
+  // As the block says; the last one that it counts is never printed.
   std::uint32_t recordCount() const noexcept { return recordCount_; }
   // The records that are whole among so many bytes and may be printed.
   std::uint32_t printableRecords(std::size_t bytes) const noexcept;

@@ -9,9 +9,9 @@
 #include <random>
 #include <string>
 
+#include "fakes/statistics_buffer.h"
 #include "storage/label_format.h"
 #include "storage/snapshot_text.h"
-#include "storage/statistics_buffer.h"
 
 namespace tally {
 namespace {
