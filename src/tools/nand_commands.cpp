@@ -7,7 +7,9 @@
 #include "storage/exporter.h"
 #include "storage/health.h"
 #include "storage/nand_info.h"
+#include "tools/nand_event_commands.h"
 #include "tools/nand_groups.h"
+#include "tools/nand_snapshot_commands.h"
 #include "tools/output.h"
 #include "tools/table.h"
 
@@ -166,6 +168,9 @@ void addNandCommands(CLI::App& app, ToolContext& context) {
   CLI::App* health = nand->add_subcommand(
       "health", "Wear, errors and spare blocks; exit status 1 when the storage should be retired");
   health->callback([&context] { context.command = [&context] { return runHealth(context); }; });
+
+  addNandEventCommands(*nand, context);
+  addNandSnapshotCommands(*nand, context);
 }
 
 }  // namespace tally::tools
