@@ -8,6 +8,7 @@
 
 #include <fmt/format.h>
 
+#include "platform/analytics_events.h"
 #include "platform/applications.h"
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
@@ -54,6 +55,7 @@ struct Platform {
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<LogHeaderFacts> logHeaderFacts;
+  std::shared_ptr<AnalyticsEvents> analyticsEvents;
   std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 

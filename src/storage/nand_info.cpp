@@ -8,7 +8,8 @@
 #include <span>
 
 #include "platform/platform.h"
-#include "storage/analytics_route.h"
+#include "storage/analytics_day.h"
+#include "storage/analytics_events.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/exporter.h"
 #include "storage/nand_info_failure.h"
@@ -38,15 +39,6 @@ bool isOddDigit(char digit) {
   return false;
 }
 
-// Half of all devices send on any one day, each of them on every other day.
-bool isAnalyticsDay() {
-  const std::optional<char> initial = bootSessionInitial();
-  if (!initial) return false;
-  const double day = std::floor(platform().clock->secondsSince1970() / kSecondsPerDay);
-  const bool isOddDay = std::fmod(day, 2.0) != 0.0;
-  return isOddDay == isOddDigit(*initial);
-}
-
 KvRef<KvDictionary> fetchNandInfo() {
   SPXParseContext context;
   const NandExporter* exporter = nullptr;
@@ -58,6 +50,14 @@ KvRef<KvDictionary> fetchNandInfo() {
 
 }  // namespace
 
+bool isAnalyticsDay() {
+  const std::optional<char> initial = bootSessionInitial();
+  if (!initial) return false;
+  const double day = std::floor(platform().clock->secondsSince1970() / kSecondsPerDay);
+  const bool isOddDay = std::fmod(day, 2.0) != 0.0;
+  return isOddDay == isOddDigit(*initial);
+}
+
 KvRef<KvDictionary> CopyNANDInfo() {
   auto info = fetchNandInfo();
   if (!addReclaimFigures(*info)) {
@@ -67,17 +67,13 @@ KvRef<KvDictionary> CopyNANDInfo() {
   return info;
 }
 
-KvRef<KvDictionary> copyNandInfoWithRoute(std::uint32_t options, const AnalyticsRoute& route) {
+KvRef<KvDictionary> CopyNANDInfoWithOptions(std::uint32_t options) {
   if (isAnalyticsDay()) {
     const bool wanted = (options & kNANDInfoAnalyticsOption) != 0;
-    return wanted && route ? route(options) : nullptr;
+    return wanted ? LogtoEPNANDInfoWithOptions(options) : nullptr;
   }
   auto info = CopyNANDInfo();
   return info ? info : nandInfoFailure(kUnparsable);
-}
-
-KvRef<KvDictionary> CopyNANDInfoWithOptions(std::uint32_t options) {
-  return copyNandInfoWithRoute(options, {});
 }
 
 KvRef<KvObject> GetNumberFromDictionarySafe(const KvDictionary& dictionary, std::string_view key) {

@@ -7,8 +7,10 @@
 #include "storage/exporter.h"
 #include "storage/health.h"
 #include "storage/nand_info.h"
+#include "tools/nand_event_commands.h"
 #include "tools/nand_groups.h"
 #include "tools/nand_list_commands.h"
+#include "tools/nand_snapshot_commands.h"
 #include "tools/output.h"
 #include "tools/table.h"
 
@@ -169,6 +171,8 @@ void addNandCommands(CLI::App& app, ToolContext& context) {
   health->callback([&context] { context.command = [&context] { return runHealth(context); }; });
 
   addNandListCommands(*nand, context);
+  addNandEventCommands(*nand, context);
+  addNandSnapshotCommands(*nand, context);
 }
 
 }  // namespace tally::tools

@@ -1,5 +1,6 @@
 // A device with a storage driver, in memory: each call can be made to fail, and every call that is
-// made is remembered. With it a stackshot service and a purgeable-space service.
+// made is remembered. With it the services that the storage
+// library asks besides.
 #pragma once
 
 #include <algorithm>
@@ -141,6 +142,21 @@ struct FakePurgeableSpace final : PurgeableSpace {
   }
 };
 
+struct FakeAnalyticsEvents final : AnalyticsEvents {
+  bool available = true;
+  std::set<std::string, std::less<>> unwanted;
+  std::vector<std::string> offered;
+  std::map<std::string, KvRef<KvDictionary>, std::less<>> sent;  // payloads
+
+  bool isAvailable() override { return available; }
+  bool isEventWanted(std::string_view eventName) override { return !unwanted.contains(eventName); }
+  bool PulseSendEventLazy(std::string_view eventName, const PayloadBuilder& builder) override {
+    offered.emplace_back(eventName);
+    if (isEventWanted(eventName)) sent[offered.back()] = builder();
+    return isEventWanted(eventName);
+  }
+};
+
 // The fakes in force, and what goes to standard error.
 struct FakeStorage {
   explicit FakeStorage(
@@ -151,12 +167,14 @@ struct FakeStorage {
   std::shared_ptr<FakeStorageRegistry> registry;
   std::shared_ptr<FakeStackshot> stackshot = std::make_shared<FakeStackshot>();
   std::shared_ptr<FakePurgeableSpace> purgeableSpace = std::make_shared<FakePurgeableSpace>();
+  std::shared_ptr<FakeAnalyticsEvents> analyticsEvents = std::make_shared<FakeAnalyticsEvents>();
 
   Platform services() const {
     Platform all = platform.services();
     all.deviceRegistry = registry;
     all.stackshot = stackshot;
     all.purgeableSpace = purgeableSpace;
+    all.analyticsEvents = analyticsEvents;
     return all;
   }
   PlatformScope scope{services()};

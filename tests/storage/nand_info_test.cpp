@@ -4,7 +4,6 @@
 
 #include "fakes/fake_storage.h"
 #include "fakes/kcdata.h"
-#include "storage/analytics_route.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
 #include "storage/statistic_key_table.h"
@@ -270,20 +269,14 @@ TEST_F(NandInfoTest, EveryOtherDayOfABootSessionBelongsToAnalytics) {
       SCOPED_TRACE(c.session + " " + std::to_string(day));
       storage.platform.clock->setDay(day, 86399);
       const bool analytics = (day % 2 != 0) == c.oddDay;
-      std::uint32_t sentOptions = 0;
-      const AnalyticsRoute route = [&](std::uint32_t options) {
-        sentOptions = options;
-        return KvDictionary::create();
-      };
+      storage.analyticsEvents->offered.clear();
       storage.registry->serve(statisticsBuffer({{53, {1}}}));
-      const auto info = copyNandInfoWithRoute(3, route);
-      EXPECT_EQ(sentOptions, analytics ? 3u : 0u);
+      const auto info = CopyNANDInfoWithOptions(1);
+      EXPECT_EQ(storage.analyticsEvents->offered.size(), analytics ? 35u : 0u);
       EXPECT_EQ(info->empty(), analytics);
-      // Without the option, or without the route, the day's figures go nowhere.
+      // Without the option the day's figures go nowhere.
       storage.registry->serve(statisticsBuffer({{53, {1}}}));
-      EXPECT_NE(bool(copyNandInfoWithRoute(2, route)), analytics);
-      storage.registry->serve(statisticsBuffer({{53, {1}}}));
-      EXPECT_NE(bool(CopyNANDInfoWithOptions(1)), analytics);
+      EXPECT_NE(bool(CopyNANDInfoWithOptions(2)), analytics);
     }
   }
   storage.platform.kernelValues->answers.clear();

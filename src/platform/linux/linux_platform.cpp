@@ -2,6 +2,7 @@
 
 #include <cstdlib>
 
+#include "platform/linux/analytics_events.h"
 #include "platform/linux/applications.h"
 #include "platform/linux/clock.h"
 #include "platform/linux/crash_reporting.h"
@@ -78,6 +79,8 @@ Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& 
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   services.logHeaderFacts =
       std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
+  services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
+      analyticsEventsFolder(prefix), log, clock, preferences, description);
   return services;
 }
 

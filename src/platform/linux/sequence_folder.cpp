@@ -1,8 +1,12 @@
 #include "platform/linux/sequence_folder.h"
 
+#include <fcntl.h>
 #include <fmt/format.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
+#include <cstring>
 #include <map>
 
 #include "base/file.h"
@@ -76,6 +80,24 @@ Status makePrivateFolder(const std::string& folder) {
     if (auto made = makeFolders(folder.substr(0, slash)); !made) return made;
   }
   return makeFolders(folder, 0700);
+}
+
+Status appendAt(const std::string& path, std::size_t end, std::string_view bytes) {
+  const auto failure = [&path] {
+    return Error{fmt::format("cannot append to {}: {}", path, std::strerror(errno)), errno};
+  };
+  const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+  if (file < 0) return failure();
+  Status status = Done{};
+  const auto start = static_cast<off_t>(end);
+  if (::ftruncate(file, start) != 0 ||
+      ::pwrite(file, bytes.data(), bytes.size(), start) != static_cast<ssize_t>(bytes.size()) ||
+      ::fdatasync(file) != 0) {
+    status = failure();
+    (void)!::ftruncate(file, start);
+  }
+  ::close(file);
+  return status;
 }
 
 }  // namespace tally

@@ -1,13 +1,9 @@
 #include "platform/linux/structured_data.h"
 
-#include <fcntl.h>
 #include <fmt/format.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
-#include <cstring>
 
 #include "base/file.h"
 #include "base/number_text.h"
@@ -45,25 +41,6 @@ std::string stemOf(std::string_view pendingName) {
 
 std::string finishedPath(const std::string& folder, std::string_view pendingName) {
   return folder + "/" + stemOf(pendingName) + std::string(kFinishedSuffix);
-}
-
-// Appends with one write, after cutting off what a killed run left half written.
-Status appendAt(const std::string& path, std::size_t end, std::string_view bytes) {
-  const auto failure = [&path] {
-    return Error{fmt::format("cannot append to {}: {}", path, std::strerror(errno)), errno};
-  };
-  const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
-  if (file < 0) return failure();
-  Status status = Done{};
-  const auto start = static_cast<off_t>(end);
-  if (::ftruncate(file, start) != 0 ||
-      ::pwrite(file, bytes.data(), bytes.size(), start) != static_cast<ssize_t>(bytes.size()) ||
-      ::fdatasync(file) != 0) {
-    status = failure();
-    (void)!::ftruncate(file, start);
-  }
-  ::close(file);
-  return status;
 }
 
 bool isRegularFile(const std::string& path) {

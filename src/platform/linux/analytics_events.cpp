@@ -1,0 +1,125 @@
+#include "platform/linux/analytics_events.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+
+#include "base/file.h"
+#include "base/time_text.h"
+#include "kv/json_writer.h"
+#include "platform/linux/log_spool.h"
+
+namespace tally {
+namespace {
+
+constexpr std::string_view kEntry = "AnalyticsEvents";
+constexpr std::string_view kName = "events.jsonl";
+constexpr std::size_t kLargestFile = 1u << 20;
+
+// The length of the whole lines that the bytes begin with.
+std::size_t wholeLines(std::string_view bytes) {
+  const std::size_t last = bytes.rfind('\n');
+  return last == std::string_view::npos ? 0 : last + 1;
+}
+
+}  // namespace
+
+std::string eventLine(std::string_view event, double secondsSince1970,
+                      const KvDictionary& payload) {
+  std::string line = "{\"event\":";
+  appendJson(line, *KvString::create(event));
+  line += ",\"time\":\"";
+  appendTimestamp(line, secondsSince1970);
+  line += "\",\"payload\":";
+  appendJson(line, payload);
+  line += "}\n";
+  return line;
+}
+
+Status EventSpool::append(std::string_view event, const KvDictionary& payload,
+                          const FolderBounds& bounds) {
+  const std::string line = eventLine(event, clock_.secondsSince1970(), payload);
+  // The newest file is never evicted, so that it must leave room for the bound to hold.
+  const std::uint64_t largest =
+      std::min<std::uint64_t>(kLargestFile, std::max<std::uint64_t>(bounds.maximumBytes / 4, 1));
+  if (line.size() > bounds.maximumBytes) return Error{"larger than the whole spool may be"};
+  if (auto made = makePrivateFolder(folder_); !made) return made;
+  const auto lock = FileLock::acquire(folder_ + "/.events.lock");
+  if (!lock) return lock.error();
+  if (auto reserve = checkReserve(folder_, line.size()); !reserve) return reserve;
+  const auto files = listSequenced(folder_);
+  if (!files) return files.error();
+
+  const auto fileName = [](std::uint64_t sequence) {
+    return sequencePrefix(sequence) + std::string(kName);
+  };
+  std::uint64_t sequence = files->empty() ? 0 : files->back().sequence;
+  std::size_t end = 0;
+  const bool takesMore = !files->empty() && files->back().bytes + line.size() <= largest &&
+                         files->back().names == std::vector{fileName(sequence)};
+  if (takesMore) {
+    const auto present = readFile(folder_ + "/" + fileName(sequence), kLargestFile);
+    if (!present) return present.error();
+    end = wholeLines(*present);
+  } else {
+    const auto next = nextSequence(*files);
+    if (!next) return next.error();
+    sequence = *next;
+  }
+  if (auto appended = appendAt(folder_ + "/" + fileName(sequence), end, line); !appended)
+    return appended;
+  return evictOldest(folder_, bounds, sequence);
+}
+
+LinuxAnalyticsEvents::LinuxAnalyticsEvents(std::string folder, std::shared_ptr<SystemLog> log,
+                                           std::shared_ptr<Clock> clock,
+                                           std::shared_ptr<Preferences> preferences,
+                                           std::shared_ptr<DeviceDescription> description)
+    : log_(std::move(log)),
+      clock_(std::move(clock)),
+      preferences_(std::move(preferences)),
+      description_(std::move(description)),
+      spool_(std::move(folder), *clock_) {}
+
+bool LinuxAnalyticsEvents::isAvailable() {
+  const auto* described = description_->getAs<KvDictionary>(kEntry);
+  return described == nullptr || !described->getBool("Absent").value_or(false);
+}
+
+bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
+  const auto* described = description_->getAs<KvDictionary>(kEntry);
+  const KvObject* wanted = described != nullptr ? described->get("Wanted") : nullptr;
+  if (wanted == nullptr) return true;
+  const auto* names = kvCast<KvArray>(wanted);
+  if (names == nullptr) {
+    // What cannot be read wants nothing: events that nobody asked for must not lie about.
+    description_->reportEntry("AnalyticsEvents.Wanted", "is no array; no event is sent");
+    return false;
+  }
+  return std::any_of(names->begin(), names->end(), [&](const auto& item) {
+    const auto* name = kvCast<KvString>(item.get());
+    if (name == nullptr) return false;
+    const std::string_view text = name->view();
+    return text.ends_with('*') ? eventName.starts_with(text.substr(0, text.size() - 1))
+                               : eventName == text;
+  });
+}
+
+bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
+                                              const PayloadBuilder& builder) {
+  if (!isAvailable() || !isEventWanted(eventName)) return false;
+  const auto payload = builder();
+  if (!payload) return false;
+  const auto appended = spool_.append(eventName, *payload, folderBounds(*preferences_));
+  if (!appended) {
+    log_->write(LogLevel::Error,
+                fmt::format("analytics event {}: {}", eventName, appended.error().message));
+  }
+  return static_cast<bool>(appended);
+}
+
+std::string analyticsEventsFolder(const std::string& prefix) {
+  return prefix + "/var/mobile/Library/Logs/AnalyticsEvents";
+}
+
+}  // namespace tally

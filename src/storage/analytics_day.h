@@ -1,0 +1,10 @@
+// Whose day it is.
+#pragma once
+
+namespace tally {
+
+// True when today's figures belong to the analytics service: half of all devices send on any one
+// day, each of them on every other day.
+bool isAnalyticsDay();
+
+}  // namespace tally
