@@ -59,11 +59,11 @@ TEST(Output, TablesAlignByDisplayWidthAndGiveWayOnTerminals) {
             "  key                      n  x\n"
             "  日本                     1\n"
             "  a very long key indeed  12  end\n"
-            "  e\xcc\x81\\x1b                     z\n");
+            "  e\xcc\x81\\x1b                       z\n");
   EXPECT_EQ(table.render({26, true, true, false}, 0),
             "\x1b[2mkey\x1b[0m                 \x1b[2mn\x1b[0m  \x1b[2mx\x1b[0m\n"
             "日本                1\n"
-            "a very long key~   12  \x1b[32mend\x1b[0m\n"
+            "a very long key ~  12  \x1b[32mend\x1b[0m\n"
             "e\xcc\x81\\x1b                  z\n");
 }
 

@@ -163,7 +163,7 @@ TEST_F(WhitelistCommands, TestNamesTheEntryThatDecides) {
     EXPECT_EQ(verdict["scalar"]["reported"], c.scalar);
     EXPECT_EQ(verdict["distribution"]["reported"], c.distribution);
     EXPECT_EQ(verdict["scalar"]["reason"], c.reason);
-    if (c.group != nullptr) EXPECT_EQ(verdict["scalar"]["group"], c.group);
+    EXPECT_EQ(verdict["scalar"].value("group", ""), c.group != nullptr ? c.group : "");
     EXPECT_EQ(verdict["scalar"]["otherEntries"].size(), c.others);
     EXPECT_EQ(outcome.status, c.scalar || c.distribution ? kSuccess : kWrong);
   }
