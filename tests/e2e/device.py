@@ -115,10 +115,6 @@ class Device:
         return plistlib.loads(path.with_name(path.name[:-len(".log")] + ".info.plist").read_bytes())
 
 
-# What a device without a storage driver says of it on every run; whether the figures would be the
-# caller's that day is up to the boot session of the machine.
-
-
 def parse_messages(stderr):
     messages = []
     for line in stderr.decode().splitlines():
