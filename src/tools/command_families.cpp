@@ -1,4 +1,5 @@
 // The table of all commands, in the order of the help.
+#include "tools/channel_commands.h"
 #include "tools/doctor_command.h"
 #include "tools/explain_command.h"
 #include "tools/nand_commands.h"
@@ -13,7 +14,7 @@ namespace tally::tools {
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
       addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
-      addNandCommands,  addPrefsCommands,     addDoctorCommand,
+      addNandCommands,  addChannelCommands,   addPrefsCommands,  addDoctorCommand,
   };
   return kFamilies;
 }

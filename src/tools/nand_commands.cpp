@@ -1,7 +1,9 @@
 #include "tools/nand_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
+#include <nlohmann/json.hpp>
 
 #include "storage/auxiliary_metrics.h"
 #include "storage/exporter.h"

@@ -1,6 +1,8 @@
 #include "tools/nand_event_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <utility>
 #include <vector>
 

@@ -1,6 +1,8 @@
 #include "tools/nand_list_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <vector>
 

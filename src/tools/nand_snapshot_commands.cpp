@@ -1,7 +1,9 @@
 #include "tools/nand_snapshot_commands.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <vector>
 

@@ -21,6 +21,7 @@ namespace {
 struct ReportArguments {
   std::string day = "yesterday";
   bool diff = false;
+  bool xml = false;
   std::string name;
 };
 
@@ -80,6 +81,10 @@ int preview(const ToolContext& context, const ReportArguments& arguments) {
           "would not make this log\n");
   }
   if (arguments.diff) return previewDiff(context, *log);
+  if (arguments.xml) {
+    print(context.out, made.body);  // to be read by a program: not a byte may differ
+    return kSuccess;
+  }
   if (context.json) {
     Json json = jsonOf(*log, made.options.get());
     json["submissionAllowed"] = allowed;
@@ -204,7 +209,9 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
   CLI::App* command =
       add("preview", "The log that would be submitted; changes nothing on the device", preview);
   command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
-  command->add_flag("--diff", arguments->diff, "Only what differs from the last submitted log");
+  CLI::Option* const diff =
+      command->add_flag("--diff", arguments->diff, "Only what differs from the last submitted log");
+  command->add_flag("--xml", arguments->xml, "The document itself, byte for byte")->excludes(diff);
 
   add("list", "The logs that were submitted", list);
 

@@ -229,8 +229,8 @@ TEST_F(TelemetrySweepTest, WithoutStorageFigures) {
                                       "export version"));
 
   storage.platform.kernelValues->answers["kern.bootsessionuuid"] = {{{std::byte{'0'}}, 0}};
-  sweep();  // the day is even
-  EXPECT_THAT(messages(), ElementsAre("failed to get NAND info dict"));
+  sweep();  // the day is even: its figures go out as events
+  EXPECT_THAT(messages(), ElementsAre());
   EXPECT_EQ(storage.platform.calls->size(), 2u);
 }
 

@@ -38,6 +38,8 @@ class ToolTest(DeviceTest):
     def test_the_tour_of_the_readme(self):
         tour = re.findall(r"^tallyctl (.+?)\s+#", (TOP / "README.md").read_text(), re.M)
         self.assertGreaterEqual(len(tour), 5)
+        subprocess.run([sys.executable, TOP / "examples/device/make-storage.py", self.device.root,
+                        str(TODAY)], check=True, stdout=subprocess.DEVNULL)
         for command in tour:
             with self.subTest(command):
                 status, out, err = self.tool(*command.split())

@@ -32,6 +32,7 @@ class AnalyticsEventsTest : public testing::Test {
 };
 
 TEST(EventReferenceText, MapsKnownKeysAlone) {
+  fakes::FakeStorage storage;
   const auto reference = parseEventReference(kEventPulseRefJson);
   ASSERT_TRUE(reference);
   std::set<std::string, std::less<>> known{std::string(kNANDInfoTlydPlaceholder),
@@ -41,7 +42,8 @@ TEST(EventReferenceText, MapsKnownKeysAlone) {
   for (const auto& row : keyMap) known.emplace(row.key);
   SPXParseContext context;
   context.exportVersion = 0x20002;
-  for (const auto& [key, value] : *buildNandInfo(context, false)) known.emplace(key->view());
+  const auto info = buildNandInfo(context, false);
+  for (const auto& [key, value] : *info) known.emplace(key->view());
   known.emplace(kNANDInfoIntermediatePartitionSizeKey);
   std::size_t fields = 0, placeholders = 0;
   for (const std::string_view event : kEventPulseEvents) {

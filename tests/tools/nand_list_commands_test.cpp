@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <nlohmann/json.hpp>
 
 #include "fakes/fake_storage.h"
@@ -141,7 +142,11 @@ TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
     EXPECT_EQ(preview["structuredRecords"], 3 * 2 + 2);
     EXPECT_THAT(preview["text"].get<std::string>(), HasSubstr("ValidityList[3]:70,71\n"));
     EXPECT_TRUE(storage.platform.calls->empty());
-    EXPECT_EQ(preferences.values, before);
+    EXPECT_TRUE(std::equal(preferences.values.begin(), preferences.values.end(), before.begin(),
+                           before.end(), [](const auto& now, const auto& then) {
+                             return now.first == then.first &&
+                                    kvEqual(now.second.get(), then.second.get());
+                           }));
     EXPECT_TRUE(storage.platform.logSubmission->logs.empty());
   }
 }
