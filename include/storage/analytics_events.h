@@ -50,13 +50,13 @@ constexpr std::array<std::string_view, 35> kEventPulseEvents{
 
 // A JSON object: by event, an object from each field of its payload to the NAND info key that the
 // field carries, or to kNANDInfoTlydPlaceholder for a field that is filled from elsewhere.
-extern const std::string_view kEventPulseRefJson;
+TALLY_API extern const std::string_view kEventPulseRefJson;
 
 // Each payload is written to the system log too.
 constexpr std::uint32_t kNANDInfoLogPayloadsOption = 2;
 
 // Sends the events. The result is empty, whatever was sent; without an analytics-event service it
 // is the failure pair of nand_info.h. A figure that the driver does not export is sent as 0.
-KvRef<KvDictionary> LogtoEPNANDInfoWithOptions(std::uint32_t options);
+TALLY_API KvRef<KvDictionary> LogtoEPNANDInfoWithOptions(std::uint32_t options);
 
 }  // namespace tally

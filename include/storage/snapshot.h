@@ -6,6 +6,8 @@
 #include <cstdint>
 #include <span>
 
+#include "kv/export.h"
+
 namespace tally {
 
 // Bytes of a record of the fixed layout.
@@ -15,8 +17,8 @@ constexpr std::uint32_t kSPXSnapshotRecordBytes = 252;
 // of the text at the call. 1: the text is whole, and *textSize its length without the zero byte at
 // its end. 0: it is the beginning of the text that the capacity holds (nothing when that is 0), and
 // *textSize is as it was.
-int SPXParseSnapshotBuffer(const void* records, std::uint32_t recordsLength, char* text,
-                           std::uint32_t* textSize);
+TALLY_API int SPXParseSnapshotBuffer(const void* records, std::uint32_t recordsLength, char* text,
+                                     std::uint32_t* textSize);
 
 // Writes lines for records whose fields a description block names, from record *recordCursor on; a
 // header stands before record 0. Records that are not whole inside recordsLength are not there.
@@ -30,9 +32,10 @@ int SPXParseSnapshotBuffer(const void* records, std::uint32_t recordsLength, cha
 // cannot be honoured in full (it ends early, a field lies outside the record, a label format holds
 // anything but one integer conversion) gives an empty text, a size of 1, 0, the same cursor, and
 // one line on standard error that says why.
-int SPXParseSnapshotBufferWithInplaceParser(const void* records, std::uint32_t recordsLength,
-                                            char* text, std::uint32_t* textSize,
-                                            std::span<const std::byte> description,
-                                            std::uint32_t* recordCursor);
+TALLY_API int SPXParseSnapshotBufferWithInplaceParser(const void* records,
+                                                      std::uint32_t recordsLength, char* text,
+                                                      std::uint32_t* textSize,
+                                                      std::span<const std::byte> description,
+                                                      std::uint32_t* recordCursor);
 
 }  // namespace tally

@@ -1,10 +1,11 @@
-"""The channel library as other programs get it: installed, found, built against and run."""
+"""The libraries as other programs get them: installed, found, built against and run."""
 import os
 import pathlib
 import plistlib
 import re
 import shutil
 import subprocess
+import sys
 import tempfile
 import unittest
 
@@ -45,7 +46,7 @@ class Library(unittest.TestCase):
         cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-library-"))
         cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
         cls.prefix = cls.folder / "prefix"
-        for component in ("tallykv", "hwreport"):
+        for component in ("tallykv", "hwreport", "tallystorage"):
             cls.check(run("cmake", "--install", BUILD, "--prefix", cls.prefix,
                           "--component", component))
         cls.library = next(cls.prefix.glob("**/libhwreport.so")).parent
@@ -75,6 +76,35 @@ class Library(unittest.TestCase):
         output = self.check(run(program, TALLYRUN_ROOT=str(self.device) + "/",
                                 LD_LIBRARY_PATH=str(self.library)))
         self.assertEqual(output, EXPECTED)
+
+    def test_storage_example(self):
+        device = self.folder / "storage-root"
+        self.check(run(sys.executable, TOP / "examples/device/make-storage.py", device, "20514"))
+        build = self.folder / "storage-by-cmake"
+        self.check(run("cmake", "-S", TOP / "examples/storage", "-B", build,
+                       f"-DCMAKE_PREFIX_PATH={self.prefix}"))
+        self.check(run("cmake", "--build", build))
+        flags = self.check(run("pkg-config", "--cflags", "--libs", "tallystorage",
+                               PKG_CONFIG_PATH=str(self.library / "pkgconfig"))).split()
+        program = self.folder / "storage-by-pkg-config"
+        self.check(run("g++", "-std=c++20", TOP / "examples/storage/wear.cpp", "-o", program, *flags))
+        for example in (build / "wear", program):
+            found = {"LD_LIBRARY_PATH": str(self.library)}
+            self.assertEqual(self.check(run(example, TALLYRUN_ROOT=str(device), **found)),
+                             "9 % used\n")
+            result = run(example, TALLYRUN_ROOT=str(self.folder), **found)
+            self.assertEqual(result.returncode, 1)
+            self.assertIn("Unable to parse buffer", result.stderr)
+
+    def test_storage_exports_what_its_headers_declare(self):
+        headers = "".join(header.read_text()
+                          for header in (self.prefix / "include/storage").iterdir())
+        declared = set(re.findall(r"TALLY_API[^;{(=]*?(\w+)[(;]", headers))
+        self.assertGreater(len(declared), 45)
+        lines = self.check(run("nm", "-DC", "--defined-only", self.library / "libtallystorage.so"))
+        exported = {re.split(r"[(\[]", line.split(" ", 2)[2])[0].removeprefix("tally::")
+                    for line in lines.splitlines()}
+        self.assertEqual(declared ^ exported, set())
 
     def test_root_is_chosen_by_the_program(self):
         source = self.folder / "chosen.cpp"

@@ -1,0 +1,15 @@
+// Which device the library looks at.
+#pragma once
+
+#include <string_view>
+
+#include "kv/export.h"
+
+namespace tally {
+
+// Takes the services of this device root from now on: its drivers, preferences, kernel values and
+// logs. Without a call they are those of the environment variable TALLYRUN_ROOT, or else of "/".
+// Before other threads use the library.
+TALLY_API void StorageSetDeviceRoot(std::string_view root);
+
+}  // namespace tally

@@ -1,0 +1,25 @@
+// What the shared library has that its room has not: the platform of a program that installs none.
+// It is made when it is first asked for.
+#include <string>
+
+#include "host_platform.h"
+#include "storage/device_root.h"
+
+namespace tally {
+namespace {
+
+// Never destroyed: what a program still holds at its end may ask for it.
+Platform& libraryPlatform() {
+  static auto* const services = new Platform(makeHostPlatform(deviceRootFromEnvironment()));
+  return *services;
+}
+
+[[maybe_unused]] const bool registered = (setDefaultPlatform(libraryPlatform), true);
+
+}  // namespace
+
+void StorageSetDeviceRoot(std::string_view root) {
+  libraryPlatform() = makeHostPlatform(std::string(root));
+}
+
+}  // namespace tally
