@@ -5,10 +5,13 @@ namespace tally {
 namespace {
 
 Platform* current = nullptr;
+Platform& (*makeDefault)() = nullptr;
 
 }  // namespace
 
-Platform& platform() { return *current; }
+Platform& platform() { return current != nullptr ? *current : makeDefault(); }
+
+void setDefaultPlatform(Platform& (*make)()) { makeDefault = make; }
 
 PlatformScope::PlatformScope(Platform services) : services_(std::move(services)), former_(current) {
   current = &services_;

@@ -59,8 +59,11 @@ struct Platform {
   std::shared_ptr<OnceBoolean> internalDevice = std::make_shared<OnceBoolean>();
 };
 
-// The platform in force. REQUIRES: one is installed.
+// The platform in force. REQUIRES: one is installed, or there is a default.
 Platform& platform();
+
+// Names who makes the platform of a program that installs none, when it is first asked for.
+void setDefaultPlatform(Platform& (*make)());
 
 // Installs a platform for a scope and puts the former one back at its end.
 class PlatformScope {

@@ -1,0 +1,50 @@
+// A shared library brings a platform of its own: the device registry of a device root, and a log
+// that says on standard error what is wrong with it. It is made when it is first asked for.
+#include "library_platform.h"
+
+#include <cstdlib>
+#include <memory>
+#include <string>
+
+#include <fmt/format.h>
+
+#include "platform/device/device_platform.h"
+#include "platform/platform.h"
+
+namespace tally {
+namespace {
+
+class ErrorLog final : public SystemLog {
+ public:
+  bool enabled(LogLevel level) const override { return level == LogLevel::Error; }
+  void write(LogLevel level, std::string_view message) override {
+    if (enabled(level)) fmt::print(stderr, "{}\n", message);
+  }
+};
+
+Platform makePlatform(std::string_view root) {
+  while (root.ends_with('/')) root.remove_suffix(1);
+  Platform services;
+  services.log = std::make_shared<ErrorLog>();
+  addDeviceRegistry(services, std::string(root));
+  return services;
+}
+
+std::string_view rootOfEnvironment() {
+  const char* const root = std::getenv("TALLYRUN_ROOT");
+  return root != nullptr ? root : "/";
+}
+
+// Never destroyed: what a program still holds at its end may ask for it.
+Platform& libraryPlatform() {
+  static auto* const services = new Platform(makePlatform(rootOfEnvironment()));
+  return *services;
+}
+
+[[maybe_unused]] const bool registered = (setDefaultPlatform(libraryPlatform), true);
+
+}  // namespace
+
+void useDeviceRoot(std::string_view root) { libraryPlatform() = makePlatform(root); }
+
+}  // namespace tally

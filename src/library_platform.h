@@ -1,0 +1,11 @@
+// The platform of a program that uses one of the libraries and installs none.
+#pragma once
+
+#include <string_view>
+
+namespace tally {
+
+// Takes the services of this device root from now on.
+void useDeviceRoot(std::string_view root);
+
+}  // namespace tally

@@ -1,0 +1,120 @@
+"""The channel library as other programs get it: installed, found, built against and run."""
+import os
+import pathlib
+import plistlib
+import re
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+TOP = pathlib.Path(__file__).resolve().parent.parent.parent
+BUILD = pathlib.Path(os.environ["TALLYRUN_BIN"]).parent
+EXAMPLE = TOP / "examples/hwreport"
+
+SECONDS = 1 << 56
+REGISTRY = {"Entries": [
+    {"Class": "HwReportHub"},
+    {"Class": "FanController", "Name": "fan", "ID": 0x10, "Properties": {
+        "HwReportLegendPublic": True,
+        "HwReportLegend": [{
+            "HwReportGroupName": "Cooling",
+            "HwReportChannelInfo": {"HwReportChannelUnit": SECONDS},
+            "HwReportChannels": [[1, 0x101000001, "Turns"], [2, 0x200000002, "Mode"]]}],
+        "HwReportValues": [
+            {"Channel": 1, "Value": 1200},
+            {"Channel": 2, "Value": [{"ID": "OFF", "InTransitions": 4, "Residency": 30},
+                                     {"ID": "ON", "InTransitions": 5, "Residency": 10}]}]}}]}
+EXPECTED = (
+    "fan <id 0x10> Turns < 0x1 (s) | G/g Cooling/(none) | cat 0x100 | format 0x01 | elts 1 >\n"
+    "                             Turns = {         1200 s }\n"
+    "fan <id 0x10> Mode < 0x2 (s) | G/g Cooling/(none) | cat 0000 | format 0x02 | elts 2 >\n"
+    "                  Mode[     OFF] = { # 4        3.000e+01 s / 75.0% }\n"
+    "                  Mode[      ON] = { # 5        1.000e+01 s / 25.0% }\n")
+
+
+def run(*command, **environment):
+    return subprocess.run([str(part) for part in command], env={**os.environ, **environment},
+                          capture_output=True, text=True, timeout=200)
+
+
+@unittest.skipUnless((BUILD / "libhwreport.so").exists(), "built without shared libraries")
+class Library(unittest.TestCase):
+    @classmethod
+    def setUpClass(cls):
+        cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-library-"))
+        cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
+        cls.prefix = cls.folder / "prefix"
+        for component in ("tallykv", "hwreport"):
+            cls.check(run("cmake", "--install", BUILD, "--prefix", cls.prefix,
+                          "--component", component))
+        cls.library = next(cls.prefix.glob("**/libhwreport.so")).parent
+        cls.device = cls.folder / "root"
+        (cls.device / "device").mkdir(parents=True)
+        (cls.device / "device/registry.plist").write_bytes(plistlib.dumps(REGISTRY))
+
+    @staticmethod
+    def check(result):
+        if result.returncode != 0:
+            raise AssertionError(f"{result.args}: {result.returncode}\n{result.stdout}{result.stderr}")
+        return result.stdout
+
+    def test_example_by_cmake(self):
+        build = self.folder / "by-cmake"
+        self.check(run("cmake", "-S", EXAMPLE, "-B", build, f"-DCMAKE_PREFIX_PATH={self.prefix}"))
+        self.check(run("cmake", "--build", build))
+        self.assertEqual(self.check(run(build / "channels", TALLYRUN_ROOT=str(self.device))), EXPECTED)
+        # A device without a hub or channels is an answer, not a crash.
+        self.assertEqual(run(build / "channels", TALLYRUN_ROOT=str(self.folder)).returncode, 0x11)
+
+    def test_example_by_pkg_config(self):
+        flags = self.check(run("pkg-config", "--cflags", "--libs", "hwreport",
+                               PKG_CONFIG_PATH=str(self.library / "pkgconfig"))).split()
+        program = self.folder / "by-pkg-config"
+        self.check(run("g++", "-std=c++20", EXAMPLE / "channels.cpp", "-o", program, *flags))
+        output = self.check(run(program, TALLYRUN_ROOT=str(self.device) + "/",
+                                LD_LIBRARY_PATH=str(self.library)))
+        self.assertEqual(output, EXPECTED)
+
+    def test_root_is_chosen_by_the_program(self):
+        source = self.folder / "chosen.cpp"
+        source.write_text('#include <hwreport/hwreport.h>\nint main(int, char** arguments) {\n'
+                          '  tally::HwReportSetDeviceRoot(arguments[1]);\n'
+                          '  return tally::HwReportGetChannelCount('
+                          'tally::HwReportCopyAllChannels(0).get());\n}\n')
+        program = self.folder / "chosen"
+        self.check(run("g++", "-std=c++20", source, "-o", program, f"-I{self.prefix}/include",
+                       f"-L{self.library}", "-lhwreport", "-ltallykv"))
+        result = run(program, self.device, TALLYRUN_ROOT="/nowhere",
+                     LD_LIBRARY_PATH=str(self.library))
+        self.assertEqual(result.returncode, 2, result.stderr)
+
+    def test_only_what_is_public_is_exported(self):
+        declared = set(re.findall(r"TALLY_API[^;{(]*?(HwReport\w+)\(", "".join(
+            header.read_text() for header in (self.prefix / "include/hwreport").iterdir())))
+        self.assertGreater(len(declared), 40)
+        exported = {}
+        for name in ("libhwreport.so", "libtallykv.so"):
+            lines = self.check(run("nm", "-DC", "--defined-only", self.library / name))
+            exported[name] = {line.split(" ", 2)[2] for line in lines.splitlines()}
+        functions = {symbol.partition("(")[0].removeprefix("tally::")
+                     for symbol in exported["libhwreport.so"]}
+        self.assertEqual(declared - functions, set(), "declared but not exported")
+        # Beyond the functions only members of the public classes.
+        for symbol in functions - declared:
+            self.assertRegex(symbol, r"^HwReport(Error|Subscription)::")
+        for symbol in exported["libtallykv.so"]:
+            self.assertRegex(symbol, r"^tally::[Kk]v[A-Z]")
+        self.assertEqual((self.library / "libhwreport.so.0").resolve().name, "libhwreport.so.0.1.0")
+
+    def test_each_public_header_compiles_alone(self):
+        headers = sorted((self.prefix / "include").glob("**/*.h"))
+        self.assertGreater(len(headers), 8)
+        for header in headers:
+            self.check(run("g++", "-std=c++20", "-fsyntax-only", "-Wall", "-Wextra", "-Wpedantic",
+                           "-Werror", f"-I{self.prefix}/include", "-x", "c++", "-include", header,
+                           "/dev/null"))
+
+
+if __name__ == "__main__":
+    unittest.main()
