@@ -1,6 +1,7 @@
 #include "hwreport/run_index.h"
 
 #include <algorithm>
+#include <bit>
 #include <utility>
 
 #include "base/hash.h"
@@ -12,6 +13,7 @@ namespace {
 // How far before its turn memory is asked for; past the end of the buffer that does no harm.
 constexpr std::size_t kFetchAhead = 2048;
 
+// Runs of four elements on average fill half of the slots that there are at first.
 constexpr std::size_t kFewestSlots = 256;
 
 std::uint64_t wordAt(std::span<const std::byte> buffer, std::size_t offset) {
@@ -33,32 +35,44 @@ std::size_t sizeOfRun(std::span<const std::byte> buffer, std::size_t offset) {
 
 }  // namespace
 
-RunIndex::RunIndex(std::span<const std::byte> buffer) : slots_(kFewestSlots) {
+RunIndex::RunIndex(std::span<const std::byte> buffer) {
   // As far as slots can count, which is 256 GiB of elements.
   constexpr std::size_t kMostElements = UINT32_MAX - 1;
   const std::size_t elements = std::min(buffer.size() / element::kSize, kMostElements);
   buffer_ = buffer.first(elements * element::kSize);
+  slots_.resize(std::bit_ceil(std::max(kFewestSlots, elements / 2)));
   for (std::size_t offset = 0; offset < buffer_.size();) {
     const std::size_t size = sizeOfRun(buffer_, offset);
     stopped_ = size == 0;
-    if (stopped_ || size > buffer_.size() - offset) return;
-    add(offset);
+    if (stopped_ || size > buffer_.size() - offset) break;
     for (std::size_t line = 0; line < size; line += element::kSize) {
       __builtin_prefetch(buffer_.data() + offset + kFetchAhead + line);
     }
+    note(offset);
     offset += size;
   }
+  addNoted();
 }
 
-void RunIndex::add(std::size_t offset) {
-  if (runs_ * 2 >= slots_.size()) grow();
-  const std::uint64_t driverID = wordAt(buffer_, offset + element::kDriverID);
-  const std::uint64_t channelID = wordAt(buffer_, offset + element::kChannelID);
-  const std::uint32_t hash = hashOf(driverID, channelID);
-  Slot& slot = slots_[slotOf(driverID, channelID, hash)];
-  if (slot.element != 0) return;  // the first run is the channel's
-  slot = {static_cast<std::uint32_t>(offset / element::kSize + 1), hash};
-  ++runs_;
+void RunIndex::note(std::size_t offset) {
+  const std::uint32_t hash = hashOf(wordAt(buffer_, offset + element::kDriverID),
+                                    wordAt(buffer_, offset + element::kChannelID));
+  __builtin_prefetch(&slots_[hash & (slots_.size() - 1)]);
+  noted_[notedCount_++] = {static_cast<std::uint32_t>(offset / element::kSize + 1), hash};
+  if (notedCount_ == noted_.size()) addNoted();
+}
+
+void RunIndex::addNoted() {
+  for (std::size_t i = 0; i < notedCount_; ++i) {
+    if (runs_ * 2 >= slots_.size()) grow();
+    const std::size_t offset = offsetOf(noted_[i].element);
+    Slot& slot = slots_[slotOf(wordAt(buffer_, offset + element::kDriverID),
+                               wordAt(buffer_, offset + element::kChannelID), noted_[i].hash)];
+    if (slot.element != 0) continue;  // the first run is the channel's
+    slot = noted_[i];
+    ++runs_;
+  }
+  notedCount_ = 0;
 }
 
 void RunIndex::grow() {

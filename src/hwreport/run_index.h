@@ -38,7 +38,9 @@ class RunIndex {
   };
   // The slot of the channel's run, or the free one where it belongs.
   std::size_t slotOf(std::uint64_t driverID, std::uint64_t channelID, std::uint32_t hash) const;
-  void add(std::size_t offset);
+  // Runs are added in batches, in their order, so that their slots are fetched meanwhile.
+  void note(std::size_t offset);
+  void addNoted();
   void grow();
 
   std::span<const std::byte> buffer_;
@@ -46,6 +48,8 @@ class RunIndex {
   using Slots = std::vector<Slot, LargeAllocator<Slot>>;
   Slots slots_;  // at most half full; a power of two
   std::size_t runs_ = 0;
+  std::array<Slot, 16> noted_{};
+  std::size_t notedCount_ = 0;
   std::array<std::uint32_t, kFetching> fetching_{};  // hashes whose slots are on their way
   std::size_t fetched_ = 0;
 };

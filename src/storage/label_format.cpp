@@ -46,8 +46,7 @@ std::optional<std::string_view> takeText(std::string_view& rest) {
 }
 
 char* appendBytes(char* to, std::string_view bytes) {
-  std::memcpy(to, bytes.data(), bytes.size());
-  return to + bytes.size();
+  return std::copy(bytes.begin(), bytes.end(), to);
 }
 
 char* appendFill(char* to, std::size_t count, char fill) {

@@ -30,7 +30,7 @@ class KeptSubmission final : public LogSubmission {
  public:
   explicit KeptSubmission(DryRun& run) : run_(run) {}
   bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
-                                const KvDictionary*, const KvObject*,
+                                const KvDictionary* options, const KvObject*,
                                 const Writer& writer) override {
     struct Body final : LogFile {
       std::string text;
@@ -40,7 +40,8 @@ class KeptSubmission final : public LogSubmission {
       }
     } body;
     writer(body);
-    run_.logs.push_back({std::string(typeCode), std::string(name), std::move(body.text)});
+    run_.logs.push_back({std::string(typeCode), std::string(name), std::move(body.text),
+                         options != nullptr ? options->copy() : nullptr});
     return true;
   }
 

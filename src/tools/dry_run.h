@@ -14,6 +14,7 @@ namespace tally::tools {
 struct DryRun {
   struct Log {
     std::string typeCode, name, body;
+    KvRef<KvDictionary> options;  // null when there are none
   };
   std::vector<Log> logs;
   std::size_t records = 0;  // of structured data

@@ -60,12 +60,12 @@ void printVerdict(const ToolContext& context, const KeyVerdict& verdict) {
   printLine(context, "            options: " + optionsText(*verdict.match.options));
   for (const KeyCandidate& other : verdict.others) {
     const std::string_view off = whyNotInForce(other.state);
-    printLine(
-        context,
-        fmt::format("            passed over: {} {} of the group {}, which {}",
-                    isPrefixSection(other.section) ? "prefix" : "entry", other.entry.key->view(),
-                    other.entry.group->view(), !off.empty() ? off : "is less specific or earlier"),
-        Ink::Faint);
+    printLine(context,
+              fmt::format("            passed over: {} {} ({} {})",
+                          isPrefixSection(other.section) ? "prefix" : "entry",
+                          other.entry.key->view(), other.entry.group->view(),
+                          !off.empty() ? off : "has it less specific or earlier"),
+              Ink::Faint);
   }
 }
 

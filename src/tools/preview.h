@@ -15,8 +15,8 @@ struct Preview {
   std::string body;              // the document as its bytes
 };
 
-// Builds the day's log by the very steps of the daily job, with preferences that forget what is
-// written to them and a submission that keeps the log here. Follows a key when a trace is given.
+// Builds the day's log by the very steps of the daily job, as a dry run. Follows a key when a trace
+// is given.
 Preview previewLog(std::int32_t day, KeyTrace* trace = nullptr);
 
 }  // namespace tally::tools

@@ -127,8 +127,14 @@ def parse_messages(stderr):
     return messages
 
 
+# What the sweep says of a device without a storage driver; which of them depends on the day.
+WITHOUT_STORAGE = {"error reading nand info, error 1 with message Unable to parse buffer",
+                   "failed to get NAND info dict"}
+
+
 def texts(messages, level=None):
-    return [text for found, text in messages if level in (None, found)]
+    return [text for found, text in messages
+            if level in (None, found) and text not in WITHOUT_STORAGE]
 
 
 class DeviceTest(unittest.TestCase):

@@ -54,7 +54,7 @@ struct FakeStorageRegistry : DeviceRegistry {
                                       MethodCall& call) override {
     std::string line = "call " + std::to_string(method);
     std::vector<std::uint32_t> words(call.structInput.size() / 4);
-    std::memcpy(words.data(), call.structInput.data(), words.size() * 4);
+    if (!words.empty()) std::memcpy(words.data(), call.structInput.data(), words.size() * 4);
     line += " in " + std::to_string(call.structInput.size());
     while (!words.empty() && words.back() == 0) words.pop_back();
     for (const std::uint32_t word : words) line += " " + std::to_string(word);

@@ -3,10 +3,12 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <limits>
 #include <map>
 #include <random>
+#include <thread>
 
 namespace tally {
 namespace {
@@ -151,6 +153,67 @@ TEST(KvRef, CountsEveryOwner) {
   EXPECT_EQ(array->getAs<KvString>(0)->view(), "shared");
   array->append(nullptr);
   EXPECT_EQ(array->size(), 1u);
+}
+
+TEST(KvArray, ChangesLikeAPlainListAtEverySize) {
+  std::mt19937 random(4);
+  const auto array = KvArray::create(3);
+  std::vector<std::int64_t> expected;
+  for (std::int64_t step = 0; step < 3000; ++step) {
+    const std::size_t index = random() % (expected.size() + 2);  // sometimes past the end
+    switch (random() % 8) {
+      case 0:
+        array->removeAt(index);
+        if (index < expected.size()) expected.erase(expected.begin() + static_cast<long>(index));
+        break;
+      case 1:
+        array->replaceAt(index, KvNumber::int64(step));
+        if (index < expected.size()) expected[index] = step;
+        break;
+      case 2: {
+        std::vector<std::size_t> removed;
+        std::vector<std::int64_t> kept;
+        for (std::size_t i = 0; i < expected.size() + 1; ++i) {
+          const bool remove = random() % 10 == 0;
+          if (remove) removed.push_back(i);
+          if (!remove && i < expected.size()) kept.push_back(expected[i]);
+        }
+        array->removeAt(removed);
+        expected = kept;
+        break;
+      }
+      default:
+        array->append(KvNumber::int64(step));
+        expected.push_back(step);
+    }
+    const auto copy = array->copy();
+    ASSERT_EQ(copy->size(), expected.size());
+    for (std::size_t i = 0; i < expected.size(); ++i) {
+      ASSERT_EQ(copy->getAs<KvNumber>(i)->asInt64(), expected[i]);
+    }
+  }
+}
+
+TEST(KvArena, ValuesAreSharedByThreadsAndOutliveTheArena) {
+  // A wrong count would free a value while it is in use, which the sanitizers see.
+  std::vector<KvRef<KvData>> values;
+  {
+    KvArena arena;
+    const std::vector<std::byte> bytes(1000, std::byte{7});
+    for (int i = 0; i < 6000; ++i) values.push_back(KvData::create(bytes, &arena));
+  }
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([values, t] {
+      for (int round = 0; round < 20; ++round) {
+        auto mine = values;
+        std::shuffle(mine.begin(), mine.end(), std::mt19937(static_cast<unsigned>(t)));
+      }
+    });
+  }
+  values.clear();  // whichever thread ends last frees them
+  for (auto& thread : threads) thread.join();
+  EXPECT_TRUE(values.empty());
 }
 
 }  // namespace
