@@ -27,16 +27,8 @@ std::string contentOf(std::FILE* file) {
   return text;
 }
 
-// Runs on a device whose driver exports these records; none: a device without a driver.
-Outcome run(std::vector<const char*> arguments, std::vector<Record> records) {
+Outcome runOn(const fakes::FakeStorage& storage, std::vector<const char*> arguments) {
   arguments.insert(arguments.begin(), {"tallyctl", "nand"});
-  fakes::FakeStorage storage;
-  if (records.empty()) storage.registry->classes.clear();
-  records.insert(records.begin(), {53, {0x20002}});
-  storage.registry->serve(fakes::statisticsBuffer(records));
-  storage.purgeableSpace->answer =
-      KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", KvNumber::int64(5)},
-                            {"RECLAIM_NONPURGEABLE_AMOUNT", KvNumber::int64(6)}});
   ToolContext context;
   context.root = "/";
   context.out = std::tmpfile();
@@ -46,6 +38,18 @@ Outcome run(std::vector<const char*> arguments, std::vector<Record> records) {
       runTool(context, arguments, [&](const std::string&) { return storage.services(); });
   testing::internal::GetCapturedStderr();
   return {status, contentOf(context.out), contentOf(context.err)};
+}
+
+// Runs on a device whose driver exports these records; none: a device without a driver.
+Outcome run(const std::vector<const char*>& arguments, std::vector<Record> records) {
+  fakes::FakeStorage storage;
+  if (records.empty()) storage.registry->classes.clear();
+  records.insert(records.begin(), {53, {0x20002}});
+  storage.registry->serve(fakes::statisticsBuffer(records));
+  storage.purgeableSpace->answer =
+      KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", KvNumber::int64(5)},
+                            {"RECLAIM_NONPURGEABLE_AMOUNT", KvNumber::int64(6)}});
+  return runOn(storage, arguments);
 }
 
 constexpr std::uint32_t kSpareAvailable = 532, kUserPartitionUsed = 431, kReads = 7, kHisto = 327;
@@ -97,6 +101,25 @@ TEST(NandCommands, HealthDecidesTheStatus) {
     EXPECT_EQ(nlohmann::json::parse(json.out).contains("error"), c.records.empty());
   }
   EXPECT_EQ(run({"wealth"}, {}).status, kBadUsage);
+}
+
+TEST(NandCommands, EventsAreShownAndNotSent) {
+  const Outcome events = run({"events"}, {{kReads, {1'234'567}}});
+  EXPECT_EQ(events.status, kSuccess);
+  EXPECT_THAT(events.out, HasSubstr("1,234,567"));
+  EXPECT_THAT(events.out, HasSubstr("35 events, 35 of them wanted; nothing was sent."));
+  EXPECT_THAT(events.out, HasSubstr("to the metrics store"));
+  const Outcome some = run({"events", "NANDInfo_6", "--json"}, {{41, {9}}});
+  const auto json = nlohmann::json::parse(some.out);
+  EXPECT_EQ(json["serviceAvailable"], true);
+  ASSERT_EQ(json["events"].size(), 1u);
+  EXPECT_EQ(json["events"][0]["payload"]["clogProgram"], 9);
+  EXPECT_EQ(run({"events", "no such"}, {}).status, kWrong);
+
+  fakes::FakeStorage storage;
+  storage.analyticsEvents->available = false;
+  EXPECT_EQ(runOn(storage, {"events"}).status, kWrong);
+  EXPECT_TRUE(storage.analyticsEvents->offered.empty());
 }
 
 }  // namespace
