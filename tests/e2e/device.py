@@ -1,5 +1,6 @@
 """A device root in a temporary folder, and the real programs run on it."""
 import csv
+import glob
 import io
 import os
 import pathlib
@@ -19,6 +20,7 @@ WHITELIST = "Library/Application Support/Tallybook/Whitelist_Nimbus.plist"
 STORE = "var/mobile/Library/Tallybook/TBDataStore.sqlitedb"
 SPOOL = "var/mobile/Library/Logs/Submission"
 PREFERENCES = "var/mobile/Library/Preferences"
+FAKETIME_LIBRARY = glob.glob("/usr/lib/*/faketime/libfaketime.so.1")[0]
 
 
 def group(scalars=None, distributions=None, **prefixes):
@@ -58,32 +60,32 @@ class Device:
                 out.writerow(["distribution", key, day, offset % 86400, repr(value)])
         self.tool("store", "import", "-", stdin=text.getvalue().encode())
 
-    def environment(self, day=None, **more):
+    def environment(self, day=None, seconds=NOON, **more):
         environment = dict(os.environ, TALLYRUN_ROOT=str(self.root), TALLYRUN_LOG="stderr", TZ="UTC",
                            LANG="C", LC_ALL="C", LANGUAGE="", **more)
         environment.pop("TALLYRUN_LOG_LEVEL", None)
         # A preloaded library comes before the sanitizer's runtime, which is fine here.
         environment["ASAN_OPTIONS"] = environment.get("ASAN_OPTIONS", "") + ":verify_asan_link_order=0"
         if day is not None:
-            environment.update(NO_FAKE_STAT="1", DONT_FAKE_MONOTONIC="1")
+            # Preloaded by hand: the faketime program leaves a semaphore of its process number behind
+            # when it is killed, and fails when that number comes up again.
+            moment = time.strftime("@%Y-%m-%d %H:%M:%S", time.gmtime(day * 86400 + seconds))
+            environment.update(LD_PRELOAD=FAKETIME_LIBRARY, FAKETIME=moment, NO_FAKE_STAT="1",
+                               DONT_FAKE_MONOTONIC="1")
         return environment
 
-    def command(self, *arguments, day=TODAY, seconds=NOON):
-        command = [str(BIN / "tallyrun"), *arguments]
-        if day is not None:
-            moment = time.strftime("%Y-%m-%d %H:%M:%S", time.gmtime(day * 86400 + seconds))
-            command = ["faketime", "-f", "@" + moment] + command
-        return command
+    def command(self, *arguments):
+        return [str(BIN / "tallyrun"), *arguments]
 
     def run(self, *arguments, day=TODAY, seconds=NOON):
         """Runs tallyrun at that time; the messages, without their prefix, by level and text."""
-        result = subprocess.run(self.command(*arguments, day=day, seconds=seconds),
-                                capture_output=True, timeout=120, env=self.environment(day))
+        result = subprocess.run(self.command(*arguments), capture_output=True, timeout=120,
+                                env=self.environment(day, seconds))
         assert result.returncode == 0, (result.returncode, result.stderr[-2000:])
         return parse_messages(result.stderr)
 
     def start(self, *arguments, day=TODAY):
-        return subprocess.Popen(self.command(*arguments, day=day), stderr=subprocess.PIPE,
+        return subprocess.Popen(self.command(*arguments), stderr=subprocess.PIPE,
                                 env=self.environment(day))
 
     def tool(self, *arguments, stdin=b"", status=0):

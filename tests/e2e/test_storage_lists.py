@@ -37,7 +37,7 @@ class StorageListsTest(DeviceTest):
         return [path.read_text() for path in (device.root / SPOOL).glob("*-StorageStatus.log")]
 
     def run_day(self, device, day):
-        subprocess.run(device.command("-f", day=day), check=True, capture_output=True, timeout=120,
+        subprocess.run(device.command("-f"), check=True, capture_output=True, timeout=120,
                        env=device.environment(day))
 
     def test_every_controller_and_generation(self):
