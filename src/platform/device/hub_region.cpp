@@ -15,6 +15,9 @@ constexpr std::size_t kInterestHeaderSize = 8;
 constexpr std::size_t kInterestSize = 24;
 constexpr std::uint32_t kMostInterests = 0x555554D;
 
+// Whoever asks for the same large channel again and again gets no more memory than this.
+constexpr std::size_t kMostRegionElements = (256u << 20) / kElementSize;
+
 constexpr std::uint64_t kElementCountMask = std::uint64_t{0xFFFF} << 32;
 
 template <class T>
@@ -146,13 +149,17 @@ std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& intere
   for (const auto& driver : drivers) entries.try_emplace(driver->id, driver.get());
   std::unordered_map<std::uint64_t, ChannelsByID> described;
   std::vector<Channel> channels;
+  std::size_t elements = 0;
   for (const Interest& interest : interests) {
     const auto entry = entries.find(interest.driver);
     if (entry == entries.end()) continue;
     const auto [known, isNew] = described.try_emplace(interest.driver);
     if (isNew) known->second = describedChannels(*entry->second, files);
     const auto frames = known->second.find(interest.channel);
-    if (frames != known->second.end()) channels.push_back({interest, frames->second});
+    if (frames == known->second.end()) continue;
+    elements += frames->second->elementCount();
+    if (elements > kMostRegionElements) return nullptr;
+    channels.push_back({interest, frames->second});
   }
   return std::make_unique<ChannelRegion>(std::move(channels));
 }

@@ -27,7 +27,8 @@ class HubRegion {
   virtual void writeFrame(std::size_t refresh, std::span<std::byte> memory) = 0;
 };
 
-// The runs of the wanted channels that the drivers describe, in the order of the interests.
+// The runs of the wanted channels that the drivers describe, in the order of the interests; null
+// when they would take more than 256 MiB.
 std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& interests,
                                              const RegistrySource::Entries& drivers,
                                              DescribedFiles& files);

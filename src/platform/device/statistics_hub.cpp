@@ -74,7 +74,7 @@ class StatisticsHubClient final : public UserClient {
     const auto interests = parseInterestList(call.structInput);
     if (!interests || call.scalarOutput.empty() || memory_) return kRegistryBadArgument;
     region_ = makeRegion(*interests);
-    if (!region_) return kRegistryNotFound;
+    if (!region_) return kRegistryNoMemory;
     memory_ = SharedMemory::create(region_->size());
     if (!memory_) return kRegistryNoMemory;
     region_->writeFrame(0, memory_->writable());
