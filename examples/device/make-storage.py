@@ -162,7 +162,9 @@ def main():
     (device / "device.plist").write_bytes(plistlib.dumps(description, sort_keys=False))
 
     registry = load(device / "registry.plist", {"Entries": []})
-    registry["Entries"] += [storage_driver(), {"Class": "HwReportHub"}, channel_driver()]
+    if not any(entry.get("Class") == "HwReportHub" for entry in registry["Entries"]):
+        registry["Entries"].append({"Class": "HwReportHub"})
+    registry["Entries"] += [storage_driver(), channel_driver()]
     (device / "registry.plist").write_bytes(plistlib.dumps(registry, sort_keys=False))
 
 

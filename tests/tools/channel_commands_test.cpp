@@ -1,0 +1,304 @@
+// tallyctl channels on described devices: what is chosen, shown and refused.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <nlohmann/json.hpp>
+
+#include "host_platform.h"
+#include "tools/tool.h"
+
+namespace tally::tools {
+namespace {
+
+using nlohmann::json;
+using testing::HasSubstr;
+
+std::string key(const std::string& name, const std::string& value) {
+  return "<key>" + name + "</key>" + value;
+}
+std::string integer(std::uint64_t value) {
+  return "<integer>" + std::to_string(value) + "</integer>";
+}
+std::string text(const std::string& value) { return "<string>" + value + "</string>"; }
+std::string dict(const std::string& content) { return "<dict>" + content + "</dict>"; }
+std::string array(const std::string& content) { return "<array>" + content + "</array>"; }
+
+constexpr std::uint64_t word(std::uint64_t format, std::uint64_t categories, std::uint64_t count) {
+  return format | categories << 16 | count << 32;
+}
+
+std::string entry(const std::string& className, const std::string& content) {
+  return dict(key("Class", text(className)) + content);
+}
+std::string driver(const std::string& name, const std::string& legend, const std::string& values) {
+  return entry("Driver", key("Name", text(name)) +
+                             key("Properties", dict(key("HwReportLegendPublic", "<true/>") +
+                                                    key("HwReportLegend", legend) +
+                                                    key("HwReportValues", array(values)))));
+}
+std::string channel(std::uint64_t id, std::uint64_t type, const std::string& name) {
+  return array(integer(id) + integer(type) + text(name));
+}
+std::string group(const std::string& names, std::uint64_t unit, const std::string& channels) {
+  const std::string config = "<data>CgAAAAAAAAAAAAAAAwAAAA==</data>";  // 3 buckets of 10
+  return dict(names +
+              key("HwReportChannelInfo", dict(key("HwReportChannelUnit", integer(unit)) +
+                                              key("HwReportChannelConfig", config))) +
+              key("HwReportChannels", array(channels)));
+}
+std::string frames(std::uint64_t id, const std::string& values) {
+  return dict(key("Channel", integer(id)) + key("Frames", array(values)));
+}
+
+constexpr std::uint64_t kMilliseconds = 0x01'00'00'7C'00000000, kEvents = 0x64'00'00'00'00000000;
+
+std::string state(const std::string& name, std::uint64_t entries, std::uint64_t residency,
+                  std::uint64_t time) {
+  return dict(key("ID", text(name)) + key("InTransitions", integer(entries)) +
+              key("Residency", integer(residency)) + key("Time", integer(time)));
+}
+std::string bucket(std::uint64_t hits, std::uint64_t sum) {
+  return dict(key("Hits", integer(hits)) + key("Sum", integer(sum)));
+}
+
+// One channel of each format, and one that is described nowhere.
+std::string goodDriver() {
+  const std::string groupA = key("HwReportGroupName", text("A"));
+  return driver(
+      "good",
+      array(group(groupA, kEvents, channel(1, word(1, 0x100, 1), "count")) +
+            group(groupA + key("HwReportSubGroupName", text("Sub")), kMilliseconds,
+                  channel(2, word(2, 0, 2), "power") + channel(3, word(3, 0x102, 3), "latency") +
+                      channel(4, word(4, 0, 2), "lanes"))),
+      frames(1, integer(10) + integer(7)) +
+          frames(2, array(state("IDLE", 3, 1000, 5) + state("BUSY", 4, 3000, 9)) +
+                        array(state("IDLE", 5, 2500, 11) + state("BUSY", 5, 3500, 10))) +
+          frames(3, array(bucket(0, 0) + bucket(2, 30) + bucket(0, 0)) +
+                        array(bucket(0, 0) + bucket(6, 90) + bucket(0, 0))) +
+          frames(4, array(integer(1) + integer(2) + integer(3) + integer(4) + integer(5)) +
+                        array(integer(2) + integer(4) + integer(6) + integer(8) + integer(10))));
+}
+std::string hub(const std::string& content = "") {
+  return entry("HwReportHub", key("Hub", dict(content)));
+}
+
+struct Outcome {
+  int status;
+  std::string out, err;
+};
+
+class ChannelCommands : public testing::Test {
+ protected:
+  void SetUp() override {
+    char name[] = "/tmp/tally-channels-XXXXXX";
+    root_ = mkdtemp(name);
+    std::filesystem::create_directory(root_ + "/device");
+  }
+  void TearDown() override { std::filesystem::remove_all(root_); }
+
+  void describe(const std::string& entries) const {
+    std::ofstream(root_ + "/device/registry.plist")
+        << "<?xml version=\"1.0\"?><plist version=\"1.0\">" << dict(key("Entries", array(entries)))
+        << "</plist>";
+  }
+  Outcome run(const std::vector<std::string>& arguments, const Terminal& terminal = {}) const {
+    std::vector<const char*> pointers = {"tallyctl", "channels"};
+    for (const std::string& argument : arguments) pointers.push_back(argument.c_str());
+    ToolContext context;
+    context.root = root_;
+    context.output = context.errors = terminal;
+    std::FILE* const out = context.out = std::tmpfile();
+    std::FILE* const err = context.err = std::tmpfile();
+    const int status =
+        runTool(context, pointers, [](const std::string& root) { return makeHostPlatform(root); });
+    return {status, contentOf(out), contentOf(err)};
+  }
+
+ private:
+  static std::string contentOf(std::FILE* file) {
+    std::string content(static_cast<std::size_t>(std::ftell(file)), '\0');
+    std::rewind(file);
+    EXPECT_EQ(std::fread(content.data(), 1, content.size(), file), content.size());
+    std::fclose(file);
+    return content;
+  }
+  std::string root_;
+};
+
+TEST_F(ChannelCommands, FiltersChooseAndCombine) {
+  describe(hub() + goodDriver() +
+           driver("other", array(group("", kEvents, channel(9, word(1, 2, 1), "lone"))), ""));
+  const struct {
+    std::vector<std::string> filters;
+    const char* names;
+  } cases[] = {
+      {{}, "count power latency lanes lone "},
+      {{"--driver", "oth"}, "lone "},
+      {{"--driver", "id 0x101"}, "count power latency lanes "},
+      {{"--group", "A"}, "count power latency lanes "},
+      {{"--subgroup", "Sub"}, "power latency lanes "},
+      {{"--category", "0x100"}, "count latency "},
+      {{"--category", "2"}, "latency lone "},
+      {{"--format", "array"}, "lanes "},
+      {{"--unit", "events"}, "count lone "},
+      {{"--unit", "0x6400000000000000"}, "count lone "},
+      {{"--unit", "0x64000000000000000000"}, ""},
+      {{"--unit", "0x"}, ""},
+      {{"--unit", "events", "--group", "A"}, "count "},
+      {{"--group", "a"}, ""},
+      {{"--format", "state", "--category", "0x100"}, ""},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(testing::PrintToString(c.filters));
+    std::vector<std::string> arguments = c.filters;
+    arguments.insert(arguments.begin(), {"list", "--json"});
+    const Outcome outcome = run(arguments);
+    std::string names;
+    const json list = json::parse(outcome.out);
+    for (const auto& item : list) names += item["name"].get<std::string>() + " ";
+    EXPECT_EQ(names, c.names);
+    EXPECT_EQ(outcome.status, *c.names != '\0' ? kSuccess : kWrong);
+    EXPECT_EQ(outcome.err.empty(), *c.names != '\0');
+  }
+}
+
+// What is read from the sample of a device, by the names of channels.
+std::map<std::string, json> byName(const Outcome& outcome) {
+  std::map<std::string, json> channels;
+  const json document = json::parse(outcome.out);
+  for (const auto& item : document["channels"]) channels[item["name"]] = item;
+  return channels;
+}
+
+TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
+  describe(hub() + goodDriver());
+  const struct {
+    std::vector<std::string> arguments;
+    std::int64_t count;
+    std::uint64_t entries, residency, hits, sum;
+    double share;
+    json lanes;
+  } cases[] = {
+      {{"sample", "--json"}, 10, 3, 1000, 2, 30, 0.25, {1, 2, 3, 4, 5}},
+      {{"sample", "--json", "--delta", "0.01"}, -3, 2, 1500, 4, 60, 0.75, {1, 2, 3, 4, 5}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.arguments.back());
+    const Outcome outcome = run(c.arguments);
+    ASSERT_EQ(outcome.status, kSuccess) << outcome.err;
+    auto channels = byName(outcome);
+    EXPECT_EQ(channels["count"]["value"], c.count);
+    const json& idle = channels["power"]["states"][0];
+    EXPECT_EQ(idle["name"], "IDLE");
+    EXPECT_EQ(idle["entries"], c.entries);
+    EXPECT_EQ(idle["residency"], c.residency);
+    EXPECT_EQ(idle["share"], c.share);
+    const json& middle = channels["latency"]["buckets"][1];
+    EXPECT_EQ(middle["lower"], 10);
+    EXPECT_EQ(middle["upper"], 20);
+    EXPECT_EQ(middle["hits"], c.hits);
+    EXPECT_EQ(middle["sum"], c.sum);
+    EXPECT_TRUE(middle["minimum"].is_null());
+    EXPECT_EQ(channels["lanes"]["values"], c.lanes);
+  }
+}
+
+TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
+  describe(hub() + goodDriver());
+  const Outcome outcome = run({"sample"}, {80, false, false, true});
+  EXPECT_EQ(outcome.out,
+            "\ngood <id 0x101>\n"
+            " A\n"
+            "  count  10  events\n"
+            " A / Sub\n"
+            "  power\n"
+            "    IDLE  ██████              25.0 %  1 s  3  entered\n"
+            "    BUSY  ██████████████████  75.0 %  3 s  4  entered, now\n"
+            "  latency\n"
+            "    10 to 20  ms  2  ████████████████████████\n"
+            "  lanes\n"
+            "    [0]  1  ms  ████▊\n"
+            "    [1]  2  ms  █████████▋\n"
+            "    [2]  3  ms  ██████████████▍\n"
+            "    [3]  4  ms  ███████████████████▎\n"
+            "    [4]  5  ms  ████████████████████████\n");
+}
+
+TEST_F(ChannelCommands, AWaitShowsOnATerminalOnly) {
+  describe(hub() + goodDriver());
+  EXPECT_EQ(run({"sample", "--delta", "0.01"}).err, "");
+  const std::string err = run({"sample", "--delta", "0.01"}, {80, true, false, true}).err;
+  EXPECT_THAT(err, HasSubstr("waiting for the second sample: 1 s"));
+  EXPECT_TRUE(err.ends_with("\r\x1b[K"));
+}
+
+TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
+  const std::string code = integer(0xE00002BC);
+  const std::string ghost =
+      driver("ghost", array(group("", kEvents, channel(8, word(1, 0, 1), "unserved"))), "");
+  const std::string broken = driver("bro&#27;ken", array(group("", 0, array(integer(1)))), "");
+  const std::string legend = driver("odd", integer(3), "");
+  const std::string lost = driver("lost", array(group("", kEvents, channel(5, word(1, 0, 1), "x"))),
+                                  frames(5, array(integer(1)) + "<array><dict/></array>"));
+  const struct {
+    const char* name;
+    std::string entries;
+    std::vector<std::string> arguments;
+    const char* message;
+    bool showsGood;
+  } cases[] = {
+      {"nothing", "", {"sample"}, "no driver publishes channels", false},
+      {"no hub", goodDriver(), {"sample"}, "the device has no statistics hub", false},
+      {"open",
+       hub(key("OpenStatus", code)) + goodDriver(),
+       {"sample"},
+       "Could not open HwReportHub (error 0xe00002bc)",
+       false},
+      {"update",
+       hub(key("UpdateStatus", code)) + goodDriver(),
+       {"sample"},
+       "no sample: error 0xe00002bc",
+       false},
+      {"garbage",
+       hub(key("RawFrames", array("<data>AQID</data>"))) + goodDriver(),
+       {"sample"},
+       "couldn't create samples",
+       false},
+      {"a channel without values",
+       hub() + goodDriver() + ghost,
+       {"sample"},
+       "1 channel not served by the hub",
+       true},
+      {"a channel that ends",
+       hub() + goodDriver() + lost,
+       {"sample", "--delta", "0.01"},
+       "x: the two samples cannot be subtracted",
+       true},
+      {"a broken legend",
+       hub() + broken + goodDriver(),
+       {"sample"},
+       "bro\\x1bken <id 0x101>: its channels cannot be read",
+       true},
+      {"no legend", hub() + legend + goodDriver(), {"list"}, "bad legend (error 0xe00002c9)", true},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    describe(c.entries);
+    for (const char* form : {"", "--json"}) {
+      auto arguments = c.arguments;
+      if (*form != '\0') arguments.push_back(form);
+      const Outcome outcome = run(arguments);
+      EXPECT_EQ(outcome.status, kWrong);
+      EXPECT_THAT(outcome.err, HasSubstr(c.message));
+      EXPECT_EQ(outcome.out.find("latency") != std::string::npos, c.showsGood);
+      EXPECT_TRUE(*form == '\0' || json::accept(outcome.out));
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tally::tools
