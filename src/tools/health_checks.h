@@ -22,8 +22,9 @@ struct HealthLine {
 // Every check, in the order in which a day's run meets what they look at. Nothing is changed.
 std::vector<HealthLine> examineDevice(const ToolContext& context);
 
-// Those of the files below the root, and those of the services.
+// Those of the files below the root, of the services, and of the drivers.
 void examineFiles(const ToolContext& context, std::vector<HealthLine>& lines);
 void examineServices(std::vector<HealthLine>& lines);
+void examineDrivers(std::vector<HealthLine>& lines);
 
 }  // namespace tally::tools

@@ -158,6 +158,7 @@ std::vector<HealthLine> examineDevice(const ToolContext& context) {
   Lines lines;
   examineFiles(context, lines);
   examineServices(lines);
+  examineDrivers(lines);
   return lines;
 }
 

@@ -136,6 +136,17 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
          put(domain + ".damaged-1", "x");
        },
        {"ok: 2 domains", "wrong: 1 damaged file set aside"}},
+      {"flash storage", [] {}, {"missing: no driver"}},
+      {"statistics", [] {}, {"missing: 0 channels, no hub"}},
+      {"flash storage",
+       [&] {
+         putPlist(
+             "device/device/registry.plist",
+             "<dict><key>Entries</key><array><dict><key>Class</key><string>SPXStorage</string>"
+             "</dict><dict><key>Class</key><string>HwReportHub</string></dict></array></dict>");
+       },
+       {"wrong: driver SPXStorage cannot be opened: error 0xe00002c7"}},
+      {"statistics", [] {}, {"missing: 0 channels"}},
       {"last day", [] {}, {"missing: "}},
       {"last day", [&] { setLastDay("20000"); }, {"missing: day 20000 (2024-10-04) was processed"}},
       {"last day", [&] { setLastDay("999999"); }, {"wrong: "}},

@@ -9,8 +9,8 @@
 #include <string>
 #include <vector>
 
+#include "host_platform.h"
 #include "linux/temporary_root.h"
-#include "platform/linux/linux_platform.h"
 #include "tools/tool.h"
 #include "tools/tool_log.h"
 
@@ -44,7 +44,7 @@ class ToolTest : public TemporaryRoot {
     return outcome;
   }
   virtual Platform makePlatform(const std::string& folder, std::FILE* err) {
-    return makeLinuxPlatform(folder, {makeToolLog(err), /*readOnlyPreferences=*/true});
+    return makeHostPlatform(folder, {makeToolLog(err), /*readOnlyPreferences=*/true});
   }
 
   void putWhitelist(const std::string& groups) {
