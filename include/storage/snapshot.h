@@ -1,5 +1,6 @@
 // The storage processor's snapshots as text: one line for each interval, below a key that explains
-// the columns. Neither function allocates or reads outside the buffers it is given.
+// the columns. Neither function allocates, reads outside the buffers it is given, or reports an
+// error in another way than by its result.
 #pragma once
 
 #include <cstddef>
@@ -30,8 +31,7 @@ TALLY_API int SPXParseSnapshotBuffer(const void* records, std::uint32_t recordsL
 //
 // A description that is null leaves everything alone and gives 0, as does a capacity of 0. One that
 // cannot be honoured in full (it ends early, a field lies outside the record, a label format holds
-// anything but one integer conversion) gives an empty text, a size of 1, 0, the same cursor, and
-// one line on standard error that says why.
+// anything but one integer conversion) gives an empty text, a size of 1, 0 and the same cursor.
 TALLY_API int SPXParseSnapshotBufferWithInplaceParser(const void* records,
                                                       std::uint32_t recordsLength, char* text,
                                                       std::uint32_t* textSize,

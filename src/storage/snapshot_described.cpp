@@ -1,6 +1,5 @@
 // Snapshots whose fields a description block names.
 #include <array>
-#include <cstdio>
 #include <cstring>
 
 #include "base/byte_reader.h"
@@ -120,15 +119,9 @@ int SPXParseSnapshotBufferWithInplaceParser(const void* records, std::uint32_t r
   if (records == nullptr) recordsLength = 0;
   LineText out(text, *textSize);
   SnapshotDescription parsed;
-  const std::string_view fault = parsed.parse(description);
-  bool whole = false;
-  if (fault.empty()) {
-    whole = appendRecords(out, {static_cast<const std::byte*>(records), recordsLength}, parsed,
-                          *recordCursor);
-  } else {
-    std::fprintf(stderr, "Snapshot description refused: %.*s\n", static_cast<int>(fault.size()),
-                 fault.data());
-  }
+  const bool whole = parsed.parse(description).empty() &&
+                     appendRecords(out, {static_cast<const std::byte*>(records), recordsLength},
+                                   parsed, *recordCursor);
   *textSize = out.finish();
   return whole ? 1 : 0;
 }

@@ -10,6 +10,7 @@
 #include "base/file.h"
 #include "base/utf8.h"
 #include "storage/snapshot.h"
+#include "storage/snapshot_description.h"
 #include "tools/output.h"
 
 namespace tally::tools {
@@ -17,29 +18,26 @@ namespace {
 
 constexpr std::size_t kLargestRecords = 64u << 20;
 constexpr std::size_t kLargestDescription = 1u << 20;
-// More than any header takes, so that a text that stays empty was refused.
 constexpr std::uint32_t kFirstCapacity = 2u << 20;
 constexpr std::uint32_t kLargestCapacity = 1u << 30;
 
 // Renders with more and more room, always from the first record, so that no record is lost to a
-// text that was too small. Empty when there is no room that suffices, or nothing can be rendered.
+// text that was too small. Empty when there is no room that suffices.
 template <class Render>
 std::optional<std::string> renderWhole(const Render& render) {
   for (std::uint32_t capacity = kFirstCapacity; capacity <= kLargestCapacity; capacity *= 2) {
     std::string text(capacity, '\0');
     std::uint32_t size = capacity;
-    bool refused = false;
-    if (render(text.data(), size, refused)) {
+    if (render(text.data(), size)) {
       text.resize(size);
       return text;
     }
-    if (refused) break;
   }
   return std::nullopt;
 }
 
 std::optional<std::string> renderFixed(const std::string& records) {
-  return renderWhole([&](char* text, std::uint32_t& size, bool&) {
+  return renderWhole([&](char* text, std::uint32_t& size) {
     return SPXParseSnapshotBuffer(records.data(), static_cast<std::uint32_t>(records.size()), text,
                                   &size) == 1;
   });
@@ -47,13 +45,12 @@ std::optional<std::string> renderFixed(const std::string& records) {
 
 std::optional<std::string> renderDescribed(const std::string& records,
                                            const std::string& description) {
-  return renderWhole([&](char* text, std::uint32_t& size, bool& refused) {
+  return renderWhole([&](char* text, std::uint32_t& size) {
     std::uint32_t cursor = 0;
     const bool whole = SPXParseSnapshotBufferWithInplaceParser(
                            records.data(), static_cast<std::uint32_t>(records.size()), text, &size,
                            std::as_bytes(std::span(description)), &cursor) == 1;
     if (whole) --size;  // the zero byte
-    refused = !whole && cursor == 0;
     return whole;
   });
 }
@@ -78,6 +75,11 @@ int runSnapshot(const ToolContext& context, const std::string& path,
   } else {
     const auto description = readFile(descriptionPath, kLargestDescription);
     if (!description) return complain(context, description.error().message, kWrong);
+    const std::string_view fault =
+        SnapshotDescription().parse(std::as_bytes(std::span(*description)));
+    if (!fault.empty()) {
+      return complain(context, fmt::format("the description is refused: {}", fault), kWrong);
+    }
     text = renderDescribed(*records, *description);
   }
   if (!text) return complain(context, "the snapshot cannot be shown", kWrong);

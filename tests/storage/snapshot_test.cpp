@@ -362,7 +362,9 @@ TEST(Snapshot, DescriptionsThatCannotBeHonouredAreRefusedWhole) {
     Block block;
     c.change(block);
     std::uint32_t cursor = 0;
+    testing::internal::CaptureStderr();
     const auto r = renderDescribed(describedBytes(), block.bytes(), 4096, cursor);
+    EXPECT_EQ(testing::internal::GetCapturedStderr(), "") << c.what;
     EXPECT_EQ(r.result, 0) << c.what;
     EXPECT_EQ(cursor, 0u) << c.what;
     EXPECT_EQ(r.size, 1u) << c.what;

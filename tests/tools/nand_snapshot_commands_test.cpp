@@ -47,7 +47,9 @@ TEST_F(SnapshotCommand, ShowsRecordsOfBothLayouts) {
   EXPECT_EQ(described.out, "- SPX Snapshot - \n\\x1b]\nT=0005\nT=0077\n");
   const Outcome json = show({records, "--header", good, "--json"});
   EXPECT_EQ(json.json()["lines"][3], "T=0077");
-  EXPECT_EQ(show({records, "--header", bad}).status, kWrong);
+  const Outcome refused = show({records, "--header", bad});
+  EXPECT_EQ(refused.status, kWrong);
+  EXPECT_THAT(refused.err, testing::HasSubstr("a label format holds anything but one integer"));
   EXPECT_EQ(show({"/nowhere"}).status, kWrong);
 }
 
