@@ -172,6 +172,18 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
             0u);
 }
 
+TEST(StatisticsHub, HasARunOfNobodysWhenNothingIsServed) {
+  Hub hub("");
+  ASSERT_EQ(hub.start(), 0u);
+  ASSERT_EQ(hub.configure(interestList(2, {{5, 9, 1}, {6, 1, 1}})), 0u);
+  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_EQ(hub.update(), 0u);
+  EXPECT_EQ(hub.length, kElementSize);
+  EXPECT_EQ(hub.word(ElementLayout::driver), kMissingValue);
+  EXPECT_EQ(hub.word(ElementLayout::channel), kMissingValue);
+  EXPECT_EQ(hub.word(ElementLayout::type), std::uint64_t{1} << 32) << "not a run of no elements";
+}
+
 TEST(StatisticsHub, ServesRawRegionsVerbatim) {
   Hub hub("<key>RawFrames</key><array><data>AQID</data><data>/w==</data></array>");
   ASSERT_EQ(hub.start(), 0u);

@@ -35,8 +35,7 @@ class ChannelRegion final : public HubRegion {
   explicit ChannelRegion(std::vector<Channel> channels) : channels_(std::move(channels)) {
     for (const Channel& channel : channels_) elements_ += channel.described->elementCount();
   }
-  // One element at least: its count of 0 tells a reader that nothing follows.
-  std::size_t size() const override { return std::max<std::size_t>(elements_, 1) * kElementSize; }
+  std::size_t size() const override { return elements_ * kElementSize; }
 
   void writeFrame(std::size_t refresh, std::span<std::byte> memory) override {
     for (const Channel& channel : channels_) {
@@ -103,6 +102,14 @@ std::unordered_map<std::uint64_t, std::uint64_t> legendTypes(const RegistryEntry
   return types;
 }
 
+// Stands for no channel: a region cannot be empty, and a run of no elements in it would fail the
+// samples of those who only wanted a channel that is not served.
+Channel nobodysChannel() {
+  ChannelFrames frames;
+  frames.frames = {{ElementValues{}}};
+  return {{kMissingValue, kMissingValue, 0}, std::make_shared<ChannelFrames>(std::move(frames))};
+}
+
 ChannelsByID describedChannels(const RegistryEntry& driver, DescribedFiles& files) {
   ChannelsByID channels;
   const auto* values = driver.properties->getAs<KvArray>("HwReportValues");
@@ -161,6 +168,7 @@ std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& intere
     if (elements > kMostRegionElements) return nullptr;
     channels.push_back({interest, frames->second});
   }
+  if (channels.empty()) channels.push_back(nobodysChannel());
   return std::make_unique<ChannelRegion>(std::move(channels));
 }
 
