@@ -47,7 +47,8 @@ TALLY_API const std::uint32_t* SPXGetSnapshotHeaderSelectors();
 TALLY_API const std::uint32_t* SPXGetBandStatsSelectors();
 
 // Handles of the device registry: a service is given back with HandleRelease, a connection with
-// FNDDisconnect; 0 is none. Every failure below is one line on standard error.
+// FNDDisconnect; 0 is none. Every failure below is one line on standard error. Any thread may call;
+// a connection is used by one at a time.
 
 // The service of the first exporter whose driver the device has, or 0. *exporterOut always points
 // into nand_exporters afterwards: at the terminator when there is none.

@@ -1,4 +1,4 @@
-// The NAND info dictionary: the flash storage's figures, by report key.
+// The NAND info dictionary: the flash storage's figures, by report key. Any thread may ask for one.
 #pragma once
 
 #include <array>

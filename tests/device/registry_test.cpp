@@ -1,7 +1,11 @@
 // The registry of a described device: matching, handles, iterators, drivers.
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cstring>
+#include <latch>
+#include <thread>
+#include <vector>
 
 #include "device/described_device.h"
 
@@ -100,6 +104,35 @@ TEST(Registry, HandlesOutOfUseFailAndNeverCrash) {
     EXPECT_NE(registry.ServiceCloseConnection(wrong), 0u);
   }
   registry.HandleRelease(iterator);
+  EXPECT_EQ(device.openHandles(), 0u);
+}
+
+// Each thread with handles of its own, as callers of the storage library are.
+TEST(Registry, ServesSeveralThreads) {
+  DescribedDevice device(R"(<dict><key>Entries</key><array><dict>
+    <key>Class</key><string>Driver</string>
+    <key>UserClient</key><dict><key>Methods</key><array><dict>
+      <key>Method</key><integer>1</integer><key>Data</key><data>AQIDBA==</data>
+    </dict></array></dict></dict></array></dict>)");
+  DeviceRegistry& registry = device.registry();
+  std::latch start(4);  // none is done before the last begins
+  std::vector<std::jthread> threads;
+  std::array<int, 4> answered{};
+  for (int& count : answered) {
+    threads.emplace_back([&device, &registry, &start, &count] {
+      start.arrive_and_wait();
+      for (int i = 0; i < 10000; ++i) {
+        const ConnectionHandle connection = device.connect("Driver");
+        std::array<std::byte, 4> reply{};
+        MethodCall call;
+        call.structOutput = reply;
+        count += registry.ConnectionCallMethod(connection, 1, call) == kRegistrySuccess &&
+                 registry.ServiceCloseConnection(connection) == kRegistrySuccess;
+      }
+    });
+  }
+  threads.clear();
+  EXPECT_EQ(answered, (std::array{10000, 10000, 10000, 10000}));
   EXPECT_EQ(device.openHandles(), 0u);
 }
 

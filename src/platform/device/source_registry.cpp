@@ -40,18 +40,21 @@ SourceRegistry::Iterator* SourceRegistry::iteratorOf(RegistryHandle handle) {
   return slot != handles_.end() ? std::get_if<Iterator>(&slot->second.object) : nullptr;
 }
 
-UserClient* SourceRegistry::clientOf(ConnectionHandle connection) const {
+std::shared_ptr<UserClient> SourceRegistry::clientOf(ConnectionHandle connection) const {
+  const std::lock_guard lock(mutex_);
   const auto client = connections_.find(connection);
-  return client != connections_.end() ? client->second.get() : nullptr;
+  return client != connections_.end() ? client->second : nullptr;
 }
 
 RegistryHandle SourceRegistry::RegistryFindService(KvRef<KvDictionary> matching) {
+  const std::lock_guard lock(mutex_);
   auto matches = matchingEntries(currentLists(), matching.get());
   return matches.empty() ? 0 : add(std::move(matches.front()));
 }
 
 RegistryResult SourceRegistry::RegistryCopyMatchingServices(KvRef<KvDictionary> matching,
                                                             RegistryHandle* iterator) {
+  const std::lock_guard lock(mutex_);
   *iterator = 0;
   if (!matching) return kRegistryBadArgument;
   Lists lists = currentLists();
@@ -61,23 +64,27 @@ RegistryResult SourceRegistry::RegistryCopyMatchingServices(KvRef<KvDictionary> 
 }
 
 RegistryHandle SourceRegistry::RegistryIteratorNext(RegistryHandle iterator) {
+  const std::lock_guard lock(mutex_);
   Iterator* const place = iteratorOf(iterator);
   if (place == nullptr || place->next >= place->matches.size()) return 0;
   return add(place->matches[place->next++]);
 }
 
 bool SourceRegistry::RegistryIteratorIsValid(RegistryHandle iterator) {
+  const std::lock_guard lock(mutex_);
   const Iterator* const place = iteratorOf(iterator);
   return place != nullptr && place->seen == currentLists();
 }
 
 KvRef<KvObject> SourceRegistry::RegistryCopyProperty(RegistryHandle entry, std::string_view key) {
+  const std::lock_guard lock(mutex_);
   const Place* const place = entryOf(entry);
   if (place == nullptr) return nullptr;
   return KvRef<KvObject>::share(place->entry->properties->get(key));
 }
 
 KvRef<KvObject> SourceRegistry::RegistrySearchProperty(RegistryHandle entry, std::string_view key) {
+  const std::lock_guard lock(mutex_);
   const Place* const place = entryOf(entry);
   if (place == nullptr) return nullptr;
   const auto entries = sources_[place->source]->entries();
@@ -99,6 +106,7 @@ KvRef<KvObject> SourceRegistry::RegistrySearchProperty(RegistryHandle entry, std
 }
 
 RegistryResult SourceRegistry::RegistryGetEntryID(RegistryHandle entry, std::uint64_t* id) {
+  const std::lock_guard lock(mutex_);
   const Place* const place = entryOf(entry);
   if (place == nullptr) return kRegistryBadArgument;
   *id = place->entry->id;
@@ -106,6 +114,7 @@ RegistryResult SourceRegistry::RegistryGetEntryID(RegistryHandle entry, std::uin
 }
 
 RegistryResult SourceRegistry::RegistryGetName(RegistryHandle entry, std::string* name) {
+  const std::lock_guard lock(mutex_);
   const Place* const place = entryOf(entry);
   if (place == nullptr) return kRegistryBadArgument;
   *name = place->entry->name;
@@ -113,22 +122,26 @@ RegistryResult SourceRegistry::RegistryGetName(RegistryHandle entry, std::string
 }
 
 std::uint32_t SourceRegistry::RegistryHandleIsValid(RegistryHandle handle) {
+  const std::lock_guard lock(mutex_);
   const auto slot = handles_.find(handle);
   return slot != handles_.end() ? slot->second.retainCount : 0;
 }
 
 void SourceRegistry::HandleRetain(RegistryHandle handle) {
+  const std::lock_guard lock(mutex_);
   const auto slot = handles_.find(handle);
   if (slot != handles_.end()) ++slot->second.retainCount;
 }
 
 void SourceRegistry::HandleRelease(RegistryHandle handle) {
+  const std::lock_guard lock(mutex_);
   const auto slot = handles_.find(handle);
   if (slot != handles_.end() && --slot->second.retainCount == 0) handles_.erase(slot);
 }
 
 RegistryResult SourceRegistry::ServiceOpenConnection(RegistryHandle service, std::uint32_t type,
                                                      ConnectionHandle* connection) {
+  const std::lock_guard lock(mutex_);
   *connection = 0;
   const Place* const place = entryOf(service);
   if (place == nullptr) return kRegistryBadArgument;
@@ -141,6 +154,7 @@ RegistryResult SourceRegistry::ServiceOpenConnection(RegistryHandle service, std
 }
 
 RegistryResult SourceRegistry::ServiceCloseConnection(ConnectionHandle connection) {
+  const std::lock_guard lock(mutex_);
   const auto client = connections_.find(connection);
   if (client == connections_.end()) return kRegistryBadArgument;
   const RegistryResult result = client->second->close();
@@ -152,7 +166,7 @@ RegistryResult SourceRegistry::ConnectionCallMethod(ConnectionHandle connection,
                                                     std::uint32_t selector, MethodCall& call) {
   call.scalarOutputCount = 0;
   call.structOutputSize = 0;
-  UserClient* const client = clientOf(connection);
+  const auto client = clientOf(connection);
   return client != nullptr ? client->call(selector, call) : kRegistryBadArgument;
 }
 
@@ -161,7 +175,7 @@ RegistryResult SourceRegistry::ConnectionMapMemory(ConnectionHandle connection,
                                                    const std::byte** address, std::size_t* length) {
   *address = nullptr;
   *length = 0;
-  UserClient* const client = clientOf(connection);
+  const auto client = clientOf(connection);
   if (client == nullptr || options != kMapAnywhere) return kRegistryBadArgument;
   std::span<const std::byte> memory;
   const RegistryResult result = client->map(memoryType, &memory);
@@ -174,7 +188,7 @@ RegistryResult SourceRegistry::ConnectionMapMemory(ConnectionHandle connection,
 RegistryResult SourceRegistry::ConnectionUnmapMemory(ConnectionHandle connection,
                                                      std::uint32_t memoryType,
                                                      const std::byte* address) {
-  UserClient* const client = clientOf(connection);
+  const auto client = clientOf(connection);
   return client != nullptr ? client->unmap(memoryType, address) : kRegistryBadArgument;
 }
 

@@ -3,6 +3,7 @@
 
 #include <map>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <variant>
 #include <vector>
@@ -11,6 +12,7 @@
 
 namespace tally {
 
+// Any thread may call. A connection's calls are not held up by those of another.
 class SourceRegistry final : public DeviceRegistry {
  public:
   // Entries of earlier sources come first in every enumeration.
@@ -40,7 +42,10 @@ class SourceRegistry final : public DeviceRegistry {
   RegistryResult ConnectionUnmapMemory(ConnectionHandle connection, std::uint32_t memoryType,
                                        const std::byte* address) override;
   // Handles and connections in use, so that leaks show.
-  std::size_t openHandles() const { return handles_.size() + connections_.size(); }
+  std::size_t openHandles() const {
+    const std::lock_guard lock(mutex_);
+    return handles_.size() + connections_.size();
+  }
 
  private:
   using Entry = std::shared_ptr<const RegistryEntry>;
@@ -64,13 +69,14 @@ class SourceRegistry final : public DeviceRegistry {
   RegistryHandle add(std::variant<Place, Iterator> object);
   const Place* entryOf(RegistryHandle handle) const;
   Iterator* iteratorOf(RegistryHandle handle);
-  UserClient* clientOf(ConnectionHandle connection) const;
+  std::shared_ptr<UserClient> clientOf(ConnectionHandle connection) const;
 
+  mutable std::mutex mutex_;  // of all below, and of the sources
   std::vector<std::unique_ptr<RegistrySource>> sources_;
   // Handles are never reused, so that one that was given back stays invalid.
   RegistryHandle nextHandle_ = 0x1000;
   std::map<RegistryHandle, Slot> handles_;
-  std::map<ConnectionHandle, std::unique_ptr<UserClient>> connections_;
+  std::map<ConnectionHandle, std::shared_ptr<UserClient>> connections_;
 };
 
 }  // namespace tally

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <memory>
+#include <mutex>
 #include <set>
 #include <string>
 #include <string_view>
@@ -13,7 +14,7 @@
 namespace tally {
 
 // Read once, at the first question. A damaged file is named in one error line and answers nothing;
-// an entry of the wrong type is named in one error line and counts as absent.
+// an entry of the wrong type is named in one error line and counts as absent. Any thread may ask.
 class DeviceDescription {
  public:
   DeviceDescription(std::string path, std::shared_ptr<SystemLog> log)
@@ -35,10 +36,13 @@ class DeviceDescription {
   void reportEntry(std::string_view entry, std::string_view fault);
 
  private:
+  void read();
+
   std::string path_;
   std::shared_ptr<SystemLog> log_;
-  bool read_ = false;
+  std::once_flag read_;
   KvRef<KvDictionary> entries_;
+  std::mutex reporting_;
   std::set<std::string, std::less<>> reported_;
 };
 

@@ -119,6 +119,7 @@ std::optional<LinuxKernelValues::Answer> LinuxKernelValues::described(std::strin
   if (value == nullptr) return std::nullopt;
   const auto* successive = kvCast<KvArray>(value);
   if (successive == nullptr) return convert(name, *value);
+  const std::lock_guard lock(taking_);
   std::size_t& taken = taken_[std::string(name)];
   if (taken >= successive->size()) return Answer{ENOENT, {}};
   return convert(name, *successive->get(taken++));

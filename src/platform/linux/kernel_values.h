@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -46,6 +47,7 @@ class LinuxKernelValues final : public KernelValues {
   std::optional<Answer> convert(std::string_view name, const KvObject& value);
 
   std::shared_ptr<DeviceDescription> description_;
+  std::mutex taking_;
   std::map<std::string, std::size_t, std::less<>> taken_;  // items of described arrays
 };
 

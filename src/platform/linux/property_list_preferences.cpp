@@ -25,6 +25,7 @@ PropertyListPreferences::~PropertyListPreferences() {
 
 KvRef<KvObject> PropertyListPreferences::SMAPreferencesGetValue(std::string_view key,
                                                                 std::string_view domain) {
+  const std::lock_guard lock(mutex_);
   Domain* const state = find(domain);
   if (state == nullptr) return nullptr;
   if (const auto written = state->pending.find(key); written != state->pending.end()) {
@@ -36,16 +37,19 @@ KvRef<KvObject> PropertyListPreferences::SMAPreferencesGetValue(std::string_view
 
 void PropertyListPreferences::SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
                                                      std::string_view domain) {
+  const std::lock_guard lock(mutex_);
   if (Domain* const state = find(domain)) state->pending.insert_or_assign(std::string(key), value);
 }
 
 bool PropertyListPreferences::SMAPreferencesSynchronize(std::string_view domain) {
+  const std::lock_guard lock(mutex_);
   Domain* const state = find(domain);
   if (state == nullptr || access_ == Access::ReadOnly) return state != nullptr;
   return state->pending.empty() || writePending(*state, domain);
 }
 
 KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain) {
+  const std::lock_guard lock(mutex_);
   Domain* const state = find(domain);
   if (state == nullptr) return KvDictionary::create();
   refresh(*state, domain);

@@ -3,6 +3,7 @@
 
 #include <map>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -18,7 +19,8 @@ namespace tally {
 // A domain is read at its first use and again whenever another process has replaced its file.
 // Writes are kept per key and laid over what the file holds when they are synchronised, so that
 // two processes never undo each other's keys. Domains still unsynchronised are written when the
-// object is destroyed. Values are shared, not copied: a value given or got must not be changed.
+// object is destroyed. Values are shared, not copied: a value given or got must not be changed. Any
+// thread may call.
 class PropertyListPreferences final : public Preferences {
  public:
   // With ReadOnly no file is touched: a damaged one stays in its place, and what is written is
@@ -64,6 +66,7 @@ class PropertyListPreferences final : public Preferences {
   std::shared_ptr<SystemLog> log_;
   unsigned mode_;
   Access access_;
+  std::mutex mutex_;  // of all below
   bool swept_ = false;
   std::map<std::string, Domain, std::less<>> domains_;
 };

@@ -9,7 +9,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <optional>
+#include <mutex>
 
 #include "base/printable.h"
 #include "base/utf8.h"
@@ -67,10 +67,9 @@ class LinuxSystemLog final : public SystemLog {
 
  private:
   bool useJournal() {
-    if (!useJournal_) {
-      useJournal_ = !settings_.forceStandardError && journalIsThere();
-    }
-    return *useJournal_;
+    std::call_once(looked_,
+                   [this] { useJournal_ = !settings_.forceStandardError && journalIsThere(); });
+    return useJournal_;
   }
 
   static bool sendToJournal(LogLevel level, std::string_view message) {
@@ -82,7 +81,8 @@ class LinuxSystemLog final : public SystemLog {
   }
 
   SystemLogSettings settings_;
-  std::optional<bool> useJournal_;
+  std::once_flag looked_;
+  bool useJournal_ = false;
 };
 
 }  // namespace
