@@ -56,6 +56,19 @@ std::string folderOf(const std::string& path) {
   return slash == 0 ? "/" : path.substr(0, slash);
 }
 
+// For what was just made at the path. By its descriptor, since the folder's owner may have put
+// something else in its place by now.
+void giveToOwnerOfFolder(int descriptor, const std::string& path) {
+  struct stat folder {
+  }, made{};
+  if (::geteuid() != 0 || ::stat(folderOf(path).c_str(), &folder) != 0 || folder.st_uid == 0)
+    return;
+  // A second name of some other file of root's, laid where a lock was expected, is not given away.
+  if (::fstat(descriptor, &made) != 0 || (S_ISREG(made.st_mode) && made.st_nlink != 1)) return;
+  // A volume without owners is no reason to write nothing.
+  if (::fchown(descriptor, folder.st_uid, folder.st_gid) != 0) return;
+}
+
 }  // namespace
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
@@ -124,13 +137,17 @@ Result<std::vector<std::string>> listFolder(const std::string& path) {
 }
 
 Status makeFolders(const std::string& path, unsigned mode) {
-  if (::mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return Done{};
+  if (::mkdir(path.c_str(), mode) == 0) {
+    const Descriptor made(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (made.get() >= 0) giveToOwnerOfFolder(made.get(), path);
+    return Done{};
+  }
+  if (errno == EEXIST) return Done{};
   if (errno != ENOENT) return systemError("cannot make folder", path);
   const std::string parent = folderOf(path);
   if (parent == path) return systemError("cannot make folder", path);
   if (auto made = makeFolders(parent, mode); !made) return made;
-  if (::mkdir(path.c_str(), mode) == 0 || errno == EEXIST) return Done{};
-  return systemError("cannot make folder", path);
+  return makeFolders(path, mode);
 }
 
 Status removeFile(const std::string& path) {
@@ -171,6 +188,7 @@ Result<TemporaryFile> TemporaryFile::beside(const std::string& path, unsigned mo
     descriptor = retried(open);
   }
   if (descriptor < 0) return systemError("cannot create", temporary);
+  giveToOwnerOfFolder(descriptor, path);
   return TemporaryFile(path, std::move(temporary), descriptor);
 }
 
@@ -215,6 +233,7 @@ Result<FileLock> FileLock::acquire(const std::string& path) {
       [&] { return ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600); });
   if (descriptor < 0) return systemError("cannot open lock", path);
   FileLock lock(descriptor);
+  giveToOwnerOfFolder(descriptor, path);
   if (retried([&] { return ::flock(descriptor, LOCK_EX); }) != 0) {
     return systemError("cannot lock", path);
   }

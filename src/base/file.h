@@ -15,6 +15,9 @@ namespace tally {
 // The whole file. Refuses folders, devices and files larger than limit, without reading them.
 Result<std::string> readFile(const std::string& path, std::size_t limit);
 
+// What root makes in the folder of another user belongs to that user, who could not read it else:
+// files, folders and locks alike.
+
 // Replaces path by contents so that, whenever the process or the machine dies, the file is either
 // the old one or the new one: temporary name in the same folder, write, fsync, rename, fsync of
 // the folder. Missing folders are made. Nothing is left behind on failure.

@@ -182,6 +182,27 @@ TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
   EXPECT_EQ(listFolder(folder)->size(), 2u) << "nothing is left behind on failure";
 }
 
+TEST_F(FileTest, WhatRootMakesInAUsersFolderIsTheUsers) {
+  if (::geteuid() != 0) GTEST_SKIP() << "only root makes files for others";
+  constexpr uid_t kUser = 12345;
+  ASSERT_EQ(::chown(folder.c_str(), kUser, kUser), 0);
+  ASSERT_TRUE(writeFileAtomically(folder + "/a/b/file", "x"));
+  ASSERT_TRUE(FileLock::acquire(folder + "/a/lock"));
+  // A file of root's with a second name in the user's folder stays root's.
+  const std::string other = folder + "-of-root";
+  ASSERT_TRUE(FileLock::acquire(other));
+  ASSERT_EQ(::link(other.c_str(), (folder + "/trap").c_str()), 0);
+  ASSERT_TRUE(FileLock::acquire(folder + "/trap"));
+  const std::pair<const char*, uid_t> owners[] = {
+      {"/a", kUser}, {"/a/b", kUser}, {"/a/b/file", kUser}, {"/a/lock", kUser}, {"/trap", 0}};
+  for (const auto& [path, owner] : owners) {
+    struct stat status {};
+    ASSERT_EQ(::stat((folder + path).c_str(), &status), 0) << path;
+    EXPECT_EQ(status.st_uid, owner) << path;
+  }
+  ASSERT_TRUE(removeFile(other));
+}
+
 TEST_F(FileTest, AKillAtAnyMomentLeavesTheOldFileOrTheNew) {
   const std::string path = folder + "/file";
   const std::string old(100'000, 'o');
