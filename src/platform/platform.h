@@ -16,14 +16,17 @@
 #include "platform/device_registry.h"
 #include "platform/event_loop.h"
 #include "platform/files.h"
+#include "platform/ipc_endpoint.h"
 #include "platform/kernel_values.h"
 #include "platform/log_header_facts.h"
 #include "platform/log_submission.h"
 #include "platform/metrics_store.h"
+#include "platform/notifications.h"
 #include "platform/preferences.h"
 #include "platform/purgeable_space.h"
 #include "platform/run_lock.h"
 #include "platform/stackshot.h"
+#include "platform/system_configuration.h"
 #include "platform/system_log.h"
 
 namespace tally {
@@ -40,9 +43,13 @@ struct Platform {
   std::shared_ptr<SystemLog> log;
   std::shared_ptr<Clock> clock;
   std::shared_ptr<EventLoop> eventLoop;
+  std::shared_ptr<IpcEndpoint> ipcEndpoint;
+  std::shared_ptr<Notifications> notifications;
   std::shared_ptr<Files> files;
   std::shared_ptr<RunLock> runLock;
   std::shared_ptr<Preferences> preferences;
+  std::shared_ptr<SMASystemConfiguration> systemConfiguration;
+  std::shared_ptr<SMAServicesClient> servicesClient;
   std::shared_ptr<MetricsStore> metricsStore;
   std::shared_ptr<LogSubmission> logSubmission;
   std::shared_ptr<CrashReporting> crashReporting;

@@ -131,6 +131,50 @@ struct FakePreferences final : Preferences {
   }
 };
 
+struct FakeNotifications final : Notifications {
+  std::shared_ptr<CallLog> calls;
+  void postSystemNotification(std::string_view name) override {
+    calls->push_back("post " + std::string(name));
+  }
+};
+
+// Writes are recorded as "system DOMAIN KEY=VALUE" or "... removed", with " unsynced" behind.
+struct FakeSystemConfiguration final : SMASystemConfiguration {
+  std::shared_ptr<CallLog> calls;
+  std::map<std::pair<std::string, std::string>, KvRef<KvObject>> values;  // by domain and key
+
+  KvRef<KvObject> getPreference(std::string_view key, std::string_view domain) override {
+    const auto found = values.find({std::string(domain), std::string(key)});
+    return found == values.end() ? nullptr : found->second;
+  }
+  void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
+                     bool sync) override {
+    calls->push_back("system " + std::string(domain) + " " + std::string(key) +
+                     (value ? "=" + kvText(value.get()) : " removed") + (sync ? "" : " unsynced"));
+    values[{std::string(domain), std::string(key)}] = std::move(value);
+  }
+};
+
+struct FakeServicesClient final : SMAServicesClient {
+  std::shared_ptr<CallLog> calls;
+  std::map<std::string, KvRef<KvObject>> values;  // by "USER DOMAIN KEY"
+
+  void setPreference(std::string_view key, std::string_view user, std::string_view domain,
+                     KvRef<KvObject> value) override {
+    const std::string name = nameOf(key, user, domain);
+    calls->push_back("user " + name + "=" + kvText(value.get()));
+    values[name] = std::move(value);
+  }
+  void deletePreference(std::string_view key, std::string_view user,
+                        std::string_view domain) override {
+    calls->push_back("user " + nameOf(key, user, domain) + " deleted");
+    values.erase(nameOf(key, user, domain));
+  }
+  static std::string nameOf(std::string_view key, std::string_view user, std::string_view domain) {
+    return std::string(user) + " " + std::string(domain) + " " + std::string(key);
+  }
+};
+
 struct FakeLogSubmission final : LogSubmission {
   struct Submitted {
     std::string typeCode, name, body;
@@ -301,6 +345,10 @@ struct FakePlatform {
   std::shared_ptr<FakeFiles> files = std::make_shared<FakeFiles>();
   std::shared_ptr<FakeRunLock> runLock = std::make_shared<FakeRunLock>();
   std::shared_ptr<FakePreferences> preferences = std::make_shared<FakePreferences>();
+  std::shared_ptr<FakeNotifications> notifications = std::make_shared<FakeNotifications>();
+  std::shared_ptr<FakeSystemConfiguration> systemConfiguration =
+      std::make_shared<FakeSystemConfiguration>();
+  std::shared_ptr<FakeServicesClient> servicesClient = std::make_shared<FakeServicesClient>();
   std::shared_ptr<FakeMetricsStore> metricsStore = std::make_shared<FakeMetricsStore>();
   std::shared_ptr<FakeLogSubmission> logSubmission = std::make_shared<FakeLogSubmission>();
   std::shared_ptr<FakeCrashReporting> crashReporting = std::make_shared<FakeCrashReporting>();
@@ -321,6 +369,9 @@ struct FakePlatform {
     services.files = files;
     services.runLock = runLock;
     services.preferences = preferences;
+    services.notifications = notifications;
+    services.systemConfiguration = systemConfiguration;
+    services.servicesClient = servicesClient;
     services.metricsStore = metricsStore;
     services.logSubmission = logSubmission;
     services.crashReporting = crashReporting;
@@ -342,7 +393,8 @@ struct FakePlatform {
 inline FakePlatform makeFakePlatform() {
   FakePlatform fake;
   fake.runLock->calls = fake.preferences->calls = fake.logSubmission->calls =
-      fake.crashReporting->calls = fake.metricsStore->calls = fake.calls;
+      fake.crashReporting->calls = fake.metricsStore->calls = fake.notifications->calls =
+          fake.systemConfiguration->calls = fake.servicesClient->calls = fake.calls;
   fake.clock->setDay(20000, 43200);
   fake.metricsStore->clock = fake.clock;
   return fake;

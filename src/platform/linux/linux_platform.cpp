@@ -4,6 +4,8 @@
 
 #include "platform/linux/analytics_events.h"
 #include "platform/linux/applications.h"
+#include "platform/linux/bus_endpoint.h"
+#include "platform/linux/bus_notifications.h"
 #include "platform/linux/clock.h"
 #include "platform/linux/crash_reporting.h"
 #include "platform/linux/described_purgeable_space.h"
@@ -16,6 +18,7 @@
 #include "platform/linux/log_header_facts.h"
 #include "platform/linux/log_spool.h"
 #include "platform/linux/metrics_store.h"
+#include "platform/linux/preference_services.h"
 #include "platform/linux/property_list_preferences.h"
 #include "platform/linux/run_lock.h"
 #include "platform/linux/store_schema.h"
@@ -48,18 +51,24 @@ Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& 
   const auto clock = std::make_shared<LinuxClock>();
   const auto description =
       std::make_shared<DeviceDescription>(prefix + "/device/device.plist", log);
+  const auto access = options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
+                                                  : PropertyListPreferences::Access::ReadWrite;
   const auto preferences = std::make_shared<PropertyListPreferences>(
-      userPreferencesFolder(prefix, kProgramUser).value(), log, 0600,
-      options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
-                                  : PropertyListPreferences::Access::ReadWrite);
+      userPreferencesFolder(prefix, kProgramUser).value(), log, 0600, access);
+  const auto eventLoop = std::make_shared<SdEventLoop>(log);
+  const auto bus = std::make_shared<BusConnection>();
 
   Platform services;
   services.log = log;
   services.clock = clock;
-  services.eventLoop = std::make_shared<SdEventLoop>(log);
+  services.eventLoop = eventLoop;
+  services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
+  services.notifications = std::make_shared<BusNotifications>(bus, log);
   services.files = std::make_shared<RootedFiles>(prefix);
   services.runLock = std::make_shared<FileRunLock>(data + "/tallyrun.lock", log);
   services.preferences = preferences;
+  services.systemConfiguration = std::make_shared<FileSystemConfiguration>(prefix, log, access);
+  services.servicesClient = std::make_shared<FileServicesClient>(prefix, log, access);
   services.metricsStore = makeSqliteMetricsStore(metricsStorePath(prefix), log, clock);
   services.logSubmission =
       std::make_shared<SpoolSubmission>(spoolFolder(prefix), log, clock, preferences);

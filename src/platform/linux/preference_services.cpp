@@ -1,0 +1,49 @@
+#include "platform/linux/preference_services.h"
+
+#include <fmt/format.h>
+
+namespace tally {
+namespace {
+
+constexpr unsigned kSystemFileMode = 0644;
+constexpr unsigned kUserFileMode = 0600;
+
+}  // namespace
+
+FileSystemConfiguration::FileSystemConfiguration(const std::string& prefix,
+                                                 std::shared_ptr<SystemLog> log,
+                                                 PropertyListPreferences::Access access)
+    : preferences_(systemPreferencesFolder(prefix), std::move(log), kSystemFileMode, access) {}
+
+KvRef<KvObject> FileSystemConfiguration::getPreference(std::string_view key,
+                                                       std::string_view domain) {
+  return preferences_.SMAPreferencesGetValue(key, domain);
+}
+
+void FileSystemConfiguration::setPreference(std::string_view key, KvRef<KvObject> value,
+                                            std::string_view domain, bool) {
+  preferences_.SMAPreferencesSetValue(key, std::move(value), domain);
+  preferences_.SMAPreferencesSynchronize(domain);
+}
+
+void FileServicesClient::setPreference(std::string_view key, std::string_view user,
+                                       std::string_view domain, KvRef<KvObject> value) {
+  auto found = users_.find(user);
+  if (found == users_.end()) {
+    const auto folder = userPreferencesFolder(prefix_, user);
+    if (!folder) {
+      log_->write(LogLevel::Error, fmt::format("preferences of {}: not a user's name", user));
+      return;
+    }
+    found = users_.try_emplace(std::string(user), *folder, log_, kUserFileMode, access_).first;
+  }
+  found->second.SMAPreferencesSetValue(key, std::move(value), domain);
+  found->second.SMAPreferencesSynchronize(domain);
+}
+
+void FileServicesClient::deletePreference(std::string_view key, std::string_view user,
+                                          std::string_view domain) {
+  setPreference(key, user, domain, nullptr);
+}
+
+}  // namespace tally
