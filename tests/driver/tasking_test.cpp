@@ -1,0 +1,355 @@
+// Tasking: what an update writes and in which order, and that a run which dies anywhere in it is
+// repaired by the next one.
+#include "driver/tasking.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <map>
+
+#include "fakes/fake_platform.h"
+#include "report/report.h"
+
+namespace tally {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+
+const std::string kOwn(kProgramDomain);
+
+KvRef<KvObject> text(std::string_view value) { return KvString::create(value); }
+KvRef<KvDictionary> entry(const char* user, const char* domain, const char* key,
+                          const char* value) {
+  return KvDictionary::create(
+      {{"User", text(user)}, {"Domain", text(domain)}, {"Key", text(key)}, {"Value", text(value)}});
+}
+KvRef<KvDictionary> schedule(const char* id, KvRef<KvObject> payload) {
+  auto made = KvDictionary::create(
+      {{"TaskingID", text(id)}, {"TaskingDigest", text(std::string("digest of ") + id)}});
+  made->set("TaskingPayload", std::move(payload));
+  return made;
+}
+KvRef<KvDictionary> taskingA() {
+  return schedule(
+      "A", KvArray::create({entry("mobile", "vellum.da", "G", "a"),
+                            entry("__sysmetra__", "sys", "S", "a"), entry("guest", "dom", "K", "a"),
+                            entry("mobile", "vellum.da", "common", "a")}));
+}
+KvRef<KvDictionary> taskingB() {
+  return schedule(
+      "B", KvArray::create({entry("__sysmetra__", "sys", "T", "b"), entry("mobile", "zz", "H", "b"),
+                            entry("guest", "dom", "L", "b"),
+                            entry("mobile", "vellum.da", "common", "b")}));
+}
+
+class TaskingTest : public testing::Test {
+ public:
+  // Empty when no schedule is given.
+  std::vector<std::string> update(KvRef<KvObject> scheduled) {
+    put(std::move(scheduled));
+    fake.calls->clear();
+    fake.log->lines.clear();
+    updateTaskingState();
+    return *fake.calls;
+  }
+  void put(KvRef<KvObject> scheduled) {
+    fake.systemConfiguration->values[{std::string(kScheduleDomain), std::string(kScheduleKey)}] =
+        std::move(scheduled);
+  }
+  std::string own(std::string_view key) {
+    return kvText(fake.preferences->SMAPreferencesGetValue(key, kProgramDomain).get());
+  }
+
+  fakes::FakePlatform fake = fakes::makeFakePlatform();
+  std::unique_ptr<PlatformScope> scope = fake.install();
+};
+
+TEST_F(TaskingTest, AppliesAndRollsBackInOrder) {
+  const auto payloadText = [](const KvDictionary& tasking) {
+    return kvText(tasking.get("TaskingPayload"));
+  };
+  fake.preferences->put("LastOSUpdate", KvDictionary::create({{"version", text("1A1")}}),
+                        kProgramDomain);
+  EXPECT_THAT(
+      update(taskingA()),
+      ElementsAre("set " + kOwn + " TaskingUnfinished=" + payloadText(*taskingA()),
+                  "synchronize " + kOwn, "set vellum.da G=a", "system sys S=a",
+                  "user guest dom K=a", "set vellum.da common=a", "set " + kOwn + " TaskingID=A",
+                  "set " + kOwn + " TaskingOS=1A1", "set " + kOwn + " TaskingDigest=digest of A",
+                  "set " + kOwn + " TaskingPayload=" + payloadText(*taskingA()),
+                  "remove " + kOwn + " TaskingUnfinished", "synchronize vellum.da",
+                  "synchronize " + kOwn, "post vellum.da.tasking_changed"));
+  EXPECT_THAT(fake.log->lines, IsEmpty());
+
+  EXPECT_THAT(update(taskingA()), IsEmpty());
+  EXPECT_THAT(update(nullptr), IsEmpty()) << "a withdrawn schedule leaves the tasking in force";
+
+  // Without a payload the former tasking goes, and nothing takes its place.
+  const std::vector<std::string> removal = {
+      "set " + kOwn + " TaskingUnfinished=" + kvText(KvArray::create().get()),
+      "synchronize " + kOwn,
+      "remove vellum.da G",
+      "system sys S removed unsynced",
+      "user guest dom K deleted",
+      "remove vellum.da common",
+      "remove " + kOwn + " TaskingID",
+      "remove " + kOwn + " TaskingDigest",
+      "remove " + kOwn + " TaskingPayload",
+      "remove " + kOwn + " TaskingUnfinished",
+      "synchronize vellum.da",
+      "synchronize " + kOwn,
+      "post vellum.da.tasking_changed"};
+  EXPECT_EQ(update(schedule("E", nullptr)), removal);
+  EXPECT_TRUE(fake.log->has(LogLevel::Default, "Tasking update (A -> E, 1A1 -> 1A1)"));
+  EXPECT_EQ(own("TaskingOS"), "1A1");
+  EXPECT_THAT(update(schedule("E", nullptr)), ElementsAre("post vellum.da.tasking_changed"));
+  EXPECT_THAT(fake.log->lines, IsEmpty());
+}
+
+TEST_F(TaskingTest, StatesOfTheRecordAndTheSchedule) {
+  const auto none = [](TaskingTest&) {};
+  const auto inForce = [](TaskingTest& t) { t.update(taskingA()); };
+  const auto otherSystem = [](TaskingTest& t) {
+    t.update(taskingA());
+    t.fake.preferences->put("TaskingOS", text("0Z9"), kProgramDomain);
+  };
+  const auto withoutPayload = [](TaskingTest& t) {
+    t.update(taskingA());
+    t.fake.preferences->put("TaskingPayload", nullptr, kProgramDomain);
+  };
+  const struct {
+    const char* name;
+    std::function<void(TaskingTest&)> recorded;
+    KvRef<KvObject> scheduled;
+    const char *id, *g, *h;  // afterwards
+    bool notified;
+    const char* message;  // "" for none
+  } cases[] = {
+      {"none, none", none, nullptr, "(null)", "(null)", "(null)", false, ""},
+      {"none, without ID", none, KvDictionary::create(), "(null)", "(null)", "(null)", false, ""},
+      {"none, present", none, taskingB(), "B", "(null)", "b", true, ""},
+      {"none, without payload", none, schedule("E", nullptr), "(null)", "(null)", "(null)", true,
+       ""},
+      {"current", inForce, taskingA(), "A", "a", "(null)", false, ""},
+      {"another system", otherSystem, taskingA(), "A", "a", "(null)", true,
+       "Tasking update (A -> A, 0Z9 -> 1A1)"},
+      {"another ID", inForce, taskingB(), "B", "(null)", "b", true,
+       "Tasking update (A -> B, 1A1 -> 1A1)"},
+      {"another, without payload", inForce, schedule("E", nullptr), "(null)", "(null)", "(null)",
+       true, "Tasking update (A -> E, 1A1 -> 1A1)"},
+      {"a record without payload", withoutPayload, schedule("E", nullptr), "A", "a", "(null)", true,
+       "Tasking update (A -> E, 1A1 -> 1A1)"},
+      {"withdrawn", inForce, nullptr, "A", "a", "(null)", false, ""},
+      {"not a dictionary", inForce, text("x"), "A", "a", "(null)", false,
+       "tasking: the schedule is not a dictionary"},
+      {"an ID that is no text", inForce, KvDictionary::create({{"TaskingID", KvNumber::int32(7)}}),
+       "A", "a", "(null)", false, "tasking: the schedule's \"TaskingID\" is not a text"},
+      {"a payload that is no list", none, schedule("P", text("x")), "(null)", "(null)", "(null)",
+       true, "tasking: the schedule's payload is not an array"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    fake.preferences->values.clear();
+    fake.preferences->put("LastOSUpdate", KvDictionary::create({{"version", text("1A1")}}),
+                          kProgramDomain);
+    c.recorded(*this);
+    const auto calls = update(c.scheduled);
+    EXPECT_EQ(own("TaskingID"), c.id);
+    EXPECT_EQ(kvText(fake.preferences->SMAPreferencesGetValue("G", "vellum.da").get()), c.g);
+    EXPECT_EQ(kvText(fake.preferences->SMAPreferencesGetValue("H", "zz").get()), c.h);
+    EXPECT_EQ(!calls.empty() && calls.back() == "post vellum.da.tasking_changed", c.notified);
+    EXPECT_EQ(fake.log->lines.empty() ? "" : fake.log->lines[0].text, std::string(c.message));
+  }
+}
+
+TEST_F(TaskingTest, ASystemUpdateIsNotedOnce) {
+  EXPECT_THAT(update(nullptr), ElementsAre(HasSubstr("set " + kOwn + " LastOSUpdate=")));
+  EXPECT_TRUE(fake.log->has(LogLevel::Default, "OS change since last run ((null) -> 1A1)"));
+  fake.clock->setDay(20005);
+  EXPECT_THAT(update(nullptr), IsEmpty());
+  const auto last = fake.preferences->SMAPreferencesGetValue("LastOSUpdate", kProgramDomain);
+  EXPECT_EQ(kvCast<KvDictionary>(last.get())->getInt64("day"), 20000);
+  fake.deviceInformation->systemVersion = KvDictionary::create();
+  EXPECT_THAT(update(nullptr), IsEmpty()) << "an unknown build is no change";
+}
+
+TEST_F(TaskingTest, BadEntriesAreSkippedWithALine) {
+  const auto without = [](const char* field) {
+    auto one = entry("mobile", "d", "k", "v");
+    one->remove(field);
+    return one;
+  };
+  const auto payload = KvArray::create(
+      {text("x"), without("Domain"), without("User"), without("Key"), without("Value"),
+       entry("mobile", "../d", "k", "v"), entry("mobile", "..", "k", "v"),
+       entry("a/b", "d", "k", "v"), entry("..", "d", "k", "v"), entry("", "d", "k", "v"),
+       entry("mobile", "d", "k/../k", "v"), entry("__sysmetra__", "/etc/d", "k", "v"),
+       KvDictionary::create({{"User", KvNumber::int32(0)}, {"Domain", text("d")}}),
+       entry("mobile", "d", "good", "v")});
+  std::vector<std::string> effects;
+  for (const std::string& call : update(schedule("A", payload))) {
+    if (call.find(kOwn) == call.npos) effects.push_back(call);
+  }
+  EXPECT_THAT(effects,
+              ElementsAre("set d good=v", "synchronize d", "post vellum.da.tasking_changed"));
+  EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), payload->size() - 1);
+  EXPECT_TRUE(fake.log->has(LogLevel::Error,
+                            "tasking: entry 5 of the scheduled payload is skipped: its \"Domain\" "
+                            "would leave its folder: ../d"));
+  EXPECT_TRUE(
+      kvEqual(fake.preferences->SMAPreferencesGetValue("TaskingPayload", kProgramDomain).get(),
+              payload.get()));
+}
+
+// The device's storage, and a process that dies at its n-th operation: what it did not flush is
+// gone with it.
+struct Dead {};
+struct Device {
+  std::map<std::string, std::string> own, system, users;
+  KvRef<KvObject> scheduled;
+  std::map<std::string, KvRef<KvObject>> record;  // the program's own domain, with its types
+};
+class MortalStores final : public Preferences,
+                           public SMASystemConfiguration,
+                           public SMAServicesClient {
+ public:
+  MortalStores(Device& device, int life) : device_(device), life_(life) {}
+
+  KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view domain) override {
+    if (domain != kProgramDomain) return nullptr;
+    const auto found = device_.record.find(std::string(key));
+    return found == device_.record.end() ? nullptr : found->second;
+  }
+  void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
+                              std::string_view domain) override {
+    live();
+    pending_[std::string(domain)].insert_or_assign(std::string(key), std::move(value));
+  }
+  bool SMAPreferencesSynchronize(std::string_view domain) override {
+    live();
+    for (const auto& [key, value] : pending_[std::string(domain)]) {
+      if (domain == kProgramDomain) {
+        device_.record[key] = value;
+        if (!value) device_.record.erase(key);
+      } else {
+        store(device_.own, std::string(domain) + " " + key, value.get());
+      }
+    }
+    pending_.erase(std::string(domain));
+    return true;
+  }
+  KvRef<KvObject> getPreference(std::string_view key, std::string_view) override {
+    return key == kScheduleKey ? device_.scheduled : nullptr;
+  }
+  void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
+                     bool) override {
+    live();
+    store(device_.system, std::string(domain) + " " + std::string(key), value.get());
+  }
+  void setPreference(std::string_view key, std::string_view user, std::string_view domain,
+                     KvRef<KvObject> value) override {
+    live();
+    store(device_.users, fakes::FakeServicesClient::nameOf(key, user, domain), value.get());
+  }
+  void deletePreference(std::string_view key, std::string_view user,
+                        std::string_view domain) override {
+    setPreference(key, user, domain, nullptr);
+  }
+
+ private:
+  void live() {
+    if (life_-- == 0) throw Dead();
+  }
+  static void store(std::map<std::string, std::string>& values, const std::string& name,
+                    const KvObject* value) {
+    if (value == nullptr) {
+      values.erase(name);
+    } else {
+      values[name] = kvText(value);
+    }
+  }
+  Device& device_;
+  int life_;
+  std::map<std::string, std::map<std::string, KvRef<KvObject>>> pending_;
+};
+
+class MortalRunTest : public TaskingTest {
+ protected:
+  // False when the run died.
+  bool run(Device& device, const KvRef<KvDictionary>& scheduled, int life = 1'000'000) {
+    device.scheduled = scheduled;
+    const auto stores = std::make_shared<MortalStores>(device, life);
+    Platform services = fake.services();
+    services.preferences = stores;
+    services.systemConfiguration = stores;
+    services.servicesClient = stores;
+    const PlatformScope inForce(std::move(services));
+    try {
+      updateTaskingState();
+    } catch (const Dead&) {
+      return false;
+    }
+    return true;
+  }
+  static std::map<std::string, std::string> everything(const Device& device) {
+    auto all = device.own;
+    all.insert(device.system.begin(), device.system.end());
+    all.insert(device.users.begin(), device.users.end());
+    for (const auto& [key, value] : device.record) all["record " + key] = kvText(value.get());
+    return all;
+  }
+};
+
+TEST_F(MortalRunTest, DeathsBetweenAnyStepsAreRepaired) {
+  const auto taskingC = schedule("C", KvArray::create({entry("mobile", "vellum.da", "c", "c"),
+                                                       entry("__sysmetra__", "sys", "c", "c")}));
+  const auto taskingE = schedule("E", nullptr);
+  const struct {
+    KvRef<KvDictionary> inForce, first, second, last;
+  } cases[] = {
+      {nullptr, taskingA(), taskingA(), taskingA()},
+      {nullptr, taskingA(), taskingC, taskingB()},
+      {nullptr, taskingB(), taskingE, taskingE},
+      {taskingA(), taskingB(), taskingB(), taskingB()},
+      {taskingA(), taskingB(), taskingC, taskingA()},
+      {taskingA(), taskingE, taskingE, taskingA()},
+      {taskingA(), taskingC, taskingA(), taskingE},
+      {taskingA(), taskingB(), taskingC, taskingB()},
+  };
+  const auto name = [](const KvRef<KvDictionary>& tasking) {
+    return tasking ? std::string(*tasking->getString("TaskingID")) : "nothing";
+  };
+  int deaths = 0;
+  for (const auto& c : cases) {
+    Device expected;
+    if (c.inForce) run(expected, c.inForce);
+    run(expected, c.last);
+    for (int firstLife = 0, firstDied = 1; firstDied != 0; ++firstLife) {
+      for (int secondLife = 0, secondDied = 1; secondDied != 0; ++secondLife) {
+        Device device;
+        if (c.inForce) run(device, c.inForce);
+        firstDied = !run(device, c.first, firstLife);
+        secondDied = !run(device, c.second, secondLife);
+        deaths += firstDied + secondDied;
+        run(device, c.last);
+        auto found = everything(device), wanted = everything(expected);
+        // When the build was first seen is noted by whichever run lived; and the build of a tasking
+        // that is gone says nothing.
+        for (auto* all : {&found, &wanted}) {
+          all->erase("record LastOSUpdate");
+          if (!device.record.contains("TaskingID")) all->erase("record TaskingOS");
+        }
+        ASSERT_EQ(found, wanted) << name(c.inForce) << " in force, " << name(c.first)
+                                 << " dies at step " << firstLife << ", " << name(c.second)
+                                 << " at step " << secondLife << ", then " << name(c.last);
+      }
+    }
+  }
+  EXPECT_GT(deaths, 2000);
+}
+
+}  // namespace
+}  // namespace tally
