@@ -3,7 +3,9 @@
 
 #include <span>
 
+#include "driver/app_info_listener.h"
 #include "driver/daily_job.h"
+#include "driver/tasking.h"
 #include "driver/telemetry_sweep.h"
 #include "host_platform.h"
 #include "platform/linux/linux_platform.h"
@@ -16,9 +18,12 @@ int main(int count, char** arguments) {
   ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
   ::mallopt(M_MMAP_THRESHOLD, kKeptBytes / 2);
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
-  tally::DailyJob job(
-      {.startListener = {},
-       .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
-       .updateTaskingState = {}});
+  tally::AppInfoListener listener;
+  tally::DailyJob job({
+      .startListener = [&listener](tally::DailyJob& self) { return listener.start(self); },
+      .stopListener = [&listener] { listener.stop(); },
+      .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
+      .updateTaskingState = tally::updateTaskingState,
+  });
   return job.run({arguments, static_cast<std::size_t>(count)});
 }

@@ -32,6 +32,8 @@ void DailyJob::runScheduled() {
     // A loop without sources will never deliver: starting it again at once would only spin.
     if (slice == SliceResult::TimedOut || slice == SliceResult::Finished) break;
   }
+  // A message that comes from here on starts a new process; one that is already here still counts.
+  if (capabilities_.stopListener) capabilities_.stopListener();
   if (!appInfoRequested) return;
   logMessage(LogLevel::Default, "never received requested AAI, so moving along without it");
   runIfNewDay(nullptr);

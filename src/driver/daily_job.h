@@ -16,6 +16,8 @@ class DailyJob;
 struct DailyCapabilities {
   // Starts the IPC listener of the scheduled mode; false when it cannot be created.
   std::function<bool(DailyJob&)> startListener;
+  // Ends the listening; messages that had arrived are handled first.
+  std::function<void()> stopListener;
   // Records device health values as scalars of the day in progress.
   std::function<void()> runTelemetrySweep;
   // Notices system updates and applies scheduled preference changes.

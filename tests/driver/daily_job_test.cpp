@@ -32,6 +32,7 @@ class DailyJobTest : public testing::Test {
               fake.calls->push_back("listener");
               return true;
             },
+            [this] { fake.calls->push_back("stop listening"); },
             [this] { fake.calls->push_back("sweep"); },
             [this] { fake.calls->push_back("tasking"); }};
   }
@@ -134,7 +135,7 @@ TEST_F(DailyJobTest, TheScheduledModeWaitsOutAQuietSlice) {
                              SliceResult::HandledEvent, SliceResult::TimedOut};
   EXPECT_EQ(run({}, allCapabilities()), 0);
   EXPECT_THAT(fake.eventLoop->slices, ElementsAre(10.0, 10.0, 10.0, 10.0));
-  EXPECT_THAT(*fake.calls, ElementsAre("listener"));
+  EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening"));
   EXPECT_THAT(fake.log->texts(LogLevel::Default),
               ElementsAre("tallyrun started", "tallyrun ended"));
 }
@@ -147,6 +148,7 @@ TEST_F(DailyJobTest, ALoopWithoutSourcesIsNotSpun) {
 
 TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
   run({}, {.startListener = [](DailyJob& job) { return job.appInfoRequested = true; },
+           .stopListener = {},
            .runTelemetrySweep = {},
            .updateTaskingState = {}});
   EXPECT_TRUE(

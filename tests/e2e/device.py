@@ -32,6 +32,7 @@ def group(scalars=None, distributions=None, **prefixes):
 class Device:
     def __init__(self):
         self.root = pathlib.Path(tempfile.mkdtemp(prefix="tally-e2e-"))
+        self.describe()
 
     def remove(self):
         shutil.rmtree(self.root, ignore_errors=True)
@@ -46,6 +47,8 @@ class Device:
         self.write(WHITELIST, groups)
 
     def describe(self, **entries):
+        # A build that is not known is no update, which is a matter of its own.
+        entries.setdefault("SystemVersion", {})
         self.write("device/device.plist", entries)
 
     def store(self, scalars=(), distributions=()):

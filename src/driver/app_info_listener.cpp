@@ -1,0 +1,132 @@
+#include "driver/app_info_listener.h"
+
+#include <fmt/format.h>
+
+#include <iterator>
+#include <span>
+#include <string>
+
+#include "base/result.h"
+#include "platform/platform.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kUuidBytes = 16;
+
+// A signed 64-bit field; a number of another width is another type.
+const KvNumber* int64Field(const KvDictionary& dictionary, std::string_view key) {
+  const auto* const number = dictionary.getAs<KvNumber>(key);
+  return number != nullptr && number->kind() == KvNumberKind::Int64 ? number : nullptr;
+}
+
+// Of 8-4-4-4-12 hexadecimal digits, in upper case.
+std::string uuidText(std::span<const std::byte> bytes) {
+  std::string text;
+  text.reserve(36);
+  for (std::size_t i = 0; i < bytes.size(); ++i) {
+    if (i == 4 || i == 6 || i == 8 || i == 10) text += '-';
+    fmt::format_to(std::back_inserter(text), "{:02X}", std::to_integer<unsigned>(bytes[i]));
+  }
+  return text;
+}
+
+Result<KvRef<KvDictionary>> makeApplication(const KvObject* element) {
+  const auto* const fields = kvCast<KvDictionary>(element);
+  if (fields == nullptr) return Error{"not a dictionary"};
+  auto* const bundle = fields->getAs<KvString>("bundle_id");
+  if (bundle == nullptr) return Error{"no text \"bundle_id\""};
+  auto* const version = fields->getAs<KvString>("version");
+  if (version == nullptr) return Error{"no text \"version\""};
+  const KvNumber* const adamID = int64Field(*fields, "adam_id");
+  if (adamID == nullptr) return Error{"no 64-bit integer \"adam_id\""};
+  const KvNumber* const arch = int64Field(*fields, "arch");
+  if (arch == nullptr) return Error{"no 64-bit integer \"arch\""};
+  const auto* const uuid = fields->getAs<KvData>("uuid");
+  if (uuid == nullptr || uuid->bytes().size() != kUuidBytes) {
+    return Error{"no \"uuid\" of 16 bytes"};
+  }
+  return KvDictionary::create({{"bundle", KvRef<KvString>::share(bundle)},
+                               {"version", KvRef<KvString>::share(version)},
+                               {"adamID", KvNumber::int64(adamID->asInt64())},
+                               {"arch", KvNumber::int64(arch->asInt64())},
+                               {"uuid", KvString::create(uuidText(uuid->bytes()))}});
+}
+
+void reportSkipped(std::string_view what) {
+  logMessage(LogLevel::Error, "message skipped: {}", what);
+}
+
+}  // namespace
+
+KvRef<KvArray> makeAppInformation(const KvArray& appData) {
+  auto information = KvArray::create(appData.size());
+  std::string firstFault;
+  for (std::size_t i = 0; i < appData.size(); ++i) {
+    auto application = makeApplication(appData.get(i));
+    if (application) {
+      information->append(*std::move(application));
+    } else if (firstFault.empty()) {
+      firstFault = fmt::format("element {}: {}", i, application.error().message);
+    }
+  }
+  if (const auto skipped = appData.size() - information->size(); skipped > 0) {
+    logMessage(LogLevel::Error, "app_data: {} of {} elements skipped; {}", skipped, appData.size(),
+               firstFault);
+  }
+  return information;
+}
+
+bool AppInfoListener::start(DailyJob& job) {
+  return platform().ipcEndpoint->listen(
+      kServiceName, [this, &job](const KvDictionary& message) { handleMessage(job, message); });
+}
+
+void AppInfoListener::stop() { platform().ipcEndpoint->stopListening(); }
+
+void AppInfoListener::handleMessage(DailyJob& job, const KvDictionary& message) {
+  const KvNumber* const operation = int64Field(message, "operation");
+  if (operation == nullptr) {
+    reportSkipped("no 64-bit integer \"operation\"");
+    return;
+  }
+  // Only the low 32 bits tell.
+  const std::int32_t code = operation->asInt32();
+  if (code == kAppData) {
+    receiveAppData(job, message);
+    return;
+  }
+  const KvNumber* const value = int64Field(message, "value");
+  if (code == kRunDay && value == nullptr && !acted_.test()) {
+    reportSkipped("no 64-bit integer \"value\"");
+    return;
+  }
+  if (acted_.test_and_set()) return;
+  if (code == kRunDay) {
+    job.runDaily(value->asInt32(), nullptr);
+  } else if (code == kLoggingStatus) {
+    job.appInfoRequested = true;
+    platform().notifications->postSystemNotification(kLoggingNotification);
+    logMessage(LogLevel::Default, "notified of logging status, waiting for activate app info");
+  }
+}
+
+void AppInfoListener::receiveAppData(DailyJob& job, const KvDictionary& message) {
+  const auto* const appData = message.getAs<KvArray>("app_data");
+  if (appData == nullptr) {
+    reportSkipped("no array \"app_data\"");
+    return;
+  }
+  const auto information = makeAppInformation(*appData);
+  // The text of a long list is worth making only for somebody who reads it.
+  if (platform().log->enabled(LogLevel::Default)) {
+    logMessage(LogLevel::Default, "tallyrun got {}AAI:\n{}",
+               job.appInfoRequested ? "requested" : "(unsolicited -- so ignoring) ",
+               kvText(information.get()));
+  }
+  if (!job.appInfoRequested) return;
+  job.runIfNewDay(information.get());
+  job.appInfoRequested = false;
+}
+
+}  // namespace tally

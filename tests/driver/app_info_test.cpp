@@ -1,0 +1,193 @@
+// The conversation with the system: what each message does, and what a bad one does not do.
+#include "driver/app_info_listener.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "fakes/fake_platform.h"
+#include "report/report.h"
+
+namespace tally {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+
+constexpr const char* kUuidText = "00112233-4455-6677-8899-AABBCCDDEEFF";
+
+KvRef<KvObject> text(const char* value) { return KvString::create(value); }
+KvRef<KvObject> uuid(std::size_t size = 16) {
+  std::vector<std::byte> bytes;
+  for (std::size_t i = 0; i < size; ++i) bytes.push_back(static_cast<std::byte>(i * 0x11));
+  return KvData::create(bytes);
+}
+KvRef<KvDictionary> application() {
+  return KvDictionary::create({{"bundle_id", text("org.example.mail")},
+                               {"version", text("7.1")},
+                               {"adam_id", KvNumber::int64(5'000'000'000)},
+                               {"arch", KvNumber::int64(-2)},
+                               {"uuid", uuid()}});
+}
+KvRef<KvDictionary> operation(std::int64_t code, KvRef<KvObject> value = nullptr) {
+  auto message = KvDictionary::create({{"operation", KvNumber::int64(code)}});
+  message->set("value", std::move(value));
+  return message;
+}
+KvRef<KvDictionary> appData(KvRef<KvObject> list) {
+  auto message = operation(2);
+  message->set("app_data", std::move(list));
+  return message;
+}
+
+class AppInfoTest : public testing::Test {
+ protected:
+  AppInfoTest() { fake.crashReporting->submissionEnabled = false; }  // the report is not at stake
+  // Sends messages to a new process; "requested" afterwards.
+  bool send(const std::vector<KvRef<KvDictionary>>& messages) {
+    fake.calls->clear();
+    fake.log->lines.clear();
+    fake.preferences->values.clear();
+    AppInfoListener listener;
+    DailyJob job({});
+    for (const auto& message : messages) listener.handleMessage(job, *message);
+    return job.appInfoRequested;
+  }
+  // The days that were processed, and the notifications.
+  std::vector<std::string> effects() {
+    std::vector<std::string> found;
+    for (const std::string& line : fake.log->texts(LogLevel::Default)) {
+      if (line.starts_with("daily tasks")) found.push_back(line.substr(16));
+    }
+    for (const std::string& call : *fake.calls) {
+      if (call.starts_with("post ")) found.push_back(call);
+    }
+    return found;
+  }
+  std::size_t errors() { return fake.log->texts(LogLevel::Error).size(); }
+
+  fakes::FakePlatform fake = fakes::makeFakePlatform();
+  std::unique_ptr<PlatformScope> scope = fake.install();
+};
+
+TEST_F(AppInfoTest, ConversationsByTheirMessages) {
+  const std::string posted = "post vellum.tallyd.tallyrun.logging";
+  const std::int64_t high = std::int64_t{7} << 32;
+  const auto list = [] { return appData(KvArray::create({application()})); };
+  const struct {
+    const char* name;
+    std::vector<KvRef<KvDictionary>> messages;
+    std::vector<std::string> effects;
+    bool requested;
+    std::size_t errors;
+  } cases[] = {
+      {"announced", {operation(0)}, {posted}, true, 0},
+      {"announced and delivered", {operation(0), list()}, {"day 19999", posted}, false, 0},
+      {"an empty list",
+       {operation(0), appData(KvArray::create())},
+       {"day 19999", posted},
+       false,
+       0},
+      {"delivered twice", {operation(0), list(), list()}, {"day 19999", posted}, false, 0},
+      {"unsolicited", {list()}, {}, false, 0},
+      {"announced twice", {operation(0), operation(0)}, {posted}, true, 0},
+      {"a day", {operation(1, KvNumber::int64(20000))}, {"day 20000"}, false, 0},
+      {"a day twice",
+       {operation(1, KvNumber::int64(7)), operation(1, KvNumber::int64(8))},
+       {"day 7"},
+       false,
+       0},
+      {"a day after an announcement",
+       {operation(0), operation(1, KvNumber::int64(7))},
+       {posted},
+       true,
+       0},
+      {"low halves",
+       {operation(high | 1, KvNumber::int64(high | 0xFFFFFFFF))},
+       {"day -1"},
+       false,
+       0},
+      {"an unknown operation spends the turn", {operation(9), operation(0)}, {}, false, 0},
+      {"no operation", {KvDictionary::create(), operation(0)}, {posted}, true, 1},
+      {"an operation of another type",
+       {KvDictionary::create({{"operation", text("0")}}),
+        KvDictionary::create({{"operation", KvNumber::int32(0)}})},
+       {},
+       false,
+       2},
+      {"a day without a value", {operation(1), operation(1, text("5"))}, {}, false, 2},
+      {"a list of another type",
+       {operation(0), appData(text("x")), list()},
+       {"day 19999", posted},
+       false,
+       1},
+      {"no list", {operation(0), operation(2)}, {posted}, true, 1},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    EXPECT_EQ(send(c.messages), c.requested);
+    EXPECT_EQ(effects(), c.effects);
+    EXPECT_EQ(errors(), c.errors);
+  }
+}
+
+TEST_F(AppInfoTest, TheListIsToldInItsTwoForms) {
+  send({appData(KvArray::create())});
+  EXPECT_THAT(fake.log->texts(LogLevel::Default),
+              ElementsAre("tallyrun got (unsolicited -- so ignoring) AAI:\n" +
+                          kvText(KvArray::create().get())));
+  send({operation(0), appData(KvArray::create({application()}))});
+  EXPECT_THAT(fake.log->texts(LogLevel::Default)[1], HasSubstr("tallyrun got requestedAAI:\n"));
+  EXPECT_THAT(fake.log->texts(LogLevel::Default)[1], HasSubstr(kUuidText));
+}
+
+TEST_F(AppInfoTest, AListForADoneDayIsUsedUp) {
+  AppInfoListener listener;
+  DailyJob job({});
+  fake.preferences->put("LastCrashLogSerializationDateInDaysSince1970", KvNumber::int32(19999),
+                        kProgramDomain);
+  listener.handleMessage(job, *operation(0));
+  listener.handleMessage(job, *appData(KvArray::create()));
+  EXPECT_FALSE(job.appInfoRequested);
+  EXPECT_TRUE(fake.log->has(LogLevel::Default, "Day unchanged since last run"));
+}
+
+TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
+  const auto good = makeAppInformation(*KvArray::create({application()}));
+  const auto expected = KvDictionary::create({{"bundle", text("org.example.mail")},
+                                              {"version", text("7.1")},
+                                              {"adamID", KvNumber::int64(5'000'000'000)},
+                                              {"arch", KvNumber::int64(-2)},
+                                              {"uuid", text(kUuidText)}});
+  ASSERT_EQ(good->size(), 1u);
+  EXPECT_TRUE(kvEqual(good->get(0), expected.get())) << kvText(good->get(0));
+  EXPECT_THAT(fake.log->lines, IsEmpty());
+
+  auto list = KvArray::create({text("no dictionary")});
+  const std::pair<const char*, KvRef<KvObject>> spoiled[] = {{"bundle_id", nullptr},
+                                                             {"bundle_id", KvNumber::int64(1)},
+                                                             {"version", nullptr},
+                                                             {"adam_id", nullptr},
+                                                             {"adam_id", KvNumber::uint64(1)},
+                                                             {"arch", text("arm")},
+                                                             {"uuid", nullptr},
+                                                             {"uuid", uuid(15)},
+                                                             {"uuid", uuid(17)},
+                                                             {"uuid", text(kUuidText)}};
+  for (const auto& [key, value] : spoiled) {
+    auto element = application();
+    element->set(key, value);
+    list->append(element);
+  }
+  auto last = application();
+  last->set("bundle_id", text("last"));
+  list->append(last);
+  const auto kept = makeAppInformation(*list);
+  ASSERT_EQ(kept->size(), 1u);
+  EXPECT_EQ(kept->getAs<KvDictionary>(0)->getString("bundle"), "last");
+  EXPECT_THAT(fake.log->texts(LogLevel::Error),
+              ElementsAre("app_data: 11 of 12 elements skipped; element 0: not a dictionary"));
+}
+
+}  // namespace
+}  // namespace tally
