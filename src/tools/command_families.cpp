@@ -5,7 +5,9 @@
 #include "tools/nand_commands.h"
 #include "tools/prefs_commands.h"
 #include "tools/report_commands.h"
+#include "tools/send_commands.h"
 #include "tools/store_commands.h"
+#include "tools/tasking_commands.h"
 #include "tools/tool.h"
 #include "tools/whitelist_commands.h"
 
@@ -15,6 +17,7 @@ std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
       addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
       addNandCommands,  addChannelCommands,   addPrefsCommands,  addDoctorCommand,
+      addSendCommands,  addTaskingCommands,
   };
   return kFamilies;
 }

@@ -1,0 +1,114 @@
+// tallyctl tasking and send, as far as no bus is needed.
+#include "tools/tool_fixture.h"
+
+namespace tally::tools {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+std::string entryText(const std::string& user, const std::string& domain, const std::string& key) {
+  const auto field = [](const char* name, const std::string& value) {
+    return "<key>" + std::string(name) + "</key><string>" + value + "</string>";
+  };
+  return "<dict>" + field("User", user) + field("Domain", domain) + field("Key", key) +
+         field("Value", "v") + "</dict>";
+}
+std::string tasking(const std::string& id, const std::string& entries) {
+  return "<dict><key>TaskingID</key><string>" + id +
+         "</string><key>TaskingDigest</key><string>d</string><key>TaskingPayload</key><array>" +
+         entries + "</array></dict>";
+}
+
+class TaskingCommandsTest : public ToolTest {
+ protected:
+  TaskingCommandsTest() {
+    putPlist("device/device/device.plist",
+             "<dict>" +
+                 dict("SystemVersion", "<key>ProductBuildVersion</key><string>16S46</string>") +
+                 "</dict>");
+  }
+  // "set USER DOMAIN KEY" of each planned write, without the program's own record.
+  static std::vector<std::string> writes(const nlohmann::json& plan) {
+    std::vector<std::string> found;
+    for (const auto& one : plan["writes"]) {
+      const auto text = [&](const char* name) { return one[name].get<std::string>(); };
+      if (text("domain") == "vellum.tallyd.tallyrun") continue;
+      found.push_back(text("action") + " " + text("user") + " " + text("domain") + " " +
+                      text("key"));
+    }
+    return found;
+  }
+};
+
+TEST_F(TaskingCommandsTest, ADryRunPrintsWhatAnApplicationDoes) {
+  putPlist("a.plist", tasking("A", entryText("mobile", "vellum.da", "G") +
+                                       entryText("__sysmetra__", "sys", "S") +
+                                       entryText("guest", "dom", "K")));
+  putPlist("b.plist", tasking("B", entryText("mobile", "vellum.da", "H")));
+  const auto before = tree();
+  const auto dry = run({"tasking", "apply", at("a.plist"), "--dry-run", "--json"});
+  EXPECT_EQ(dry.status, kSuccess) << dry.err;
+  EXPECT_EQ(tree(), before) << "a dry run leaves no trace";
+  EXPECT_THAT(writes(dry.json()),
+              ElementsAre("set mobile vellum.da G", "set __sysmetra__ sys S", "set guest dom K"));
+
+  EXPECT_EQ(run({"tasking", "apply", at("a.plist")}).status, kSuccess);
+  EXPECT_THAT(get("device/var/mobile/Library/Preferences/vellum.da.plist"), HasSubstr("G"));
+  EXPECT_THAT(get("device/Library/Preferences/sys.plist"), HasSubstr("S"));
+  EXPECT_THAT(get("device/var/guest/Library/Preferences/dom.plist"), HasSubstr("K"));
+
+  putPlist("device/Library/Preferences/vellum.Ferryman.plist",
+           "<dict><key>ScheduledTasking</key>" +
+               tasking("B", entryText("mobile", "vellum.da", "H")) + "</dict>");
+  const auto shown = run({"tasking", "show", "--json"}).json();
+  EXPECT_EQ(shown["inForce"]["id"], "A");
+  EXPECT_EQ(shown["inForce"]["system"], "16S46");
+  EXPECT_EQ(shown["scheduled"]["id"], "B");
+  EXPECT_FALSE(shown["unfinished"]);
+  EXPECT_THAT(writes(shown["change"]),
+              ElementsAre("remove mobile vellum.da G", "remove __sysmetra__ sys S",
+                          "remove guest dom K", "set mobile vellum.da H"));
+  EXPECT_THAT(run({"tasking", "show"}).out, HasSubstr("Tasking update (A -> B, 16S46 -> 16S46)"));
+}
+
+TEST_F(TaskingCommandsTest, BadTaskingsAreNamed) {
+  putPlist("fault.plist", tasking("F", entryText("../../etc", "dom", "K")));
+  const auto fault = run({"tasking", "apply", at("fault.plist"), "--dry-run"});
+  EXPECT_EQ(fault.status, kWrong);
+  EXPECT_THAT(fault.out, HasSubstr("its \"User\" would leave its folder: ../../etc"));
+  put("text", "no property list");
+  for (const char* name : {"text", "absent"}) {
+    const auto outcome = run({"tasking", "apply", at(name), "--dry-run"});
+    EXPECT_EQ(outcome.status, kWrong);
+    EXPECT_THAT(outcome.err, HasSubstr(at(name)));
+  }
+}
+
+TEST_F(TaskingCommandsTest, ApplicationListsAreCheckedBeforeTheyAreSent) {
+  const std::string good = R"({"bundle_id":"a","version":"1","adam_id":1,"arch":1,)"
+                           R"("uuid":"00112233-4455-6677-8899-aabbccddeeff"})";
+  const struct {
+    std::string content, fault;
+  } cases[] = {
+      {"", "neither JSON nor a property list"},
+      {"{}", "neither JSON nor a property list"},
+      {"[1]", "neither JSON nor a property list"},
+      {"[" + good + ",{}]", "element 1: no text \"bundle_id\""},
+      {R"([{"bundle_id":"a","version":"1","adam_id":1.5}])", "element 0: no integer \"adam_id\""},
+      {R"([{"bundle_id":"a","version":"1","adam_id":1,"arch":1,"uuid":"0011"}])", "no \"uuid\""},
+      {R"([{"bundle_id":"a","version":"1","adam_id":1,"arch":1,)"
+       R"("uuid":"00112233x4455-6677-8899-aabbccddeeff"}])",
+       "no \"uuid\""},
+  };
+  for (const auto& c : cases) {
+    put("list", c.content);
+    const auto outcome = run({"send", "apps", at("list")});
+    EXPECT_EQ(outcome.status, kWrong) << c.content;
+    EXPECT_THAT(outcome.err, HasSubstr(c.fault)) << c.content;
+  }
+  EXPECT_EQ(run({"send", "day", "soon"}).status, kBadUsage);
+}
+
+}  // namespace
+}  // namespace tally::tools
