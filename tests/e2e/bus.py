@@ -1,0 +1,146 @@
+"""A private message bus that starts the program for a device, as the machine's own bus would."""
+import pathlib
+import shutil
+import signal
+import subprocess
+import tempfile
+import threading
+import time
+
+from device import Device, parse_messages, texts
+
+# The real day: a clock that is faked fakes the event loop's timers too. A test must not meet midnight.
+if 86400 - time.time() % 86400 < 300:
+    time.sleep(301)
+TODAY = int(time.time() // 86400)
+NAME = "vellum.tallyd.tallyrun"
+OBJECT = "/vellum/tallyd/tallyrun"
+CONFIG = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configuration 1.0//EN"
+ "http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd">
+<busconfig><type>system</type><listen>unix:path={folder}/socket</listen>
+<servicedir>{folder}/services</servicedir>{limits}
+<policy context="default"><allow user="*"/><allow own="*"/>
+<allow send_destination="*" eavesdrop="true"/><allow eavesdrop="true"/></policy></busconfig>"""
+# So that a test can have many messages under way.
+LIMITS = '<limit name="max_replies_per_connection">50000</limit>'
+
+
+class BusDevice(Device):
+    """A device, a bus, and the messages of every run that the bus started."""
+
+    def __init__(self):
+        super().__init__()
+        self.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-bus-"))
+        self.folder.chmod(0o755)  # another user has to reach the socket
+        self.address = f"unix:path={self.folder}/socket"
+        self.messages_file = self.folder / "messages"
+        self.messages_file.touch()
+        (self.folder / "services").mkdir()
+        starter = self.folder / "start"
+        environment = {**self.environment(), "DBUS_SYSTEM_BUS_ADDRESS": self.address,
+                       "DBUS_SESSION_BUS_ADDRESS": self.address}
+        wanted = ("TALLYRUN", "DBUS", "ASAN", "UBSAN", "LANG", "LC_", "TZ", "PATH")
+        exports = "".join(f"export {key}='{value}'\n" for key, value in environment.items()
+                          if key.startswith(wanted))
+        command = " ".join(f"'{part}'" for part in self.command())
+        starter.write_text(f"#!/bin/sh\n{exports}echo $$ > {self.folder}/pid\n"
+                           f"exec {command} 2>> {self.messages_file}\n")
+        starter.chmod(0o755)
+        (self.folder / "services" / f"{NAME}.service").write_text(
+            f"[D-BUS Service]\nName={NAME}\nExec={starter}\nUser=root\n")
+        config = self.folder / "config"
+        config.write_text(CONFIG.format(folder=self.folder, limits=LIMITS))
+        with open(self.folder / "daemon", "wb") as errors:
+            self.daemon = subprocess.Popen(["dbus-daemon", f"--config-file={config}", "--nofork",
+                                            "--nopidfile", "--nosyslog"], stderr=errors)
+        self.until(lambda: (self.folder / "socket").exists(), 30, "the bus")
+
+    def remove(self):
+        self.daemon.terminate()
+        self.daemon.wait()
+        shutil.rmtree(self.folder, ignore_errors=True)
+        super().remove()
+
+    def environment(self, day=None, *moment, **more):
+        bus = {}
+        if hasattr(self, "address"):
+            bus = {"DBUS_SYSTEM_BUS_ADDRESS": self.address, "DBUS_SESSION_BUS_ADDRESS": self.address}
+        return super().environment(day, *moment, **bus, **more)
+
+    def messages(self):
+        return parse_messages(self.messages_file.read_bytes())
+
+    def default_texts(self):
+        return texts(self.messages(), "default")
+
+    def error_texts(self):
+        return texts(self.messages(), "error")
+
+    def until(self, condition, seconds, what):
+        end = time.monotonic() + seconds
+        while not condition():
+            assert time.monotonic() < end, f"{what}: not after {seconds} s: {self.log_tail()}"
+            time.sleep(0.05)
+
+    def log_tail(self):
+        return self.messages_file.read_bytes()[-1500:] if self.messages_file.exists() else b""
+
+    def wait_for_end(self, runs=1, seconds=150):
+        self.until(lambda: self.messages_file.read_bytes().count(b"tallyrun ended") >= runs,
+                   seconds, "the end of the run")
+        return self.default_texts()
+
+    def watch_memory(self):
+        """Follows the running program; what is returned gives its peak in kB, at its end."""
+        status = pathlib.Path("/proc", (self.folder / "pid").read_text().strip(), "status")
+        peaks = [0]
+
+        def follow():
+            try:
+                while True:
+                    text = status.read_text()
+                    peaks.append(int(text.partition("VmHWM:")[2].split()[0]))
+                    time.sleep(0.2)
+            except (OSError, IndexError):
+                pass  # it ended
+        thread = threading.Thread(target=follow, daemon=True)
+        thread.start()
+
+        def peak():
+            thread.join(30)
+            return max(peaks)
+        return peak
+
+    def kill_daemon(self):
+        self.daemon.send_signal(signal.SIGKILL)
+        self.daemon.wait()
+
+    def busctl(self, *fields, count=1, user=None, status=0):
+        return self.client("busctl", f"--address={self.address}", "--", "call", NAME, OBJECT, NAME, "Send",
+                           "a{sv}", str(count), *fields, user=user, status=status)
+
+    def gdbus(self, dictionary):
+        return self.client("gdbus", "call", "--address", self.address, "--dest", NAME,
+                           "--object-path", OBJECT, "--method", f"{NAME}.Send", dictionary)
+
+    def dbus_send(self, *arguments, status=0):
+        return self.client("dbus-send", f"--bus={self.address}", "--print-reply", f"--dest={NAME}",
+                           OBJECT, f"{NAME}.Send", *arguments, status=status)
+
+    def client(self, *command, user=None, status=0):
+        result = subprocess.run(command, capture_output=True, timeout=120, user=user,
+                                env=self.environment())
+        assert result.returncode == status, (command[:3], result.returncode, result.stderr[-1000:])
+        return (result.stdout + result.stderr).decode()
+
+    def monitor(self):
+        """Starts to write down the signals of the program's notifications."""
+        with open(self.folder / "signals", "wb") as output:
+            process = subprocess.Popen(["dbus-monitor", "--address", self.address, "--profile",
+                                        "type='signal',path='/vellum'"], stdout=output)
+        time.sleep(0.5)
+        return process
+
+    def signals(self):
+        lines = (self.folder / "signals").read_text().splitlines()
+        return [tuple(line.split("\t")[5:8]) for line in lines if "\t/vellum\t" in line]

@@ -1,0 +1,223 @@
+"""The scheduled mode on a real bus, with the clients that everybody has. Every conversation ends with
+ten quiet seconds, so all of them are held at once, each on a device and a bus of its own."""
+import concurrent.futures
+import json
+import os
+import subprocess
+import time
+import unittest
+
+from bus import BusDevice, NAME, TODAY
+from device import BIN, LAST_DAY, group
+from raw_peer import RawPeer, int64_fields
+
+YESTERDAY = TODAY - 1
+NOTIFIED = "notified of logging status, waiting for activate app info"
+NEVER = "never received requested AAI, so moving along without it"
+LOGGING = (f"{NAME}", "logging")
+ELEMENTS = ["aa{sv}", "1", "5", "bundle_id", "s", "org.example.mail", "version", "s", "7.1", "adam_id", "x",
+            "5000000000", "arch", "x", "-2", "uuid", "ay", "16", *map(str, range(0, 256, 17))]
+MAIL = {"bundle": "org.example.mail", "version": "7.1", "adamID": 5000000000, "arch": -2,
+        "uuid": "00112233-4455-6677-8899-AABBCCDDEEFF"}
+GVARIANT = ("{'operation': <int64 2>, 'app_data': <[{'bundle_id': <'org.example.mail'>, 'version': <'7.1'>, "
+            "'adam_id': <int64 5000000000>, 'arch': <int64 -2>, 'uuid': <[%s]>}]>}"
+            % ", ".join(f"byte {value}" for value in range(0, 256, 17)))
+MOST_MEMORY_KB = 96 * 1024
+# The sanitizers' own memory is not the program's.
+IS_SANITIZED = b"__asan" in (BIN / "tallyrun").read_bytes()
+
+
+def simple(device):
+    device.describe(SystemVersion={"ProductBuildVersion": "16S46"})
+    device.whitelist(G=group({"a": {}}))
+    device.store([("a", day, day) for day in range(TODAY - 4, TODAY + 4)])
+
+
+def applications(count, **changes):
+    return [{"bundle_id": f"org.example.app{i}", "version": "1", "adam_id": i, "arch": 1,
+             "uuid": "00112233-4455-6677-8899-aabbccddeeff", **changes} for i in range(count)]
+
+
+def send_applications(device, elements, status=0):
+    return device.tool("send", "apps", "-", stdin=json.dumps(elements).encode(), status=status)
+
+
+def expected_conversation(test, device):
+    """Two messages by stock tools, and the list is in the day's log."""
+    monitor = device.monitor()
+    device.busctl("operation", "x", "0")
+    device.gdbus(GVARIANT)
+    device.gdbus(GVARIANT)  # nobody asked for a second one
+    found = device.wait_for_end()
+    test.assertEqual([text.partition("\n")[0].partition("\\n")[0] for text in found],
+                     ["tallyrun started", NOTIFIED, "tallyrun got requestedAAI:",
+                      f"daily tasks for day {YESTERDAY}", *test.sweep(found),
+                      "OS change since last run ((null) -> 16S46)",
+                      "tallyrun got (unsolicited -- so ignoring) AAI:", "tallyrun ended"])
+    test.assertEqual(device.log()["TBActivatedAppInfo"], [MAIL])
+    test.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
+    # The next message starts a new process, which takes part in the same conversation.
+    device.busctl("operation", "x", "0")
+    device.busctl("operation", "x", "2", "app_data", *ELEMENTS, count=2)
+    found = device.wait_for_end(runs=2)
+    test.assertEqual(found.count("Day unchanged since last run"), 1)
+    monitor.terminate()
+    monitor.wait()
+    test.assertEqual([signal[-2:] for signal in device.signals()], [LOGGING, LOGGING])
+
+
+def list_that_never_comes(test, device):
+    began = time.monotonic()
+    device.tool("send", "logging")
+    device.tool("send", "logging")
+    device.busctl("operation", "x", "1", "value", "x", "20000", count=2)  # too late for this run
+    found = device.wait_for_end()
+    test.assertGreater(time.monotonic() - began, 9.5)
+    test.assertEqual((found.count(NOTIFIED), found.count(NEVER)), (1, 1))
+    test.assertNotIn("TBActivatedAppInfo", device.log())
+    test.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
+
+
+def unsolicited_list(test, device):
+    device.busctl("operation", "x", "2", "app_data", *ELEMENTS, count=2)
+    found = device.wait_for_end()
+    test.assertEqual(len(found), 3, found)
+    test.assertEqual((device.log_files(), device.preferences()), ([], {}))
+
+
+def day_request(test, device):
+    device.set_preferences(**{LAST_DAY: 5})
+    device.tool("send", "day", str(TODAY - 3))
+    device.tool("send", "logging")
+    found = device.wait_for_end()
+    test.assertEqual(device.log()["TBScalars"]["a"], TODAY - 3)
+    test.assertEqual(device.preferences()[LAST_DAY], 5)
+    test.assertNotIn(NOTIFIED, found)
+
+
+def twenty_thousand_applications(test, device):
+    device.tool("send", "logging")
+    peak = device.watch_memory()
+    refused = send_applications(device, applications(20_001), status=1)
+    test.assertEqual(refused, "")
+    send_applications(device, applications(20_000))
+    device.wait_for_end()
+    listed = device.log()["TBActivatedAppInfo"]
+    test.assertEqual([len(listed), listed[19_999]["adamID"]], [20_000, 19_999])
+    test.assertEqual(device.error_texts(), [
+        f"endpoint {NAME}: a message is refused: more elements than a message may have"])
+    test.assert_memory(peak())
+
+
+def hostile_messages(test, device):
+    bad_uuid = ELEMENTS[:-17] + ["3", "1", "2", "3"]
+    two = ["aa{sv}", "2"] + ELEMENTS[2:] + bad_uuid[2:]
+    nested = ["v"] * 20 + ["s", "deep"]
+    cases = [  # fields, exit status of the client, what the line says
+        (1, ["operation", "s", "0"], 0, 'no 64-bit integer "operation"'),
+        (1, ["operation", "i", "0"], 0, 'no 64-bit integer "operation"'),
+        (0, [], 0, 'no 64-bit integer "operation"'),
+        (1, ["operation", "x", "1"], 0, 'no 64-bit integer "value"'),
+        (1, ["operation", "x", "2"], 0, 'no array "app_data"'),
+        (2, ["operation", "x", "2", "app_data", "s", "x"], 0, 'no array "app_data"'),
+        (2, ["operation", "x", "2", "app_data", *two], 0, "1 of 2 elements skipped; element 1: "),
+        (2, ["operation", "x", "2", "app_data", "av", "2", "s", "x", "(xx)", "1", "2"], 0, "1 of 1 elements"),
+        (2, ["operation", "x", "0", "x", *nested], 1, "nested too deeply"),
+        (2, ["operation", "x", "0", "x", "as", "20001", *["y"] * 20_001], 1, "more elements"),
+    ]
+    lines = []
+    for count, fields, status, line in cases:
+        device.busctl(*fields, count=count, status=status)
+        lines.append(line)
+    # Not a dictionary at all; one of the wrong kind; too much of everything.
+    device.dbus_send("string:hello", status=1)
+    device.dbus_send("dict:string:int64:operation,0", status=1)
+    lines += ["not a dictionary but \"s\"", "not a dictionary but \"a{sx}\""]
+    send_applications(device, applications(1, version="x" * (17 << 20)), status=1)
+    lines.append("larger than a message may be")
+    if os.getuid() == 0:
+        output = device.busctl("operation", "x", "0", user="nobody", status=1)
+        test.assertIn("Access denied", output)
+        lines.append("is not heard")
+    # After all that, the program is still there for whoever means well.
+    device.busctl("operation", "x", str(7 << 32 | 1), "value", "x", str(3 << 32 | TODAY - 2), count=2)
+    found = device.wait_for_end()
+    test.assertEqual(found.count("tallyrun started"), 1)
+    errors = device.error_texts()
+    test.assertEqual(len(errors), len(lines), errors)
+    for error, line in zip(errors, lines):
+        test.assertIn(line, error)
+    test.assertEqual(device.log()["TBScalars"]["a"], TODAY - 2)
+
+
+def flood(test, device):
+    peer = RawPeer(device)
+    test.addCleanup(peer.socket.close)
+    device.tool("send", "logging")
+    peak = device.watch_memory()
+    for _ in range(5_000):
+        peer.send(int64_fields(operation=2))  # a line for each, as the list is missing
+    for _ in range(5_000):
+        peer.send(int64_fields(operation=2), flags=0)
+    last = time.monotonic()
+    peer.wait_for_answers(5_000)
+    device.until(lambda: len(device.error_texts()) >= 10_000, 60, "10,000 lines")
+    found = device.wait_for_end()
+    test.assertGreater(time.monotonic() - last, 9.5)
+    test.assertEqual(len(device.error_texts()), 10_000)
+    test.assertEqual(found.count(NEVER), 1)
+    test.assert_memory(peak())
+
+
+def bus_that_dies(test, device):
+    device.tool("send", "logging")
+    device.until(lambda: NOTIFIED in device.default_texts(), 30, "the announcement")
+    device.kill_daemon()
+    test.assertIn(NEVER, device.wait_for_end())
+    test.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
+
+
+def no_bus(test, device):
+    device.kill_daemon()
+    messages = device.run(day=None)
+    texts = [text for _, text in messages]
+    test.assertEqual((texts[0], texts[-1]), ("tallyrun started", "tallyrun ended"))
+    test.assertIn("cannot listen", texts[1])
+    test.assertIn("not sent", subprocess.run(
+        [BIN / "tallyctl", "send", "logging"], capture_output=True, env=device.environment(),
+        check=False).stderr.decode())
+
+
+CONVERSATIONS = [expected_conversation, list_that_never_comes, unsolicited_list, day_request,
+                 twenty_thousand_applications, hostile_messages, flood, bus_that_dies, no_bus]
+
+
+class Endpoint(unittest.TestCase):
+    def hold(self, conversation):
+        device = BusDevice()
+        try:
+            simple(device)
+            conversation(self, device)
+        finally:
+            device.remove()
+
+    def test_conversations(self):
+        with concurrent.futures.ThreadPoolExecutor(len(CONVERSATIONS)) as pool:
+            held = [pool.submit(self.hold, conversation) for conversation in CONVERSATIONS]
+            for conversation, result in zip(CONVERSATIONS, held):
+                with self.subTest(conversation.__name__):
+                    result.result()
+
+    def assert_memory(self, kilobytes):
+        if not IS_SANITIZED:
+            self.assertLess(kilobytes, MOST_MEMORY_KB)
+
+    def sweep(self, found):
+        """What the telemetry sweep says, which is another test's matter."""
+        start = found.index(f"daily tasks for day {YESTERDAY}") + 1
+        end = [text.startswith("OS change") for text in found].index(True)
+        return found[start:end]
+
+
+if __name__ == "__main__":
+    unittest.main()
