@@ -8,7 +8,7 @@ include(CMakePackageConfigHelpers)
 #                      [WHOLE room...]       rooms that are in it as a whole
 #                      [HIDDEN room...]      rooms of which it takes what it needs
 #                      [NEEDS library...])   shared libraries of ours that its users see
-# Makes libNAME.so and installs it as the component NAME, with its headers, a CMake package
+# Makes libNAME.so and installs it as the component NAME; as NAME-dev its headers, a CMake package
 # (NAME::NAME) and a pkg-config file.
 function(tally_shared_library name)
   cmake_parse_arguments(LIB "" "DESCRIPTION;HEADERS" "SOURCES;WHOLE;HIDDEN;NEEDS" ${ARGN})
@@ -29,9 +29,9 @@ function(tally_shared_library name)
   target_link_options(${name} PRIVATE -Wl,--version-script=${exports} -Wl,--no-undefined)
 
   install(TARGETS ${name} EXPORT ${name}Targets
-    LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT ${name} NAMELINK_COMPONENT ${name})
+    LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT ${name} NAMELINK_COMPONENT ${name}-dev)
   install(DIRECTORY ${PROJECT_SOURCE_DIR}/include/${LIB_HEADERS}
-    DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT ${name} FILES_MATCHING PATTERN *.h)
+    DESTINATION ${CMAKE_INSTALL_INCLUDEDIR} COMPONENT ${name}-dev FILES_MATCHING PATTERN *.h)
   tally_install_package(${name} "${LIB_DESCRIPTION}" "${LIB_NEEDS}")
 endfunction()
 
@@ -50,9 +50,9 @@ function(tally_install_package name description needs)
     ${built}/${name}Config.cmake INSTALL_DESTINATION ${package})
   write_basic_package_version_file(${built}/${name}ConfigVersion.cmake
     COMPATIBILITY SameMinorVersion)
-  install(EXPORT ${name}Targets NAMESPACE ${name}:: DESTINATION ${package} COMPONENT ${name})
+  install(EXPORT ${name}Targets NAMESPACE ${name}:: DESTINATION ${package} COMPONENT ${name}-dev)
   install(FILES ${built}/${name}Config.cmake ${built}/${name}ConfigVersion.cmake
-    DESTINATION ${package} COMPONENT ${name})
+    DESTINATION ${package} COMPONENT ${name}-dev)
   install(FILES ${built}/${name}.pc
-    DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT ${name})
+    DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT ${name}-dev)
 endfunction()

@@ -47,8 +47,9 @@ class Library(unittest.TestCase):
         cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
         cls.prefix = cls.folder / "prefix"
         for component in ("tallykv", "hwreport", "tallystorage"):
-            cls.check(run("cmake", "--install", BUILD, "--prefix", cls.prefix,
-                          "--component", component))
+            for part in (component, f"{component}-dev"):
+                cls.check(run("cmake", "--install", BUILD, "--prefix", cls.prefix,
+                              "--component", part))
         cls.library = next(cls.prefix.glob("**/libhwreport.so")).parent
         cls.device = cls.folder / "root"
         (cls.device / "device").mkdir(parents=True)
