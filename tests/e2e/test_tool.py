@@ -40,7 +40,7 @@ class ToolTest(DeviceTest):
         self.assertGreaterEqual(len(tour), 5)
         subprocess.run([sys.executable, TOP / "examples/device/make-storage.py", self.device.root,
                         str(TODAY)], check=True, stdout=subprocess.DEVNULL)
-        for command in tour:
+        for command in (line.replace("examples/", f"{TOP}/examples/") for line in tour):
             with self.subTest(command):
                 status, out, err = self.tool(*command.split())
                 self.assertEqual((status, err), (0, ""))
