@@ -9,6 +9,9 @@ if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
   export CCACHE_DIR="$root_dir/build/ccache"
 fi
 
+# Objects are the same wherever the clone lies, so that every clone is built from the same cache.
+export CCACHE_BASEDIR="$root_dir" CCACHE_NOHASHDIR=1
+
 say() { printf '\n== %s\n' "$*"; }
 fail() {
   printf '%s: %s\n' "$(basename "$0")" "$*" >&2
