@@ -27,6 +27,7 @@ LIMITS = '<limit name="max_replies_per_connection">50000</limit>'
 
 class BusDevice(Device):
     """A device, a bus, and the messages of every run that the bus started."""
+    today = TODAY
 
     def __init__(self):
         super().__init__()

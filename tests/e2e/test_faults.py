@@ -14,6 +14,12 @@ YESTERDAY = TODAY - 1
 HEAD = b'<?xml version="1.0"?><plist version="1.0">'
 
 
+def blocks_termination(pid):
+    with open(f"/proc/{pid}/status", encoding="ascii") as status:
+        blocked = status.read().partition("SigBlk:")[2].split()[0]
+    return int(blocked, 16) >> (signal.SIGTERM - 1) & 1
+
+
 def bplist_with_cycle():
     """An array that holds itself."""
     objects = b"\xa1\x00"
@@ -209,7 +215,10 @@ class Rivals(DeviceTest):
     def test_a_terminated_wait_ends_in_order(self):
         device = self.simple()
         run = device.start(day=None)
-        time.sleep(0.5)
+        end = time.monotonic() + 60
+        while not blocks_termination(run.pid):  # as it does once it waits in its event loop
+            self.assertLess(time.monotonic(), end)
+            time.sleep(0.02)
         run.send_signal(signal.SIGTERM)
         messages = parse_messages(run.communicate(timeout=120)[1])
         self.assertEqual(run.returncode, 0)
