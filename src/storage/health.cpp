@@ -134,6 +134,13 @@ KvRef<KvDictionary> otaExtract(const KvDictionary& health) {
   return extract;
 }
 
+std::span<const std::string_view> countersOfHealthFigure(std::string_view key) {
+  for (const HealthGroup& group : kGroups) {
+    if (group.largestKey == key) return group.keys;
+  }
+  return {};
+}
+
 KvRef<KvDictionary> CopyNANDHealthInfo() { return healthOfNandInfo(*CopyNANDInfo()); }
 KvRef<KvDictionary> CopyFixlineNANDInfo() { return fixlineExtract(*CopyNANDHealthInfo()); }
 KvRef<KvDictionary> CopyInternalLabNANDInfo() { return internalLabExtract(*CopyNANDHealthInfo()); }

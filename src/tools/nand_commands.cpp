@@ -77,31 +77,33 @@ int runInfo(const ToolContext& context, const std::string& text) {
   return failure.empty() ? kSuccess : complainOf(context, failure);
 }
 
-// A figure of the summary; one that the driver does not export is said to be missing, not 0.
 struct HealthLine {
   const char* label;
-  std::string_view key;
-  std::string_view source;  // a key that must be exported for it; empty: none in particular
+  std::string_view key;  // in the summary
   const char* unit;
   std::int64_t doubtfulFrom, badFrom;  // the figure is shown in the ink of what it reached
 };
 constexpr HealthLine kHealthLines[] = {
-    {"Wear, most used part", kNANDInfoHealthMaxPercentageNANDUsedKey, {}, " %", 80, 100},
-    {"  user partition", "vellum.NANDInfo.UserPartitionPEPercentUsed",
-     "vellum.NANDInfo.UserPartitionPEPercentUsed", " %", 80, 100},
-    {"  intermediate partition", "vellum.NANDInfo.IntermediatePartitionPEPercentUsed",
-     "vellum.NANDInfo.IntermediatePartitionPEPercentUsed", " %", 80, 100},
-    {"  firmware updates", "vellum.NANDInfo.fwUpdatesPercentUsed",
-     "vellum.NANDInfo.fwUpdatesPercentUsed", " %", 80, 100},
-    {"End-to-end errors, worst counter", kNANDInfoHealthMaxE2EErrorsKey, {}, "", 1, 1},
-    {"Host read errors", kNANDInfoHealthHostReadErrorsKey, {}, "", 1, 1},
-    {"Grown bad blocks", "vellum.NANDInfo.numGrownBad", "vellum.NANDInfo.numGrownBad", "",
-     INT64_MAX, INT64_MAX},
+    {"Wear, most used part", kNANDInfoHealthMaxPercentageNANDUsedKey, " %", 80, 100},
+    {"  user partition", "vellum.NANDInfo.UserPartitionPEPercentUsed", " %", 80, 100},
+    {"  intermediate partition", "vellum.NANDInfo.IntermediatePartitionPEPercentUsed", " %", 80,
+     100},
+    {"  firmware updates", "vellum.NANDInfo.fwUpdatesPercentUsed", " %", 80, 100},
+    {"End-to-end errors, worst counter", kNANDInfoHealthMaxE2EErrorsKey, "", 1, 1},
+    {"Host read errors", kNANDInfoHealthHostReadErrorsKey, "", 1, 1},
+    {"Grown bad blocks", "vellum.NANDInfo.numGrownBad", "", INT64_MAX, INT64_MAX},
 };
 constexpr std::string_view kSpareKey = "vellum.NANDInfo.spareAvailablePercent";
 
+// The summary has a 0 for what the driver does not export, which would look like good health.
+bool isExported(const KvDictionary& info, std::string_view key) {
+  const auto counters = countersOfHealthFigure(key);
+  if (counters.empty()) return info.contains(key);
+  return std::ranges::any_of(counters, [&](std::string_view one) { return info.contains(one); });
+}
+
 Cell figureCell(const KvDictionary& info, const KvDictionary& health, const HealthLine& line) {
-  if (!line.source.empty() && !info.contains(line.source)) return {"not exported", Ink::Faint};
+  if (!isExported(info, line.key)) return {"not exported", Ink::Faint};
   // The figures are counts of 32 bits, of which the upper half reads as negative.
   const std::int64_t value = static_cast<std::uint32_t>(health.getInt64(line.key).value_or(0));
   const Ink ink = value >= line.badFrom        ? Ink::Bad
