@@ -36,7 +36,8 @@ class PageBuffer {
   std::span<std::byte> bytes() const noexcept { return {static_cast<std::byte*>(memory_), size_}; }
 
  private:
-  static constexpr std::align_val_t kPage{4096};
+  // The largest page of the machines this runs on, and so aligned to the pages of all of them.
+  static constexpr std::align_val_t kPage{65536};
   std::size_t size_;
   void* memory_;
 };
