@@ -73,8 +73,13 @@ int runInfo(const ToolContext& context, const std::string& text) {
   for (const auto key : {kNANDInfoReclaimErrorMessageKey, kNANDInfoVMFreezerErrorMessageKey}) {
     if (const auto message = info->getString(key)) complain(context, *message, kWrong);
   }
-  const std::string failure = failureOf(*info);
-  return failure.empty() ? kSuccess : complainOf(context, failure);
+  if (const std::string failure = failureOf(*info); !failure.empty()) {
+    return complainOf(context, failure);
+  }
+  const bool found = std::ranges::any_of(*info, [&](const auto& entry) {
+    return entry.key->view().find(text) != std::string_view::npos;
+  });
+  return found ? kSuccess : complain(context, "no figure of that name: " + text, kWrong);
 }
 
 struct HealthLine {

@@ -68,6 +68,7 @@ TEST(NandCommands, InfoInGroups) {
   const Outcome some = run({"info", "Histo"}, {{kReads, {1}}, {kHisto, {1, 9, 3}}});
   EXPECT_THAT(some.out, HasSubstr("BandsMaxTempHisto0-2"));
   EXPECT_THAT(some.out, Not(HasSubstr("NumLogicalReads")));
+  EXPECT_EQ(run({"info", "no such"}, {{kReads, {1}}}).status, kWrong);
 }
 
 TEST(NandCommands, InfoForPrograms) {
