@@ -26,6 +26,8 @@ KNOWN = {
     "nandWrites": 2_190_334_871, "bandErases": 41_882, "intermediateBandErases": 96_310,
     "wearLevMoves": 8_812, "IND_pool_free": 21_404, "IND_pool_count": 65_536,
     "numSleepOps": 181_204, "maxHighEnduranceBlockErases": 1_240, "boots": 213, "uncleanBoots": 4,
+    "averageGracefulBootTimeMs": 744, "maxGracefulBootTimeMs": 1_312,
+    "averageUngracefulBootTimeMs": 2_380, "maxUngracefulBootTimeMs": 5_906,
     "percentUsed": 9, "slcPercentUsed": 14, "fwUpdatesPercentUsed": 2,
     "spareAvailablePercent": 98, "numGrownBad": 3, "numFactoryBad": 27, "numPfail": 2,
     "numEfail": 1, "ueccReads": 0, "internalUeccs": 0, "raidSmartErrors": 0, "numDieFailures": 0,

@@ -273,8 +273,10 @@ class Reader {
   KvRef<KvString> stringOf(std::string_view content) {
     constexpr std::size_t longestShared = 24;
     if (content.empty() || content.size() > longestShared) return KvString::create(content);
-    const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(content[i]); };
-    const std::size_t mixed = content.size() * 131 + byte(0) * 31u + byte(content.size() / 2) * 7u +
+    const auto byte = [&](std::size_t i) {
+      return std::size_t{static_cast<unsigned char>(content[i])};
+    };
+    const std::size_t mixed = content.size() * 131 + byte(0) * 31 + byte(content.size() / 2) * 7 +
                               byte(content.size() - 1);
     KvRef<KvString>& slot = recent_[mixed % recent_.size()];
     if (!slot || slot->view() != content) slot = KvString::create(content);

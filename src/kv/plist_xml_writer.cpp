@@ -37,7 +37,9 @@ constexpr std::array<std::uint8_t, 256> kByteClass = [] {
   std::array<std::uint8_t, 256> classes{};
   for (unsigned byte = 0; byte < 0x20; ++byte) classes[byte] = kSuspect;
   classes['\t'] = classes['\n'] = kPlain;
-  for (const unsigned char byte : {'&', '<', '>', '\r'}) classes[byte] = kEscaped;
+  for (const char byte : {'&', '<', '>', '\r'}) {
+    classes[static_cast<unsigned char>(byte)] = kEscaped;
+  }
   classes[0xEF] = kSuspect;
   return classes;
 }();
@@ -154,7 +156,7 @@ class Writer {
 
   void data(std::span<const std::byte> bytes, int depth) {
     const int tabs = std::min(depth, kDataMaximumTabs);
-    const auto bytesPerLine = static_cast<std::size_t>((kDataColumns - kTabColumns * tabs) / 4 * 3);
+    const auto bytesPerLine = static_cast<std::size_t>(kDataColumns - kTabColumns * tabs) / 4 * 3;
     out_ += "<data>\n";
     for (; !bytes.empty(); bytes = bytes.subspan(std::min(bytes.size(), bytesPerLine))) {
       indent(tabs);

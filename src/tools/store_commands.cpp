@@ -13,6 +13,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store_history.h"
 #include "platform/linux/store_writer.h"
+#include "tools/day_argument.h"
 #include "tools/output.h"
 #include "tools/store_csv.h"
 #include "tools/store_dump.h"
@@ -25,7 +26,8 @@ namespace {
 struct StoreArguments {
   std::string key, value, file;
   std::vector<std::string> values;
-  std::optional<std::int32_t> day;
+  std::string dayForm;              // as it was given; empty when it was not
+  std::optional<std::int32_t> day;  // the day that it names
   std::optional<std::uint32_t> offset;
   std::string prefix;
 };
@@ -182,6 +184,13 @@ int listKeys(const ToolContext& context, const StoreArguments&) {
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
+// False when the day that was given is none.
+bool resolveDay(StoreArguments& arguments) {
+  if (arguments.dayForm.empty()) return true;
+  arguments.day = parseDay(arguments.dayForm, platform().metricsStore->TBDaysSince1970());
+  return arguments.day.has_value();
+}
+
 }  // namespace
 
 void addStoreCommands(CLI::App& app, ToolContext& context) {
@@ -191,14 +200,20 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   const auto add = [&](const char* name, const char* description, auto run) {
     CLI::App* const command = store->add_subcommand(name, description);
     command->callback([&context, arguments, run] {
-      context.command = [&context, arguments, run] { return run(context, *arguments); };
+      context.command = [&context, arguments, run] {
+        if (!resolveDay(*arguments)) {
+          return complain(context, "not a day: " + arguments->dayForm, kBadUsage);
+        }
+        return run(context, *arguments);
+      };
     });
     return command;
   };
-  const auto addDay = [&](CLI::App* command, const char* meaning) {
-    command->add_option("--day", arguments->day, meaning)->type_name("N");
+  const auto addDay = [&](CLI::App* command, const char* otherwise) {
+    command->add_option("--day", arguments->dayForm, kDayForms + std::string(otherwise))
+        ->type_name("DAY");
   };
-  constexpr const char* kDay = "Days since 1970-01-01 (UTC); today when left out";
+  constexpr const char* kDay = "; today when left out";
 
   CLI::App* command = add("set", "Set a scalar", setScalar);
   command->add_option("KEY", arguments->key)->required();
@@ -217,7 +232,7 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   command->add_option("FILE", arguments->file, "A file, or - for standard input")->required();
 
   command = add("dump", "Print all rows as CSV, in the form that import reads", dump);
-  addDay(command, "Only this day");
+  addDay(command, "; all days when left out");
   command->add_option("--prefix", arguments->prefix, "Only keys that begin so");
 
   add("keys", "List the keys, with their days and numbers of samples", listKeys);

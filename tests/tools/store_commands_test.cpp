@@ -137,6 +137,7 @@ TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
   } cases[] = {
       {{"set", "a", "-5"}, kSuccess, "scalar,a,20000,,-5\n"},
       {{"set", "a", "6", "--day", "-7"}, kSuccess, "scalar,a,-7,,6\n"},
+      {{"set", "a", "8", "--day", "yesterday"}, kSuccess, "scalar,a,19999,,8\n"},
       {{"push", "d", "-2.5"}, kSuccess, "distribution,d,20000,3661,-2.5\n"},
       {{"push", "d", "nan", "1", "--day", "3", "--offset", "9"},
        kSuccess,
