@@ -1,6 +1,7 @@
 // The daily log of a large day: `tallyrun -f` as a whole, beside a query and a script that work on
 // a table with a row for each sample; and the pass over the samples alone, beside reading the same
-// store with nothing computed. Each measurement is a process of its own.
+// store with nothing computed. Each measurement is a process of its own. "bench_daily_log growth"
+// measures the whole run and the query for days of different sizes.
 #include <stdlib.h>
 
 #include <algorithm>
@@ -84,14 +85,46 @@ std::string newestLog(const std::string& root) {
   return newest;
 }
 
-int make(const std::string& base) {
-  const SampleDay day{yesterday()};
+int make(const std::string& base, std::size_t samplesEach) {
+  SampleDay day{yesterday()};
+  day.samplesEach = samplesEach;
   SampleDay fewer = day;
   fewer.samplesEach /= 100;
   return makeDevice(base + "/full", day) && makeDevice(base + "/few", fewer) &&
                  makeRowDatabase(base + "/rows.sqlite", day)
              ? 0
              : 1;
+}
+
+// In a process of its own: a child's peak of memory starts at what its parent holds.
+bool makeApart(const std::string& self, const std::string& base, std::size_t samplesEach) {
+  return runProcess({self, "make", base, std::to_string(samplesEach)}).exitStatus == 0;
+}
+
+std::vector<std::string> onDevice(const std::string& root) {
+  return {"TALLYRUN_ROOT=" + root, "TALLYRUN_LOG=stderr", "TALLYRUN_LOG_LEVEL=error"};
+}
+
+int growth(const std::string& self) {
+  const std::string job = std::filesystem::path(self).parent_path() / "tallyrun";
+  std::printf("%12s %16s %16s %12s\n", "samples", "tallyrun, s CPU", "query, s CPU", "peak, MiB");
+  for (const std::size_t samplesEach : {100u, 300u, 1000u, 3000u, 10000u}) {
+    char folder[] = "/tmp/tally-daily-log-XXXXXX";
+    if (::mkdtemp(folder) == nullptr) return 1;
+    const std::string base = folder;
+    ProcessCost whole, query;
+    const bool made = makeApart(self, base, samplesEach);
+    for (int round = 0; made && round < kRounds; ++round) {
+      least(whole, {job, "-f"}, onDevice(base + "/full"));
+      least(query, {self, "query", base + "/rows.sqlite"});
+    }
+    std::filesystem::remove_all(base);
+    if (whole.exitStatus != 0 || query.exitStatus != 0) return 1;
+    std::printf("%12zu %16.3f %16.3f %12.1f\n", samplesEach * SampleDay{}.distributions,
+                whole.cpuSeconds, query.cpuSeconds,
+                static_cast<double>(whole.peakKibibytes) / 1024);
+  }
+  return 0;
 }
 
 int measure(const std::string& self, const std::string& yardsticks) {
@@ -101,16 +134,11 @@ int measure(const std::string& self, const std::string& yardsticks) {
   const std::string base = folder, full = base + "/full", few = base + "/few";
   const std::string rows = base + "/rows.sqlite", expected = base + "/expected.plist";
   const SampleDay day{yesterday()};
-  // In a process of its own: a child's peak starts at what its parent holds.
-  if (runProcess({self, "make", base}).exitStatus != 0) return 1;
+  if (!makeApart(self, base, day.samplesEach)) return 1;
   std::printf("%zu scalars, %zu distributions of %zu samples\n\n", day.scalars, day.distributions,
               day.samplesEach);
 
-  const auto device = [](const std::string& root) {
-    return std::vector<std::string>{"TALLYRUN_ROOT=" + root, "TALLYRUN_LOG=stderr",
-                                    "TALLYRUN_LOG_LEVEL=error"};
-  };
-  const auto onFull = device(full), onFew = device(few);
+  const auto onFull = onDevice(full), onFew = onDevice(few);
   const std::string store = metricsStorePath(full), job = programs / "tallyrun";
   ProcessCost whole, small, pass, floor, values, query, script;
   // In turns, so that a machine whose speed drifts slows all alike.
@@ -158,7 +186,9 @@ int measure(const std::string& self, const std::string& yardsticks) {
 
 int main(int count, char** arguments) {
   const std::string_view mode = count > 1 ? arguments[1] : "";
-  if (mode == "make" && count == 3) return make(arguments[2]);
+  const std::string self = std::filesystem::canonical("/proc/self/exe");
+  if (mode == "make" && count == 4) return make(arguments[2], std::stoul(arguments[3]));
+  if (mode == "growth") return growth(self);
   if (mode == "read-store" && count == 3) {
     return readRows(arguments[2], {"SELECT key, day, value FROM scalars",
                                    "SELECT sample_values, sample_offsets FROM chunks"});
@@ -171,5 +201,5 @@ int main(int count, char** arguments) {
                                    "FROM samples GROUP BY key"});
   }
   if (mode == "pass" && count == 3) return passOverSamples(arguments[2]);
-  return measure(std::filesystem::canonical("/proc/self/exe"), YARDSTICK_FOLDER);
+  return measure(self, YARDSTICK_FOLDER);
 }

@@ -29,8 +29,8 @@ class BusDevice(Device):
     """A device, a bus, and the messages of every run that the bus started."""
     today = TODAY
 
-    def __init__(self):
-        super().__init__()
+    def __init__(self, root=None):
+        super().__init__(root)
         self.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-bus-"))
         self.folder.chmod(0o755)  # another user has to reach the socket
         self.address = f"unix:path={self.folder}/socket"

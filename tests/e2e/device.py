@@ -32,9 +32,11 @@ def group(scalars=None, distributions=None, **prefixes):
 class Device:
     today = TODAY  # the day that its runs are thought to fall on
 
-    def __init__(self):
-        self.root = pathlib.Path(tempfile.mkdtemp(prefix="tally-e2e-"))
-        self.describe()
+    def __init__(self, root=None):
+        """A fresh device, or the one whose root is given."""
+        self.root = root or pathlib.Path(tempfile.mkdtemp(prefix="tally-e2e-"))
+        if root is None:
+            self.describe()
 
     def remove(self):
         shutil.rmtree(self.root, ignore_errors=True)

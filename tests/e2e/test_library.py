@@ -66,6 +66,8 @@ class Library(unittest.TestCase):
         self.check(run("cmake", "-S", EXAMPLE, "-B", build, f"-DCMAKE_PREFIX_PATH={self.prefix}"))
         self.check(run("cmake", "--build", build))
         self.assertEqual(self.check(run(build / "channels", TALLYRUN_ROOT=str(self.device))), EXPECTED)
+        self.assertEqual(self.check(run(build / "delta", TALLYRUN_ROOT=str(self.device))), "Turns 0\n")
+        self.assertEqual(run(build / "delta", TALLYRUN_ROOT=str(self.folder)).returncode, 1)
         # A device without a hub or channels is an answer, not a crash.
         self.assertEqual(run(build / "channels", TALLYRUN_ROOT=str(self.folder)).returncode, 0x11)
 

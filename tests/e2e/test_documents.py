@@ -1,0 +1,128 @@
+"""What the documents show is true: commands run, examples are those that are built, links lead somewhere."""
+import os
+import pathlib
+import re
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+from bus import BusDevice
+from device import BIN
+
+TOP = pathlib.Path(__file__).resolve().parents[2]
+DOCUMENTS = sorted([TOP / "README.md", TOP / "CONTRIBUTING.md", *TOP.glob("docs/*.md")])
+FENCE = re.compile(r"^```(\w*)\n(.*?)^```$", re.MULTILINE | re.DOTALL)
+# A file's path alone on the line before a block: the block is its content.
+FILE_NAMED = re.compile(r"^`([^`]+\.plist)`[^\n]*:\n\n\Z", re.MULTILINE)
+# What a block may call that is too large to be run here, and what runs it.
+RUN_BY_OTHERS = {
+    "cmake --preset default": "scripts/test",
+    "cmake --build build": "scripts/test",
+    "cpack --config build/CPackConfig.cmake": "test_package.py",
+    "apt install ./build/packages-debian/tallyrun_*.deb": "test_package.py",
+    "cmake --install build --prefix /usr/local --component tallykv": "test_library.py",
+    "cmake --install build --prefix /usr/local --component tallykv-dev": "test_library.py",
+    "cmake --install build --prefix /usr/local --component hwreport": "test_library.py",
+    "cmake --install build --prefix /usr/local --component hwreport-dev": "test_library.py",
+    "cmake -S examples/hwreport -B example": "test_library.py",
+    "cmake --build example": "test_library.py",
+    "example/channels": "test_library.py",
+    "scripts/demo": ".ci/run", "scripts/test": ".ci/run", "scripts/test --sanitize": ".ci/run",
+    "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
+    "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "test_load.py, at a smaller size",
+    "scripts/bench": "by hand, when docs/performance.md is made anew",
+}
+STANDS_IN = "#!/bin/sh\necho \"$TALLYRUN_SHOWN $*\" >> \"$TALLYRUN_CALLS\"\n"
+
+
+class Documents(unittest.TestCase):
+    @classmethod
+    def setUpClass(cls):
+        cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-documents-"))
+        cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
+        cls.demo = cls.folder / "demo-root"
+        environment = {**os.environ, "TALLYRUN_BIN": str(BIN), "TALLYRUN_ROOT": str(cls.demo)}
+        for command in ([TOP / "scripts/make-demo-root", cls.demo], [BIN / "tallyrun", "-f"]):
+            subprocess.run(command, check=True, capture_output=True, env=environment)
+
+    def clone(self):
+        """A folder that looks like a clone after its demo; what is too large to run is written down."""
+        clone = pathlib.Path(tempfile.mkdtemp(dir=self.folder))
+        (clone / "build").mkdir()
+        shutil.copytree(self.demo, clone / "build/demo-root")
+        (clone / "build/bin").symlink_to(BIN)
+        (clone / "examples").symlink_to(TOP / "examples")
+        for name in ("stand-ins/cmake", "stand-ins/cpack", "stand-ins/apt", "example/channels",
+                     *(f"scripts/{path.name}" for path in (TOP / "scripts").iterdir())):
+            program = clone / name
+            program.parent.mkdir(exist_ok=True)
+            shown = program.name if program.parent.name == "stand-ins" else name
+            program.write_text(STANDS_IN.replace("$TALLYRUN_SHOWN", shown))
+            program.chmod(0o755)
+        return clone
+
+    def run_document(self, text, clone, device):
+        (clone / "calls").touch()
+        environment = {**device.environment(), "TALLYRUN_CALLS": str(clone / "calls"),
+                       "TALLYRUN_ROOT": str(clone / "build/demo-root"),
+                       "PATH": f"{clone}/stand-ins:{BIN}:{os.environ['PATH']}"}
+        ran = 0
+        for block in FENCE.finditer(text):
+            language, content = block.groups()
+            named = FILE_NAMED.search(text[:block.start()])
+            if language == "xml" and named:
+                (clone / named[1]).write_text(content)
+            if language != "sh":
+                continue
+            ran += 1
+            result = subprocess.run(["bash", "-euo", "pipefail", "-c", content], cwd=clone,
+                                    env=environment, capture_output=True, timeout=120, check=False)
+            self.assertEqual(result.returncode, 0,
+                             f"{content}\n{(result.stdout + result.stderr).decode()[-2000:]}")
+        for call in (clone / "calls").read_text().splitlines():
+            self.assertIn(call.strip(), RUN_BY_OTHERS)
+        return ran
+
+    def test_every_command_runs(self):
+        ran = 0
+        for document in DOCUMENTS:
+            with self.subTest(document.name):
+                clone = self.clone()
+                device = BusDevice(clone / "build/demo-root")
+                self.addCleanup(device.remove)
+                ran += self.run_document(document.read_text(), clone, device)
+        self.assertGreater(ran, 15)
+
+    def test_every_block_says_what_it_is(self):
+        for document in DOCUMENTS:
+            languages = {match[1] for match in FENCE.finditer(document.read_text())}
+            self.assertLessEqual(languages, {"sh", "xml", "csv", "json", "cpp", "text"}, document.name)
+
+    def test_examples_are_those_that_are_built(self):
+        sources = [path.read_text() for path in (TOP / "examples").rglob("*.cpp")]
+        for document in DOCUMENTS:
+            for language, content in FENCE.findall(document.read_text()):
+                if language == "cpp":
+                    self.assertTrue(any(content.strip() in source for source in sources), content)
+
+    def test_an_example_replaces_a_service(self):
+        device = BusDevice(self.clone() / "build/demo-root")
+        self.addCleanup(device.remove)
+        device.command = lambda *arguments: [str(BIN / "example_platform"), *arguments]
+        device.run("-f", day=None)
+        device.run("-f", day=None)
+        self.assertEqual(device.info(device.log_files()[0])["Options"]["previous_os_version"], "<unknown>")
+        self.assertEqual(device.preferences()["LastOSVersion"], "Trailhead 4.2 (R1180)")
+
+    def test_links_and_named_files_are_there(self):
+        for document in DOCUMENTS:
+            text = document.read_text()
+            for target in re.findall(r"\]\(([^)#]+)(?:#[^)]*)?\)", text):
+                self.assertTrue((document.parent / target).exists(), f"{document.name}: {target}")
+            for name in re.findall(r"`((?:tests|scripts|fuzz|src|examples|bench|docs)/[\w./-]+)`", text):
+                self.assertTrue((TOP / name).exists(), f"{document.name}: {name}")
+
+
+if __name__ == "__main__":
+    unittest.main()
