@@ -3,6 +3,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstdio>
 #include <functional>
 #include <span>
 #include <string_view>
@@ -47,6 +48,10 @@ bool fetchLists(std::span<const ListRequest> requests, bool requestFlag);
 bool fetchListsFrom(std::uint32_t connection, const NandExporter& exporter,
                     const KvObject* characteristics, std::span<const ListRequest> requests,
                     bool requestFlag);
+
+// DumpStorageStructuredLog, which names digits that are none on standard output. A program whose
+// own output goes there has them elsewhere.
+bool dumpStorageLists(bool requestFlag, std::FILE* notices);
 
 // Hand the records of a defects list to the sink: a summary, and each defect. A record that does
 // not lie inside the list is left out; then a line says so and the result is false.

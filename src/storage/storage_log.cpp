@@ -1,10 +1,11 @@
 // The daily dump: from the write amplification to the handlers of the lists.
 #include "storage/storage_log.h"
 
+#include <cstdio>
+
 #include "platform/platform.h"
 #include "storage/exporter.h"
 #include "storage/storage_lists.h"
-#include "storage/vendor_counters.h"
 #include "storage/write_amplification.h"
 
 namespace tally {
@@ -24,31 +25,30 @@ bool handleValidityList(const StorageList& list) {
   return true;
 }
 
-bool handleTelemetryList(const StorageList& list) {
-  return parseTelemetryList(list.bytes.data(), list.bytes.size(), list.characteristics)->value();
-}
-
-bool handleDefectsList(const StorageList& list) {
-  return readDefectsList(list, [](const KvDictionary& record) {
-    platform().crashReporting->FDLogStructuredData(kStorageRecordType, record);
-  });
-}
+bool handleDefectsList(const StorageList& list) { return readDefectsList(list, logStorageRecord); }
 
 }  // namespace
 
-KvRef<KvBoolean> DumpStorageStructuredLog(const KvBoolean& requestFlag) {
+bool dumpStorageLists(bool requestFlag, std::FILE* notices) {
   const WriteAmplification measured = measureWriteAmplification();
   gCurrentSysWamp = measured.intermediate;
   gCurrentUserWamp = measured.user;
   gNeedValidityList =
       gForceCollectionSet != 0 || measured.user > writeAmplificationThreshold() ? 1 : 0;
 
+  const auto handleTelemetryList = [notices](const StorageList& list) {
+    return readTelemetryList(list.bytes, list.characteristics, notices, logStorageRecord);
+  };
   const ListRequest requests[] = {
       {kValidityList, handleValidityList},      {kTelemetryList, handleTelemetryList, 0},
       {kTelemetryList, handleTelemetryList, 1}, {kTelemetryList, handleTelemetryList, 2},
       {kDefectsList, handleDefectsList},
   };
-  return KvBoolean::of(fetchLists(requests, requestFlag.value()));
+  return fetchLists(requests, requestFlag);
+}
+
+KvRef<KvBoolean> DumpStorageStructuredLog(const KvBoolean& requestFlag) {
+  return KvBoolean::of(dumpStorageLists(requestFlag.value(), stdout));
 }
 
 void CopyDictionary(const KvRef<KvString>& key, const KvRef<KvObject>& value,

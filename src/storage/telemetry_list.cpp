@@ -20,6 +20,9 @@ constexpr std::size_t kChipIdRoom = 64;    // with its terminator
 constexpr std::size_t kVendorDigits = 4;   // what follows them is the part code
 constexpr std::size_t kMostHexDigits = 8;
 
+// The record type of structured data that storage lists give.
+constexpr std::uint32_t kStorageRecordType = 176;
+
 enum Generation : std::uint8_t { kGeneration0, kGeneration1, kGeneration2, kGenerations };
 
 // The first signed words of a bus's summary, by name.
@@ -200,13 +203,14 @@ bool readTelemetryList(std::span<const std::byte> list, const KvObject* characte
   return true;
 }
 
+void logStorageRecord(const KvDictionary& record) {
+  platform().crashReporting->FDLogStructuredData(kStorageRecordType, record);
+}
+
 KvRef<KvBoolean> parseTelemetryList(const void* buffer, std::size_t length,
                                     const KvObject* characteristics) {
   const std::span list(static_cast<const std::byte*>(buffer), length);
-  return KvBoolean::of(
-      readTelemetryList(list, characteristics, stdout, [](const KvDictionary& record) {
-        platform().crashReporting->FDLogStructuredData(kStorageRecordType, record);
-      }));
+  return KvBoolean::of(readTelemetryList(list, characteristics, stdout, logStorageRecord));
 }
 
 std::uint8_t hexStringToByte(std::string_view text, std::size_t length) {

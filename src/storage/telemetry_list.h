@@ -17,7 +17,7 @@ using RecordSink = std::function<void(const KvDictionary&)>;
 bool readTelemetryList(std::span<const std::byte> list, const KvObject* characteristics,
                        std::FILE* notices, const RecordSink& sink);
 
-// The record type of structured data that storage lists give.
-constexpr std::uint32_t kStorageRecordType = 176;
+// The sink of the daily job: a structured-data record.
+void logStorageRecord(const KvDictionary& record);
 
 }  // namespace tally

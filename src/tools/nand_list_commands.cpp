@@ -159,7 +159,7 @@ struct LogPreview {
   DryRun run;
 };
 
-LogPreview previewStorageLog() {
+LogPreview previewStorageLog(std::FILE* notices) {
   LogPreview preview;
   preview.threshold = writeAmplificationThreshold();
   preview.last = lastStorageLog();
@@ -169,7 +169,7 @@ LogPreview previewStorageLog() {
   platform().preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr,
                                                  "vellum.tallyd.tallyrun");
   const std::uint8_t force = std::exchange(gForceCollectionSet, std::uint8_t{1});
-  preview.complete = DumpStorageStructuredLog(*KvBoolean::of(false))->value();
+  preview.complete = dumpStorageLists(false, notices);
   gForceCollectionSet = force;
   preview.wanted = force != 0 || gCurrentUserWamp > preview.threshold;
   return preview;
@@ -180,7 +180,7 @@ std::string timeText(std::optional<double> seconds) {
 }
 
 int runStorageLog(const ToolContext& context) {
-  const LogPreview preview = previewStorageLog();
+  const LogPreview preview = previewStorageLog(context.err);
   const auto& logs = preview.run.logs;
   const bool made = !logs.empty();
   if (context.json) {

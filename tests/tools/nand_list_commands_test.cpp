@@ -45,8 +45,10 @@ class NandListCommandsTest : public testing::Test {
     context.out = open_memstream(&text, &size);
     context.err = std::tmpfile();
     testing::internal::CaptureStderr();
+    testing::internal::CaptureStdout();
     const int status =
         runTool(context, arguments, [&](const std::string&) { return storage.services(); });
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "") << "the library's notices spoil JSON";
     testing::internal::GetCapturedStderr();
     std::fclose(context.out);
     std::fclose(context.err);
