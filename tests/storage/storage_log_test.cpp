@@ -480,5 +480,20 @@ TEST_F(StorageLogTest, OnceInSevenDays) {
   EXPECT_TRUE(platform.preferences->SMAPreferencesGetValue("SSLastLoggedAt", kProgramDomain));
 }
 
+TEST_F(StorageLogTest, WhatIsThrownEndsTheLogAlone) {
+  struct OutOfMemory final : LogSubmission {
+    bool SMAWriteLogForSubmission(std::string_view, std::string_view, const KvDictionary*,
+                                  const KvObject*, const Writer&) override {
+      throw std::bad_alloc();
+    }
+  };
+  Platform services = tally::platform();
+  services.logSubmission = std::make_shared<OutOfMemory>();
+  const PlatformScope scope(std::move(services));
+  NLW_WriteLog("165", KvDictionary::create().get());
+  EXPECT_TRUE(platform.log->has(LogLevel::Default, "An exception occurred: std::bad_alloc"));
+  EXPECT_FALSE(platform.preferences->SMAPreferencesGetValue("SSLastLoggedAt", kProgramDomain));
+}
+
 }  // namespace
 }  // namespace tally
