@@ -51,9 +51,9 @@ std::vector<ShownEvent> previewEvents() {
 
 std::string valueText(const KvObject* value) {
   const auto* number = kvCast<KvNumber>(value);
-  return number != nullptr && !number->isUnsigned() && !number->isReal()
-             ? integerText(number->asInt64())
-             : kvText(value);
+  if (number == nullptr || number->isReal()) return kvText(value);
+  const bool fits = !number->isUnsigned() || number->asInt64() >= 0;
+  return fits ? integerText(number->asInt64()) : kvText(value);
 }
 
 void printEvent(const ToolContext& context, const ShownEvent& event) {
