@@ -30,11 +30,13 @@ std::vector<StateReading> readStates(KvDictionary& channel) {
   std::vector<StateReading> states;
   const std::int32_t count = HwReportStateGetCount(&channel);
   const std::int32_t current = HwReportStateGetCurrent(&channel);
+  // All states have names or none has, and every attempt to make them goes through all states.
+  const bool named = HwReportStateGetNameForIndex(&channel, 0) != nullptr;
   double total = 0;
   for (std::int32_t i = 0; i < count; ++i) {
     StateReading state;
     state.id = HwReportStateGetIDForIndex(&channel, i);
-    const KvString* const name = HwReportStateGetNameForIndex(&channel, i);
+    const KvString* const name = named ? HwReportStateGetNameForIndex(&channel, i) : nullptr;
     state.name = name != nullptr ? std::string(name->view()) : fmt::format("{:#x}", state.id);
     state.entries = present(HwReportStateGetInTransitions(&channel, i));
     state.residency = present(HwReportStateGetResidency(&channel, i));
@@ -53,10 +55,12 @@ std::vector<StateReading> readStates(KvDictionary& channel) {
 std::vector<BucketReading> readBuckets(KvDictionary& channel) {
   std::vector<BucketReading> buckets;
   const std::int32_t count = HwReportHistogramGetBucketCount(&channel);
+  bool bounded = true;  // the bounds of a bucket without them are not worked out again for the next
   for (std::int32_t i = 0; i < count; ++i) {
     BucketReading bucket;
     std::int64_t lower = 0, upper = 0;
-    if (HwReportHistogramGetBucketBounds(&channel, i, &lower, &upper) == 0) {
+    bounded = bounded && HwReportHistogramGetBucketBounds(&channel, i, &lower, &upper) == 0;
+    if (bounded) {
       bucket.lower = lower;
       bucket.upper = upper;
     }

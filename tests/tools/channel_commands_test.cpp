@@ -43,11 +43,13 @@ std::string driver(const std::string& name, const std::string& legend, const std
 std::string channel(std::uint64_t id, std::uint64_t type, const std::string& name) {
   return array(integer(id) + integer(type) + text(name));
 }
-std::string group(const std::string& names, std::uint64_t unit, const std::string& channels) {
-  const std::string config = "<data>CgAAAAAAAAAAAAAAAwAAAA==</data>";  // 3 buckets of 10
+constexpr const char* kThreeBuckets = "CgAAAAAAAAAAAAAAAwAAAA==";  // 10 wide
+std::string group(const std::string& names, std::uint64_t unit, const std::string& channels,
+                  const std::string& config = kThreeBuckets) {
   return dict(names +
-              key("HwReportChannelInfo", dict(key("HwReportChannelUnit", integer(unit)) +
-                                              key("HwReportChannelConfig", config))) +
+              key("HwReportChannelInfo",
+                  dict(key("HwReportChannelUnit", integer(unit)) +
+                       key("HwReportChannelConfig", "<data>" + config + "</data>"))) +
               key("HwReportChannels", array(channels)));
 }
 std::string frames(std::uint64_t id, const std::string& values) {
@@ -226,6 +228,40 @@ TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
             "    [2]  3  ms  ██████████████▍\n"
             "    [3]  4  ms  ███████████████████▎\n"
             "    [4]  5  ms  ████████████████████████\n");
+}
+
+TEST_F(ChannelCommands, WrongDriversAreShownAsFarAsTheyCanBeRead) {
+  constexpr std::size_t kMost = 65'535;
+  const auto many = [](const std::string& element, const std::string& last) {
+    std::string elements;
+    for (std::size_t i = 1; i < kMost; ++i) elements += element;
+    return elements + last;
+  };
+  const std::string unnamed =
+      dict(key("ID", integer(1)) + key("InTransitions", integer(1)) + key("Residency", integer(1)));
+  const struct {
+    const char* what;
+    std::uint64_t type;
+    std::string elements;
+    const char* shown;  // where in the channel
+    json value;
+  } cases[] = {
+      // Time that grew with the square of the elements would show.
+      {"the last of all states has no name", word(2, 0, kMost), many(state("A", 1, 1, 1), unnamed),
+       "/states/65534/name", "0x1"},
+      {"the bounds of all buckets rise, and then fall", word(3, 0, kMost),
+       many(bucket(1, 1), bucket(7, 7)), "/buckets/65534/hits", 7},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.what);
+    // All buckets with rising bounds, and one bound more.
+    const char* const config = "AQAAAAAAAAAAAAAA//8AAAAAAAAAAAAAAAAAAAEAAAA=";
+    describe(hub() + driver("wrong", array(group("", kEvents, channel(1, c.type, "x"), config)),
+                            frames(1, array(c.elements))));
+    const Outcome outcome = run({"sample", "--json"});
+    EXPECT_EQ(outcome.status, kSuccess) << outcome.err;
+    EXPECT_EQ(byName(outcome)["x"].at(json::json_pointer(c.shown)), c.value);
+  }
 }
 
 TEST_F(ChannelCommands, AWaitShowsOnATerminalOnly) {
