@@ -41,13 +41,13 @@ std::vector<StateReading> readStates(KvDictionary& channel) {
     state.entries = present(HwReportStateGetInTransitions(&channel, i));
     state.residency = present(HwReportStateGetResidency(&channel, i));
     state.isCurrent = i == current;
-    total += static_cast<double>(state.residency.value_or(0));
+    total += state.residency ? static_cast<double>(*state.residency) : std::nan("");
     states.push_back(std::move(state));
   }
   // The duty cycle of every single state would add all of them up each time.
   for (StateReading& state : states) {
     const auto part = static_cast<double>(state.residency.value_or(0));
-    state.share = state.residency && total > 0 ? part / total : std::nan("");
+    state.share = total > 0 ? part / total : std::nan("");
   }
   return states;
 }

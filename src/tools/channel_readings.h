@@ -16,7 +16,7 @@ struct StateReading {
   std::uint64_t id = 0;
   std::optional<std::uint64_t> entries;    // how often it was entered
   std::optional<std::uint64_t> residency;  // in the channel's unit
-  double share = 0;                        // of all residencies; NaN when they are all 0
+  double share = 0;  // of all residencies; NaN when one is missing or all are 0
   bool isCurrent = false;
 };
 struct BucketReading {

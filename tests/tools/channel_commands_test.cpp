@@ -246,6 +246,8 @@ TEST_F(ChannelCommands, WrongDriversAreShownAsFarAsTheyCanBeRead) {
     const char* shown;  // where in the channel
     json value;
   } cases[] = {
+      {"a missing residency leaves no shares", word(2, 0, 2),
+       state("IDLE", 3, 1000, 5) + dict(key("ID", text("BUSY"))), "/states/0/share", nullptr},
       // Time that grew with the square of the elements would show.
       {"the last of all states has no name", word(2, 0, kMost), many(state("A", 1, 1, 1), unnamed),
        "/states/65534/name", "0x1"},
