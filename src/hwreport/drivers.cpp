@@ -4,6 +4,7 @@
 
 #include "hwreport/error_maker.h"
 #include "hwreport/keys.h"
+#include "hwreport/type_word.h"
 #include "platform/platform.h"
 
 namespace tally {
@@ -24,6 +25,14 @@ class Handle {
   const RegistryHandle handle_;
 };
 
+// What a channel takes of its legend: the array itself, unless a sample will write the type into
+// it, which other readers of the registry's legend must not meet.
+KvRef<KvArray> shareableLegend(KvArray& legendChannel) {
+  const TypeWord type{bitsOf(legendChannel.get(kLegendTypeWord))};
+  return type.format() != kHwReportFormatUnknown ? KvRef<KvArray>::share(&legendChannel)
+                                                 : legendChannel.copy();
+}
+
 // Adds the channels of one legend group. False: a channel could not be made.
 bool readGroup(const KvArray& channels, const ChannelGroup& group, HwRegistryEntry driver,
                std::int32_t options, ChannelOwner& owner, KvDictionary& collection) {
@@ -32,7 +41,7 @@ bool readGroup(const KvArray& channels, const ChannelGroup& group, HwRegistryEnt
     if (legendChannel == nullptr) return true;
     if (!isLegendChannel(*legendChannel)) return false;
     if (!owner.driverID && readOwner(driver, &owner, nullptr) != 0) return false;
-    const auto channel = makeChannel(owner, group, KvRef<KvArray>::share(legendChannel), nullptr);
+    const auto channel = makeChannel(owner, group, shareableLegend(*legendChannel), nullptr);
     if (!channel || addChannel(&collection, channel.get(), options, nullptr) != 0) return false;
   }
   return true;

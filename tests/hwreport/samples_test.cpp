@@ -142,6 +142,23 @@ TEST_F(Samples, TheHubGetsTheInterestsAndTheSampleItsElements) {
   EXPECT_EQ(errorText(error), "E00002C2 " + std::string(kNoReason));
 }
 
+TEST_F(Samples, WhatASampleLearnsStaysOutOfTheLegend) {
+  // Others may be reading the driver's legend, which is one object for all.
+  const auto line = KvArray::create({number(0x41), number(0)});
+  const auto group = KvDictionary::create({{"HwReportChannels", KvArray::create({line})}});
+  addDriver("D", 0x10, KvArray::create({group}));
+  const auto channels = HwReportCopyAllChannels(0);
+  const auto raw = KvData::create(run(0x41, typeWord(1, 1), {{{9}}}));
+  const auto samples = HwReportCreateSamplesRaw(channels.get(), raw.get());
+  EXPECT_EQ(HwReportSimpleGetIntegerValue(
+                samples->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(0)),
+            9);
+  EXPECT_EQ(HwReportChannelGetFormat(
+                channels->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(0)),
+            1);
+  EXPECT_EQ(line->getAs<KvNumber>(1)->asInt64(), 0);
+}
+
 TEST(SamplesRaw, BuffersOfEveryShape) {
   const auto wanted = flat({channel(1, typeWord(1, 1), "a"), channel(2, typeWord(1, 1), "b")});
   const auto one = run(1, typeWord(1, 1), {{{10}}}), two = run(2, typeWord(1, 1), {{{20}}});
