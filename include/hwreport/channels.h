@@ -25,7 +25,8 @@ constexpr int HwIterContinue = 0;
 constexpr int HwIterDrop = 16;
 constexpr int HwIterFailed = 0x111;  // also the result of a walk over a malformed collection
 
-// Gets a borrowed channel. It may change the channel but not the collection it is walked in.
+// Gets a borrowed channel. It may change the channel but not the collection it is walked in. A walk
+// without a callback fails.
 using HwReportCallback = std::function<int(KvDictionary* channel)>;
 
 // A handle of the device registry's entry of a driver; the caller keeps it.

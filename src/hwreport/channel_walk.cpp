@@ -239,11 +239,11 @@ int deltaChannels(KvDictionary* later, KvDictionary* earlier, KvArena& arena,
 }
 
 int HwReportPrune(KvDictionary* collection, const HwReportCallback& callback) {
-  return pruneChannels(collection, callback);
+  return callback ? pruneChannels(collection, callback) : HwIterFailed;
 }
 
 int HwReportIterate(KvDictionary* collection, const HwReportCallback& callback) {
-  return iterateChannels(collection, callback);
+  return callback ? iterateChannels(collection, callback) : HwIterFailed;
 }
 
 std::int32_t HwReportGetChannelCount(KvDictionary* collection) {

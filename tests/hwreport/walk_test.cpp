@@ -171,6 +171,8 @@ TEST(Walk, MalformedCollectionsFailInEveryMode) {
     }
   }
   cyclic->set("HwReportDrivers", nullptr);  // so that it is freed
+  EXPECT_EQ(HwReportIterate(nested().get(), nullptr), HwIterFailed);
+  EXPECT_EQ(HwReportPrune(nested().get(), nullptr), HwIterFailed);
 }
 
 TEST(Walk, DroppingManyDriversKeepsTheOthersReachable) {
