@@ -275,7 +275,8 @@ void addFilters(CLI::App* command, ChannelArguments& wanted) {
   command->add_option("--group", wanted.group, "Only this group")->type_name("NAME");
   command->add_option("--subgroup", wanted.subgroup, "Only this subgroup")->type_name("NAME");
   command->add_option("--category", wanted.categories, "Only these category bits (0x100)")
-      ->type_name("BITS");
+      ->type_name("BITS")
+      ->check(CLI::Range(0x1, 0xFFFF));
   command->add_option("--format", wanted.format, "Only this format")
       ->check(CLI::IsMember({"simple", "state", "histogram", "array"}));
   command->add_option("--unit", wanted.unit, "Only this unit: its label, or its word (0x...)")

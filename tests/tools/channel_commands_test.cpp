@@ -166,6 +166,7 @@ TEST_F(ChannelCommands, FiltersChooseAndCombine) {
     EXPECT_EQ(outcome.status, *c.names != '\0' ? kSuccess : kWrong);
     EXPECT_EQ(outcome.err.empty(), *c.names != '\0');
   }
+  EXPECT_EQ(run({"list", "--category", "0"}).status, kBadUsage) << "not all of them";
 }
 
 // What is read from the sample of a device, by the names of channels.
