@@ -86,9 +86,9 @@ std::optional<ChannelFrames> parseChannelFrames(const KvDictionary& description)
     if (!add(*value)) return std::nullopt;
   }
   if (channel.frames.empty()) return std::nullopt;
-  std::size_t longest = 0;
-  for (const auto& frame : channel.frames) longest = std::max(longest, frame.size());
-  for (auto& frame : channel.frames) frame.resize(longest);
+  for (const auto& frame : channel.frames) {
+    channel.elementCount = std::max(channel.elementCount, frame.size());
+  }
   return channel;
 }
 

@@ -18,6 +18,7 @@ constexpr std::uint32_t kMostInterests = 0x555554D;
 // Whoever asks for the same large channel again and again gets no more memory than this.
 constexpr std::size_t kMostRegionElements = (256u << 20) / kElementSize;
 
+constexpr ElementValues kMissingElement;
 constexpr std::uint64_t kElementCountMask = std::uint64_t{0xFFFF} << 32;
 
 template <class T>
@@ -33,14 +34,16 @@ struct Channel {
 class ChannelRegion final : public HubRegion {
  public:
   explicit ChannelRegion(std::vector<Channel> channels) : channels_(std::move(channels)) {
-    for (const Channel& channel : channels_) elements_ += channel.described->elementCount();
+    for (const Channel& channel : channels_) elements_ += channel.described->elementCount;
   }
   std::size_t size() const override { return elements_ * kElementSize; }
 
   void writeFrame(std::size_t refresh, std::span<std::byte> memory) override {
     for (const Channel& channel : channels_) {
       const auto& frames = channel.described->frames;
-      for (const ElementValues& element : frames[std::min(refresh, frames.size() - 1)]) {
+      const auto& frame = frames[std::min(refresh, frames.size() - 1)];
+      for (std::size_t i = 0; i < channel.described->elementCount; ++i) {
+        const ElementValues& element = i < frame.size() ? frame[i] : kMissingElement;
         writeElement(channel, element, memory.first(kElementSize));
         memory = memory.subspan(kElementSize);
       }
@@ -52,7 +55,7 @@ class ChannelRegion final : public HubRegion {
                            std::span<std::byte> memory) {
     const std::uint64_t type =
         channel.interest.type != 0 ? channel.interest.type : channel.described->type;
-    const std::uint64_t count = channel.described->elementCount();
+    const std::uint64_t count = channel.described->elementCount;
     put(memory, ElementLayout::driver, channel.interest.driver);
     put(memory, ElementLayout::channel, channel.interest.channel);
     put(memory, ElementLayout::type, (type & ~kElementCountMask) | count << 32);
@@ -105,8 +108,7 @@ std::unordered_map<std::uint64_t, std::uint64_t> legendTypes(const RegistryEntry
 // Stands for no channel: a region cannot be empty, and a run of no elements in it would fail the
 // samples of those who only wanted a channel that is not served.
 Channel nobodysChannel() {
-  ChannelFrames frames;
-  frames.frames = {{ElementValues{}}};
+  ChannelFrames frames{0, {{kMissingElement}}, 1};
   return {{kMissingValue, kMissingValue, 0}, std::make_shared<ChannelFrames>(std::move(frames))};
 }
 
@@ -164,7 +166,7 @@ std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& intere
     if (isNew) known->second = describedChannels(*entry->second, files);
     const auto frames = known->second.find(interest.channel);
     if (frames == known->second.end()) continue;
-    elements += frames->second->elementCount();
+    elements += frames->second->elementCount;
     if (elements > kMostRegionElements) return nullptr;
     channels.push_back({interest, frames->second});
   }
