@@ -6,8 +6,10 @@
 namespace tally {
 
 void KeyTable::reserve(std::size_t further) {
-  entries_.reserve(entries_.size() + further);
-  positions_.reserve(entries_.size() + further);
+  // A file of many small groups asks often: at least doubled, or each time would copy all entries.
+  const std::size_t wanted = entries_.size() + further;
+  if (wanted > entries_.capacity()) entries_.reserve(std::max(wanted, entries_.capacity() * 2));
+  positions_.reserve(wanted);
 }
 
 void KeyTable::set(WhitelistEntry entry) {

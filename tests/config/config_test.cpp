@@ -113,6 +113,18 @@ TEST_F(ConfigTest, ALongChainOfPrefixesIsFoundLikeAScanWould) {
   }
 }
 
+TEST(KeyTable, ManySmallSectionsDoNotCopyTheTableEachTime) {
+  KeyTable table;
+  int moves = 0;
+  for (int i = 0; i < 2000; ++i) {
+    const WhitelistEntry* const former = table.entries().data();
+    table.reserve(1);
+    table.set({KvString::create(std::to_string(i)), KvDictionary::create(), KvString::create("G")});
+    moves += table.entries().data() != former ? 1 : 0;
+  }
+  EXPECT_LT(moves, 20);
+}
+
 TEST_F(ConfigTest, TheLastGroupOfTheFileWins) {
   const auto config = load(group("Z", section("ScalarKeys", entry("k", 1))) +
                            group("A", section("ScalarKeys", entry("k", 2))));
