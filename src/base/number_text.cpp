@@ -2,14 +2,15 @@
 
 #include <charconv>
 #include <cmath>
+#include <type_traits>
 
 namespace tally {
 namespace {
 
-template <class T>
-void append(std::string& out, T value) {
+template <class T, class... Format>
+void append(std::string& out, T value, Format... format) {
   char text[32];
-  const auto end = std::to_chars(text, text + sizeof text, value).ptr;
+  const auto end = std::to_chars(text, text + sizeof text, value, format...).ptr;
   out.append(text, end);
 }
 
@@ -17,9 +18,15 @@ template <class T>
 void appendReal(std::string& out, T value) {
   if (std::isnan(value)) {
     out += "nan";  // without the sign that some processors give it
-  } else {
-    append(out, value);
+    return;
   }
+  // Plain digits as far as the type's precision reaches, so that 100000 is no "1e+05" beside a
+  // 250000.
+  constexpr T kPlainFrom = T(1e-4);
+  constexpr T kPlainBelow = std::is_same_v<T, float> ? T(1e7) : T(1e16);
+  const T size = std::fabs(value);
+  const bool plain = size == 0 || (size >= kPlainFrom && size < kPlainBelow);
+  append(out, value, plain ? std::chars_format::fixed : std::chars_format::scientific);
 }
 
 template <class T>

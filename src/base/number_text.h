@@ -10,9 +10,11 @@ namespace tally {
 
 void appendInt64(std::string& out, std::int64_t value);
 void appendUInt64(std::string& out, std::uint64_t value);
-// Shortest text that reads back equal: "2.5", "10", "1e+22", "inf", "-inf", "nan".
+// Shortest digits that read back equal: "2.5", "10", "inf", "-inf", "nan"; with an exponent only
+// below 1e-4 and from 1e16 on: "100000", "1e+22".
 void appendDouble(std::string& out, double value);
-// The same for a single, whose shortest text is not that of the double of equal value.
+// The same for a single, whose shortest digits are not those of the double of equal value; with an
+// exponent from 1e7 on.
 void appendFloat(std::string& out, float value);
 
 // The whole text as a number, or nothing: no blanks, no sign but a leading '-', no overflow.

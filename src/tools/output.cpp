@@ -70,7 +70,7 @@ std::string bar(const Terminal& terminal, double share, std::size_t width) {
 std::string integerText(std::int64_t value) { return grouped(std::to_string(value)); }
 
 std::string realText(double value) {
-  constexpr double kWhole = 999.95, kLargest = 1e15;  // from here four digits leave no fraction
+  constexpr double kWhole = 999.95, kLargest = 1e16;  // from here four digits leave no fraction
   if (!std::isfinite(value) || std::fabs(value) >= kLargest) {
     std::string text;
     appendDouble(text, value);

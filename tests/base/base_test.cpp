@@ -78,6 +78,11 @@ TEST(NumberText, RealsReadBackEqual) {
                {10, "10"},
                {2.5, "2.5"},
                {0.1, "0.1"},
+               {100000, "100000"},
+               {0.0001, "0.0001"},
+               {1e-5, "1e-05"},
+               {9e15, "9000000000000000"},
+               {1e16, "1e+16"},
                {1e22, "1e+22"},
                {5e-324, "5e-324"},
                {1.0 / 3, "0.3333333333333333"},
@@ -91,7 +96,9 @@ TEST(NumberText, RealsReadBackEqual) {
   }
   std::string single;
   appendFloat(single, 0.1f);
-  EXPECT_EQ(single, "0.1");
+  appendFloat(single, -100000.0f);
+  appendFloat(single, 1e7f);
+  EXPECT_EQ(single, "0.1-1000001e+07");
 }
 
 TEST(NumberText, OnlyWholeNumbersOfTheRangeAreRead) {

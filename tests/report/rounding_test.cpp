@@ -122,10 +122,10 @@ TEST(Histogram, TheSearchAnswersLikeAScan) {
 
 TEST(Histogram, LabelsShowTheNumbersOfTheWhitelist) {
   const auto array = KvArray::create({KvNumber::int64(10), KvNumber::float64(2.5),
-                                      KvNumber::float64(30), KvNumber::uint64(UINT64_MAX)});
+                                      KvNumber::float64(300000), KvNumber::uint64(UINT64_MAX)});
   const HistogramIntervals intervals(*array);
-  const char* labels[] = {"(-inf, 10]", "(10, 2.5]", "(2.5, 30]", "(30, 18446744073709551615]",
-                          "(18446744073709551615, inf)"};
+  const char* labels[] = {"(-inf, 10]", "(10, 2.5]", "(2.5, 300000]",
+                          "(300000, 18446744073709551615]", "(18446744073709551615, inf)"};
   ASSERT_EQ(intervals.bucketCount(), std::size(labels));
   for (std::size_t i = 0; i < std::size(labels); ++i) EXPECT_EQ(intervals.label(i), labels[i]);
   const auto none = KvArray::create();
