@@ -1,6 +1,8 @@
 // The history pass: scalars and distributions of the day.
 #include "report/report.h"
 
+#include <limits>
+
 #include "platform/platform.h"
 #include "report/distribution_summary.h"
 
@@ -19,14 +21,16 @@ void TBReport::writeLogForYesterdayWithAppInfo(std::int32_t day, const KvArray* 
 
 void TBReport::readHistory(std::int32_t day) {
   const auto history = platform().metricsStore->openHistory();
-  history->enumerateScalars("", day - 1, day,
+  // A message may ask for any day, even for the first there is.
+  const std::int32_t before = day == std::numeric_limits<std::int32_t>::min() ? day : day - 1;
+  history->enumerateScalars("", before, day,
                             [this](std::string_view key, std::int32_t, std::int64_t value, bool&) {
                               if (const auto* options = scalarOptions(key)) {
                                 addScalarForKeyWithOptions(value, key, *options);
                               }
                             });
   history->enumerateDistributions(
-      "", day - 1, day,
+      "", before, day,
       [this](std::string_view key, std::int32_t, DistributionValues& values, bool&) {
         const auto* options = _config ? _config->configOptionsForDistributionKey(key) : nullptr;
         if (options != nullptr) computeAndAddDistributionForKeyWithOptions(values, key, *options);

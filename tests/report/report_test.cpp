@@ -4,6 +4,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <limits>
+
 #include "fakes/fake_platform.h"
 #include "kv/plist_codec.h"
 
@@ -138,6 +140,8 @@ TEST_F(ReportTest, NothingWhitelistedMeansNoLogAndNoTrace) {
   writeLog();
   EXPECT_THAT(*fake.calls, IsEmpty());
   EXPECT_EQ(fake.appRegistry->enumerations, 0);
+  TBReport().writeLogForYesterdayWithAppInfo(std::numeric_limits<std::int32_t>::min(), nullptr);
+  EXPECT_THAT(*fake.calls, IsEmpty());
   fake.files->contents.clear();
   writeLog();
   EXPECT_THAT(*fake.calls, IsEmpty());
