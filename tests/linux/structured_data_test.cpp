@@ -59,8 +59,9 @@ TEST_F(StructuredDataTest, RecordsAreGatheredByTypeAndWrittenOutOnce) {
   EXPECT_EQ(finished(176), std::vector<std::int64_t>{9});
   bounds.maximumLogs = 1;
   ASSERT_TRUE(append(176, 10));
-  EXPECT_TRUE(finish().empty());
-  EXPECT_EQ(names("data"), Names{"0000000004-176.plist"});
+  ASSERT_TRUE(append(172, 11));
+  EXPECT_EQ(finish(), Names{}) << "the first log took the second one's place";
+  EXPECT_EQ(names("data"), Names{"0000000005-172.plist"});
 }
 
 TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {

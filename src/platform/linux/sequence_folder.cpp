@@ -56,7 +56,7 @@ Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::u
   for (const SequencedLog& log : *logs) bytes += log.bytes;
   for (const SequencedLog& log : *logs) {
     if (count <= bounds.maximumLogs && bytes <= bounds.maximumBytes) break;
-    if (log.sequence == kept) continue;
+    if (log.sequence >= kept) break;  // a newer one makes its own room when it is done
     for (auto name = log.names.rbegin(); name != log.names.rend(); ++name) {
       if (auto removed = removeFile(folder + "/" + *name); !removed) return removed;
     }

@@ -36,8 +36,8 @@ Result<std::vector<SequencedLog>> listSequenced(const std::string& folder);
 // The number for the next log.
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
 
-// Removes the oldest logs until the folder is within its bounds, but never the log `kept`. A log's
-// files go last name first.
+// Removes the oldest logs until the folder is within its bounds, but neither the log `kept` nor a
+// newer one. A log's files go last name first.
 Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::uint64_t kept);
 
 // An error when writing this many more bytes would use what is reserved of the volume.
