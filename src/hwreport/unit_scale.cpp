@@ -32,7 +32,7 @@ std::uint64_t shifted(std::uint64_t value, int bits) {
 template <class Apply>
 void applyExponent(std::uint8_t byte, Ratio* ratio, Apply apply) {
   if (byte == 0) return;
-  const int exponent = static_cast<std::int8_t>(byte - kExponentBias);
+  const int exponent{static_cast<std::int8_t>(byte - kExponentBias)};
   std::uint64_t& side = exponent >= 0 ? ratio->multiplier : ratio->divisor;
   side = apply(side, exponent >= 0 ? exponent : -exponent);
 }
