@@ -70,6 +70,7 @@ class Package(unittest.TestCase):
         self.assertTrue((root / wanted[5]).resolve().is_file())
         self.use(root)
         # The machine's own root is the device, as it is when it is installed for real.
+        (root / "var/mobile/Library").mkdir()
         (root / "var/mobile/Library/log").write_text("data")
         self.dpkg(root, "-P", "tallyrun")
         left = self.files(root) - before
@@ -104,6 +105,17 @@ class Package(unittest.TestCase):
         self.dpkg(root, "-i", str(self.package))
         self.dpkg(root, "-P", "tallyrun")
         self.assertEqual(self.files(root) - before - {"usr", "var"}, set())
+
+    @unittest.skipUnless(shutil.which("systemd-tmpfiles"), "systemd-tmpfiles is missing")
+    def test_a_home_stays_as_its_user_has_it(self):
+        root = self.clean_root()
+        home = root / "var/mobile"
+        home.mkdir()
+        home.chmod(0o700)
+        self.dpkg(root, "-i", str(self.package))
+        run("systemd-tmpfiles", f"--root={root}", "--create", "tallyrun.conf")
+        # Whatever root made there would be root's, and the user could not read what comes into it.
+        self.assertEqual((home.stat().st_mode & 0o777, list(home.iterdir())), (0o700, []))
 
     @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd-analyze is missing")
     def test_units_are_sound(self):
