@@ -55,6 +55,7 @@ KvRef<KvObject> uuidOf(std::string_view text) {
 
 KvRef<KvObject> valueOf(const nlohmann::json& json) {
   if (json.is_string()) return KvString::create(json.get_ref<const std::string&>());
+  if (json.is_number_unsigned()) return KvNumber::uint64(json.get<std::uint64_t>());
   if (json.is_number_integer()) return KvNumber::int64(json.get<std::int64_t>());
   return nullptr;
 }
@@ -85,6 +86,9 @@ Result<KvRef<KvDictionary>> makeElement(const KvObject* value) {
   for (const char* key : {"adam_id", "arch"}) {
     const auto* const number = fields->getAs<KvNumber>(key);
     if (number == nullptr || number->isReal()) return Error{fmt::format("no integer \"{}\"", key)};
+    if (number->isUnsigned() && number->asInt64() < 0) {
+      return Error{fmt::format("\"{}\" does not fit in a signed 64-bit integer", key)};
+    }
     element->set(key, KvNumber::int64(number->asInt64()));
   }
   auto* const data = fields->getAs<KvData>("uuid");
