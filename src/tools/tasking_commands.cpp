@@ -139,6 +139,10 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
     return complain(context, fmt::format("{}: {}", arguments.file, schedule.error().message),
                     kWrong);
   }
+  const auto* const fields = kvCast<KvDictionary>(schedule->get());
+  if (fields != nullptr && !fields->contains("TaskingID")) {
+    return complain(context, fmt::format("{}: no \"TaskingID\"", arguments.file), kWrong);
+  }
   // The platform of the tool only reads preferences; this command is one of the few that write.
   Platform variant = platform();
   if (!arguments.dryRun) {

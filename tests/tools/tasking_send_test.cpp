@@ -78,7 +78,8 @@ TEST_F(TaskingCommandsTest, BadTaskingsAreNamed) {
   EXPECT_EQ(fault.status, kWrong);
   EXPECT_THAT(fault.out, HasSubstr("its \"User\" would leave its folder: ../../etc"));
   put("text", "no property list");
-  for (const char* name : {"text", "absent"}) {
+  putPlist("unnamed", "<dict><key>TaskingPayload</key><array/></dict>");
+  for (const char* name : {"text", "absent", "unnamed"}) {
     const auto outcome = run({"tasking", "apply", at(name), "--dry-run"});
     EXPECT_EQ(outcome.status, kWrong);
     EXPECT_THAT(outcome.err, HasSubstr(at(name)));
