@@ -56,8 +56,9 @@ std::string folderOf(const std::string& path) {
   return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-// For what was just made at the path. By its descriptor, since the folder's owner may have put
-// something else in its place by now.
+}  // namespace
+
+// By the descriptor, since the folder's owner may have put something else at the path by now.
 void giveToOwnerOfFolder(int descriptor, const std::string& path) {
   struct stat folder {
   }, made{};
@@ -68,8 +69,6 @@ void giveToOwnerOfFolder(int descriptor, const std::string& path) {
   // A volume without owners is no reason to write nothing.
   if (::fchown(descriptor, folder.st_uid, folder.st_gid) != 0) return;
 }
-
-}  // namespace
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
   constexpr std::size_t kPiece = 128u << 10;

@@ -18,6 +18,9 @@ Result<std::string> readFile(const std::string& path, std::size_t limit);
 // What root makes in the folder of another user belongs to that user, who could not read it else:
 // files, folders and locks alike.
 
+// Does so for a file that was made at the path without these helpers.
+void giveToOwnerOfFolder(int descriptor, const std::string& path);
+
 // Replaces path by contents so that, whenever the process or the machine dies, the file is either
 // the old one or the new one: temporary name in the same folder, write, fsync, rename, fsync of
 // the folder. Missing folders are made. Nothing is left behind on failure.

@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <sys/file.h>
+#include <sys/stat.h>
 
 #include <chrono>
 #include <cstring>
@@ -294,6 +295,27 @@ TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
     right = right && loop.runMainLoopSlice(30, true) == SliceResult::Stopped;
     return right && loop.runMainLoopSlice(30, true) == SliceResult::TimedOut;
   });
+}
+
+TEST_F(ServicesTest, WhatRootRecordsForAUserIsTheUsers) {
+  if (::geteuid() != 0) GTEST_SKIP() << "only root makes files for others";
+  constexpr uid_t kUser = 12345;
+  const std::string home = at("var/mobile");
+  ASSERT_TRUE(makeFolders(home));
+  ASSERT_EQ(::chown(home.c_str(), kUser, kUser), 0);
+  const Platform services = makeLinuxPlatform(root);
+  services.metricsStore->TBClientSetValueForScalarKey("a", 1);
+  services.crashReporting->FDLogStructuredData(172, *KvDictionary::create());
+  services.preferences->SMAPreferencesSetValue("a", KvNumber::int32(1), "b");
+  services.preferences->SMAPreferencesSynchronize("b");
+  int files = 0;  // those that the store has while it is open among them
+  for (const auto& one : std::filesystem::recursive_directory_iterator(home)) {
+    struct stat status {};
+    ASSERT_EQ(::stat(one.path().c_str(), &status), 0);
+    EXPECT_EQ(status.st_uid, kUser) << one.path();
+    files += one.is_regular_file() ? 1 : 0;
+  }
+  EXPECT_GE(files, 5);
 }
 
 TEST_F(ServicesTest, MakingThePlatformTouchesNothing) {

@@ -88,6 +88,7 @@ Status appendAt(const std::string& path, std::size_t end, std::string_view bytes
   };
   const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
   if (file < 0) return failure();
+  giveToOwnerOfFolder(file, path);
   Status status = Done{};
   const auto start = static_cast<off_t>(end);
   if (::ftruncate(file, start) != 0 ||

@@ -4,6 +4,8 @@
 #include <sqlite3.h>
 #include <unistd.h>
 
+#include "base/file.h"
+
 namespace tally {
 namespace {
 
@@ -25,11 +27,14 @@ std::string immutableUri(std::string_view path) {
   return uri + "?immutable=1";
 }
 
-// SQLite would give a new file the modes of the umask. Only a file that is not there yet is opened
-// here: closing any other would drop the locks that this process holds on it.
+// SQLite would make a new file with the modes of the umask and for whoever runs; what it lays
+// beside a file gets the modes and the owner of that file. Only a file that is not there yet is
+// opened here: closing any other would drop the locks that this process holds on it.
 void makePrivateFile(const std::string& path) {
   const int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-  if (file >= 0) ::close(file);
+  if (file < 0) return;
+  giveToOwnerOfFolder(file, path);
+  ::close(file);
 }
 
 }  // namespace
