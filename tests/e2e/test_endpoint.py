@@ -121,7 +121,8 @@ def hostile_messages(test, device):
         (1, ["operation", "x", "2"], 0, 'no array "app_data"'),
         (2, ["operation", "x", "2", "app_data", "s", "x"], 0, 'no array "app_data"'),
         (2, ["operation", "x", "2", "app_data", *two], 0, "1 of 2 elements skipped; element 1: "),
-        (2, ["operation", "x", "2", "app_data", "av", "2", "s", "x", "(xx)", "1", "2"], 0, "1 of 1 elements"),
+        (2, ["operation", "x", "2", "app_data", "av", "2", "s", "x", "(xx)", "1", "2"], 0, "2 of 2 elements"),
+        (2, ["operation", "x", "2", "app_data", "a(ss)", "1", "a", "b"], 0, "1 of 1 elements skipped; element 0: "),
         (2, ["operation", "x", "0", "x", *nested], 1, "nested too deeply"),
         (2, ["operation", "x", "0", "x", "as", "20001", *["y"] * 20_001], 1, "more elements"),
     ]

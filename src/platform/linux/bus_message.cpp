@@ -124,7 +124,7 @@ class DictionaryReader {
       --left_.elements;
       auto value = readNext();
       if (!value) return value;
-      array->append(*std::move(value));
+      array->append(*value ? *std::move(value) : KvRef<KvObject>(KvData::create({})));
     }
     if (result >= 0) result = ::sd_bus_message_exit_container(message_);
     if (result < 0) return systemFailure("malformed", result);

@@ -22,8 +22,9 @@ struct BusMessageLimits {
 // (those of 8 and 16 bits become 32-bit ones), an array of bytes is data, object paths and
 // signatures are strings, an array of string-keyed entries is a dictionary, any other an array. Of
 // a key that comes twice the later value counts. A field whose value has no counterpart here
-// (structures, file descriptors, dictionaries by number) is left out. An error is a message that is
-// above the limits or that is malformed.
+// (structures, file descriptors, dictionaries by number) is left out; such an element of an array
+// becomes empty data, so that it is missed and the others keep their places. An error is a message
+// that is above the limits or that is malformed.
 Result<KvRef<KvDictionary>> readBusDictionary(sd_bus_message* message,
                                               const BusMessageLimits& limits = {});
 
