@@ -1,0 +1,250 @@
+"""A device far larger than any should be. TALLYRUN_LOAD is the share of the full size: 1 is a million
+scalars, a hundred million samples, a million records, 200,000 channels and three years of logs."""
+import csv
+import io
+import json
+import os
+import plistlib
+import re
+import signal
+import sqlite3
+import struct
+import subprocess
+import sys
+import tempfile
+import time
+import traceback
+import unittest
+
+from device import BIN, DeviceTest, SPOOL, STORE, TODAY, group, parse_messages, texts
+
+SHARE = float(os.environ.get("TALLYRUN_LOAD", "0.01"))
+YESTERDAY = TODAY - 1
+MIB = 1024  # of the kibibytes in which memory is counted
+# What a sanitizer needs says nothing about the program.
+MEMORY_COUNTS = b"__asan_init" not in (BIN / "tallyrun").read_bytes()
+# Between the test and what it measures stands a small process, because a program's peak memory begins
+# with that of the process which starts it.
+LAUNCHER = """import os, sys
+_, status, usage = os.wait4(os.posix_spawn(sys.argv[2], sys.argv[2:], os.environ), 0)
+open(sys.argv[1], "w").write(str(usage.ru_maxrss))
+sys.exit(os.waitstatus_to_exitcode(status))"""
+
+
+def sized(full, least=1):
+    return max(int(full * SHARE), least)
+
+
+class Run:
+    """A program that ran to its end: what it wrote, how long it took, its peak memory in KiB."""
+
+    def __init__(self, device, *command, stdin=(), day=None):
+        usage = device.root / "usage"
+        with tempfile.TemporaryFile() as out, tempfile.TemporaryFile() as errors:
+            start = time.monotonic()
+            process = subprocess.Popen([sys.executable, "-ISc", LAUNCHER, usage, *command],
+                                       stdin=subprocess.PIPE, stdout=out, stderr=errors,
+                                       env=device.environment(day))
+            for piece in stdin:
+                process.stdin.write(piece)
+            process.stdin.close()
+            status = process.wait()
+            self.seconds = time.monotonic() - start
+            self.out, self.errors = (file.seek(0) or file.read() for file in (out, errors))
+        assert status == 0, (command, status, self.errors[-2000:])
+        self.memory = int(usage.read_text())
+
+    def __str__(self):
+        return f"{self.seconds:.1f} s, {self.memory / MIB:.0f} MiB"
+
+
+def daily(device, argument, day=TODAY):
+    run = Run(device, *device.command(argument), day=day)
+    errors = texts(parse_messages(run.errors), "error")
+    assert not errors, errors
+    return run
+
+
+def tool(device, *arguments, stdin=()):
+    run = Run(device, BIN / "tallyctl", "--root", device.root, *arguments, stdin=stdin)
+    assert arguments[0] == "nand" or not run.errors, run.errors[-2000:]
+    return run
+
+
+def rival(device):
+    """Commits a thousand times a second until told to end, and opens the store anew now and then."""
+    ended = []
+    signal.signal(signal.SIGTERM, lambda *_: ended.append(True))
+    count, start = 0, time.monotonic()
+    while not ended:
+        store = sqlite3.connect(device.root / STORE, timeout=60, isolation_level=None)
+        store.execute("PRAGMA synchronous = NORMAL")
+        for count in range(count + 1, count + 501):
+            store.execute("BEGIN IMMEDIATE")
+            store.execute("INSERT OR REPLACE INTO scalars VALUES (?, 'load.rival', ?)", (TODAY, count))
+            store.execute("INSERT INTO recent SELECT ?1, 'load.rival', ifnull(max(number), -1) + 1, 1, ?2,"
+                          " zeroblob(4) FROM recent WHERE day = ?1 AND key = 'load.rival'",
+                          (TODAY, struct.pack("<d", count)))
+            store.execute("COMMIT")
+            time.sleep(max(0, start + count / 1000 - time.monotonic()))
+        store.close()
+    (device.root / "commits").write_text(f"{count} {count / (time.monotonic() - start):,.0f}")
+
+
+class Load(DeviceTest):
+    # Keys take turns by a thousand samples, whose values are the key's number and three digits.
+    KEYS, TURN = 100, 1000
+
+    def say(self, text):
+        print(f"\n{self.id().rpartition('.test_')[2]}: {text}", flush=True)
+
+    def large(self, **preferences):
+        device = self.fresh()
+        device.whitelist(G=group(scalar_prefixes={"load.": {}}, distribution_prefixes={"load.": {}}))
+        device.set_preferences(SpoolMaximumBytes=1 << 32, **preferences)
+        return device
+
+    def rows(self, scalars, turns):
+        for first in range(0, scalars, self.TURN):
+            yield b"".join(b"scalar,load.s%06d,%d,,%d\n" % (i, YESTERDAY, i * 7)
+                           for i in range(first, min(first + self.TURN, scalars)))
+        turn = b"".join(b"distribution,load.d#,%d,%d,#%03d\n" % (YESTERDAY, i * 86, i * 617 % self.TURN)
+                        for i in range(self.TURN))
+        for _ in range(turns):
+            for key in range(1, self.KEYS + 1):
+                yield turn.replace(b"#", b"%d" % key)
+
+    def check_log(self, device, scalars, turns):
+        log = device.log()
+        self.assertEqual({key: value for key, value in log["TBScalars"].items() if "load." in key},
+                         {"load.s%06d" % i: i * 7 for i in range(scalars)})
+        self.assertEqual(len(log["TBDistributions"]), self.KEYS)
+        deviations = turns * self.TURN * (self.TURN ** 2 - 1) / 12
+        for key in range(1, self.KEYS + 1):
+            least, most, mean, squares, count = log["TBDistributions"][f"load.d{key}"]
+            base = key * self.TURN
+            self.assertEqual((least, most, count), (base, base + self.TURN - 1, turns * self.TURN), key)
+            self.assertAlmostEqual(mean, base + (self.TURN - 1) / 2, delta=1e-9 * base)
+            self.assertAlmostEqual(squares, deviations, delta=1e-9 * deviations)
+
+    def test_day(self):
+        scalars, memory = sized(1_000_000), []
+        for turns in (sized(100), sized(1000)):
+            device = self.large()
+            load = tool(device, "store", "import", "-", stdin=self.rows(scalars, turns))
+            run = daily(device, "-f")
+            self.check_log(device, scalars, turns)
+            samples = turns * self.KEYS * self.TURN
+            self.say(f"{scalars:,} scalars, {samples:,} samples: import {load}; daily run {run}")
+            self.assertTrue(load.memory < 64 * MIB or not MEMORY_COUNTS)
+            memory.append(run.memory)
+            device.remove()
+        self.assertTrue(memory[1] < memory[0] * 1.03 + MIB or not MEMORY_COUNTS,
+                        "the daily run's memory grows with the samples")
+
+    def test_statistics(self):
+        rounds = sized(250_000)
+        device = self.fresh()
+        device.write("device/registry.plist", {"Entries": [{"Class": "SPXStorage", "UserClient": {
+            "Methods": [{"Method": 8, "Selector": 13, "Data": "statistics.bin"}]}}]})
+        # Of a counter the last record stands; what goes into a derived figure is added up.
+        device.write("device/statistics.bin", struct.pack("<IIQ", 53, 1, 0x20004) + b"".join(
+            struct.pack("<IIQIIQIIQQIIQ", 7, 1, i, 532, 1, 2 * i, 269, 2, i, 1, 0x1000000, 1, 5)
+            for i in range(rounds)))
+        run = tool(device, "nand", "info", "--json")
+        info = json.loads(run.out)
+        self.assertEqual([info["vellum.NANDInfo." + name] for name in
+                          ("NumLogicalReads", "spareAvailablePercent", "NumMaintenanceRequests")],
+                         [rounds - 1, 2 * (rounds - 1), rounds * (rounds - 1) // 2])
+        self.say(f"{4 * rounds + 1:,} records: {run}")
+
+    def test_channels(self):
+        runs = []
+        for part in (sized(1000), sized(10_000)):
+            device = self.fresh()
+            simple = 1 | 0x100 << 16 | 1 << 32
+            drivers = [range(first, first + part) for first in range(0, 20 * part, part)]
+            device.write("device/registry.plist", {"Entries": [{"Class": "HwReportHub"}] + [
+                {"Class": "Load", "Properties": {
+                    "HwReportLegendPublic": True,
+                    "HwReportLegend": [{"HwReportGroupName": "Load", "HwReportChannels":
+                                        [[i, simple, f"channel {i}"] for i in ids]}],
+                    "HwReportValues": [{"Channel": i, "Value": i * 3} for i in ids]}}
+                for ids in drivers]})
+            listed = tool(device, "channels", "list", "--json")
+            sampled = tool(device, "channels", "sample", "--json")
+            self.assertEqual({channel["name"] for channel in json.loads(listed.out)},
+                             {f"channel {i}" for i in range(20 * part)})
+            self.assertEqual({channel["name"]: channel["value"]
+                              for channel in json.loads(sampled.out)["channels"]},
+                             {f"channel {i}": i * 3 for i in range(20 * part)})
+            self.say(f"{20 * part:,} channels: list {listed}; sample {sampled}")
+            runs.append((listed, sampled))
+        for less, more in zip(*runs):
+            self.assertLess(more.seconds, 20 * less.seconds + 1, "time grows faster than the channels")
+            self.assertLess(more.memory, 12 * less.memory, "memory grows faster than the channels")
+
+    def test_spool(self):
+        days = sized(1096, 20)
+        device = self.simple()
+        device.run("-f")
+        made = device.log_files()[0]
+        body, info = made.read_bytes(), plistlib.dumps(device.info(made))
+        for i in range(1, days + 1):
+            day = time.strftime("%F", time.gmtime((YESTERDAY - days + i) * 86400)).encode()
+            dated = re.sub(rb"(TBStartDate</key>\s*<date>)[^T]*", rb"\g<1>" + day, body)
+            device.write(f"{SPOOL}/{i:010}-log-tallyd.log", dated)
+            device.write(f"{SPOOL}/{i:010}-log-tallyd.info.plist", info)
+        device.set_preferences(SpoolMaximumLogs=days)
+        run = tool(device, "report", "list", "--json")
+        self.assertEqual([(log["sequence"], log["day"]) for log in json.loads(run.out)],
+                         [(i, YESTERDAY - days + i) for i in range(1, days + 1)])
+        for day, kept in ((TODAY, days), (TODAY + 1, days // 2)):
+            device.set_preferences(SpoolMaximumLogs=kept)
+            evicting = daily(device, "-d", day=day)
+            newest = days + 1 + day - TODAY
+            self.assertEqual([int(path.name[:10]) for path in device.log_files()],
+                             list(range(newest + 1 - kept, newest + 1)))
+            self.assertEqual(len(list((device.root / SPOOL).glob("*.info.plist"))), kept)
+        self.say(f"{days:,} logs: list {run}; daily run that removes half {evicting}")
+
+    def test_rival(self):
+        seconds, scalars, turns = 3 + 57 * SHARE, sized(20_000, 2000), sized(10, 3)
+        device = self.large(SpoolMaximumLogs=1)
+        tool(device, "store", "import", "-", stdin=self.rows(scalars, turns))
+        daily(device, "-f")
+
+        def readings():
+            return [re.findall(rb".*load\.[ds].*", tool(device, *read, "--day", str(YESTERDAY)).out)
+                    for read in (("report", "preview"), ("store", "dump"), ("explain", "load.s000042"),
+                                 ("explain", "load.d1"))]
+
+        expected = readings()
+        child = os.fork()
+        if child == 0:
+            try:
+                rival(device)
+                os._exit(0)
+            except BaseException:
+                traceback.print_exc()
+                os._exit(1)
+        end, rounds = time.monotonic() + seconds, 0
+        try:
+            while time.monotonic() < end:
+                daily(device, "-f")
+                self.check_log(device, scalars, turns)
+                self.assertEqual(readings(), expected)
+                rounds += 1
+        finally:
+            os.kill(child, signal.SIGTERM)
+            status = os.waitpid(child, 0)[1]
+        self.assertEqual(status, 0)
+        commits, rate = (device.root / "commits").read_text().split()
+        dump = tool(device, "store", "dump", "--day", str(TODAY), "--prefix", "load.rival").out.decode()
+        self.assertEqual([float(row["value"]) for row in csv.DictReader(io.StringIO(dump))],
+                         [int(commits), *range(1, int(commits) + 1)])
+        self.say(f"{rounds} daily runs and {4 * rounds} readers beside {commits} commits, {rate} a second")
+
+
+if __name__ == "__main__":
+    unittest.main()
