@@ -149,10 +149,8 @@ Result<KvRef<KvObject>> readBinary(std::string_view document) {
 
 }  // namespace
 
-Result<KvRef<KvObject>> decodePlist(std::string_view document) {
-  if (document.size() > kPlistMaximumBytes) {
-    return Error{"the property list is larger than 64 MiB"};
-  }
+Result<KvRef<KvObject>> decodePlist(std::string_view document, std::size_t maximumBytes) {
+  if (document.size() > maximumBytes) return plistTooLarge(maximumBytes);
   if (document.empty()) return Error{"the property list is empty"};
   if (isBinaryPlist(std::as_bytes(std::span(document)))) return readBinary(document);
   const std::size_t first = document.find_first_not_of(" \t\r\n\xEF\xBB\xBF");
@@ -162,6 +160,8 @@ Result<KvRef<KvObject>> decodePlist(std::string_view document) {
   return readXmlPlist(document);
 }
 
-Result<std::string> encodeXmlPlist(const KvObject& root) { return writeXmlPlist(root); }
+Result<std::string> encodeXmlPlist(const KvObject& root, std::size_t maximumBytes) {
+  return writeXmlPlist(root, maximumBytes);
+}
 
 }  // namespace tally

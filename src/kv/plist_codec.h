@@ -16,13 +16,16 @@ constexpr std::size_t kPlistMaximumBytes = 64u << 20;
 constexpr int kPlistMaximumDepth = 512;
 constexpr std::size_t kPlistMaximumObjects = 4'000'000;
 
-// The document's root value. An error says what is wrong; nothing partial is ever returned.
-Result<KvRef<KvObject>> decodePlist(std::string_view document);
+// The document's root value. An error says what is wrong; nothing partial is ever returned. A
+// larger bound is for documents that the program wrote itself.
+Result<KvRef<KvObject>> decodePlist(std::string_view document,
+                                    std::size_t maximumBytes = kPlistMaximumBytes);
 
 // An XML property list, version 1.0, UTF-8, ending in a newline. Fails when the value is nested
 // deeper than kPlistMaximumDepth, which a reference cycle always is, or when the document would be
-// larger than kPlistMaximumBytes and so could not be read again. Characters that XML 1.0 cannot
+// larger than maximumBytes and so could not be read again. Characters that XML 1.0 cannot
 // carry are written as U+FFFD. Reals read back equal.
-Result<std::string> encodeXmlPlist(const KvObject& root);
+Result<std::string> encodeXmlPlist(const KvObject& root,
+                                   std::size_t maximumBytes = kPlistMaximumBytes);
 
 }  // namespace tally

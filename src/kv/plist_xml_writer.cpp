@@ -96,10 +96,10 @@ void appendReal(std::string& out, double value) {
 
 class Writer {
  public:
+  explicit Writer(std::size_t maximumBytes) : maximumBytes_(maximumBytes) {}
+
   Status value(const KvObject& object, int depth) {
-    if (out_.size() > kPlistMaximumBytes) {
-      return Error{"the property list is larger than 64 MiB"};
-    }
+    if (out_.size() > maximumBytes_) return plistTooLarge(maximumBytes_);
     indent(depth);
     switch (object.type()) {
       case KvType::String:
@@ -196,17 +196,21 @@ class Writer {
   static Error tooDeep() {
     return Error{"the value is nested deeper than 512 levels or contains itself"};
   }
+
+  std::size_t maximumBytes_;
 };
 
 }  // namespace
 
-Result<std::string> writeXmlPlist(const KvObject& root) {
-  Writer writer;
+Error plistTooLarge(std::size_t maximumBytes) {
+  return Error{"the property list is larger than " + std::to_string(maximumBytes >> 20) + " MiB"};
+}
+
+Result<std::string> writeXmlPlist(const KvObject& root, std::size_t maximumBytes) {
+  Writer writer(maximumBytes);
   if (Status status = writer.value(root, 0); !status) return status.error();
   writer.out_ += kFooter;
-  if (writer.out_.size() > kPlistMaximumBytes) {
-    return Error{"the property list is larger than 64 MiB"};
-  }
+  if (writer.out_.size() > maximumBytes) return plistTooLarge(maximumBytes);
   return std::move(writer.out_);
 }
 

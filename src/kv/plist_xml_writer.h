@@ -1,6 +1,7 @@
 // Writes values as an XML property list, straight into a string.
 #pragma once
 
+#include <cstddef>
 #include <string>
 
 #include "base/result.h"
@@ -9,7 +10,9 @@
 namespace tally {
 
 // The whole document. Fails when the value is nested too deeply (a cycle always is) or the document
-// would be too large to be read again.
-Result<std::string> writeXmlPlist(const KvObject& root);
+// would be larger than maximumBytes.
+Result<std::string> writeXmlPlist(const KvObject& root, std::size_t maximumBytes);
+
+Error plistTooLarge(std::size_t maximumBytes);
 
 }  // namespace tally

@@ -74,7 +74,7 @@ void TBReport::serializeWithDateAndAppInfo(std::int32_t day, const KvArray* appI
   reportCPUUptime();
   reportVMStats();
 
-  const auto encoded = encodeXmlPlist(*makeDocument(day, appInfo));
+  const auto encoded = encodeXmlPlist(*makeDocument(day, appInfo), kDailyLogMaximumBytes);
   if (!encoded) {
     logMessage(LogLevel::Error, "Could not create tallyd plist: {}", encoded.error().message);
     return;

@@ -25,6 +25,9 @@ constexpr std::string_view kLastProcessedDay = "LastCrashLogSerializationDateInD
 // What log submission knows the daily log by.
 constexpr std::string_view kDailyLogTypeCode = "193";
 constexpr std::string_view kDailyLogName = "log-tallyd";
+// What a million keys with long names and their histograms need; what fewer may have is a matter of
+// the spool's bounds.
+constexpr std::size_t kDailyLogMaximumBytes = 256u << 20;
 
 // True for the scalars that the report measures itself instead of reading them from the store.
 bool isMeasuredByReport(std::string_view key);

@@ -12,7 +12,7 @@
 namespace tally::tools {
 
 Result<DailyLog> DailyLog::parse(std::string_view bytes) {
-  const auto root = decodePlist(bytes);
+  const auto root = decodePlist(bytes, kDailyLogMaximumBytes);
   if (!root) return root.error();
   return of(KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get())));
 }
@@ -74,7 +74,7 @@ Result<std::optional<SpooledLog>> SubmittedLogs::find(std::string_view name) con
 }
 
 Result<std::string> SubmittedLogs::read(const SpooledLog& log) const {
-  return reader_.readBody(log, kPlistMaximumBytes);
+  return reader_.readBody(log, kDailyLogMaximumBytes);
 }
 
 std::optional<SubmittedLogs::Found> SubmittedLogs::newest(std::optional<std::int32_t> day) const {

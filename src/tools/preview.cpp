@@ -19,7 +19,7 @@ Preview previewLog(std::int32_t day, KeyTrace* trace) {
   if (run.logs.empty()) return preview;
   preview.options = std::move(run.logs.front().options);
   preview.body = std::move(run.logs.front().body);
-  if (const auto root = decodePlist(preview.body)) {
+  if (const auto root = decodePlist(preview.body, kDailyLogMaximumBytes)) {
     preview.document = KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get()));
   }
   return preview;

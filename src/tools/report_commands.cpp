@@ -6,8 +6,8 @@
 
 #include "base/file.h"
 #include "base/time_text.h"
-#include "kv/plist_codec.h"
 #include "platform/platform.h"
+#include "report/report.h"
 #include "tools/daily_log.h"
 #include "tools/day_argument.h"
 #include "tools/log_diff.h"
@@ -177,7 +177,7 @@ int showBody(const ToolContext& context, const std::string& title, std::string_v
 
 int show(const ToolContext& context, const ReportArguments& arguments) {
   if (arguments.name.find('/') != std::string::npos) {
-    const auto body = readFile(arguments.name, kPlistMaximumBytes);
+    const auto body = readFile(arguments.name, kDailyLogMaximumBytes);
     if (!body) return complain(context, body.error().message, kWrong);
     return showBody(context, arguments.name, *body, nullptr);
   }

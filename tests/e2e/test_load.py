@@ -35,6 +35,10 @@ def sized(full, least=1):
     return max(int(full * SHARE), least)
 
 
+def scalar_key(i):
+    return b"load.scalar.of.an.everyday.length.%06d" % i
+
+
 class Run:
     """A program that ran to its end: what it wrote, how long it took, its peak memory in KiB."""
 
@@ -44,7 +48,7 @@ class Run:
             start = time.monotonic()
             process = subprocess.Popen([sys.executable, "-ISc", LAUNCHER, usage, *command],
                                        stdin=subprocess.PIPE, stdout=out, stderr=errors,
-                                       env=device.environment(day))
+                                       env=dict(device.environment(day), TALLYRUN_LOG_LEVEL="info"))
             for piece in stdin:
                 process.stdin.write(piece)
             process.stdin.close()
@@ -106,7 +110,7 @@ class Load(DeviceTest):
 
     def rows(self, scalars, turns):
         for first in range(0, scalars, self.TURN):
-            yield b"".join(b"scalar,load.s%06d,%d,,%d\n" % (i, YESTERDAY, i * 7)
+            yield b"".join(b"scalar,%s,%d,,%d\n" % (scalar_key(i), YESTERDAY, i * 7)
                            for i in range(first, min(first + self.TURN, scalars)))
         turn = b"".join(b"distribution,load.d#,%d,%d,#%03d\n" % (YESTERDAY, i * 86, i * 617 % self.TURN)
                         for i in range(self.TURN))
@@ -117,7 +121,7 @@ class Load(DeviceTest):
     def check_log(self, device, scalars, turns):
         log = device.log()
         self.assertEqual({key: value for key, value in log["TBScalars"].items() if "load." in key},
-                         {"load.s%06d" % i: i * 7 for i in range(scalars)})
+                         {scalar_key(i).decode(): i * 7 for i in range(scalars)})
         self.assertEqual(len(log["TBDistributions"]), self.KEYS)
         deviations = turns * self.TURN * (self.TURN ** 2 - 1) / 12
         for key in range(1, self.KEYS + 1):
@@ -216,7 +220,7 @@ class Load(DeviceTest):
 
         def readings():
             return [re.findall(rb".*load\.[ds].*", tool(device, *read, "--day", str(YESTERDAY)).out)
-                    for read in (("report", "preview"), ("store", "dump"), ("explain", "load.s000042"),
+                    for read in (("report", "preview"), ("store", "dump"), ("explain", scalar_key(42)),
                                  ("explain", "load.d1"))]
 
         expected = readings()

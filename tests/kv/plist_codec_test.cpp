@@ -291,6 +291,7 @@ TEST(PlistCodec, NestsAsDeepAsTheLimitAndNoDeeper) {
   KvRef<KvObject> doubling = KvBoolean::of(true);  // small in memory, 2^40 elements as a document
   for (int i = 0; i < 40; ++i) doubling = KvArray::create({doubling, doubling});
   EXPECT_THAT(encodeXmlPlist(*doubling).error().message, HasSubstr("64 MiB"));
+  EXPECT_THAT(encodeXmlPlist(*doubling, 96u << 20).error().message, HasSubstr("96 MiB"));
 }
 
 TEST(PlistCodec, RefusesEveryTruncationAndSurvivesEveryChangedByte) {
