@@ -180,6 +180,11 @@ TEST_F(StoreTest, SamplesComeBackBitForBitInRecordedOrderHoweverTheyAreStored) {
   record(sequence(1e9, kChunkSamples), true);
   record({1}, false);
   check("chunks and new ones");
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    const auto complete = writer.foldRecentUntil({});  // a time that is up
+    return complete && !*complete ? Status(Done{}) : Error{"not a part"};
+  }));
+  check("folded in part");
   store()->TBClientCheckpoint();
   check("folded again");
   EXPECT_EQ(

@@ -1,6 +1,8 @@
 #include "platform/linux/metrics_store.h"
 
+#include <chrono>
 #include <optional>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -12,6 +14,11 @@ namespace tally {
 namespace {
 
 constexpr std::int32_t kDaysKept = 30;
+
+// A checkpoint of millions of new samples takes minutes, for which nobody who records would wait.
+// It lets the others in between, long enough for those who look only ten times a second.
+constexpr std::chrono::seconds kLongestTurn{2};
+constexpr std::chrono::milliseconds kPauseForOthers{150};
 
 class SqliteMetricsStore final : public MetricsStore {
  public:
@@ -82,10 +89,16 @@ class SqliteMetricsStore final : public MetricsStore {
     const auto needed = store.needsCheckpoint(oldest);
     if (!needed) return needed.error();
     if (!*needed) return Done{};
-    return transaction(store, [&]() -> Status {
-      if (auto folded = store.foldRecent(); !folded) return folded;
-      return store.forgetBefore(oldest);
-    });
+    for (bool complete = false;;) {
+      auto done = transaction(store, [&]() -> Status {
+        const auto folded = store.foldRecentUntil(std::chrono::steady_clock::now() + kLongestTurn);
+        if (!folded) return folded.error();
+        complete = *folded;
+        return complete ? store.forgetBefore(oldest) : Status(Done{});
+      });
+      if (!done || complete) return done;
+      std::this_thread::sleep_for(kPauseForOthers);
+    }
   }
 
   void writeBatch() {

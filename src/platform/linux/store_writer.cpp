@@ -178,6 +178,11 @@ Status StoreWriter::appendToChunks(std::int32_t day, std::string_view key,
 }
 
 Status StoreWriter::foldRecent() {
+  const auto folded = foldRecentUntil(std::chrono::steady_clock::time_point::max());
+  return folded ? Status(Done{}) : folded.error();
+}
+
+Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point end) {
   auto rows = database_.prepare(
       "SELECT day, key, number, samples, sample_values, sample_offsets FROM recent "
       "ORDER BY day, key, number");
@@ -200,21 +205,25 @@ Status StoreWriter::foldRecent() {
       continue;
     }
     if (!started || day != rows->integer(0) || key != rows->text(1)) {
-      if (auto finished = tail.finish(); !finished) return finished;
+      if (auto finished = tail.finish(); !finished) return finished.error();
       day = rows->integer(0);
       key = rows->text(1);
-      if (auto moved = tail.moveTo(static_cast<std::int32_t>(day), key); !moved) return moved;
+      if (auto moved = tail.moveTo(static_cast<std::int32_t>(day), key); !moved) {
+        return moved.error();
+      }
       started = true;
     }
     values.resize(static_cast<std::size_t>(samples));
     offsets.resize(values.size());
     unpackValues(valueColumn, 0, values);
     unpackOffsets(offsetColumn, 0, offsets);
-    if (auto appended = tail.append(values, offsets); !appended) return appended;
+    if (auto appended = tail.append(values, offsets); !appended) return appended.error();
     if (!remove->bind(1, day).bind(2, key).bind(3, number).run()) return database_.error();
+    if (std::chrono::steady_clock::now() >= end) break;
   }
   if (step == Step::Failed) return database_.error();
-  return tail.finish();
+  if (auto finished = tail.finish(); !finished) return finished.error();
+  return step == Step::Done;
 }
 
 Status StoreWriter::forgetBefore(std::int32_t day) {

@@ -1,6 +1,7 @@
 // Writes to the metrics store.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -34,6 +35,8 @@ class StoreWriter {
                         std::span<const std::uint32_t> offsets);
   // Moves pushed samples to the chunks of their day. Damaged rows stay where they are.
   Status foldRecent();
+  // The same until the time is up, but for one row at least. False when there may be more.
+  Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
   Status forgetBefore(std::int32_t day);
 
   // Whether foldRecent() or forgetBefore(day) would find something to do.
