@@ -3,6 +3,7 @@ scalars, a hundred million samples, a million records, 200,000 channels and thre
 import csv
 import io
 import json
+import multiprocessing
 import os
 import plistlib
 import re
@@ -13,7 +14,6 @@ import subprocess
 import sys
 import tempfile
 import time
-import traceback
 import unittest
 
 from device import BIN, DeviceTest, SPOOL, STORE, TODAY, group, parse_messages, texts
@@ -51,11 +51,10 @@ class Run:
                                        env=dict(device.environment(day), TALLYRUN_LOG_LEVEL="info"))
             for piece in stdin:
                 process.stdin.write(piece)
-            process.stdin.close()
-            status = process.wait()
+            process.communicate()
             self.seconds = time.monotonic() - start
             self.out, self.errors = (file.seek(0) or file.read() for file in (out, errors))
-        assert status == 0, (command, status, self.errors[-2000:])
+        assert process.returncode == 0, (command, self.errors[-2000:])
         self.memory = int(usage.read_text())
 
     def __str__(self):
@@ -95,12 +94,13 @@ def rival(device):
     (device.root / "commits").write_text(f"{count} {count / (time.monotonic() - start):,.0f}")
 
 
+def say(text):
+    print("\n" + text, flush=True)
+
+
 class Load(DeviceTest):
     # Keys take turns by a thousand samples, whose values are the key's number and three digits.
     KEYS, TURN = 100, 1000
-
-    def say(self, text):
-        print(f"\n{self.id().rpartition('.test_')[2]}: {text}", flush=True)
 
     def large(self, **preferences):
         device = self.fresh()
@@ -138,8 +138,8 @@ class Load(DeviceTest):
             load = tool(device, "store", "import", "-", stdin=self.rows(scalars, turns))
             run = daily(device, "-f")
             self.check_log(device, scalars, turns)
-            samples = turns * self.KEYS * self.TURN
-            self.say(f"{scalars:,} scalars, {samples:,} samples: import {load}; daily run {run}")
+            say(f"{scalars:,} scalars, {turns * self.KEYS * self.TURN:,} samples: "
+                f"import {load}; daily run {run}")
             self.assertTrue(load.memory < 64 * MIB or not MEMORY_COUNTS)
             memory.append(run.memory)
             device.remove()
@@ -160,30 +160,30 @@ class Load(DeviceTest):
         self.assertEqual([info["vellum.NANDInfo." + name] for name in
                           ("NumLogicalReads", "spareAvailablePercent", "NumMaintenanceRequests")],
                          [rounds - 1, 2 * (rounds - 1), rounds * (rounds - 1) // 2])
-        self.say(f"{4 * rounds + 1:,} records: {run}")
+        say(f"{4 * rounds + 1:,} records: {run}")
 
     def test_channels(self):
         runs = []
         for part in (sized(1000), sized(10_000)):
-            device = self.fresh()
-            simple = 1 | 0x100 << 16 | 1 << 32
-            drivers = [range(first, first + part) for first in range(0, 20 * part, part)]
+            device, count, simple = self.large(), 20 * part, 1 | 0x100 << 16 | 1 << 32
+            drivers = [range(first, first + part) for first in range(0, count, part)]
             device.write("device/registry.plist", {"Entries": [{"Class": "HwReportHub"}] + [
                 {"Class": "Load", "Properties": {
                     "HwReportLegendPublic": True,
-                    "HwReportLegend": [{"HwReportGroupName": "Load", "HwReportChannels":
+                    "HwReportLegend": [{"HwReportChannels":
                                         [[i, simple, f"channel {i}"] for i in ids]}],
                     "HwReportValues": [{"Channel": i, "Value": i * 3} for i in ids]}}
                 for ids in drivers]})
-            listed = tool(device, "channels", "list", "--json")
-            sampled = tool(device, "channels", "sample", "--json")
-            self.assertEqual({channel["name"] for channel in json.loads(listed.out)},
-                             {f"channel {i}" for i in range(20 * part)})
+            runs.append([tool(device, "channels", "list", "--json"),
+                         tool(device, "channels", "sample", "--json"), daily(device, "-f")])
+            listed, sampled, _ = (run.out for run in runs[-1])
+            expected = {f"channel {i}": i * 3 for i in range(count)}
+            self.assertEqual({channel["name"] for channel in json.loads(listed)}, set(expected))
             self.assertEqual({channel["name"]: channel["value"]
-                              for channel in json.loads(sampled.out)["channels"]},
-                             {f"channel {i}": i * 3 for i in range(20 * part)})
-            self.say(f"{20 * part:,} channels: list {listed}; sample {sampled}")
-            runs.append((listed, sampled))
+                              for channel in json.loads(sampled)["channels"]}, expected)
+            swept = tool(device, "store", "dump", "--prefix", "vellum.hwreport.").out
+            self.assertEqual(swept.count(b"\n"), count + 1)
+            say("{:,} channels: list {}; sample {}; daily run {}".format(count, *runs[-1]))
         for less, more in zip(*runs):
             self.assertLess(more.seconds, 20 * less.seconds + 1, "time grows faster than the channels")
             self.assertLess(more.memory, 12 * less.memory, "memory grows faster than the channels")
@@ -210,7 +210,7 @@ class Load(DeviceTest):
             self.assertEqual([int(path.name[:10]) for path in device.log_files()],
                              list(range(newest + 1 - kept, newest + 1)))
             self.assertEqual(len(list((device.root / SPOOL).glob("*.info.plist"))), kept)
-        self.say(f"{days:,} logs: list {run}; daily run that removes half {evicting}")
+        say(f"{days:,} logs: list {run}; daily run that removes half {evicting}")
 
     def test_rival(self):
         seconds, scalars, turns = 3 + 57 * SHARE, sized(20_000, 2000), sized(10, 3)
@@ -224,30 +224,24 @@ class Load(DeviceTest):
                                  ("explain", "load.d1"))]
 
         expected = readings()
-        child = os.fork()
-        if child == 0:
-            try:
-                rival(device)
-                os._exit(0)
-            except BaseException:
-                traceback.print_exc()
-                os._exit(1)
-        end, rounds = time.monotonic() + seconds, 0
+        other = multiprocessing.get_context("fork").Process(target=rival, args=(device,))
+        other.start()
+        end, runs = time.monotonic() + seconds, []
         try:
             while time.monotonic() < end:
-                daily(device, "-f")
+                runs.append(daily(device, "-f"))
                 self.check_log(device, scalars, turns)
                 self.assertEqual(readings(), expected)
-                rounds += 1
         finally:
-            os.kill(child, signal.SIGTERM)
-            status = os.waitpid(child, 0)[1]
-        self.assertEqual(status, 0)
+            other.terminate()
+            other.join()
+        self.assertEqual(other.exitcode, 0)
         commits, rate = (device.root / "commits").read_text().split()
         dump = tool(device, "store", "dump", "--day", str(TODAY), "--prefix", "load.rival").out.decode()
         self.assertEqual([float(row["value"]) for row in csv.DictReader(io.StringIO(dump))],
                          [int(commits), *range(1, int(commits) + 1)])
-        self.say(f"{rounds} daily runs and {4 * rounds} readers beside {commits} commits, {rate} a second")
+        say(f"{len(runs)} daily runs, the longest {max(run.seconds for run in runs):.1f} s, beside "
+                 f"{commits} commits, {rate} a second")
 
 
 if __name__ == "__main__":
