@@ -254,6 +254,7 @@ int sample(const ToolContext& context, const ChannelArguments& wanted) {
   if (taken.second) {
     const auto changed = differences(context, taken, &complete);
     std::vector<KvDictionary*> borrowed;
+    borrowed.reserve(changed.size());
     for (const auto& channel : changed) borrowed.push_back(channel.get());
     printSample(context, borrowed, taken.seconds);
   } else {
