@@ -16,6 +16,8 @@
 #include <memory>
 #include <utility>
 
+#include "base/retried.h"
+
 namespace tally {
 namespace {
 
@@ -27,13 +29,6 @@ Error systemError(std::string_view what, const std::string& path, int code = err
 
 Error tooLarge(const std::string& path, std::size_t limit) {
   return {path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
-}
-
-template <class Call>
-auto retried(Call call) {
-  auto result = call();
-  while (result == -1 && errno == EINTR) result = call();
-  return result;
 }
 
 class Descriptor {
@@ -137,7 +132,8 @@ Result<std::vector<std::string>> listFolder(const std::string& path) {
 
 Status makeFolders(const std::string& path, unsigned mode) {
   if (::mkdir(path.c_str(), mode) == 0) {
-    const Descriptor made(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    const Descriptor made(retried(
+        [&] { return ::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
     if (made.get() >= 0) giveToOwnerOfFolder(made.get(), path);
     return Done{};
   }
@@ -160,7 +156,8 @@ Status renameFile(const std::string& from, const std::string& to) {
 }
 
 Status syncFolder(const std::string& path) {
-  Descriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  Descriptor folder(
+      retried([&] { return ::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
   if (folder.get() < 0 || retried([&] { return ::fsync(folder.get()); }) != 0) {
     return systemError("cannot sync folder", path);
   }

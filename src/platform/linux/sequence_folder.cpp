@@ -11,12 +11,24 @@
 
 #include "base/file.h"
 #include "base/number_text.h"
+#include "base/retried.h"
 
 namespace tally {
 namespace {
 
 constexpr std::size_t kDigits = 10;
 constexpr std::uint64_t kLastSequence = 9'999'999'999;
+
+// A volume that runs full takes a part before it says so.
+bool writeAllAt(int file, std::string_view bytes, off_t offset) {
+  while (!bytes.empty()) {
+    const auto count = retried([&] { return ::pwrite(file, bytes.data(), bytes.size(), offset); });
+    if (count < 0) return false;
+    bytes.remove_prefix(static_cast<std::size_t>(count));
+    offset += count;
+  }
+  return true;
+}
 
 }  // namespace
 
@@ -86,16 +98,17 @@ Status appendAt(const std::string& path, std::size_t end, std::string_view bytes
   const auto failure = [&path] {
     return Error{fmt::format("cannot append to {}: {}", path, std::strerror(errno)), errno};
   };
-  const int file = ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600);
+  const int file = retried(
+      [&] { return ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600); });
   if (file < 0) return failure();
   giveToOwnerOfFolder(file, path);
   Status status = Done{};
   const auto start = static_cast<off_t>(end);
-  if (::ftruncate(file, start) != 0 ||
-      ::pwrite(file, bytes.data(), bytes.size(), start) != static_cast<ssize_t>(bytes.size()) ||
-      ::fdatasync(file) != 0) {
+  const auto cutBack = [&] { return retried([&] { return ::ftruncate(file, start); }) == 0; };
+  if (!cutBack() || !writeAllAt(file, bytes, start) ||
+      retried([&] { return ::fdatasync(file); }) != 0) {
     status = failure();
-    (void)!::ftruncate(file, start);
+    (void)cutBack();
   }
   ::close(file);
   return status;

@@ -43,8 +43,8 @@ Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::u
 // An error when writing this many more bytes would use what is reserved of the volume.
 Status checkReserve(const std::string& folder, std::uint64_t bytes);
 
-// Makes the file end with the bytes, in one write that is on the disk afterwards, at the place
-// where its whole records end; what a killed run left half written there is cut off.
+// Makes the file end with the bytes, which are on the disk afterwards, at the place where its whole
+// records end; what a killed run left half written there is cut off.
 Status appendAt(const std::string& path, std::size_t end, std::string_view bytes);
 
 // Makes the folder readable by its owner alone.
