@@ -3,6 +3,7 @@
 #include <fmt/format.h>
 
 #include <cerrno>
+#include <utility>
 
 #include "kv/plist_codec.h"
 
@@ -113,10 +114,17 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain, boo
     recover(state, domain, document.error().message, locked);
     return;
   }
+  if (code == ENOENT) {
+    state.stored = KvDictionary::create();
+    state.writable = true;
+    return;
+  }
+  // What cannot be read now may be sound, so nothing is written over it, and what this very file
+  // held before still counts.
+  if (std::exchange(state.writable, false)) report(domain, document.error().message);
+  if (seen) return;
   state.stored = KvDictionary::create();
-  // What cannot be read now may be sound, so nothing is written over it.
-  state.writable = code == ENOENT;
-  if (!state.writable && !seen) report(domain, document.error().message);
+  state.read = false;  // the next use tries again
 }
 
 // Makes room for a new file where there is a damaged one.
