@@ -48,15 +48,23 @@ bool isRegularFile(const std::string& path) {
   return ::lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
 }
 
-// Moves generations up to the first free place, so that a run killed in between loses none.
-Status rollLog(const std::string& path) {
-  const auto generation = [&path](int number) { return fmt::format("{}.{}", path, number); };
+// Moves generations up to the first free place, so that a run killed in between loses none. What is
+// there is known from the folder's names, since a file that cannot be examined is no free place.
+Status rollLog(const std::string& folder, const std::vector<std::string>& names,
+               const std::string& name) {
+  const auto generation = [&name](int number) { return fmt::format("{}.{}", name, number); };
+  const auto move = [&folder](const std::string& from, const std::string& to) {
+    return renameFile(folder + "/" + from, folder + "/" + to);
+  };
   int free = 1;
-  while (free < kGenerationsKept && fileIdentity(generation(free))) ++free;
-  for (int number = free; number > 1; --number) {
-    if (auto moved = renameFile(generation(number - 1), generation(number)); !moved) return moved;
+  while (free < kGenerationsKept &&
+         std::binary_search(names.begin(), names.end(), generation(free))) {
+    ++free;
   }
-  return renameFile(path, generation(1));
+  for (int number = free; number > 1; --number) {
+    if (auto moved = move(generation(number - 1), generation(number)); !moved) return moved;
+  }
+  return move(name, generation(1));
 }
 
 }  // namespace
@@ -180,7 +188,7 @@ Status rollLogs(const std::string& folder) {
     if (!name.ends_with(".log") || !isRegularFile(path) || fileSize(path).value_or(0) == 0) {
       continue;
     }
-    if (auto rolled = rollLog(path); !rolled) status = rolled;
+    if (auto rolled = rollLog(folder, *names, name); !rolled) status = rolled;
   }
   return status;
 }
