@@ -4,9 +4,12 @@
 #include <sqlite3.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <chrono>
+#include <cstring>
 
 #include "base/file.h"
+#include "base/retried.h"
 
 namespace tally {
 namespace {
@@ -43,11 +46,14 @@ std::string immutableUri(std::string_view path) {
 // SQLite would make a new file with the modes of the umask and for whoever runs; what it lays
 // beside a file gets the modes and the owner of that file. Only a file that is not there yet is
 // opened here: closing any other would drop the locks that this process holds on it.
-void makePrivateFile(const std::string& path) {
-  const int file = ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600);
-  if (file < 0) return;
+Status makePrivateFile(const std::string& path) {
+  const int file =
+      retried([&] { return ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600); });
+  if (file < 0 && errno == EEXIST) return Done{};
+  if (file < 0) return Error{"metrics store " + path + ": " + std::strerror(errno), errno};
   giveToOwnerOfFolder(file, path);
   ::close(file);
+  return Done{};
 }
 
 }  // namespace
@@ -134,7 +140,7 @@ Result<Database> Database::open(const std::string& path, Access access) {
       flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
       break;
     case Access::Create:
-      makePrivateFile(path);
+      if (auto made = makePrivateFile(path); !made) return made.error();
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::ReadWrite:
