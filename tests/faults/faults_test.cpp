@@ -1,0 +1,299 @@
+// Walks: each call of a daily run on a file or on the store fails once, or is the last of the run.
+//
+// What a run may leave behind, whatever happens to it:
+// - Preference files, the store and the logs in the spool are whole at any moment.
+// - The day that is noted as processed is the former one or yesterday, and yesterday only when all
+//   of the day's tasks have been gone through. A task that failed by itself does not count: the day
+//   is noted all the same, and an error line says what it cost. A run that died before has not
+//   noted it, so that the next one does the day.
+// - The next run in which nothing fails ends with everything done, whatever is left over.
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <fstream>
+#include <optional>
+#include <set>
+
+#include "base/file.h"
+#include "faults/sample_device.h"
+#include "platform/linux/sqlite_database.h"
+
+namespace tally::faults {
+
+void PrintTo(const Fault& fault, std::ostream* out) { *out << fault.name; }
+
+namespace {
+
+using Effect = Fault::Effect;
+
+const Fault kFaults[] = {
+    {"NoSpace", Effect::Fail, kNoSpace, ENOSPC},
+    {"NoSpaceFromThere", Effect::Fail, kNoSpace, ENOSPC, true},
+    {"InputOutput", Effect::Fail, kInputOutput, EIO},
+    {"InputOutputFromThere", Effect::Fail, kInputOutput, EIO, true},
+    {"Denied", Effect::Fail, kDenied, EACCES},
+    {"DeniedFromThere", Effect::Fail, kDenied, EACCES, true},
+    // Killed right after a call is killed before the next: between two calls nothing changes.
+    {"Killed", Effect::Kill, kLastCall},
+    {"KilledHalfWay", Effect::KillHalfWay, kHalfWrite},
+    {"Interrupted", Effect::Fail, kInterrupted, EINTR},
+    {"HalfWritten", Effect::WriteHalf, kShortWrite},
+};
+
+struct Scenario {
+  const char* name;
+  std::int32_t day;
+  const char* folder;  // whose calls meet the fault
+  bool hasStore = true;
+};
+
+const Scenario kScenarios[] = {
+    {"the whole day", kDay, ""},
+    {"a day of events", kDay + 1, "/var/mobile/Library/Logs/AnalyticsEvents"},
+    {"a day without a store", kDay, "/var/mobile/Library/Tallybook", false},
+};
+// So few, and the calls of the whole day would not come here at all.
+constexpr long kFewestCalls = 20;
+
+// Of one day.
+constexpr std::size_t kStorageRecords = 9;
+
+const char* const kSpool = "/var/mobile/Library/Logs/Submission";
+const char* const kPreferences = "/var/mobile/Library/Preferences";
+
+class FaultWalk : public testing::TestWithParam<Fault> {
+ protected:
+  static void SetUpTestSuite() {
+    watchStore();
+    device = new SampleDevice;
+  }
+  static void TearDownTestSuite() {
+    delete device;
+    device = nullptr;
+  }
+
+  const Fault& fault() const { return GetParam(); }
+
+  std::int64_t notedDay() const {
+    const auto own = dictionaryIn(device->at(kPreferences) + "/vellum.tallyd.tallyrun.plist");
+    return own ? own->getInt64("LastCrashLogSerializationDateInDaysSince1970").value_or(0) : 0;
+  }
+
+  // The days whose logs are in the spool. Every log there is whole.
+  std::multiset<std::int32_t> loggedDays() const {
+    std::multiset<std::int32_t> days;
+    for (const std::string& path : device->files(kSpool)) {
+      if (!path.ends_with(".log")) continue;
+      const auto info = dictionaryIn(path.substr(0, path.size() - 4) + ".info.plist");
+      EXPECT_TRUE(info && info->contains("CreationTime")) << path;
+      const auto text = readFile(path, 1u << 24);
+      if (path.ends_with("-StorageStatus.log")) {
+        EXPECT_TRUE(text->starts_with("System ID: ") && text->ends_with("\n")) << *text;
+        continue;
+      }
+      const auto log = dictionaryIn(path);
+      if (!log) {
+        ADD_FAILURE() << path << " is no whole log";
+        continue;
+      }
+      const auto day =
+          static_cast<std::int32_t>(log->getAs<KvDate>("TBStartDate")->secondsSince1970() / 86400);
+      const auto* const scalars = log->getAs<KvDictionary>("TBScalars");
+      const auto* const times = log->getAs<KvDictionary>("TBDistributions")->getAs<KvArray>("time");
+      const bool whole = scalars->getInt64("count") == countOf(day) && times != nullptr &&
+                         times->getAs<KvNumber>(4)->asInt64() == kSamples;
+      if (whole) days.insert(day);
+    }
+    return days;
+  }
+
+  // At any moment.
+  void checkNothingIsDamaged() const {
+    for (const std::string& path : device->files("")) {
+      if (path.find("/Preferences/") == std::string::npos) continue;
+      EXPECT_EQ(path.find(".damaged"), std::string::npos) << path;
+      if (path.ends_with(".plist")) {
+        EXPECT_TRUE(dictionaryIn(path)) << path;
+      }
+    }
+    for (const std::string& path : device->files("/var/mobile/Library/Tallybook")) {
+      EXPECT_EQ(std::filesystem::status(path).permissions(), std::filesystem::perms{0600}) << path;
+    }
+    (void)loggedDays();
+    const auto noted = notedDay();
+    EXPECT_TRUE(noted == kFormerRun - 1 || noted == scenario.day - 1) << noted;
+    checkStore();
+  }
+
+  // With a day: it also holds what was swept on that day.
+  void checkStore(std::optional<std::int32_t> sweptOn = std::nullopt) const {
+    const std::string copy = device->copyOfStore();
+    if (copy.empty()) {
+      EXPECT_FALSE(scenario.hasStore || sweptOn);
+      return;
+    }
+    auto store = Database::open(copy, Database::Access::ReadWrite);
+    ASSERT_TRUE(store);
+    auto check = store->prepare("PRAGMA integrity_check");
+    ASSERT_TRUE(check) << check.error().message;
+    ASSERT_EQ(check->step(), Step::Row);
+    EXPECT_EQ(check->text(0), "ok");
+    if (sweptOn) {
+      const auto swept = store->integer(
+          "SELECT count(*) FROM scalars WHERE key GLOB 'vellum.dockyard.*' AND day = " +
+          std::to_string(*sweptOn));
+      EXPECT_TRUE(swept && *swept > 0);
+    }
+    if (!scenario.hasStore) return;
+    for (const std::int32_t day : {kDay - 1, kDay}) {
+      const auto rows = std::to_string(day);
+      const auto count =
+          store->integer("SELECT value FROM scalars WHERE key = 'count' AND day = " + rows);
+      EXPECT_TRUE(count && *count == countOf(day)) << day;
+      const auto samples = store->integer(
+          "SELECT sum(samples) FROM (SELECT * FROM chunks UNION ALL SELECT * FROM recent) "
+          "WHERE key = 'time' AND day = " +
+          rows);
+      EXPECT_TRUE(samples && *samples == kSamples) << day;
+    }
+  }
+
+  // After a run of that day in which nothing failed.
+  void checkDone(std::int32_t day, const char* tasking = "present") const {
+    EXPECT_EQ(notedDay(), day - 1);
+    if (scenario.hasStore) {
+      EXPECT_TRUE(loggedDays().contains(day - 1));
+    }
+    for (const std::string& path : device->files("")) {
+      EXPECT_FALSE(isTemporaryName(path) || path.ends_with(".pending")) << path;
+    }
+    checkStructuredData();
+    checkEvents();
+    checkStore(day);
+    checkTasking(tasking);
+    checkRepairLogs();
+  }
+
+  // The last log of the storage has at least the records of one day.
+  void checkStructuredData() const {
+    std::size_t records = 0;
+    for (const std::string& path : device->files("/var/mobile/Library/Logs/StructuredData")) {
+      if (!path.ends_with(".plist")) continue;
+      const auto log = dictionaryIn(path);
+      ASSERT_TRUE(log) << path;
+      if (log->getInt64("RecordType") == 176) records = log->getAs<KvArray>("Records")->size();
+    }
+    EXPECT_GE(records, kStorageRecords);
+  }
+
+  // Each line is one whole event.
+  void checkEvents() const {
+    for (const std::string& path : device->files("/var/mobile/Library/Logs/AnalyticsEvents")) {
+      if (!path.ends_with(".jsonl")) continue;
+      std::ifstream lines(path);
+      for (std::string line; std::getline(lines, line);) {
+        EXPECT_TRUE(line.rfind("{\"event\":") == 0 && line.ends_with("}}")) << line;
+      }
+    }
+  }
+
+  // The scheduled tasking is in force, and nothing of another one is left.
+  void checkTasking(const char* tasking) const {
+    for (const char* const folder : {"/var/mobile/Library/Preferences", "/Library/Preferences",
+                                     "/var/guest/Library/Preferences"}) {
+      const auto domain = dictionaryIn(device->at(folder) + "/dom.plist");
+      ASSERT_TRUE(domain) << folder;
+      EXPECT_EQ(kvText(domain.get()),
+                kvText(KvDictionary::create({{tasking, KvNumber::int64(1)}}).get()))
+          << folder;
+    }
+    const auto own = dictionaryIn(device->at(kPreferences) + "/vellum.tallyd.tallyrun.plist");
+    EXPECT_EQ(own->getString("TaskingID"), tasking);
+    EXPECT_TRUE(own->contains("TaskingDigest") && own->contains("TaskingPayload"));
+    EXPECT_FALSE(own->contains("TaskingUnfinished"));
+  }
+
+  // Rolled, and none of them lost.
+  void checkRepairLogs() const {
+    std::multiset<std::string> contents;
+    for (const std::string& path : device->files("/var/mobile/Library/Logs/Fixline")) {
+      EXPECT_FALSE(path.ends_with(".log")) << path;
+      contents.insert(*readFile(path, 100));
+    }
+    EXPECT_EQ(contents, (std::multiset<std::string>{"new", "old", "older"}));
+  }
+
+  void checkEnding(const Ending& ending) const {
+    ASSERT_TRUE(ending.sound) << testing::PrintToString(ending.errors);
+    checkNothingIsDamaged();
+    const bool noted = notedDay() == scenario.day - 1;
+    if (fault().isHarmless()) {
+      EXPECT_EQ(ending.errors, std::vector<std::string>());
+      EXPECT_TRUE(noted);
+    }
+    if (ending.killed ? noted : fault().isHarmless()) checkDone(scenario.day);
+    if (ending.killed) return;
+    const bool logged = !scenario.hasStore || loggedDays().contains(scenario.day - 1);
+    EXPECT_TRUE((noted && logged) || !ending.errors.empty());
+  }
+
+  // False when the walk is at its end.
+  bool tryPoint(long point) {
+    device->restore(scenario.hasStore);
+    const Ending ending = device->run(scenario.day, &fault(), point, scenario.folder);
+    SCOPED_TRACE("call " + std::to_string(point) + ": " + describeCall() +
+                 "; errors: " + testing::PrintToString(ending.errors));
+    if (!ending.met) {
+      EXPECT_EQ(ending.errors, std::vector<std::string>());
+      checkDone(scenario.day);
+      return false;
+    }
+    checkEnding(ending);
+    if (fault().isHarmless()) return true;
+    // A day that is noted is not done again, so the next run with something to do is tomorrow's.
+    const std::int32_t next = scenario.day + (notedDay() == scenario.day - 1 ? 1 : 0);
+    // Every other time another tasking has been scheduled meanwhile.
+    const char* const tasking = point % 2 == 0 ? "next" : "present";
+    device->schedule(tasking);
+    const Ending healthy = device->run(next);
+    EXPECT_TRUE(healthy.sound);
+    EXPECT_EQ(healthy.errors, std::vector<std::string>());
+    SCOPED_TRACE("after the next run, of day " + std::to_string(next));
+    checkDone(next, tasking);
+    return true;
+  }
+
+  // How many points were tried.
+  long walk() {
+    constexpr int kFailuresShown = 3;
+    // What lasts meets most calls many times, so that every third start will do.
+    const long stride = FAULT_STRIDE * (fault().lasts ? 3 : 1);
+    long tried = 0;
+    int failures = 0;
+    for (long point = 1; tryPoint(point); point += stride) {
+      ++tried;
+      if (HasFailure() && ++failures == kFailuresShown) break;
+    }
+    std::printf("%s: %ld points tried in %s\n", fault().name, tried, scenario.name);
+    return tried * stride;
+  }
+
+  Scenario scenario = kScenarios[0];
+  static SampleDevice* device;
+};
+
+SampleDevice* FaultWalk::device = nullptr;
+
+TEST_P(FaultWalk, LeavesNothingThatTheNextRunDoesNotPutRight) {
+  for (const Scenario& next : kScenarios) {
+    scenario = next;
+    const long calls = walk();
+    EXPECT_TRUE(*scenario.folder != '\0' || calls >= kFewestCalls) << calls;
+  }
+}
+
+INSTANTIATE_TEST_SUITE_P(, FaultWalk, testing::ValuesIn(kFaults),
+                         [](const auto& param) { return std::string(param.param.name); });
+
+}  // namespace
+}  // namespace tally::faults

@@ -1,0 +1,191 @@
+// The calls of the program on files. The linker leads each to __wrap_NAME, and __real_NAME to the
+// system's (CMakeLists.txt lists them).
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cmath>
+#include <cstdarg>
+#include <utility>
+
+#include "faults/fault.h"
+
+namespace tally::faults {
+namespace {
+
+// The paths of what is open, by descriptor: calls that come without a path are on these.
+struct OpenFile {
+  std::string path;
+  bool written = false;
+};
+std::array<OpenFile, 1024> openFiles;
+double clockSeconds = 0;
+
+OpenFile& openFile(int descriptor) {
+  static OpenFile none;
+  return descriptor >= 0 && descriptor < std::ssize(openFiles)
+             ? openFiles[static_cast<std::size_t>(descriptor)]
+             : none;
+}
+
+// True when the call is to fail, with errno set.
+bool fails(const char* call, std::string_view path, unsigned possible) {
+  if (judge(call, path, possible) != Verdict::Fail) return false;
+  errno = faultCode();
+  return true;
+}
+
+template <class Write>
+ssize_t writeJudged(const char* call, int file, size_t count, const Write& write) {
+  switch (judge(call, openFile(file).path,
+                kNoSpace | kInputOutput | kInterrupted | kLastCall |
+                    (count > 1 ? kHalfWrite | kShortWrite : 0))) {
+    case Verdict::Fail:
+      errno = faultCode();
+      return -1;
+    case Verdict::WriteHalf:
+      return write(count / 2);
+    case Verdict::KillHalfWay:
+      write(count / 2);
+      die();
+    case Verdict::Go:
+      break;
+  }
+  return write(count);
+}
+
+}  // namespace
+
+void setClock(double secondsSince1970) { clockSeconds = secondsSince1970; }
+
+}  // namespace tally::faults
+
+using namespace tally::faults;
+
+extern "C" {
+
+int __real_open(const char*, int, ...);
+int __real_close(int);
+ssize_t __real_read(int, void*, size_t);
+ssize_t __real_write(int, const void*, size_t);
+ssize_t __real_pwrite(int, const void*, size_t, off_t);
+int __real_fsync(int);
+int __real_fdatasync(int);
+int __real_ftruncate(int, off_t);
+int __real_flock(int, int);
+int __real_fstat(int, struct stat*);
+int __real_stat(const char*, struct stat*);
+int __real_lstat(const char*, struct stat*);
+int __real_rename(const char*, const char*);
+int __real_unlink(const char*);
+int __real_mkdir(const char*, mode_t);
+DIR* __real_opendir(const char*);
+int __real_clock_gettime(clockid_t, timespec*);
+
+int __wrap_open(const char* path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(arguments, mode_t) : 0;
+  va_end(arguments);
+  const bool creates = (flags & O_CREAT) != 0;
+  if (fails(creates ? "create" : "open", path,
+            kInputOutput | kDenied | kInterrupted | (creates ? kNoSpace | kLastCall : 0))) {
+    return -1;
+  }
+  const int file = __real_open(path, flags, mode);
+  if (file >= 0) openFile(file) = {path, (flags & O_ACCMODE) != O_RDONLY};
+  return file;
+}
+
+// What is closed is closed, whatever the answer.
+int __wrap_close(int file) {
+  const OpenFile closed = std::exchange(openFile(file), {});
+  const int result = __real_close(file);
+  return closed.written && fails("close", closed.path, kNoSpace | kInputOutput) ? -1 : result;
+}
+
+ssize_t __wrap_read(int file, void* bytes, size_t count) {
+  if (fails("read", openFile(file).path, kInputOutput | kInterrupted)) return -1;
+  return __real_read(file, bytes, count);
+}
+
+ssize_t __wrap_write(int file, const void* bytes, size_t count) {
+  return writeJudged("write", file, count,
+                     [=](size_t part) { return __real_write(file, bytes, part); });
+}
+
+ssize_t __wrap_pwrite(int file, const void* bytes, size_t count, off_t offset) {
+  return writeJudged("pwrite", file, count,
+                     [=](size_t part) { return __real_pwrite(file, bytes, part, offset); });
+}
+
+int __wrap_fsync(int file) {
+  if (fails("fsync", openFile(file).path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) {
+    return -1;
+  }
+  return __real_fsync(file);
+}
+
+int __wrap_fdatasync(int file) {
+  if (fails("fdatasync", openFile(file).path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) {
+    return -1;
+  }
+  return __real_fdatasync(file);
+}
+
+int __wrap_ftruncate(int file, off_t size) {
+  if (fails("ftruncate", openFile(file).path, kInputOutput | kInterrupted | kLastCall)) return -1;
+  return __real_ftruncate(file, size);
+}
+
+int __wrap_flock(int file, int operation) {
+  if (fails("flock", openFile(file).path, kInputOutput | kInterrupted)) return -1;
+  return __real_flock(file, operation);
+}
+
+int __wrap_fstat(int file, struct stat* status) {
+  if (fails("fstat", openFile(file).path, kInputOutput)) return -1;
+  return __real_fstat(file, status);
+}
+
+int __wrap_stat(const char* path, struct stat* status) {
+  if (fails("stat", path, kInputOutput | kDenied)) return -1;
+  return __real_stat(path, status);
+}
+
+int __wrap_lstat(const char* path, struct stat* status) {
+  if (fails("lstat", path, kInputOutput | kDenied)) return -1;
+  return __real_lstat(path, status);
+}
+
+int __wrap_rename(const char* from, const char* to) {
+  if (fails("rename to", to, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
+  return __real_rename(from, to);
+}
+
+int __wrap_unlink(const char* path) {
+  if (fails("unlink", path, kInputOutput | kDenied | kLastCall)) return -1;
+  return __real_unlink(path);
+}
+
+int __wrap_mkdir(const char* path, mode_t mode) {
+  if (fails("mkdir", path, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
+  return __real_mkdir(path, mode);
+}
+
+DIR* __wrap_opendir(const char* path) {
+  if (fails("opendir", path, kInputOutput | kDenied)) return nullptr;
+  return __real_opendir(path);
+}
+
+int __wrap_clock_gettime(clockid_t clock, timespec* now) {
+  if (clock != CLOCK_REALTIME) return __real_clock_gettime(clock, now);
+  *now = {static_cast<time_t>(std::floor(clockSeconds)), 0};
+  return 0;
+}
+}

@@ -1,0 +1,190 @@
+#include "faults/sample_device.h"
+
+#include <fcntl.h>
+#include <fmt/format.h>
+#include <fmt/ranges.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <fstream>
+#include <memory>
+#include <numeric>
+
+#include "base/file.h"
+#include "driver/daily_job.h"
+#include "driver/tasking.h"
+#include "driver/telemetry_sweep.h"
+#include "fakes/fake_platform.h"
+#include "host_platform.h"
+#include "kv/plist_codec.h"
+#include "platform/linux/store_schema.h"
+#include "platform/linux/store_writer.h"
+
+namespace tally::faults {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr double kSecondsPerDay = 86400;
+
+void require(bool done, const std::string& what) {
+  if (done) return;
+  fmt::print(stderr, "the sample device cannot be made: {}\n", what);
+  std::abort();
+}
+
+// Where memory is a disk, the walks take a fraction of the time.
+fs::path placeForDevices() {
+  return ::access("/dev/shm", W_OK) == 0 ? fs::path("/dev/shm") : fs::temp_directory_path();
+}
+
+// The day check as the program does it; returns what it said at error level.
+std::vector<std::string> dayCheck(const std::string& root) {
+  const auto log = std::make_shared<fakes::FakeSystemLog>();
+  log->lowest = LogLevel::Error;
+  const auto notifications = std::make_shared<fakes::FakeNotifications>();
+  notifications->calls = std::make_shared<fakes::CallLog>();
+  {
+    Platform services = makeHostPlatform(root, {.log = log});
+    services.notifications = notifications;
+    const PlatformScope scope(std::move(services));
+    DailyJob job({
+        .startListener = nullptr,
+        .stopListener = nullptr,
+        .runTelemetrySweep = [] { runTelemetrySweep(programSweepCapabilities()); },
+        .updateTaskingState = updateTaskingState,
+    });
+    const char* const arguments[] = {"tallyrun", "-d"};
+    job.run(arguments);
+  }
+  return log->texts(LogLevel::Error);
+}
+
+}  // namespace
+
+SampleDevice::SampleDevice() {
+  std::string name = (placeForDevices() / "tally-faults-XXXXXX").string();
+  require(::mkdtemp(name.data()) != nullptr, "no folder");
+  folder_ = name;
+  fs::copy(FAULT_DEVICE, at(""), fs::copy_options::recursive);
+  // One of the days is too old to be kept after the next run.
+  record({kDay - 35, kFormerRun - 1});
+  fs::create_directories(at("/Library/Preferences"));
+  schedule("former");
+  // A healthy run some days ago leaves what every later run finds.
+  const Ending former = run(kFormerRun);
+  require(former.sound && former.errors.empty(),
+          fmt::format("the former run: {}", fmt::join(former.errors, "; ")));
+  // What the next run has to do: samples to fold, another tasking, logs to roll.
+  record({kDay - 1, kDay, kDay + 1});
+  schedule("present");
+  const std::string repairLogs = at("/var/mobile/Library/Logs/Fixline");
+  fs::create_directories(repairLogs);
+  std::ofstream(repairLogs + "/fix.log") << "new";
+  std::ofstream(repairLogs + "/fix.log.1") << "old";
+  std::ofstream(repairLogs + "/fix.log.2") << "older";
+  fs::rename(at("/device"), folder_ / "device");  // nothing is ever written there
+  fs::rename(at(""), folder_ / "original");
+}
+
+SampleDevice::~SampleDevice() {
+  std::error_code ignored;
+  fs::remove_all(folder_, ignored);
+}
+
+void SampleDevice::record(const std::vector<std::int32_t>& days) const {
+  auto writer = StoreWriter::open(metricsStorePath(at("")), IfMissing::Create);
+  require(writer && *writer, "the store");
+  require(static_cast<bool>((*writer)->begin()), "a transaction");
+  for (const std::int32_t day : days) {
+    std::vector<double> values(kSamples);
+    std::iota(values.begin(), values.end(), 0);
+    const std::vector<std::uint32_t> offsets(kSamples, 0);
+    require((*writer)->setScalar(day, "count", countOf(day)) &&
+                (*writer)->pushSamples(day, "time", values, offsets),
+            "a row");
+  }
+  require(static_cast<bool>((*writer)->commit()), "the rows");
+}
+
+void SampleDevice::restore(bool withStore) const {
+  fs::remove_all(at(""));
+  fs::copy(folder_ / "original", at(""), fs::copy_options::recursive);
+  fs::create_directory_symlink(folder_ / "device", at("/device"));
+  if (!withStore) fs::remove_all(at("/var/mobile/Library/Tallybook"));
+}
+
+Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
+                         const std::string& folder) const {
+  const std::string output = folder_ / "output", errors = folder_ / "errors";
+  faultWasMet() = false;
+  const pid_t child = ::fork();
+  require(child >= 0, "no process");
+  if (child == 0) {
+    // What the storage library says on standard error; a sanitizer's report, too.
+    ::dup2(::open(output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600), STDERR_FILENO);
+    setClock(day * kSecondsPerDay + kSecondsPerDay / 2);
+    std::ofstream(errors, std::ios::trunc).close();
+    if (fault != nullptr) arm(*fault, n, at(folder));
+    const auto said = dayCheck(at(""));
+    disarm();
+    std::ofstream list(errors);
+    for (const std::string& line : said) list << line << '\n';
+    list.close();
+    ::_exit(0);
+  }
+  int status = 0;
+  require(::waitpid(child, &status, 0) == child, "no child");
+  Ending ending;
+  ending.met = faultWasMet();
+  ending.killed = WIFEXITED(status) && WEXITSTATUS(status) == kKilledStatus;
+  ending.sound = ending.killed || (WIFEXITED(status) && WEXITSTATUS(status) == 0);
+  std::ifstream list(errors);
+  for (std::string line; std::getline(list, line);) ending.errors.push_back(line);
+  if (!ending.sound) {
+    ending.errors.push_back(
+        fmt::format("ended with status {:#x}: {}", status, *readFile(output, 1u << 20)));
+  }
+  return ending;
+}
+
+void SampleDevice::schedule(const std::string& tasking) const {
+  fs::copy_file(at("/schedules/" + tasking + ".plist"),
+                at("/Library/Preferences/vellum.Ferryman.plist"),
+                fs::copy_options::overwrite_existing);
+}
+
+std::string SampleDevice::at(std::string_view path) const {
+  return (folder_ / "root").string() + std::string(path);
+}
+
+std::vector<std::string> SampleDevice::files(std::string_view folder) const {
+  std::vector<std::string> found;
+  if (!fs::exists(at(folder))) return found;
+  for (const auto& entry : fs::recursive_directory_iterator(at(folder))) {
+    if (entry.is_regular_file()) found.push_back(entry.path().string());
+  }
+  std::sort(found.begin(), found.end());
+  return found;
+}
+
+std::string SampleDevice::copyOfStore() const {
+  const std::string store = metricsStorePath(at("")), copy = folder_ / "copy";
+  // Without the map of the log, which its next reader makes anew.
+  for (const char* suffix : {"", "-wal"}) {
+    fs::remove(copy + suffix);
+    if (fs::exists(store + suffix)) fs::copy_file(store + suffix, copy + suffix);
+  }
+  return fs::exists(copy) ? copy : "";
+}
+
+KvRef<KvDictionary> dictionaryIn(const std::string& path) {
+  const auto text = readFile(path, 1u << 24);
+  const auto root = text ? decodePlist(*text) : Result<KvRef<KvObject>>(text.error());
+  return root ? KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get())) : nullptr;
+}
+
+std::int64_t countOf(std::int32_t day) { return day % 1000; }
+
+}  // namespace tally::faults
