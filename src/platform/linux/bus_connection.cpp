@@ -72,7 +72,7 @@ Status sendToEndpoint(std::string_view name, const KvDictionary& message) {
   const std::unique_ptr<sd_bus_message, MessageDeleter> call(made);
   if (result < 0) return Error{std::strerror(-result), -result};
   if (Status content = appendBusDictionary(call.get(), message); !content) return content;
-  sd_bus_error error = SD_BUS_ERROR_NULL;
+  sd_bus_error error{};
   result = ::sd_bus_call(bus->get(), call.get(), kAnswerMicroseconds, &error, nullptr);
   if (result >= 0) return Done{};
   Error reason{error.message != nullptr ? error.message : std::strerror(-result), -result};
