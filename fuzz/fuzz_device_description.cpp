@@ -1,0 +1,66 @@
+// device.plist: every service that it answers for is asked.
+#include <array>
+
+#include "described_folder.h"
+#include "platform/linux/analytics_events.h"
+#include "platform/linux/described_purgeable_space.h"
+#include "platform/linux/described_stackshot.h"
+#include "platform/linux/device_information.h"
+#include "platform/linux/kernel_values.h"
+#include "platform/linux/locale.h"
+#include "platform/linux/log_header_facts.h"
+
+using namespace tally;
+using fuzz::require;
+
+namespace {
+
+void askKernelValues(LinuxKernelValues& values) {
+  std::array<std::byte, 64> buffer;
+  for (const std::string_view name : {"Value", "vm.swapusage", "kern.bootsessionuuid"}) {
+    for (const std::size_t room : {std::size_t{0}, std::size_t{8}, buffer.size()}) {
+      std::size_t length = room;
+      values.readKernelValue(name, std::span(buffer).first(room), &length);
+      require(length <= buffer.size(), "no more is delivered than there is room for");
+    }
+  }
+  values.MonotonicTicks();
+  const auto timebase = values.TimebaseInfo();
+  require(!timebase || timebase->denominator != 0, "a timebase can be divided by");
+}
+
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  static const fuzz::DescribedFolder folder;
+  fuzz::Input input(data, size);
+  folder.writeInput("device.plist", input);
+  const auto description = std::make_shared<DeviceDescription>(folder.path() + "/device.plist",
+                                                               std::make_shared<fuzz::UnreadLog>());
+
+  const auto device = std::make_shared<LinuxDeviceInformation>(folder.path(), description);
+  device->DeviceQuery("DiskUsage");
+  device->DeviceQuery("InternalBuild");
+  device->HasInternalDiagnostics("Value");
+  device->copySystemVersionDictionary();
+  device->SMAOSVersion();
+  LinuxKernelValues values(description);
+  askKernelValues(values);
+  LinuxLocale locale(folder.path(), {}, description);
+  locale.PreferredLanguages();
+  locale.SystemLanguages();
+  locale.CurrentRegionCode();
+  LinuxLogHeaderFacts facts(device, description);
+  for (const std::string& line : {facts.SysIdDescription(), facts.HardwareModelString()}) {
+    require(line.find('\n') == line.npos, "a line of a log's header stays one");
+  }
+  DescribedStackshot stackshot(folder.path(), description);
+  if (const auto config = stackshot.stackshotConfigCreate()) {
+    config->stackshotConfigSetFlags(0x10000);
+    config->stackshotCapture();
+    config->stackshotBuffer();
+  }
+  DescribedPurgeableSpace space(description);
+  if (space.isAvailable()) space.copyItemizedPurgeableSpace(*KvDictionary::create());
+  return 0;
+}

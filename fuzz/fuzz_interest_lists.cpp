@@ -1,0 +1,68 @@
+// Interest lists at the statistics hub: parsed, served from drivers of any values, and mapped.
+#include "fuzz_values.h"
+#include "platform/device/hub_region.h"
+#include "platform/device/statistics_hub.h"
+
+using namespace tally;
+using fuzz::require;
+
+namespace {
+
+constexpr std::uint32_t kStart = 0, kConfigure = 2, kUpdate = 3;
+constexpr std::size_t kElement = 64;
+
+struct NoLog final : SystemLog {
+  bool enabled(LogLevel) const override { return true; }
+  void write(LogLevel, std::string_view) override {}
+};
+
+std::shared_ptr<const RegistrySource::Entries> takeDrivers(fuzz::Input& input) {
+  auto drivers = std::make_shared<RegistrySource::Entries>();
+  for (int left = input.take<std::uint8_t>() % 4; left > 0; --left) {
+    auto driver = std::make_shared<RegistryEntry>();
+    driver->id = input.take<std::uint8_t>();
+    driver->properties = fuzz::ValueReader(input).takeDictionary();
+    drivers->push_back(std::move(driver));
+  }
+  return drivers;
+}
+
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  fuzz::Input input(data, size);
+  const auto drivers = takeDrivers(input);
+  const bool isRaw = input.takeFlag();
+  const auto hub = isRaw ? fuzz::ValueReader(input).takeDictionary() : nullptr;
+  const auto list = input.takeRest();
+  const auto files = std::make_shared<DescribedFiles>("/nonexistent", std::make_shared<NoLog>());
+
+  const auto interests = parseInterestList(list);
+  if (interests) {
+    require(list.size() == 8 + interests->size() * 24, "a list that is taken is whole");
+    if (const auto region = makeChannelRegion(*interests, *drivers, *files)) {
+      require(region->size() > 0 && region->size() % kElement == 0, "a region is whole elements");
+      std::vector<std::byte> memory(region->size());
+      for (std::size_t refresh = 0; refresh < 3; ++refresh) region->writeFrame(refresh, memory);
+    }
+  }
+
+  RegistryResult result = 0;
+  const auto client = openStatisticsHub(hub, drivers, files, &result);
+  require((client != nullptr) == (result == kRegistrySuccess), "a client or a reason");
+  if (client == nullptr) return 0;
+  MethodCall start;
+  client->call(kStart, start);
+  std::uint64_t token = 0;
+  MethodCall configure{.structInput = list, .scalarOutput = {&token, 1}};
+  if (client->call(kConfigure, configure) != kRegistrySuccess) return 0;
+  require(interests.has_value(), "only a whole list is configured");
+  std::span<const std::byte> memory;
+  if (client->map(static_cast<std::uint32_t>(token), &memory) != kRegistrySuccess) return 0;
+  require(!memory.empty(), "a region is never empty");
+  MethodCall update{.scalarInput = {&token, 1}};
+  client->call(kUpdate, update);
+  require(client->unmap(static_cast<std::uint32_t>(token), memory.data()) == kRegistrySuccess,
+          "what was mapped is unmapped");
+  return 0;
+}

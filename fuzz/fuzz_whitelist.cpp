@@ -1,0 +1,80 @@
+// The whitelist: as a file of any bytes, or as a property list of any shape; then keys looked up.
+#include <string>
+
+#include "config/config.h"
+#include "fakes/fake_platform.h"
+#include "fuzz_values.h"
+
+using namespace tally;
+using fuzz::require;
+
+namespace {
+
+// The longest entry that the key begins with, found by looking at each.
+const KvString* longestPrefix(const KvDictionary& root, std::string_view sectionTitle,
+                              std::string_view key) {
+  const KvString* longest = nullptr;
+  for (const auto& group : root) {
+    const auto* const sections = kvCast<KvDictionary>(group.value.get());
+    if (sections == nullptr || groupState(group.key->view()) != GroupState::InForce) continue;
+    const auto* const entries = sections->getAs<KvDictionary>(sectionTitle);
+    if (entries == nullptr) continue;
+    for (const auto& entry : *entries) {
+      const std::string_view prefix = entry.key->view();
+      if (kvCast<KvDictionary>(entry.value.get()) == nullptr || !key.starts_with(prefix)) continue;
+      if (longest == nullptr || prefix.size() > longest->view().size()) longest = entry.key.get();
+    }
+  }
+  return longest;
+}
+
+void lookUp(const TBConfig& config, const KvDictionary& root, std::string_view key) {
+  const auto match = config.matchScalarKey(key);
+  require(config.configOptionsForScalarKey(key) == match.options, "both answers are the same");
+  require((match.kind == WhitelistMatchKind::None) == (match.options == nullptr),
+          "a key that is admitted has options");
+  config.configOptionsForDistributionKey(key);
+  if (match.kind == WhitelistMatchKind::Exact) {
+    require(match.entry->key->view() == key, "an exact match is the key");
+    return;
+  }
+  const KvString* const expected = longestPrefix(root, "ScalarKeyPrefixes", key);
+  require((match.kind == WhitelistMatchKind::Prefix) == (expected != nullptr) &&
+              (expected == nullptr || match.entry->key->view() == expected->view()),
+          "the longest prefix matches");
+}
+
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  fuzz::Input input(data, size);
+  fakes::FakePlatform fake = fakes::makeFakePlatform();
+  const auto scope = fake.install();
+  WhitelistFile file;
+  if (fuzz::isDocument(input.rest())) {
+    file = parseWhitelistFile(input.rest());
+  } else {
+    file.read = true;
+    file.root = fuzz::ValueReader(input).takeDictionary();
+  }
+  const auto config = TBConfig::initWithFile(file);
+  require((config != nullptr) == static_cast<bool>(file.root), "a file that is read is in force");
+  if (config == nullptr) return 0;
+  for (const auto& group : *file.root) {
+    const auto* const sections = kvCast<KvDictionary>(group.value.get());
+    if (sections == nullptr) continue;
+    for (const auto& section : *sections) {
+      const auto* const entries = kvCast<KvDictionary>(section.value.get());
+      if (entries == nullptr) continue;
+      std::size_t looked = 0;
+      for (const auto& entry : *entries) {
+        const std::string key(entry.key->view());
+        lookUp(*config, *file.root, key);
+        lookUp(*config, *file.root, key + "x");
+        lookUp(*config, *file.root, std::string_view(key).substr(0, key.size() / 2));
+        if (++looked == 8) break;
+      }
+    }
+  }
+  return 0;
+}

@@ -1,0 +1,33 @@
+// What holds of every value that the codec delivers or is given.
+#pragma once
+
+#include <string>
+
+#include "fuzz.h"
+#include "kv/json_writer.h"
+#include "kv/plist_codec.h"
+
+namespace tally::fuzz {
+
+// Writes the value in each form. The XML reads back as itself, but that keys which XML cannot carry
+// may have become one.
+inline void checkRoundTrip(const KvObject& value) {
+  std::string json;
+  appendJson(json, value);
+  require(!json.empty() && json.find('\n') == json.npos, "JSON is one line");
+  require(kvEqual(&value, &value) || !kvText(&value).empty(), "a value has a text");
+
+  const auto written = encodeXmlPlist(value);
+  if (!written) return;  // too deep
+  const auto read = decodePlist(*written);
+  require(static_cast<bool>(read), "what is written can be read");
+  const auto second = encodeXmlPlist(**read);
+  constexpr std::string_view kReplacement = "\xEF\xBF\xBD";
+  require(second && (*second == *written || written->find(kReplacement) != written->npos),
+          "reading and writing changes nothing");
+  const auto readAgain = decodePlist(*second);
+  const auto third = readAgain ? encodeXmlPlist(**readAgain) : Error{};
+  require(third && *third == *second, "what was read once stays as it is");
+}
+
+}  // namespace tally::fuzz
