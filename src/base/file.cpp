@@ -67,6 +67,7 @@ void giveToOwnerOfFolder(int descriptor, const std::string& path) {
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
   constexpr std::size_t kPiece = 128u << 10;
+  constexpr std::size_t kSmallestPiece = 4096;  // files of the kernel say that they are empty
   // Non-blocking, so that a pipe put in a file's place cannot hold the run up.
   Descriptor file(retried([&] { return ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK); }));
   if (file.get() < 0) return systemError("cannot open", path);
@@ -78,7 +79,7 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
   std::string contents;
   contents.reserve(static_cast<std::size_t>(status.st_size));
   std::vector<char> piece(
-      std::min<std::size_t>(kPiece, static_cast<std::size_t>(status.st_size) + 1));
+      std::clamp(static_cast<std::size_t>(status.st_size) + 1, kSmallestPiece, kPiece));
   for (;;) {
     const auto count = retried([&] { return ::read(file.get(), piece.data(), piece.size()); });
     if (count < 0) return systemError("cannot read", path);
