@@ -25,8 +25,7 @@ void askKernelValues(LinuxKernelValues& values) {
     }
   }
   values.MonotonicTicks();
-  const auto timebase = values.TimebaseInfo();
-  require(!timebase || timebase->denominator != 0, "a timebase can be divided by");
+  values.TimebaseInfo();
 }
 
 }  // namespace
