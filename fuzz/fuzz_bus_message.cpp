@@ -1,4 +1,5 @@
-// Messages of the bus: values written into one and read again, and messages of any types read.
+// Messages of the bus: values written into one and read again, messages of any types read, and the
+// list of applications that one may bring.
 #include <systemd/sd-bus.h>
 
 #include <sys/socket.h>
@@ -6,6 +7,8 @@
 #include <memory>
 #include <string>
 
+#include "driver/app_info_listener.h"
+#include "fakes/fake_platform.h"
 #include "fuzz_values.h"
 #include "platform/linux/bus_message.h"
 
@@ -58,6 +61,16 @@ void checkRoundTrip(const KvDictionary& values) {
   require(
       again && (kvEqual(read->get(), again->get()) || kvText(read->get()) == kvText(again->get())),
       "writing and reading changes nothing");
+}
+
+void takeApplications(const KvDictionary& message) {
+  const auto* const list = message.getAs<KvArray>("app_data");
+  if (list == nullptr) return;
+  const auto applications = makeAppInformation(*list);
+  require(applications->size() <= list->size(), "no application is made up");
+  for (const auto& application : *applications) {
+    require(kvCast<KvDictionary>(application.get())->size() == 5, "an application is whole");
+  }
 }
 
 // Appends a value of any type whatever: also of those that have no counterpart here.
@@ -164,14 +177,21 @@ class AnyMessage {
 
 int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
+  const fakes::FakePlatform fake = fakes::makeFakePlatform();
+  const auto scope = fake.install();
   if (fuzz::isDocument(input.rest()) || input.takeFlag()) {
     const auto value = fuzz::valueOf(input);
-    if (const auto* values = kvCast<KvDictionary>(value.get())) checkRoundTrip(*values);
+    if (const auto* values = kvCast<KvDictionary>(value.get())) {
+      checkRoundTrip(*values);
+      takeApplications(*values);
+    }
     return 0;
   }
   const Message message = newMessage();
   AnyMessage(message.get(), input).appendDictionary();
   const auto read = readBack(message.get());
-  if (read) checkRoundTrip(**read);
+  if (!read) return 0;
+  checkRoundTrip(**read);
+  takeApplications(**read);
   return 0;
 }

@@ -119,7 +119,15 @@ constexpr std::string_view kKnownTexts[] = {"Entries",
                                             "version",
                                             "adam_id",
                                             "arch",
-                                            "uuid"};
+                                            "uuid",
+                                            "TaskingID",
+                                            "TaskingDigest",
+                                            "TaskingPayload",
+                                            "User",
+                                            "Domain",
+                                            "Key",
+                                            "mobile",
+                                            "__sysmetra__"};
 
 class ValueReader {
  public:
