@@ -127,7 +127,23 @@ constexpr std::string_view kKnownTexts[] = {"Entries",
                                             "Domain",
                                             "Key",
                                             "mobile",
-                                            "__sysmetra__"};
+                                            "__sysmetra__",
+                                            "TBCrashLogVersion",
+                                            "TBStartDate",
+                                            "TBLogCreationDate",
+                                            "TBMetadata",
+                                            "TBScalars",
+                                            "TBDistributions",
+                                            "TBDistributionsHistogram",
+                                            "TBActivatedAppInfo",
+                                            "(-inf, 10]",
+                                            "(10, 20]",
+                                            "(20, inf)",
+                                            "bundle",
+                                            "adamID",
+                                            "inf",
+                                            "-inf",
+                                            "nan"};
 
 class ValueReader {
  public:
