@@ -17,7 +17,7 @@ constexpr std::int32_t kDay = 19999;
 void takeRows(fuzz::Input& input, fakes::FakeMetricsStore& store) {
   for (int left = input.take<std::uint8_t>() % 32; left > 0 && !input.empty(); --left) {
     const auto place = input.take<std::uint8_t>();
-    const std::string_view key = fuzz::kKnownTexts[place % std::size(fuzz::kKnownTexts)];
+    const std::string_view key = fuzz::knownText(place);
     if (input.takeFlag()) {
       store.putScalar(kDay, key, input.take<std::int64_t>());
       continue;

@@ -12,138 +12,41 @@
 
 namespace tally::fuzz {
 
-// The keys and texts that mean something somewhere. Only append: seeds name them by their place.
-constexpr std::string_view kKnownTexts[] = {"Entries",
-                                            "Class",
-                                            "Name",
-                                            "ID",
-                                            "Parents",
-                                            "Properties",
-                                            "Hub",
-                                            "UserClient",
-                                            "Methods",
-                                            "Method",
-                                            "Selector",
-                                            "Flags",
-                                            "Data",
-                                            "SizeStatus",
-                                            "DataStatus",
-                                            "AnnouncedSize",
-                                            "OpenStatus",
-                                            "CloseStatus",
-                                            "StartStatus",
-                                            "ConfigureStatus",
-                                            "MapStatus",
-                                            "UpdateStatus",
-                                            "RawFrames",
-                                            "HwReportHub",
-                                            "HwReportLegendPublic",
-                                            "HwReportLegend",
-                                            "HwReportChannels",
-                                            "HwReportGroupName",
-                                            "HwReportSubGroupName",
-                                            "HwReportChannelInfo",
-                                            "HwReportChannelUnit",
-                                            "HwReportChannelConfig",
-                                            "HwReportValues",
-                                            "Channel",
-                                            "Type",
-                                            "Value",
-                                            "Frames",
-                                            "Time",
-                                            "InTransitions",
-                                            "Residency",
-                                            "Hits",
-                                            "Minimum",
-                                            "Maximum",
-                                            "Sum",
-                                            "SPXStorage",
-                                            "HwReportDrivers",
-                                            "HwReportChannelGroups",
-                                            "QueryOpts",
-                                            "DriverID",
-                                            "DriverName",
-                                            "LegendChannel",
-                                            "RawElements",
-                                            "ChannelName",
-                                            "UnitLabel",
-                                            "StateNames",
-                                            "ProcessedChannelConfig",
-                                            "ScalarKeys",
-                                            "DistributionKeys",
-                                            "ScalarKeyPrefixes",
-                                            "DistributionKeyPrefixes",
-                                            "sig_fig",
-                                            "bucket_interval",
-                                            "intervals",
-                                            "InternalTesting",
-                                            "DeviceAnswers",
-                                            "KernelValues",
-                                            "PurgeableSpace",
-                                            "DiskUsage",
-                                            "Applications",
-                                            "CaptureStatus",
-                                            "FlagsStatus",
-                                            "File",
-                                            "Error",
-                                            "Timebase",
-                                            "Numerator",
-                                            "Denominator",
-                                            "MonotonicTicks",
-                                            "HardwareModel",
-                                            "SystemID",
-                                            "InternalBuild",
-                                            "InverseDeviceID",
-                                            "AnalyticsEvents",
-                                            "Wanted",
-                                            "Stackshot",
-                                            "PreferredLanguages",
-                                            "SystemLanguages",
-                                            "RegionCode",
-                                            "OSVersion",
-                                            "SystemVersion",
-                                            "HasInternalDiagnostics",
-                                            "chip-id",
-                                            "manufacturer-id",
-                                            "num-bus",
-                                            "nand-device-desc",
-                                            "HwProviderClass",
-                                            "HwNameMatch",
-                                            "HwEntryIDMatch",
-                                            "HwPropertyMatch",
-                                            "Driver",
-                                            "vellum.",
-                                            "operation",
-                                            "app_data",
-                                            "bundle_id",
-                                            "version",
-                                            "adam_id",
-                                            "arch",
-                                            "uuid",
-                                            "TaskingID",
-                                            "TaskingDigest",
-                                            "TaskingPayload",
-                                            "User",
-                                            "Domain",
-                                            "Key",
-                                            "mobile",
-                                            "__sysmetra__",
-                                            "TBCrashLogVersion",
-                                            "TBStartDate",
-                                            "TBLogCreationDate",
-                                            "TBMetadata",
-                                            "TBScalars",
-                                            "TBDistributions",
-                                            "TBDistributionsHistogram",
-                                            "TBActivatedAppInfo",
-                                            "(-inf, 10]",
-                                            "(10, 20]",
-                                            "(20, inf)",
-                                            "bundle",
-                                            "adamID",
-                                            "inf",
-                                            "-inf",
-                                            "nan"};
+// The keys and texts that mean something somewhere, with bars between them. Only append: seeds name
+// them by their place.
+constexpr std::string_view kKnownTexts =
+    "Entries|Class|Name|ID|Parents|Properties|Hub|UserClient|Methods|Method|Selector|Flags|Data|"
+    "SizeStatus|DataStatus|AnnouncedSize|OpenStatus|CloseStatus|StartStatus|ConfigureStatus|"
+    "MapStatus|UpdateStatus|RawFrames|HwReportHub|HwReportLegendPublic|HwReportLegend|"
+    "HwReportChannels|HwReportGroupName|HwReportSubGroupName|HwReportChannelInfo|"
+    "HwReportChannelUnit|HwReportChannelConfig|HwReportValues|Channel|Type|Value|Frames|Time|"
+    "InTransitions|Residency|Hits|Minimum|Maximum|Sum|SPXStorage|HwReportDrivers|"
+    "HwReportChannelGroups|QueryOpts|DriverID|DriverName|LegendChannel|RawElements|ChannelName|"
+    "UnitLabel|StateNames|ProcessedChannelConfig|ScalarKeys|DistributionKeys|ScalarKeyPrefixes|"
+    "DistributionKeyPrefixes|sig_fig|bucket_interval|intervals|InternalTesting|DeviceAnswers|"
+    "KernelValues|PurgeableSpace|DiskUsage|Applications|CaptureStatus|FlagsStatus|File|Error|"
+    "Timebase|Numerator|Denominator|MonotonicTicks|HardwareModel|SystemID|InternalBuild|"
+    "InverseDeviceID|AnalyticsEvents|Wanted|Stackshot|PreferredLanguages|SystemLanguages|"
+    "RegionCode|OSVersion|SystemVersion|HasInternalDiagnostics|chip-id|manufacturer-id|num-bus|"
+    "nand-device-desc|HwProviderClass|HwNameMatch|HwEntryIDMatch|HwPropertyMatch|Driver|vellum.|"
+    "operation|app_data|bundle_id|version|adam_id|arch|uuid|TaskingID|TaskingDigest|"
+    "TaskingPayload|User|Domain|Key|mobile|__sysmetra__|TBCrashLogVersion|TBStartDate|"
+    "TBLogCreationDate|TBMetadata|TBScalars|TBDistributions|TBDistributionsHistogram|"
+    "TBActivatedAppInfo|(-inf, 10]|(10, 20]|(20, inf)|bundle|adamID|inf|-inf|nan";
+
+// The known text of that number, of any number.
+inline std::string_view knownText(std::size_t number) {
+  static const auto* const texts = [] {
+    auto* const made = new std::vector<std::string_view>();
+    for (std::size_t begin = 0; begin <= kKnownTexts.size();) {
+      const std::size_t end = std::min(kKnownTexts.find('|', begin), kKnownTexts.size());
+      made->push_back(kKnownTexts.substr(begin, end - begin));
+      begin = end + 1;
+    }
+    return made;
+  }();
+  return (*texts)[number % texts->size()];
+}
 
 class ValueReader {
  public:
@@ -155,7 +58,7 @@ class ValueReader {
     constexpr int kDeepest = 48;
     switch (const auto kind = input_.take<std::uint8_t>() % 16; kind) {
       case 0:
-        return KvString::create(known(input_.take<std::uint8_t>()));
+        return KvString::create(knownText(input_.take<std::uint8_t>()));
       case 1:
         return KvString::create(input_.takeText(input_.take<std::uint8_t>()));
       case 2:
@@ -198,13 +101,10 @@ class ValueReader {
   }
 
  private:
-  static std::string_view known(std::size_t number) {
-    return kKnownTexts[number % std::size(kKnownTexts)];
-  }
   std::string takeKey() {
     constexpr std::uint8_t kFirstLength = 0xC0;
     const auto first = input_.take<std::uint8_t>();
-    if (first < kFirstLength) return std::string(known(first));
+    if (first < kFirstLength) return std::string(knownText(first));
     return std::string(input_.takeText(first - kFirstLength));
   }
   KvRef<KvObject> takeArray(int depth) {
