@@ -116,10 +116,15 @@ class ValueReader {
   }
   KvRef<KvObject> takeLongText() {
     const auto letter = input_.take<char>();
-    return KvString::create(std::string(input_.take<std::uint8_t>() * std::size_t{8}, letter));
+    const std::size_t length =
+        std::min(input_.take<std::uint8_t>() * std::size_t{8}, longLettersLeft_);
+    longLettersLeft_ -= length;
+    return KvString::create(std::string(length, letter));
   }
 
   Input& input_;
+  std::size_t longLettersLeft_ =
+      4096;  // else three bytes after the other would cost a run its time
 };
 
 inline bool isDocument(std::string_view bytes) {
