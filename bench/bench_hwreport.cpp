@@ -146,6 +146,7 @@ double perChannel(const Operation& operation, const Devices& devices) {
 
 double perChannelHot(const Operation& operation, Device& device, std::size_t channels) {
   std::vector<double> times;
+  times.reserve(kHotRuns);
   for (int i = 0; i < kHotRuns; ++i) {
     times.push_back(timeOf(operation, device) / static_cast<double>(channels));
   }

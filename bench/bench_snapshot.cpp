@@ -57,7 +57,7 @@ std::string renderWithLibrary(const std::vector<Record>& records, std::size_t ca
     add(" WL=%7u/%7u/%7u/%7u", r[3], r[6], r[9], r[12]);
     add(" WM=%5u/%5u/%5u/%5u\n", r[4], r[7], r[10], r[13]);
   }
-  add("\n");
+  add("%s", "\n");
   text.resize(used);
   return text;
 }

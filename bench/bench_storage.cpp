@@ -143,7 +143,7 @@ KvRef<KvDictionary> linearNandInfo(const Bytes& bytes) {
                                    [&](const StatisticKey& known) { return known.key == key; });
     if (row == std::end(kStatisticKeys)) return;
     const std::uint32_t taken = std::min<std::uint32_t>(count, std::max<unsigned>(row->maximum, 1));
-    for (std::uint32_t i = 0; i < taken; ++i) {
+    for (std::size_t i = 0; i < taken; ++i) {
       const std::string name = taken == 1 ? row->name : row->name + std::to_string(i);
       const auto* found = std::find_if(keyMap.begin(), keyMap.end() - 1,
                                        [&](const SPXKeyMapRow& r) { return r.name == name; });

@@ -18,6 +18,7 @@ double seconds(const timeval& time) {
 
 std::vector<char*> pointers(std::vector<std::string>& strings) {
   std::vector<char*> result;
+  result.reserve(strings.size() + 1);
   for (std::string& string : strings) result.push_back(string.data());
   result.push_back(nullptr);
   return result;
@@ -56,6 +57,7 @@ ProcessCost medianRun(int runs, const std::vector<std::string>& command,
                       const std::vector<std::string>& environment) {
   runProcess(command, environment);
   std::vector<ProcessCost> costs;
+  costs.reserve(static_cast<std::size_t>(runs));
   for (int i = 0; i < runs; ++i) costs.push_back(runProcess(command, environment));
   const auto middle = costs.begin() + runs / 2;
   std::nth_element(costs.begin(), middle, costs.end(),
