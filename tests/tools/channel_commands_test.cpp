@@ -1,15 +1,5 @@
 // tallyctl channels on described devices: what is chosen, shown and refused.
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-#include <stdlib.h>
-
-#include <filesystem>
-#include <fstream>
-#include <map>
-#include <nlohmann/json.hpp>
-
-#include "host_platform.h"
-#include "tools/tool.h"
+#include "tools/tool_fixture.h"
 
 namespace tally::tools {
 namespace {
@@ -88,47 +78,22 @@ std::string hub(const std::string& content = "") {
   return entry("HwReportHub", key("Hub", dict(content)));
 }
 
-struct Outcome {
-  int status;
-  std::string out, err;
-};
-
-class ChannelCommands : public testing::Test {
+class ChannelCommands : public ToolTest {
  protected:
-  void SetUp() override {
-    char name[] = "/tmp/tally-channels-XXXXXX";
-    root_ = mkdtemp(name);
-    std::filesystem::create_directory(root_ + "/device");
-  }
-  void TearDown() override { std::filesystem::remove_all(root_); }
-
   void describe(const std::string& entries) const {
-    std::ofstream(root_ + "/device/registry.plist")
-        << "<?xml version=\"1.0\"?><plist version=\"1.0\">" << dict(key("Entries", array(entries)))
-        << "</plist>";
+    putPlist("device/device/registry.plist", dict(key("Entries", array(entries))));
   }
-  Outcome run(const std::vector<std::string>& arguments, const Terminal& terminal = {}) const {
-    std::vector<const char*> pointers = {"tallyctl", "channels"};
-    for (const std::string& argument : arguments) pointers.push_back(argument.c_str());
-    ToolContext context;
-    context.root = root_;
-    context.output = context.errors = terminal;
-    std::FILE* const out = context.out = std::tmpfile();
-    std::FILE* const err = context.err = std::tmpfile();
-    const int status =
-        runTool(context, pointers, [](const std::string& root) { return makeHostPlatform(root); });
-    return {status, contentOf(out), contentOf(err)};
+  Outcome channels(std::vector<std::string> arguments) {
+    arguments.insert(arguments.begin(), "channels");
+    return run(arguments);
   }
-
- private:
-  static std::string contentOf(std::FILE* file) {
-    std::string content(static_cast<std::size_t>(std::ftell(file)), '\0');
-    std::rewind(file);
-    EXPECT_EQ(std::fread(content.data(), 1, content.size(), file), content.size());
-    std::fclose(file);
-    return content;
+  // What is read from the sample of a device, by the names of channels.
+  static std::map<std::string, json> byName(const Outcome& outcome) {
+    std::map<std::string, json> channels;
+    const json document = outcome.json();
+    for (const auto& item : document["channels"]) channels[item["name"]] = item;
+    return channels;
   }
-  std::string root_;
 };
 
 TEST_F(ChannelCommands, FiltersChooseAndCombine) {
@@ -158,23 +123,15 @@ TEST_F(ChannelCommands, FiltersChooseAndCombine) {
     SCOPED_TRACE(testing::PrintToString(c.filters));
     std::vector<std::string> arguments = c.filters;
     arguments.insert(arguments.begin(), {"list", "--json"});
-    const Outcome outcome = run(arguments);
+    const Outcome outcome = channels(arguments);
     std::string names;
-    const json list = json::parse(outcome.out);
+    const json list = outcome.json();
     for (const auto& item : list) names += item["name"].get<std::string>() + " ";
     EXPECT_EQ(names, c.names);
     EXPECT_EQ(outcome.status, *c.names != '\0' ? kSuccess : kWrong);
     EXPECT_EQ(outcome.err.empty(), *c.names != '\0');
   }
-  EXPECT_EQ(run({"list", "--category", "0"}).status, kBadUsage) << "not all of them";
-}
-
-// What is read from the sample of a device, by the names of channels.
-std::map<std::string, json> byName(const Outcome& outcome) {
-  std::map<std::string, json> channels;
-  const json document = json::parse(outcome.out);
-  for (const auto& item : document["channels"]) channels[item["name"]] = item;
-  return channels;
+  EXPECT_EQ(channels({"list", "--category", "0"}).status, kBadUsage) << "not all of them";
 }
 
 TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
@@ -191,28 +148,28 @@ TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.arguments.back());
-    const Outcome outcome = run(c.arguments);
+    const Outcome outcome = channels(c.arguments);
     ASSERT_EQ(outcome.status, kSuccess) << outcome.err;
-    auto channels = byName(outcome);
-    EXPECT_EQ(channels["count"]["value"], c.count);
-    const json& idle = channels["power"]["states"][0];
+    auto shown = byName(outcome);
+    EXPECT_EQ(shown["count"]["value"], c.count);
+    const json& idle = shown["power"]["states"][0];
     EXPECT_EQ(idle["name"], "IDLE");
     EXPECT_EQ(idle["entries"], c.entries);
     EXPECT_EQ(idle["residency"], c.residency);
     EXPECT_EQ(idle["share"], c.share);
-    const json& middle = channels["latency"]["buckets"][1];
+    const json& middle = shown["latency"]["buckets"][1];
     EXPECT_EQ(middle["lower"], 10);
     EXPECT_EQ(middle["upper"], 20);
     EXPECT_EQ(middle["hits"], c.hits);
     EXPECT_EQ(middle["sum"], c.sum);
     EXPECT_TRUE(middle["minimum"].is_null());
-    EXPECT_EQ(channels["lanes"]["values"], c.lanes);
+    EXPECT_EQ(shown["lanes"]["values"], c.lanes);
   }
 }
 
 TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
   describe(hub() + goodDriver());
-  const Outcome outcome = run({"sample"}, {80, false, false, true});
+  const Outcome outcome = channels({"sample"});
   EXPECT_EQ(outcome.out,
             "\ngood <id 0x101>\n"
             " A\n"
@@ -261,7 +218,7 @@ TEST_F(ChannelCommands, WrongDriversAreShownAsFarAsTheyCanBeRead) {
     const char* const config = "AQAAAAAAAAAAAAAA//8AAAAAAAAAAAAAAAAAAAEAAAA=";
     describe(hub() + driver("wrong", array(group("", kEvents, channel(1, c.type, "x"), config)),
                             frames(1, array(c.elements))));
-    const Outcome outcome = run({"sample", "--json"});
+    const Outcome outcome = channels({"sample", "--json"});
     EXPECT_EQ(outcome.status, kSuccess) << outcome.err;
     EXPECT_EQ(byName(outcome)["x"].at(json::json_pointer(c.shown)), c.value);
   }
@@ -269,65 +226,45 @@ TEST_F(ChannelCommands, WrongDriversAreShownAsFarAsTheyCanBeRead) {
 
 TEST_F(ChannelCommands, AWaitShowsOnATerminalOnly) {
   describe(hub() + goodDriver());
-  EXPECT_EQ(run({"sample", "--delta", "0.01"}).err, "");
-  const std::string err = run({"sample", "--delta", "0.01"}, {80, true, false, true}).err;
+  EXPECT_EQ(channels({"sample", "--delta", "0.01"}).err, "");
+  errorTerminal = {80, true, false, true};
+  const std::string err = channels({"sample", "--delta", "0.01"}).err;
   EXPECT_THAT(err, HasSubstr("waiting for the second sample: 1 s"));
   EXPECT_TRUE(err.ends_with("\r\x1b[K"));
 }
 
 TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
-  const std::string code = integer(0xE00002BC);
+  const std::string code = integer(0xE00002BC), good = hub() + goodDriver();
   const std::string ghost =
       driver("ghost", array(group("", kEvents, channel(8, word(1, 0, 1), "unserved"))), "");
   const std::string broken = driver("bro&#27;ken", array(group("", 0, array(integer(1)))), "");
   const std::string legend = driver("odd", integer(3), "");
   const std::string lost = driver("lost", array(group("", kEvents, channel(5, word(1, 0, 1), "x"))),
                                   frames(5, array(integer(1)) + "<array><dict/></array>"));
+  const std::string rawFrames = key("RawFrames", array("<data>AQID</data>"));
   const struct {
     const char* name;
     std::string entries;
-    std::vector<std::string> arguments;
     const char* message;
-    bool showsGood;
+    bool showsGood = false;
+    std::vector<std::string> arguments = {"sample"};
   } cases[] = {
-      {"nothing", "", {"sample"}, "no driver publishes channels", false},
-      {"no hub", goodDriver(), {"sample"}, "the device has no statistics hub", false},
-      {"open",
-       hub(key("OpenStatus", code)) + goodDriver(),
-       {"sample"},
-       "Could not open HwReportHub (error 0xe00002bc)",
-       false},
-      {"update",
-       hub(key("UpdateStatus", code)) + goodDriver(),
-       {"sample"},
-       "no sample: error 0xe00002bc",
-       false},
-      {"garbage",
-       hub(key("RawFrames", array("<data>AQID</data>"))) + goodDriver(),
-       {"sample"},
-       "couldn't create samples",
-       false},
-      {"a channel without values",
-       hub() + goodDriver() + ghost,
-       {"sample"},
-       "1 channel not served by the hub",
-       true},
-      {"no channel with values",
-       hub() + ghost,
-       {"sample"},
-       "1 channel not served by the hub",
-       false},
+      {"nothing", "", "no driver publishes channels"},
+      {"no hub", goodDriver(), "the device has no statistics hub"},
+      {"open", hub(key("OpenStatus", code)) + goodDriver(),
+       "Could not open HwReportHub (error 0xe00002bc)"},
+      {"update", hub(key("UpdateStatus", code)) + goodDriver(), "no sample: error 0xe00002bc"},
+      {"garbage", hub(rawFrames) + goodDriver(), "couldn't create samples"},
+      {"a channel without values", good + ghost, "1 channel not served by the hub", true},
+      {"no channel with values", hub() + ghost, "1 channel not served by the hub"},
       {"a channel that ends",
-       hub() + goodDriver() + lost,
-       {"sample", "--delta", "0.01"},
+       good + lost,
        "x: the two samples cannot be subtracted",
-       true},
-      {"a broken legend",
-       hub() + broken + goodDriver(),
-       {"sample"},
-       "bro\\x1bken <id 0x101>: its channels cannot be read",
-       true},
-      {"no legend", hub() + legend + goodDriver(), {"list"}, "bad legend (error 0xe00002c9)", true},
+       true,
+       {"sample", "--delta", "0.01"}},
+      {"a broken legend", hub() + broken + goodDriver(),
+       "bro\\x1bken <id 0x101>: its channels cannot be read", true},
+      {"no legend", hub() + legend + goodDriver(), "bad legend (error 0xe00002c9)", true, {"list"}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -335,7 +272,7 @@ TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
     for (const char* form : {"", "--json"}) {
       auto arguments = c.arguments;
       if (*form != '\0') arguments.push_back(form);
-      const Outcome outcome = run(arguments);
+      const Outcome outcome = channels(arguments);
       EXPECT_EQ(outcome.status, kWrong);
       EXPECT_THAT(outcome.err, HasSubstr(c.message));
       EXPECT_EQ(outcome.out.find("latency") != std::string::npos, c.showsGood);

@@ -1,12 +1,7 @@
 // tallyctl nand: the driver's lists and the preview of the storage log, which changes nothing.
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
 #include <algorithm>
-#include <nlohmann/json.hpp>
 
-#include "fakes/fake_storage.h"
-#include "tools/tool.h"
+#include "tools/nand_tool.h"
 
 namespace tally::tools {
 namespace {
@@ -23,38 +18,13 @@ Bytes listOf(const std::vector<std::uint32_t>& words) {
   return bytes;
 }
 
-struct Outcome {
-  int status;
-  std::string out;
-};
-
-class NandListCommandsTest : public testing::Test {
+class NandListCommandsTest : public NandToolTest {
  protected:
   NandListCommandsTest() {
     storage.registry->properties["Device Characteristics"] =
         KvDictionary::create({{"chip-id", KvString::create("Q7M")},
                               {"manufacturer-id", KvString::create("x")},
                               {"num-bus", KvNumber::int32(2)}});
-  }
-  Outcome run(std::vector<const char*> arguments) {
-    arguments.insert(arguments.begin(), {"tallyctl", "nand"});
-    ToolContext context;
-    context.root = "/";
-    char* text = nullptr;
-    std::size_t size = 0;
-    context.out = open_memstream(&text, &size);
-    context.err = std::tmpfile();
-    testing::internal::CaptureStderr();
-    testing::internal::CaptureStdout();
-    const int status =
-        runTool(context, arguments, [&](const std::string&) { return storage.services(); });
-    EXPECT_EQ(testing::internal::GetCapturedStdout(), "") << "the library's notices spoil JSON";
-    testing::internal::GetCapturedStderr();
-    std::fclose(context.out);
-    std::fclose(context.err);
-    const std::string out(text, size);
-    std::free(text);
-    return {status, out};
   }
   void serveTelemetry(std::size_t modes, std::size_t bytes = 2 * 4128) {
     for (std::size_t mode = 0; mode < modes; ++mode) {
@@ -63,7 +33,6 @@ class NandListCommandsTest : public testing::Test {
       storage.registry->serveNext(list);
     }
   }
-  fakes::FakeStorage storage;
   const Bytes statistics =
       fakes::statisticsBuffer({{53, {1}}, {20, {180}}, {50, {256}}, {49, {16384}}, {4, {102400}}});
   const Bytes validity = listOf({2, 0, 0, 3, 70, 0, 0, 0, 3, 71, 0, 0, 0});
@@ -72,44 +41,44 @@ class NandListCommandsTest : public testing::Test {
 
 TEST_F(NandListCommandsTest, ListsForPeopleAndForPrograms) {
   serveTelemetry(3);
-  const Outcome telemetry = run({"telemetry"});
+  const Outcome telemetry = nand({"telemetry"});
   EXPECT_EQ(telemetry.status, kSuccess);
   EXPECT_THAT(telemetry.out, HasSubstr("Mode 2, bus 1"));
   EXPECT_THAT(telemetry.out, HasSubstr("readStage[0-22]"));
   EXPECT_THAT(telemetry.out, HasSubstr("0 42 0"));
   serveTelemetry(1);
-  const Outcome one = run({"telemetry", "--mode", "1", "--json"});
-  const json modes = json::parse(one.out);  // the digit that is none is not named in it
+  const Outcome one = nand({"telemetry", "--mode", "1", "--json"});
+  const json modes = one.json();  // the digit that is none is not named in it
   ASSERT_EQ(modes.size(), 1u);
   EXPECT_EQ(modes[0]["mode"], 1);
   EXPECT_EQ(modes[0]["buses"].size(), 2u);
   EXPECT_EQ(modes[0]["buses"][0]["readStage"][1], 42);
-  EXPECT_EQ(run({"telemetry", "--mode", "3"}).status, kBadUsage);
+  EXPECT_EQ(nand({"telemetry", "--mode", "3"}).status, kBadUsage);
 
   storage.registry->serve(validity);
-  EXPECT_THAT(run({"validity"}).out, HasSubstr("70 71"));
+  EXPECT_THAT(nand({"validity"}).out, HasSubstr("70 71"));
   storage.registry->serve(validity);
-  EXPECT_EQ(json::parse(run({"validity", "--json"}).out), json({{"ValidityList[3]", {70, 71}}}));
+  EXPECT_EQ(nand({"validity", "--json"}).json(), json({{"ValidityList[3]", {70, 71}}}));
 
   storage.registry->serve(defects);
-  EXPECT_THAT(run({"defects"}).out, HasSubstr("41 of the factory, 1 found since"));
+  EXPECT_THAT(nand({"defects"}).out, HasSubstr("41 of the factory, 1 found since"));
   storage.registry->serve(defects);
-  const json found = json::parse(run({"defects", "--json"}).out);
+  const json found = nand({"defects", "--json"}).json();
   EXPECT_EQ(found["summary"]["Factory Count"], 41);
   EXPECT_EQ(found["defects"][0]["CE"], 2);
 }
 
 TEST_F(NandListCommandsTest, ListsThatCannotBeRead) {
   for (const char* list : {"telemetry", "validity", "defects"}) {
-    EXPECT_EQ(run({list}).status, kWrong) << "every call fails";
-    const Outcome outcome = run({list, "--json"});
+    EXPECT_EQ(nand({list}).status, kWrong) << "every call fails";
+    const Outcome outcome = nand({list, "--json"});
     EXPECT_EQ(outcome.status, kWrong);
     EXPECT_TRUE(json::accept(outcome.out)) << outcome.out;
   }
   serveTelemetry(3, 4128);
-  EXPECT_EQ(run({"telemetry"}).status, kWrong) << "shorter than two buses";
-  EXPECT_EQ(run({"storage-log", "--preview"}).status, kWrong);
-  EXPECT_EQ(run({"storage-log"}).status, kBadUsage);
+  EXPECT_EQ(nand({"telemetry"}).status, kWrong) << "shorter than two buses";
+  EXPECT_EQ(nand({"storage-log", "--preview"}).status, kWrong);
+  EXPECT_EQ(nand({"storage-log"}).status, kBadUsage);
 }
 
 TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
@@ -133,13 +102,13 @@ TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
     const auto before = preferences.values;
     storage.platform.calls->clear();
     serve();
-    const Outcome text = run({"storage-log", "--preview"});
+    const Outcome text = nand({"storage-log", "--preview"});
     EXPECT_EQ(text.status, kSuccess);
     EXPECT_THAT(text.out, HasSubstr("UserWamp:1.80;"));
     EXPECT_THAT(text.out, HasSubstr("FaultDesk Key: error\n"));
     EXPECT_EQ(text.out.find("Next one from") != std::string::npos, c.sinceLast < 604800);
     serve();
-    const json preview = json::parse(run({"storage-log", "--preview", "--json"}).out);
+    const json preview = nand({"storage-log", "--preview", "--json"}).json();
     EXPECT_EQ(preview["wouldBeWritten"], c.written);
     EXPECT_EQ(preview["structuredRecords"], 3 * 2 + 2);
     EXPECT_THAT(preview["text"].get<std::string>(), HasSubstr("ValidityList[3]:70,71\n"));

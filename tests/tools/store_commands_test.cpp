@@ -30,14 +30,14 @@ TEST_F(StoreCommands, ImportKeepsTheGoodLinesAndNamesTheBadOnes) {
   const struct {
     std::string csv;
     int scalars, samples;
-    std::vector<int> bad;  // line numbers
-    const char* reason;    // of the first
+    std::vector<int> bad = {};     // line numbers
+    const char* reason = nullptr;  // of the first
   } cases[] = {
-      {"", 0, 0, {}, nullptr},
-      {header, 0, 0, {}, nullptr},
-      {"scalar,a,1,,5\n", 1, 0, {}, nullptr},
-      {"\xef\xbb\xbf" + header + "scalar,a,1,,5\r\n\r\ndistribution,b,1,0,2.5", 1, 1, {}, nullptr},
-      {header + "scalar,a,1,,5\n" + header + "scalar,b,-3,,-6\n", 2, 0, {}, nullptr},
+      {"", 0, 0},
+      {header, 0, 0},
+      {"scalar,a,1,,5\n", 1, 0},
+      {"\xef\xbb\xbf" + header + "scalar,a,1,,5\r\n\r\ndistribution,b,1,0,2.5", 1, 1},
+      {header + "scalar,a,1,,5\n" + header + "scalar,b,-3,,-6\n", 2, 0},
       {header + "scalar,a,1,,1.5\nscalar,a,1,,5\n", 1, 0, {2}, "whole number of 64 bits"},
       {"scalar,a,1,,9223372036854775808\nscalar,a,1,,-9223372036854775808\n", 1, 0, {1}, "64 bits"},
       {"scalar,a,2147483648,,1\nscalar,a,-2147483649,,1\nscalar,a,,,1\n",
@@ -66,7 +66,7 @@ TEST_F(StoreCommands, ImportKeepsTheGoodLinesAndNamesTheBadOnes) {
        0,
        {1, 2, 3, 4},
        "valid UTF-8"},
-      {"\"scalar\",\"a,\"\"\n\",\"1\",\"\",\"5\"\nscalar,b,1,,1\n", 2, 0, {}, nullptr},
+      {"\"scalar\",\"a,\"\"\n\",\"1\",\"\",\"5\"\nscalar,b,1,,1\n", 2, 0},
       {"scalar,\"a,1,,1\nscalar,b,1,,1\n", 1, 0, {1}, "not closed"},
       {"scalar,\"a\"x,1,,1\nscalar,b\"c,1,,1\nscalar,d\"e,1,,1\n", 2, 0, {1}, "follows a closing"},
       {"scalar,a,1,,1\n" + std::string(600'000, 'x') + "\nscalar,b,1,,1\n", 2, 0, {2}, "longer"},

@@ -30,6 +30,7 @@ class ToolTest : public TemporaryRoot {
     for (const std::string& argument : arguments) pointers.push_back(argument.c_str());
     ToolContext context;
     context.output = terminal;
+    context.errors = errorTerminal;
     const auto open = [&](const char* name) { return std::fopen(at(name).c_str(), "w"); };
     std::FILE* const out = context.out = open("out");
     std::FILE* const err = context.err = open("err");
@@ -65,7 +66,7 @@ class ToolTest : public TemporaryRoot {
     return files;
   }
 
-  Terminal terminal{80, false, false, true};
+  Terminal terminal{80, false, false, true}, errorTerminal;
 };
 
 // A part of a whitelist: a dictionary under a key.
