@@ -87,44 +87,40 @@ TEST_F(StorageConnectionTest, Fetch) {
   const struct {
     const char* name;
     std::deque<fakes::FakeStorageRegistry::Reply> replies;
-    RegistryResult openStatus, closeStatus;
     bool result;
-    std::string printed;
-    Calls calls;
-    std::uint64_t hostReads;
+    Calls calls = kFetch;
+    std::uint64_t hostReads = 0;
+    std::string printed = {};
+    RegistryResult openStatus = 0, closeStatus = 0;
   } cases[] = {
-      {"all well", {{size}, {kBuffer}}, 0, 0, true, "", kFetch, 11},
-      {"shorter than announced", {{size}, {cut}}, 0, 0, true, "", kFetch, 0},
-      {"cut in a record", {{size}, {torn}}, 0, 0, false, "", kFetch, 0},
-      {"empty", {{size}, {Bytes{}}}, 0, 0, false, "", kFetch, 0},
-      {"says more than announced", {{size}, {longer}}, 0, 0, true, "", kFetch, 11},
-      {"nothing announced", {{Bytes(4)}, {kBuffer}}, 0, 0, false, "", withoutRoom, 0},
-      {"no size at all", {{Bytes{}}, {kBuffer}}, 0, 0, false, "", withoutRoom, 0},
-      {"no connection", {}, 5, 0, false, "Could not get connection to service\n", untilOpen, 0},
-      {"size query fails",
+      {"all well", {{size}, {kBuffer}}, true, kFetch, 11},
+      {"shorter than announced", {{size}, {cut}}, true},
+      {"cut in a record", {{size}, {torn}}, false},
+      {"empty", {{size}, {Bytes{}}}, false},
+      {"says more than announced", {{size}, {longer}}, true, kFetch, 11},
+      {"nothing announced", {{Bytes(4)}, {kBuffer}}, false, withoutRoom},
+      {"no size at all", {{Bytes{}}, {kBuffer}}, false, withoutRoom},
+      {"no connection", {}, false, untilOpen, 0, "Could not get connection to service\n", 5},
+      {"size query",
        {{size, 0xE00002C2}},
-       0,
-       0,
        false,
-       "HwConnectCallStructMethod: -536870206",
        withoutData,
-       0},
-      {"data call fails",
+       0,
+       "HwConnectCallStructMethod: -536870206"},
+      {"data call",
        {{size}, {kBuffer, 1}},
-       0,
-       0,
        false,
-       "Could not retrieve data from driver for selector d\n",
        kFetch,
-       0},
-      {"close fails",
-       {{size}, {kBuffer}},
        0,
-       1,
+       "Could not retrieve data from driver for selector d\n"},
+      {"close",
+       {{size}, {kBuffer}},
        true,
-       "Could not close connection to service\n",
        kFetch,
-       11},
+       11,
+       "Could not close connection to service\n",
+       0,
+       1},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -168,35 +164,23 @@ TEST_F(StorageConnectionTest, ContentDeletion) {
     if (length > 0) bytes.back() = last;
     return bytes;
   };
-  const Calls asked = {"find SPXStorage", "open 7 type 0", "call 5 in 0 room 4", "close 9"};
+  const Calls unopened = {"find SPXStorage", "open 7 type 0"};
   const struct {
-    const char* className;
     fakes::FakeStorageRegistry::Reply reply;
-    RegistryResult openStatus, closeStatus;
     bool answer;
-    std::string printed;
-    Calls calls;
+    std::string printed = {};
+    RegistryResult openStatus = 0, closeStatus = 0;
+    Calls calls = {"find SPXStorage", "open 7 type 0", "call 5 in 0 room 4", "close 9"};
+    const char* className = "SPXStorage";
   } cases[] = {
-      {"SPXStorage", {reply(4, std::byte{1})}, 0, 0, true, "", asked},
-      {"SPXStorage", {reply(9, std::byte{1})}, 0, 0, false, "", asked},
-      {"SPXStorage", {reply(4, std::byte{0})}, 0, 0, false, "", asked},
-      {"SPXStorage", {reply(3, std::byte{1})}, 0, 0, false, "", asked},
-      {"SPXStorage", {reply(4, std::byte{1}), 1}, 0, 0, false, "", asked},
-      {"SPXStorage",
-       {reply(4, std::byte{1})},
-       0,
-       1,
-       true,
-       "Could not close connection to service\n",
-       asked},
-      {"SPXStorage",
-       {},
-       1,
-       0,
-       false,
-       "Could not get connection to service\n",
-       {"find SPXStorage", "open 7 type 0"}},
-      {kNvme, {reply(4, std::byte{1})}, 0, 0, false, "", {std::string("find ") + kNvme}},
+      {{reply(4, std::byte{1})}, true},
+      {{reply(9, std::byte{1})}, false},
+      {{reply(4, std::byte{0})}, false},
+      {{reply(3, std::byte{1})}, false},
+      {{reply(4, std::byte{1}), 1}, false},
+      {{reply(4, std::byte{1})}, true, "Could not close connection to service\n", 0, 1},
+      {{}, false, "Could not get connection to service\n", 1, 0, unopened},
+      {{reply(4, std::byte{1})}, false, "", 0, 0, {std::string("find ") + kNvme}, kNvme},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(&c - cases);

@@ -54,20 +54,11 @@ class NandInfoTest : public testing::Test {
 const char* const kReclaim = " Reclaim.TotalPurgeableBytes=5L Reclaim.TotalNonPurgeableBytes=6L";
 
 TEST_F(NandInfoTest, AnOldExportHasTheFirstFiguresOnly) {
-  EXPECT_EQ(text(*infoOf(0x20001, {{49, {4096}},
-                                   {50, {128}},
-                                   {52, {0x1FFFFFFFF}},
-                                   {7, {1}},
-                                   {4, {2}},
-                                   {48, {3}},
-                                   {17, {4}},
-                                   {19, {5}},
-                                   {18, {6}},
-                                   {20, {7}},
-                                   {12, {8}},
-                                   {13, {~0ull}},
-                                   {56, {1u << 30}},
-                                   {37, {9}}})),
+  const std::vector<Record> records = {
+      {49, {4096}}, {50, {128}},   {52, {0x1FFFFFFFF}}, {7, {1}},  {4, {2}},
+      {48, {3}},    {17, {4}},     {19, {5}},           {18, {6}}, {20, {7}},
+      {12, {8}},    {13, {~0ull}}, {56, {1u << 30}},    {37, {9}}};
+  EXPECT_EQ(text(*infoOf(0x20001, records)),
             std::string("ExportVersion=131073 DriverVersion=-1 DemoMode=0L NumVirtualBlocks=-1 "
                         "PagesPerVirtualBlock=128 BytesPerPage=4096 NumLogicalReads=1L "
                         "NumLogicalWrites=2L NumFreeVirtualBlocks=3L NumWearLevelOps=4L "
@@ -77,15 +68,9 @@ TEST_F(NandInfoTest, AnOldExportHasTheFirstFiguresOnly) {
 }
 
 TEST_F(NandInfoTest, AFullExport) {
-  EXPECT_EQ(text(*infoOf(kFull, {{37, {9}},
-                                 {28, {1}},
-                                 {45, {2}},
-                                 {51, {3}},
-                                 {265, {4, 5}},
-                                 {86, {100}},
-                                 {85, {40}},
-                                 {2, {1}},
-                                 {42, {1}}})),
+  const std::vector<Record> records = {{37, {9}},   {28, {1}},  {45, {2}}, {51, {3}}, {265, {4, 5}},
+                                       {86, {100}}, {85, {40}}, {2, {1}},  {42, {1}}};
+  EXPECT_EQ(text(*infoOf(kFull, records)),
             std::string("ExportVersion=131074 DriverVersion=-1 DemoMode=0L NumVirtualBlocks=0 "
                         "PagesPerVirtualBlock=0 BytesPerPage=0 NumLogicalReads=0L "
                         "NumLogicalWrites=0L NumFreeVirtualBlocks=0L NumWearLevelOps=0L "

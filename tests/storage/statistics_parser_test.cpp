@@ -50,35 +50,32 @@ TEST(StatisticsParser, RecordsBecomeCounters) {
   const struct {
     const char* name;
     std::vector<Record> records;
-    int result;
     Counters counters;
+    int result = 1;
   } cases[] = {
-      {"unknown key without values", {{21, {}}}, 1, {}},
-      {"scalar", {{2, {kMax}}}, 1, {"hostWriteXacts=18446744073709551615"}},
+      {"unknown key without values", {{21, {}}}, {}},
+      {"scalar", {{2, {kMax}}}, {"hostWriteXacts=18446744073709551615"}},
       {"values beyond a scalar's first",
        {{2, {5, 6, 7}}, {3, {8}}},
-       1,
        {"hostWriteXacts=5", "hostReadXacts=8"}},
-      {"scalar without a value", {{2, {}}, {3, {8}}}, 1, {"hostReadXacts=8"}},
-      {"array", {{91, {1, 2, 3}}}, 1, {"maxQosPerCmdQ0=1", "maxQosPerCmdQ1=2", "maxQosPerCmdQ2=3"}},
-      {"array of one", {{265, {9}}}, 1, {"readCountHisto=9"}},
-      {"array of none", {{265, {}}}, 1, {}},
+      {"scalar without a value", {{2, {}}, {3, {8}}}, {"hostReadXacts=8"}},
+      {"array", {{91, {1, 2, 3}}}, {"maxQosPerCmdQ0=1", "maxQosPerCmdQ1=2", "maxQosPerCmdQ2=3"}},
+      {"array of one", {{265, {9}}}, {"readCountHisto=9"}},
+      {"array of none", {{265, {}}}, {}},
       {"array that takes one",
        {{184, {4, 5, 6}}, {185, {7}}},
-       1,
        {"TempSensorMax=4", "TempSensorMin=7"}},
       {"elements beyond the maximum",
        {{93, {1, 2, 3, 4, 5}}, {2, {6}}},
-       1,
        {"numBandsRefreshedForAgePerTier0=1", "numBandsRefreshedForAgePerTier1=2",
         "numBandsRefreshedForAgePerTier2=3", "hostWriteXacts=6"}},
-      {"a key twice", {{2, {1}}, {2, {2}}}, 1, {"hostWriteXacts=1", "hostWriteXacts=2"}},
-      {"highest key", {{kHighestKey, {1}}, {2, {1}}}, 1, {"hostWriteXacts=1"}},
-      {"key above it", {{2, {1}}, {kHighestKey + 1, {1}}, {3, {1}}}, 0, {"hostWriteXacts=1"}},
-      {"one value too many announced", {{2, {1}}, {3, {1}, 2}}, 0, {"hostWriteXacts=1"}},
-      {"count far beyond the buffer", {{2, {1}, 0xFFFFFFFF}}, 0, {}},
-      {"unknown key beyond the buffer", {{21, {}, 1}}, 0, {}},
-      {"header alone at the end", {{2, {1}}, {3, {}}}, 1, {"hostWriteXacts=1"}},
+      {"a key twice", {{2, {1}}, {2, {2}}}, {"hostWriteXacts=1", "hostWriteXacts=2"}},
+      {"highest key", {{kHighestKey, {1}}, {2, {1}}}, {"hostWriteXacts=1"}},
+      {"key above it", {{2, {1}}, {kHighestKey + 1, {1}}, {3, {1}}}, {"hostWriteXacts=1"}, 0},
+      {"one value too many announced", {{2, {1}}, {3, {1}, 2}}, {"hostWriteXacts=1"}, 0},
+      {"count far beyond the buffer", {{2, {1}, 0xFFFFFFFF}}, {}, 0},
+      {"unknown key beyond the buffer", {{21, {}, 1}}, {}, 0},
+      {"header alone at the end", {{2, {1}}, {3, {}}}, {"hostWriteXacts=1"}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);

@@ -332,12 +332,10 @@ TEST_F(StorageLogTest, WriteAmplification) {
   };
   const auto case_ = [&](std::uint64_t erases, std::uint64_t pages, std::uint64_t bytesPerPage,
                          std::uint64_t pagesSlc, std::uint64_t erasesSlc, std::uint64_t host) {
-    return measured({{20, {erases}},
-                     {50, {pages}},
-                     {49, {bytesPerPage}},
-                     {129, {pagesSlc}},
-                     {84, {erasesSlc}},
-                     {4, {host}}});
+    const std::vector<fakes::Record> records = {{20, {erases}},       {50, {pages}},
+                                                {49, {bytesPerPage}}, {129, {pagesSlc}},
+                                                {84, {erasesSlc}},    {4, {host}}};
+    return measured(records);
   };
   EXPECT_EQ(case_(180, 256, 16384, 128, 50, 102400), std::pair(1.8f, 0.25f));
   EXPECT_EQ(case_(180, 256, 16384, 128, 50, 0), std::pair(0.0f, 0.0f));
