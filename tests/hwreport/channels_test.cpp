@@ -85,28 +85,22 @@ TEST_F(Channels, ADriverIsAdmittedByThePresenceOfAProperty) {
 }
 
 TEST_F(Channels, OptionBitsInAllCombinationsPlaceAChannel) {
+  constexpr std::string_view drivers = "HwReportDrivers", driver = "D <id 0x10>",
+                             groups = "HwReportChannelGroups";
   const struct {
     std::int32_t options;
-    const char* group;
-    const char* subgroup;
+    const char *group, *subgroup;
     std::vector<std::string_view> path;
   } cases[] = {
       {0, "G", "S", {}},
-      {1, "G", "S", {"HwReportDrivers", "D <id 0x10>"}},
-      {2, "G", "S", {"HwReportChannelGroups", "G", "HwReportChannelGroups", "S"}},
-      {3,
-       "G",
-       "S",
-       {"HwReportDrivers", "D <id 0x10>", "HwReportChannelGroups", "G", "HwReportChannelGroups",
-        "S"}},
-      {2, "G", nullptr, {"HwReportChannelGroups", "G"}},
+      {1, "G", "S", {drivers, driver}},
+      {2, "G", "S", {groups, "G", groups, "S"}},
+      {3, "G", "S", {drivers, driver, groups, "G", groups, "S"}},
+      {2, "G", nullptr, {groups, "G"}},
       {2, nullptr, "S", {}},
-      {3, nullptr, nullptr, {"HwReportDrivers", "D <id 0x10>"}},
+      {3, nullptr, nullptr, {drivers, driver}},
       {INT32_MIN, "G", "S", {}},
-      {INT32_MIN | 3,
-       "G",
-       nullptr,
-       {"HwReportDrivers", "D <id 0x10>", "HwReportChannelGroups", "G"}},
+      {INT32_MIN | 3, "G", nullptr, {drivers, driver, groups, "G"}},
   };
   for (const auto& c : cases) {
     const auto collection = HwReportCreateAggregate(c.options);
