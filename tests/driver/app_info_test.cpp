@@ -74,40 +74,25 @@ TEST_F(AppInfoTest, ConversationsByTheirMessages) {
   const std::string posted = "post vellum.tallyd.tallyrun.logging";
   const std::int64_t high = std::int64_t{7} << 32;
   const auto list = [] { return appData(KvArray::create({application()})); };
+  const auto day = [](int number) { return operation(1, KvNumber::int64(number)); };
   const struct {
     const char* name;
     std::vector<KvRef<KvDictionary>> messages;
     std::vector<std::string> effects;
-    bool requested;
-    std::size_t errors;
+    bool requested = false;
+    std::size_t errors = 0;
   } cases[] = {
-      {"announced", {operation(0)}, {posted}, true, 0},
-      {"announced and delivered", {operation(0), list()}, {"day 19999", posted}, false, 0},
-      {"an empty list",
-       {operation(0), appData(KvArray::create())},
-       {"day 19999", posted},
-       false,
-       0},
-      {"delivered twice", {operation(0), list(), list()}, {"day 19999", posted}, false, 0},
-      {"unsolicited", {list()}, {}, false, 0},
-      {"announced twice", {operation(0), operation(0)}, {posted}, true, 0},
-      {"a day", {operation(1, KvNumber::int64(20000))}, {"day 20000"}, false, 0},
-      {"a day twice",
-       {operation(1, KvNumber::int64(7)), operation(1, KvNumber::int64(8))},
-       {"day 7"},
-       false,
-       0},
-      {"a day after an announcement",
-       {operation(0), operation(1, KvNumber::int64(7))},
-       {posted},
-       true,
-       0},
-      {"low halves",
-       {operation(high | 1, KvNumber::int64(high | 0xFFFFFFFF))},
-       {"day -1"},
-       false,
-       0},
-      {"an unknown operation spends the turn", {operation(9), operation(0)}, {}, false, 0},
+      {"announced", {operation(0)}, {posted}, true},
+      {"announced and delivered", {operation(0), list()}, {"day 19999", posted}},
+      {"an empty list", {operation(0), appData(KvArray::create())}, {"day 19999", posted}},
+      {"delivered twice", {operation(0), list(), list()}, {"day 19999", posted}},
+      {"unsolicited", {list()}, {}},
+      {"announced twice", {operation(0), operation(0)}, {posted}, true},
+      {"a day", {day(20000)}, {"day 20000"}},
+      {"a day twice", {day(7), day(8)}, {"day 7"}},
+      {"a day after an announcement", {operation(0), day(7)}, {posted}, true},
+      {"low halves", {operation(high | 1, KvNumber::int64(high | 0xFFFFFFFF))}, {"day -1"}},
+      {"an unknown operation spends the turn", {operation(9), operation(0)}, {}},
       {"no operation", {KvDictionary::create(), operation(0)}, {posted}, true, 1},
       {"an operation of another type",
        {KvDictionary::create({{"operation", text("0")}}),
