@@ -64,7 +64,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
     // A collection that nobody made here may be anything.
     const auto foreign = described->copy();
     HwReportIterate(foreign.get(), [](KvDictionary* channel) {
-      fuzz::askChannel(channel);
+      fuzz::askChannel(channel, fuzz::Maker::Anybody);
       return HwIterContinue;
     });
     const auto target = HwReportCreateAggregate(options);

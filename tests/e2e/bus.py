@@ -1,4 +1,5 @@
 """A private message bus that starts the program for a device, as the machine's own bus would."""
+import contextlib
 import pathlib
 import shutil
 import signal
@@ -111,6 +112,23 @@ class BusDevice(Device):
             thread.join(30)
             return max(peaks)
         return peak
+
+    @contextlib.contextmanager
+    def kept_awake(self):
+        """A slow machine may take more than ten seconds for what comes next: the run, in which something
+        was asked for already, gets messages meanwhile that mean nothing to it."""
+        done = threading.Event()
+
+        def ping():
+            while not done.wait(2):
+                self.busctl("operation", "x", "9")
+        thread = threading.Thread(target=ping)
+        thread.start()
+        try:
+            yield
+        finally:
+            done.set()
+            thread.join()
 
     def kill_daemon(self):
         self.daemon.send_signal(signal.SIGKILL)

@@ -98,9 +98,10 @@ def day_request(test, device):
 def twenty_thousand_applications(test, device):
     device.tool("send", "logging")
     peak = device.watch_memory()
-    refused = send_applications(device, applications(20_001), status=1)
-    test.assertEqual(refused, "")
-    send_applications(device, applications(20_000))
+    with device.kept_awake():
+        refused = send_applications(device, applications(20_001), status=1)
+        test.assertEqual(refused, "")
+        send_applications(device, applications(20_000))
     device.wait_for_end()
     listed = device.log()["TBActivatedAppInfo"]
     test.assertEqual([len(listed), listed[19_999]["adamID"]], [20_000, 19_999])
