@@ -185,7 +185,6 @@ class Load(DeviceTest):
             self.assertEqual(swept.count(b"\n"), count + 1)
             say("{:,} channels: list {}; sample {}; daily run {}".format(count, *runs[-1]))
         for less, more in zip(*runs):
-            self.assertLess(more.seconds, 20 * less.seconds + 1, "time grows faster than the channels")
             self.assertLess(more.memory, 12 * less.memory, "memory grows faster than the channels")
 
     def test_spool(self):
