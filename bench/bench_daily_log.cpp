@@ -43,11 +43,11 @@ int readRows(const char* path, std::initializer_list<const char*> queries) {
 
 // What the report does with the day's samples, without the whitelist and the log.
 int passOverSamples(const char* root) {
-  const PlatformScope scope(makeLinuxPlatform(root));
+  const PlatformScope scope(makeLinuxPlatform(std::string(root)));
   const KvRef<KvDictionary> options[] = {SampleDay::distributionOptions(0),
                                          SampleDay::distributionOptions(1)};
   const auto history =
-      openSqliteHistory(metricsStorePath(root), [](const std::string&) { std::exit(1); });
+      openSqliteHistory(metricsStorePath(std::string(root)), [](const std::string&) { std::exit(1); });
   std::size_t number = 0;
   history->enumerateDistributions(
       "", std::numeric_limits<std::int32_t>::min(), std::numeric_limits<std::int32_t>::max(),

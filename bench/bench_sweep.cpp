@@ -67,7 +67,7 @@ int measure(const std::string& self) {
 
 int main(int count, char** arguments) {
   if (count != 3) return measure(std::filesystem::canonical(arguments[0]));
-  const PlatformScope scope(makeHostPlatform(arguments[2]));
+  const PlatformScope scope(makeHostPlatform(std::string(arguments[2])));
   const std::string_view name = arguments[1];
   if (name == "sweep") sweep();
   if (name == "scalars") writeScalars();

@@ -7,13 +7,16 @@
 #include <cstdio>
 #include <vector>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "kv/plist_codec.h"
 #include "platform/linux/store_importer.h"
 #include "tools/store_csv.h"
 
 namespace tally::bench {
 namespace {
+
+constexpr std::string_view kWhitelistFolder = "/Library/Application Support/Tallybook";
+constexpr std::string_view kWhitelistName = "Whitelist_Nimbus.plist";
 
 std::uint64_t scrambled(std::uint64_t value) {
   value = (value ^ (value >> 31)) * 0x9E3779B97F4A7C15;
@@ -35,7 +38,7 @@ KvRef<KvDictionary> scalarOptions(std::size_t index) {
   }
 }
 
-bool writeWhitelist(const std::string& path, const SampleDay& day) {
+bool writeWhitelist(const std::string& device, const SampleDay& day) {
   auto scalars = KvDictionary::create(day.scalars);
   for (std::size_t i = 0; i < day.scalars; ++i) {
     scalars->set(SampleDay::scalarKey(i), scalarOptions(i));
@@ -48,7 +51,8 @@ bool writeWhitelist(const std::string& path, const SampleDay& day) {
       {{"Bench",
         KvDictionary::create({{"ScalarKeys", scalars}, {"DistributionKeys", distributions}})}});
   const auto document = encodeXmlPlist(*root);
-  return document && writeFileAtomically(path, *document);
+  const auto folder = DeviceRoot(device).make(kWhitelistFolder);
+  return document && folder && writeFileAtomically(*folder, kWhitelistName, *document);
 }
 
 bool importDay(const std::string& path, const SampleDay& day) {
@@ -106,11 +110,11 @@ std::int32_t yesterday() {
 }
 
 std::string whitelistPath(const std::string& root) {
-  return root + "/Library/Application Support/Tallybook/Whitelist_Nimbus.plist";
+  return root + std::string(kWhitelistFolder) + "/" + std::string(kWhitelistName);
 }
 
 bool makeDevice(const std::string& root, const SampleDay& day) {
-  return writeWhitelist(whitelistPath(root), day) && importDay(metricsStorePath(root), day);
+  return writeWhitelist(root, day) && importDay(metricsStorePath(root), day);
 }
 
 bool makeRowDatabase(const std::string& path, const SampleDay& day) {

@@ -34,7 +34,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   static const fuzz::DescribedFolder folder;
   fuzz::Input input(data, size);
   folder.writeInput("device.plist", input);
-  const auto description = std::make_shared<DeviceDescription>(folder.path() + "/device.plist",
+  const auto description = std::make_shared<DeviceDescription>(DeviceDirectory(folder.path(), ""),
                                                                std::make_shared<fuzz::UnreadLog>());
 
   const auto device = std::make_shared<LinuxDeviceInformation>(folder.path(), description);
@@ -53,7 +53,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   for (const std::string& line : {facts.SysIdDescription(), facts.HardwareModelString()}) {
     require(line.find('\n') == line.npos, "a line of a log's header stays one");
   }
-  DescribedStackshot stackshot(folder.path(), description);
+  DescribedStackshot stackshot(DeviceDirectory(folder.path(), ""), description);
   if (const auto config = stackshot.stackshotConfigCreate()) {
     config->stackshotConfigSetFlags(0x10000);
     config->stackshotCapture();

@@ -53,8 +53,8 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   folder.writeInput("registry.plist", input);
 
   std::vector<std::unique_ptr<RegistrySource>> sources;
-  sources.push_back(
-      std::make_unique<RegistryDescription>(folder.path(), std::make_shared<fuzz::UnreadLog>()));
+  sources.push_back(std::make_unique<RegistryDescription>(DeviceDirectory(folder.path(), ""),
+                                                          std::make_shared<fuzz::UnreadLog>()));
   SourceRegistry registry(std::move(sources));
   for (const std::string_view className : {"HwReportHub", "SPXStorage"}) {
     const auto service = registry.RegistryFindService(ServiceMatchingByClass(className));

@@ -4,9 +4,9 @@
 
 namespace tally {
 
-Platform makeHostPlatform(const std::string& root, const LinuxPlatformOptions& options) {
+Platform makeHostPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
   Platform services = makeLinuxPlatform(root, options);
-  addDeviceRegistry(services, devicePrefix(root));
+  addDeviceRegistry(services, root);
   return services;
 }
 

@@ -1,8 +1,6 @@
 // The platform of the programs: Linux, and the devices that a device root describes.
 #pragma once
 
-#include <string>
-
 #include "platform/linux/linux_platform.h"
 #include "platform/platform.h"
 
@@ -10,6 +8,6 @@ namespace tally {
 
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
 // service is used.
-Platform makeHostPlatform(const std::string& root, const LinuxPlatformOptions& options = {});
+Platform makeHostPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options = {});
 
 }  // namespace tally

@@ -23,7 +23,6 @@ class ErrorLog final : public SystemLog {
 };
 
 Platform makePlatform(std::string_view root) {
-  while (root.ends_with('/')) root.remove_suffix(1);
   Platform services;
   services.log = std::make_shared<ErrorLog>();
   addDeviceRegistry(services, std::string(root));

@@ -56,6 +56,7 @@ void DailyJob::runSwitch(const char* argument) {
 void DailyJob::runIfNewDay(const KvArray* appInfo) {
   // Waiting for another run comes first: it may be processing the very day.
   const RunTurn turn(*platform().runLock);
+  if (!turn) return;
   const std::int32_t yesterday = platform().metricsStore->TBDaysSince1970() - 1;
   Preferences& preferences = *platform().preferences;
   const std::int32_t last =
@@ -71,6 +72,7 @@ void DailyJob::runIfNewDay(const KvArray* appInfo) {
 
 void DailyJob::runDaily(std::int32_t day, const KvArray* appInfo) {
   const RunTurn turn(*platform().runLock);
+  if (!turn) return;
   logMessage(LogLevel::Default, "daily tasks for day {}", day);
   platform().metricsStore->TBClientCheckpoint();
   CrashReporting& crashReporting = *platform().crashReporting;

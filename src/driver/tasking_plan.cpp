@@ -6,6 +6,7 @@
 #include <set>
 #include <utility>
 
+#include "base/directory.h"
 #include "base/file.h"
 #include "base/result.h"
 #include "report/report.h"

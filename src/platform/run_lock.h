@@ -1,4 +1,4 @@
-// Turns: two runs on one device never work at once.
+// The run lock: two runs on one device never work at once.
 #pragma once
 
 namespace tally {
@@ -6,21 +6,27 @@ namespace tally {
 class RunLock {
  public:
   virtual ~RunLock() = default;
-  // Waits until no other run is working. Nested calls are allowed.
-  virtual void enter() = 0;
+  // Waits until no other run is working, for a bounded time. False, after one line that names the
+  // other run's process, when it still is; then nothing may be done. Nested calls are allowed; each
+  // one that succeeds is followed by a leave().
+  virtual bool enter() = 0;
   virtual void leave() = 0;
 };
 
-// Holds a turn for a scope.
+// Holds the lock for a scope.
 class RunTurn {
  public:
-  explicit RunTurn(RunLock& lock) : lock_(lock) { lock_.enter(); }
-  ~RunTurn() { lock_.leave(); }
+  explicit RunTurn(RunLock& lock) : lock_(lock), held_(lock.enter()) {}
+  ~RunTurn() {
+    if (held_) lock_.leave();
+  }
+  explicit operator bool() const { return held_; }
   RunTurn(const RunTurn&) = delete;
   RunTurn& operator=(const RunTurn&) = delete;
 
  private:
   RunLock& lock_;
+  bool held_;
 };
 
 }  // namespace tally

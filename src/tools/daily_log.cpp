@@ -56,8 +56,7 @@ bool isDailyLog(const SpooledLog& log) {
   return log.typeCode == kDailyLogTypeCode && log.name == kDailyLogName;
 }
 
-SubmittedLogs::SubmittedLogs(const ToolContext& context)
-    : reader_(spoolFolder(devicePrefix(context.root))) {}
+SubmittedLogs::SubmittedLogs(const ToolContext& context) : reader_(spoolFolder(context.root)) {}
 
 Result<std::optional<SpooledLog>> SubmittedLogs::find(std::string_view name) const {
   const auto logs = list();

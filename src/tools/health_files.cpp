@@ -1,9 +1,8 @@
 // Checks of what lies below the device root.
 #include <algorithm>
-#include <filesystem>
 #include <limits>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "kv/plist_codec.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/log_spool.h"
@@ -31,13 +30,11 @@ class ErrorCollector final : public SystemLog {
   }
 };
 
-void examineRoot(const std::string& prefix, Lines& lines) {
-  std::error_code ignored;
-  const std::string root = prefix.empty() ? "/" : prefix;
-  const bool there = std::filesystem::is_directory(root, ignored);
-  lines.push_back(
-      {there ? Health::Ok : Health::Wrong, "device root", there ? root : root + " is no folder"});
-  const auto space = there ? freeSpace(root) : std::nullopt;
+void examineRoot(const DeviceRoot& root, Lines& lines) {
+  const auto directory = root.open("/");
+  lines.push_back({directory ? Health::Ok : Health::Wrong, "device root",
+                   directory ? directory->path() : directory.error().message});
+  const auto space = directory ? directory->freeSpace() : std::nullopt;
   if (!space) return;
   const bool enough = *space > kReservedBytes;
   lines.push_back(
@@ -66,20 +63,21 @@ constexpr DescribedEntry kDescribed[] = {
     {"Timebase", KvType::Dictionary},
 };
 
-void examineDescription(const std::string& prefix, Lines& lines) {
+void examineDescription(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "device description";
-  const auto document = readFile(prefix + "/device/device.plist", kPlistMaximumBytes);
+  const auto document = root.readFile("/device/device.plist", kPlistMaximumBytes);
   if (!document) {
-    const bool absent = !fileIdentity(prefix + "/device/device.plist");
+    const bool absent = !root.identity("/device/device.plist");
     lines.push_back({absent ? Health::Missing : Health::Wrong, kSubject,
                      absent ? "none; Linux answers for the device" : document.error().message});
     return;
   }
-  const auto root = decodePlist(*document);
-  const auto* entries = root ? kvCast<KvDictionary>(root->get()) : nullptr;
+  const auto decoded = decodePlist(*document);
+  const auto* entries = decoded ? kvCast<KvDictionary>(decoded->get()) : nullptr;
   if (entries == nullptr) {
-    lines.push_back({Health::Wrong, kSubject,
-                     root ? "device/device.plist is not a dictionary" : root.error().message});
+    lines.push_back(
+        {Health::Wrong, kSubject,
+         decoded ? "device/device.plist is not a dictionary" : decoded.error().message});
     return;
   }
   std::vector<std::string_view> names;
@@ -123,10 +121,11 @@ void examineWhitelist(Lines& lines) {
   }
 }
 
-void examineStore(const std::string& prefix, Lines& lines) {
+void examineStore(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "metrics store";
-  const std::string path = metricsStorePath(prefix);
-  if (!fileIdentity(path)) {
+  const std::string path = metricsStorePath(root);
+  const auto identity = storeDirectory(root).identity("TBDataStore.sqlitedb");
+  if (!identity) {
     lines.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
     return;
   }
@@ -149,15 +148,15 @@ void examineStore(const std::string& prefix, Lines& lines) {
   if (scalars + distributions > 0) {
     text += ", up to " + dayName(static_cast<std::int32_t>(lastDay));
   }
-  lines.push_back({Health::Ok, kSubject, text + ", " + byteText(fileSize(path).value_or(0))});
+  lines.push_back({Health::Ok, kSubject, text + ", " + byteText(identity->size)});
   if (scalars + distributions > 0 && lastDay > platform().metricsStore->TBDaysSince1970()) {
     lines.push_back({Health::Wrong, kSubject, "it has days that have not come yet"});
   }
 }
 
-void examinePreferences(const std::string& prefix, Lines& lines) {
+void examinePreferences(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "preferences";
-  const std::string folder = *userPreferencesFolder(prefix, kProgramUser);
+  const DeviceDirectory folder = *userPreferencesFolder(root, kProgramUser);
   const auto collector = std::make_shared<ErrorCollector>();
   PropertyListPreferences preferences(folder, collector, 0600,
                                       PropertyListPreferences::Access::ReadOnly);
@@ -174,7 +173,7 @@ void examinePreferences(const std::string& prefix, Lines& lines) {
     lines.push_back({domains->empty() ? Health::Missing : Health::Ok, kSubject,
                      domains->empty() ? "none are set" : counted(domains->size(), "domain")});
   }
-  const auto names = listFolder(folder);
+  const auto names = folder.list();
   const auto aside =
       names ? std::ranges::count_if(*names,
                                     [](const std::string& name) {
@@ -185,7 +184,7 @@ void examinePreferences(const std::string& prefix, Lines& lines) {
     lines.push_back(
         {Health::Wrong, kSubject,
          fmt::format("{} set aside in {}",
-                     counted(static_cast<std::uint64_t>(aside), "damaged file"), folder)});
+                     counted(static_cast<std::uint64_t>(aside), "damaged file"), folder.text())});
   }
 }
 
@@ -215,12 +214,12 @@ void examineSpool(const ToolContext& context, Lines& lines) {
 }  // namespace
 
 void examineFiles(const ToolContext& context, Lines& lines) {
-  const std::string prefix = devicePrefix(context.root);
-  examineRoot(prefix, lines);
-  examineDescription(prefix, lines);
-  examinePreferences(prefix, lines);
+  const DeviceRoot root(context.root);
+  examineRoot(root, lines);
+  examineDescription(root, lines);
+  examinePreferences(root, lines);
   examineWhitelist(lines);
-  examineStore(prefix, lines);
+  examineStore(root, lines);
   examineSpool(context, lines);
 }
 

@@ -32,9 +32,7 @@ struct StoreArguments {
   std::string prefix;
 };
 
-std::string storePath(const ToolContext& context) {
-  return metricsStorePath(devicePrefix(context.root));
-}
+std::string storePath(const ToolContext& context) { return metricsStorePath(context.root); }
 
 template <class Work>
 Status writeStore(const ToolContext& context, const Work& work) {

@@ -3,6 +3,7 @@
 #include <signal.h>
 #include <stdlib.h>
 #include <sys/stat.h>
+#include <sys/sysmacros.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -11,6 +12,7 @@
 #include <limits>
 
 #include "base/byte_reader.h"
+#include "base/device_root.h"
 #include "base/file.h"
 #include "base/number_text.h"
 #include "base/printable.h"
@@ -153,6 +155,9 @@ class FileTest : public testing::Test {
   void put(const std::string& name, std::string_view text) {
     std::ofstream(folder + "/" + name) << text;
   }
+  DeviceRoot root() const { return {folder}; }
+  Directory here() const { return *Directory::open(folder); }
+  static constexpr uid_t kUser = 12345;
   std::string folder;
 };
 
@@ -170,56 +175,104 @@ TEST_F(FileTest, ReadingRefusesWhatIsNoFileOrTooLarge) {
 }
 
 TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
-  const std::string path = folder + "/deep/er/file";
-  ASSERT_TRUE(writeFileAtomically(path, "one"));
-  const auto first = fileIdentity(path);
-  ASSERT_TRUE(writeFileAtomically(path, "two"));
-  EXPECT_EQ(*readFile(path, 9), "two");
-  EXPECT_NE(fileIdentity(path), first);
+  const auto deep = root().make("/deep/er");
+  ASSERT_TRUE(deep);
+  ASSERT_TRUE(writeFileAtomically(*deep, "file", "one"));
+  const auto first = deep->identity("file");
+  ASSERT_TRUE(writeFileAtomically(*deep, "file", "two"));
+  EXPECT_EQ(*deep->readFile("file", 9), "two");
+  EXPECT_NE(deep->identity("file"), first);
   {
-    auto abandoned = TemporaryFile::beside(path);
+    auto abandoned = TemporaryFile::create(*deep, "file");
     ASSERT_TRUE(abandoned);
     ASSERT_TRUE(abandoned->write("half"));
-    EXPECT_TRUE(isTemporaryName(listFolder(folder + "/deep/er")->back()));
+    EXPECT_TRUE(isTemporaryName(deep->list()->back()));
   }
-  EXPECT_EQ(listFolder(folder + "/deep/er")->size(), 1u) << "an abandoned file is removed";
-  EXPECT_FALSE(writeFileAtomically(path + "/below-a-file", "x"));
-  ASSERT_TRUE(makeFolders(folder + "/taken"));
-  EXPECT_FALSE(writeFileAtomically(folder + "/taken", "x"));
-  EXPECT_EQ(listFolder(folder)->size(), 2u) << "nothing is left behind on failure";
+  EXPECT_EQ(deep->list()->size(), 1u) << "an abandoned file is removed";
+  EXPECT_FALSE(root().make("/deep/er/file/below-a-file"));
+  ASSERT_TRUE(root().make("/taken"));
+  EXPECT_FALSE(writeFileAtomically(here(), "taken", "x"));
+  EXPECT_EQ(here().list()->size(), 2u) << "nothing is left over on failure";
 }
 
-TEST_F(FileTest, WhatRootMakesInAUsersFolderIsTheUsers) {
+TEST_F(FileTest, LinksAreFollowedOnlyWhereNobodyElseCanMakeThem) {
+  if (::geteuid() != 0) GTEST_SKIP() << "only root can give files to others";
+  put("outside", "secret");
+  ASSERT_TRUE(root().make("/device/mnt/var/home/user"));
+  const auto link = [this](const std::string& target, const std::string& name) {
+    ASSERT_EQ(::symlink(target.c_str(), (folder + "/device" + name).c_str()), 0) << name;
+  };
+  const auto own = [this](const std::string& name) {
+    ASSERT_EQ(::lchown((folder + "/device" + name).c_str(), kUser, kUser), 0) << name;
+  };
+  link("/mnt/var", "/var");           // taken below the device root
+  link("mnt/../mnt/var", "/climbs");  // as far as the device root
+  link("../../outside", "/escapes");
+  link("loop", "/loop");
+  link("/mnt/var", "/foreign");
+  own("/foreign");
+  put("device/mnt/var/home/user/file", "mine");
+  link("/mnt/var", "/mnt/var/home/user/var");
+  link("file", "/mnt/var/home/user/link");
+  ASSERT_EQ(
+      ::link((folder + "/outside").c_str(), (folder + "/device/mnt/var/home/user/second").c_str()),
+      0);
+  put("device/mnt/var/home/user/planted", "other");
+  ASSERT_EQ(::chown((folder + "/device/mnt/var/home/user/planted").c_str(), kUser + 1, kUser), 0);
+  own("/mnt/var/home/user");
+  own("/mnt/var/home/user/file");
+  const DeviceRoot device(folder + "/device");
+  const struct {
+    const char* path;
+    const char* content;  // null: refused
+  } cases[] = {
+      {"/var/home/user/file", "mine"},
+      {"/climbs/home/user/file", "mine"},
+      {"/escapes", nullptr},
+      {"/loop", nullptr},
+      {"/foreign/home/user/file", nullptr},
+      {"/mnt/var/home/user/var/home/user/file", nullptr},
+      {"/mnt/var/home/user/link", nullptr},
+      {"/mnt/var/home/user/second", nullptr},
+      {"/mnt/var/home/user/planted", nullptr},
+      {"/mnt/../mnt/var/home/user/file", nullptr},
+  };
+  for (const auto& c : cases) {
+    const auto text = device.readFile(c.path, 100);
+    EXPECT_EQ(text ? *text : "", c.content != nullptr ? c.content : "") << c.path;
+  }
+  const auto home = device.open("/var/home/user");
+  ASSERT_TRUE(home);
+  EXPECT_FALSE(home->openForWriting("second"));
+  EXPECT_FALSE(FileLock::acquire(*home, "second"));
+}
+
+TEST_F(FileTest, WhatRootMakesInAUsersDirectoryIsTheUsers) {
   if (::geteuid() != 0) GTEST_SKIP() << "only root makes files for others";
-  constexpr uid_t kUser = 12345;
   ASSERT_EQ(::chown(folder.c_str(), kUser, kUser), 0);
-  ASSERT_TRUE(writeFileAtomically(folder + "/a/b/file", "x"));
-  ASSERT_TRUE(FileLock::acquire(folder + "/a/lock"));
-  // A file of root's with a second name in the user's folder stays root's.
-  const std::string other = folder + "-of-root";
-  ASSERT_TRUE(FileLock::acquire(other));
-  ASSERT_EQ(::link(other.c_str(), (folder + "/trap").c_str()), 0);
-  ASSERT_TRUE(FileLock::acquire(folder + "/trap"));
-  const std::pair<const char*, uid_t> owners[] = {
-      {"/a", kUser}, {"/a/b", kUser}, {"/a/b/file", kUser}, {"/a/lock", kUser}, {"/trap", 0}};
-  for (const auto& [path, owner] : owners) {
+  const auto made = root().make("/a/b");
+  ASSERT_TRUE(made && writeFileAtomically(*made, "file", "x"));
+  ASSERT_TRUE(FileLock::acquire(*made, "lock"));
+  for (const char* path : {"/a", "/a/b", "/a/b/file", "/a/b/lock"}) {
     struct stat status {};
     ASSERT_EQ(::stat((folder + path).c_str(), &status), 0) << path;
-    EXPECT_EQ(status.st_uid, owner) << path;
+    EXPECT_EQ(status.st_uid, kUser) << path;
   }
-  ASSERT_TRUE(removeFile(other));
 }
 
 TEST_F(FileTest, AKillAtAnyMomentLeavesTheOldFileOrTheNew) {
-  const std::string path = folder + "/file";
+  const Directory directory = here();
   const std::string old(100'000, 'o');
   const std::string fresh(100'000, 'n');
-  ASSERT_TRUE(writeFileAtomically(path, old));
+  ASSERT_TRUE(writeFileAtomically(directory, "file", old));
   for (int attempt = 0; attempt < 20; ++attempt) {
     const pid_t child = ::fork();
     if (child == 0) {
       for (;;) {
-        if (!writeFileAtomically(path, fresh) || !writeFileAtomically(path, old)) ::_exit(1);
+        if (!writeFileAtomically(directory, "file", fresh) ||
+            !writeFileAtomically(directory, "file", old)) {
+          ::_exit(1);
+        }
       }
     }
     ::usleep(static_cast<useconds_t>(500 + attempt * 137));
@@ -227,18 +280,17 @@ TEST_F(FileTest, AKillAtAnyMomentLeavesTheOldFileOrTheNew) {
     int status = 0;
     ::waitpid(child, &status, 0);
     ASSERT_TRUE(WIFSIGNALED(status)) << "the writer failed by itself";
-    const auto contents = readFile(path, 1'000'000);
+    const auto contents = directory.readFile("file", 1'000'000);
     ASSERT_TRUE(contents && (*contents == old || *contents == fresh));
   }
 }
 
 TEST_F(FileTest, ALockIsHeldByOneAndFreedByDeath) {
-  const std::string path = folder + "/lock";
   int ready[2];
   ASSERT_EQ(::pipe(ready), 0);
   const pid_t child = ::fork();
   if (child == 0) {
-    const auto held = FileLock::acquire(path);
+    const auto held = FileLock::acquire(here(), "lock");
     [[maybe_unused]] const auto written = ::write(ready[1], held ? "1" : "0", 1);
     ::pause();
     ::_exit(0);
@@ -246,8 +298,12 @@ TEST_F(FileTest, ALockIsHeldByOneAndFreedByDeath) {
   char answer = 0;
   ASSERT_EQ(::read(ready[0], &answer, 1), 1);
   ASSERT_EQ(answer, '1');
+  const auto refused = FileLock::acquire(here(), "lock", std::chrono::milliseconds(1));
+  ASSERT_FALSE(refused);
+  EXPECT_TRUE(refused.error().message.ends_with("is locked by process " + std::to_string(child)))
+      << refused.error().message;
   const pid_t waiter = ::fork();
-  if (waiter == 0) ::_exit(FileLock::acquire(path) ? 0 : 1);
+  if (waiter == 0) ::_exit(FileLock::acquire(here(), "lock") ? 0 : 1);
   ::usleep(50'000);
   int status = 0;
   EXPECT_EQ(::waitpid(waiter, &status, WNOHANG), 0) << "the second did not wait";
@@ -255,6 +311,17 @@ TEST_F(FileTest, ALockIsHeldByOneAndFreedByDeath) {
   ::waitpid(child, nullptr, 0);
   ::waitpid(waiter, &status, 0);
   EXPECT_EQ(WEXITSTATUS(status), 0);
+}
+
+TEST(LockHolder, ReadsTheKernelsTable) {
+  constexpr std::string_view kTable =
+      "1: POSIX  ADVISORY  WRITE 11 fe:0a:77 0 EOF\n"
+      "2: FLOCK  ADVISORY  WRITE 22 fe:0a:77 0 EOF\n"
+      "2: -> FLOCK  ADVISORY  WRITE 33 fe:0a:77 0 EOF\n"
+      "3: FLOCK  ADVISORY  WRITE 0 fe:0a:78 0 EOF\n4: FLOCK\n\n5: FLOCK a b c d";
+  EXPECT_EQ(lockHolder(kTable, makedev(0xfe, 0x0a), 77), 22);
+  EXPECT_FALSE(lockHolder(kTable, makedev(0xfe, 0x0a), 78)) << "of another namespace";
+  EXPECT_FALSE(lockHolder(kTable, makedev(0xfe, 0x0b), 77));
 }
 
 TEST(SafeFileName, NamesFromOutside) {

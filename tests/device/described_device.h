@@ -27,7 +27,7 @@ class DescribedDevice {
     folder_ = mkdtemp(name);
     if (body != nullptr) describe(body);
     std::vector<std::unique_ptr<RegistrySource>> sources;
-    sources.push_back(std::make_unique<RegistryDescription>(folder_, log_));
+    sources.push_back(std::make_unique<RegistryDescription>(DeviceDirectory(folder_, ""), log_));
     registry_ = std::make_unique<SourceRegistry>(std::move(sources));
   }
   ~DescribedDevice() { std::filesystem::remove_all(folder_); }

@@ -90,10 +90,13 @@ struct FakeFiles final : Files {
 struct FakeRunLock final : RunLock {
   std::shared_ptr<CallLog> calls;
   int depth = 0, entered = 0;
+  bool held = false;  // by another run
 
-  void enter() override {
+  bool enter() override {
     ++entered;
+    if (held) return false;
     if (depth++ == 0) calls->push_back("lock");
+    return true;
   }
   void leave() override {
     if (--depth == 0) calls->push_back("unlock");

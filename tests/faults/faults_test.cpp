@@ -14,6 +14,7 @@
 #include <optional>
 #include <set>
 
+#include "base/directory.h"
 #include "base/file.h"
 #include "faults/sample_device.h"
 #include "platform/linux/sqlite_database.h"

@@ -33,6 +33,11 @@ OpenFile& openFile(int descriptor) {
              : none;
 }
 
+std::string pathAt(int directory, std::string_view name) {
+  if (directory == AT_FDCWD || name.starts_with('/')) return std::string(name);
+  return openFile(directory).path + (name == "." ? "" : "/" + std::string(name));
+}
+
 // True when the call is to fail, with errno set.
 bool fails(const char* call, std::string_view path, unsigned possible) {
   if (judge(call, path, possible) != Verdict::Fail) return false;
@@ -69,7 +74,7 @@ using namespace tally::faults;
 
 extern "C" {
 
-int __real_open(const char*, int, ...);
+int __real_openat(int, const char*, int, ...);
 int __real_close(int);
 ssize_t __real_read(int, void*, size_t);
 ssize_t __real_write(int, const void*, size_t);
@@ -79,25 +84,26 @@ int __real_fdatasync(int);
 int __real_ftruncate(int, off_t);
 int __real_flock(int, int);
 int __real_fstat(int, struct stat*);
-int __real_stat(const char*, struct stat*);
-int __real_lstat(const char*, struct stat*);
-int __real_rename(const char*, const char*);
-int __real_unlink(const char*);
-int __real_mkdir(const char*, mode_t);
-DIR* __real_opendir(const char*);
+int __real_fstatat(int, const char*, struct stat*, int);
+int __real_renameat(int, const char*, int, const char*);
+int __real_unlinkat(int, const char*, int);
+int __real_mkdirat(int, const char*, mode_t);
+DIR* __real_fdopendir(int);
 int __real_clock_gettime(clockid_t, timespec*);
 
-int __wrap_open(const char* path, int flags, ...) {
+int __wrap_openat(int directory, const char* name, int flags, ...) {
   va_list arguments;
   va_start(arguments, flags);
   const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(arguments, mode_t) : 0;
   va_end(arguments);
   const bool creates = (flags & O_CREAT) != 0;
-  if (fails(creates ? "create" : "open", path,
-            kInputOutput | kDenied | kInterrupted | (creates ? kNoSpace | kLastCall : 0))) {
-    return -1;
-  }
-  const int file = __real_open(path, flags, mode);
+  const std::string path = pathAt(directory, name);
+  // The way down to a file is a dozen directories, for which one kind of failure is enough.
+  const unsigned possible = (flags & O_DIRECTORY) != 0 ? kDenied
+                                                       : kInputOutput | kDenied | kInterrupted |
+                                                             (creates ? kNoSpace | kLastCall : 0);
+  if (fails(creates ? "create" : "open", path, possible)) return -1;
+  const int file = __real_openat(directory, name, flags, mode);
   if (file >= 0) openFile(file) = {path, (flags & O_ACCMODE) != O_RDONLY};
   return file;
 }
@@ -153,34 +159,33 @@ int __wrap_fstat(int file, struct stat* status) {
   return __real_fstat(file, status);
 }
 
-int __wrap_stat(const char* path, struct stat* status) {
-  if (fails("stat", path, kInputOutput | kDenied)) return -1;
-  return __real_stat(path, status);
+int __wrap_fstatat(int directory, const char* name, struct stat* status, int flags) {
+  if (fails("fstatat", pathAt(directory, name), kInputOutput | kDenied)) return -1;
+  return __real_fstatat(directory, name, status, flags);
 }
 
-int __wrap_lstat(const char* path, struct stat* status) {
-  if (fails("lstat", path, kInputOutput | kDenied)) return -1;
-  return __real_lstat(path, status);
+int __wrap_renameat(int from, const char* name, int to, const char* newName) {
+  if (fails("rename to", pathAt(to, newName), kNoSpace | kInputOutput | kDenied | kLastCall)) {
+    return -1;
+  }
+  return __real_renameat(from, name, to, newName);
 }
 
-int __wrap_rename(const char* from, const char* to) {
-  if (fails("rename to", to, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
-  return __real_rename(from, to);
+int __wrap_unlinkat(int directory, const char* name, int flags) {
+  if (fails("unlink", pathAt(directory, name), kInputOutput | kDenied | kLastCall)) return -1;
+  return __real_unlinkat(directory, name, flags);
 }
 
-int __wrap_unlink(const char* path) {
-  if (fails("unlink", path, kInputOutput | kDenied | kLastCall)) return -1;
-  return __real_unlink(path);
+int __wrap_mkdirat(int directory, const char* name, mode_t mode) {
+  if (fails("mkdir", pathAt(directory, name), kNoSpace | kInputOutput | kDenied | kLastCall)) {
+    return -1;
+  }
+  return __real_mkdirat(directory, name, mode);
 }
 
-int __wrap_mkdir(const char* path, mode_t mode) {
-  if (fails("mkdir", path, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
-  return __real_mkdir(path, mode);
-}
-
-DIR* __wrap_opendir(const char* path) {
-  if (fails("opendir", path, kInputOutput | kDenied)) return nullptr;
-  return __real_opendir(path);
+DIR* __wrap_fdopendir(int directory) {
+  if (fails("list", openFile(directory).path, kInputOutput | kDenied)) return nullptr;
+  return __real_fdopendir(directory);
 }
 
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {

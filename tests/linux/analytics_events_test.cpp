@@ -16,7 +16,7 @@ class EventSpoolTest : public TemporaryRoot {
   EventSpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
   LinuxAnalyticsEvents service() {
     return {analyticsEventsFolder(root), log, clock, preferences,
-            std::make_shared<DeviceDescription>(at("device.plist"), log)};
+            std::make_shared<DeviceDescription>(TemporaryRoot::folder(""), log)};
   }
   bool send(std::string_view name, std::string_view text = "x") {
     return service().PulseSendEventLazy(name, [&] {

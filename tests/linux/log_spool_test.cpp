@@ -13,19 +13,19 @@ using Names = std::vector<std::string>;
 class SpoolTest : public TemporaryRoot {
  protected:
   SpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
-  SpoolSubmission spool() { return {at("spool"), log, clock, preferences}; }
+  SpoolSubmission spool() { return {folder("spool"), log, clock, preferences}; }
   bool submit(std::string_view body, std::string_view name = "log-test",
               const KvDictionary* options = nullptr) {
     return spool().SMAWriteLogForSubmission("193", name, options, nullptr,
                                             [body](LogFile& file) { file.write(body); });
   }
   std::vector<SpooledLog> list() const {
-    auto logs = SpoolReader(at("spool")).list();
+    auto logs = SpoolReader(folder("spool")).list();
     EXPECT_TRUE(logs);
     return *std::move(logs);
   }
   std::string body(const SpooledLog& entry) const {
-    return *SpoolReader(at("spool")).readBody(entry, 1u << 30);
+    return *SpoolReader(folder("spool")).readBody(entry, 1u << 30);
   }
   void bound(const char* key, std::int32_t value) {
     preferences->put(key, KvNumber::int32(value), "vellum.tallyd.tallyrun");

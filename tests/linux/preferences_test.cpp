@@ -14,7 +14,7 @@ constexpr char kFile[] = "prefs/vellum.test.plist";
 
 class PreferencesTest : public TemporaryRoot {
  protected:
-  PropertyListPreferences open() { return {at("prefs"), log}; }
+  PropertyListPreferences open() { return {folder("prefs"), log}; }
   static KvRef<KvObject> number(std::int64_t value) { return KvNumber::int64(value); }
   std::int32_t stored(std::string_view key) {
     return open().SMAPreferencesGetIntegerValue(key, kDomain);
@@ -27,7 +27,7 @@ TEST_F(PreferencesTest, WritesReachStorageAtSynchroniseOrAtTheEnd) {
     preferences.SMAPreferencesSetValue("a", number(1), kDomain);
     preferences.SMAPreferencesSetValue("b", number(2), kDomain);
     EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 1);
-    EXPECT_FALSE(fileIdentity(at(kFile))) << "written before it was asked for";
+    EXPECT_FALSE(exists(kFile)) << "written before it was asked for";
     EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
     EXPECT_EQ(stored("b"), 2);
     preferences.SMAPreferencesSetValue("a", nullptr, kDomain);
@@ -35,7 +35,7 @@ TEST_F(PreferencesTest, WritesReachStorageAtSynchroniseOrAtTheEnd) {
     EXPECT_EQ(preferences.SMAPreferencesGetValue("a", kDomain).get(), nullptr);
     preferences.SMAPreferencesSetValue("other", number(4), "vellum.other");
   }
-  const auto preferences = std::make_unique<PropertyListPreferences>(at("prefs"), log);
+  const auto preferences = std::make_unique<PropertyListPreferences>(folder("prefs"), log);
   EXPECT_EQ(kvText(preferences->copyDomain(kDomain).get()),
             kvText(KvDictionary::create({{"b", number(2)}, {"c", number(3)}}).get()));
   EXPECT_EQ(*preferences->listDomains(), (std::vector<std::string>{"vellum.other", kDomain}));
@@ -46,13 +46,13 @@ TEST_F(PreferencesTest, NothingIsWrittenWhenNothingChanges) {
   auto preferences = open();
   preferences.SMAPreferencesSetValue("a", number(1), kDomain);
   preferences.SMAPreferencesSynchronize(kDomain);
-  const auto before = fileIdentity(at(kFile));
+  const auto before = DeviceRoot(root).identity(kFile);
   preferences.SMAPreferencesSetValue("a", number(1), kDomain);
   preferences.SMAPreferencesSetValue("absent", nullptr, kDomain);
   EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
   EXPECT_TRUE(preferences.SMAPreferencesSynchronize("vellum.never"));
-  EXPECT_EQ(fileIdentity(at(kFile)), before);
-  EXPECT_FALSE(fileIdentity(at("prefs/vellum.never.plist")));
+  EXPECT_EQ(DeviceRoot(root).identity(kFile), before);
+  EXPECT_FALSE(exists("prefs/vellum.never.plist"));
 }
 
 TEST_F(PreferencesTest, SeesAndKeepsWhatOtherProcessesWrite) {
@@ -159,9 +159,9 @@ TEST_F(PreferencesTest, UnsafeDomainsAreRefused) {
     EXPECT_EQ(errors().size(), 3u) << domain;
   }
   EXPECT_EQ(get("outside.plist"), "untouched");
-  EXPECT_FALSE(fileIdentity(at("prefs")));
-  EXPECT_EQ(userPreferencesFolder("/r", "mobile"), "/r/var/mobile/Library/Preferences");
-  for (const auto user : {"..", "", "a/b"}) EXPECT_FALSE(userPreferencesFolder("/r", user));
+  EXPECT_FALSE(exists("prefs"));
+  EXPECT_EQ(userPreferencesFolder(root, "mobile")->text(), at("var/mobile/Library/Preferences"));
+  for (const auto user : {"..", "", "a/b"}) EXPECT_FALSE(userPreferencesFolder(root, user));
 }
 
 TEST_F(PreferencesTest, AFailedWriteKeepsTheChangesForTheNextAttempt) {

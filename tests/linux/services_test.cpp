@@ -27,7 +27,7 @@ class ServicesTest : public TemporaryRoot {
  protected:
   std::shared_ptr<DeviceDescription> describe(const std::string& dictionary) {
     if (!dictionary.empty()) putPlist("device.plist", "<dict>" + dictionary + "</dict>");
-    return std::make_shared<DeviceDescription>(at("device.plist"), log);
+    return std::make_shared<DeviceDescription>(folder(""), log);
   }
 };
 
@@ -239,7 +239,7 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
   EXPECT_EQ(errors().size(), 2u) << "the number too large and the text";
   EXPECT_EQ(kernel.MonotonicTicks(), 99u);
   EXPECT_FALSE(kernel.TimebaseInfo());
-  LinuxKernelValues real(std::make_shared<DeviceDescription>(at("none"), log));
+  LinuxKernelValues real(std::make_shared<DeviceDescription>(folder("none"), log));
   const auto ticks = real.MonotonicTicks();
   EXPECT_GE(real.MonotonicTicks(), ticks);
   EXPECT_EQ(real.TimebaseInfo()->denominator, 1u);
@@ -259,9 +259,9 @@ TEST_F(ServicesTest, FilesStayBelowTheRoot) {
 }
 
 TEST_F(ServicesTest, TurnsNestAndEndWithTheProcess) {
-  FileRunLock lock(at("folder/run.lock"), log);
+  FileRunLock lock(folder("folder"), log);
   const auto held = [this] {
-    const int file = ::open(at("folder/run.lock").c_str(), O_RDWR | O_CLOEXEC);
+    const int file = ::open(at("folder/tallyrun.lock").c_str(), O_RDWR | O_CLOEXEC);
     const bool locked = ::flock(file, LOCK_EX | LOCK_NB) != 0;
     ::close(file);
     return locked;
@@ -273,15 +273,21 @@ TEST_F(ServicesTest, TurnsNestAndEndWithTheProcess) {
   }
   EXPECT_FALSE(held());
   runAndKill(20000, [this] {
-    FileRunLock other(at("folder/run.lock"), log);
+    FileRunLock other(folder("folder"), log);
     other.enter();
     ::pause();
   });
   EXPECT_FALSE(held()) << "a killed run still holds its turn";
   put("file", "");
-  FileRunLock impossible(at("file/run.lock"), log);
-  for (int i = 0; i < 2; ++i) const RunTurn turn(impossible);
+  FileRunLock impossible(folder("file"), log);
+  for (int i = 0; i < 2; ++i) EXPECT_TRUE(RunTurn(impossible)) << "no lock is no reason to stop";
   EXPECT_EQ(errors().size(), 1u);
+
+  const RunTurn turn(lock);
+  FileRunLock refused(folder("folder"), log, std::chrono::milliseconds(1));
+  EXPECT_FALSE(RunTurn(refused));
+  const std::string holder = "is locked by process " + std::to_string(::getpid());
+  EXPECT_NE(errors().back().find(holder), std::string::npos) << errors().back();
 }
 
 TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
@@ -301,7 +307,7 @@ TEST_F(ServicesTest, WhatRootRecordsForAUserIsTheUsers) {
   if (::geteuid() != 0) GTEST_SKIP() << "only root makes files for others";
   constexpr uid_t kUser = 12345;
   const std::string home = at("var/mobile");
-  ASSERT_TRUE(makeFolders(home));
+  ASSERT_TRUE(folder("var/mobile").make());
   ASSERT_EQ(::chown(home.c_str(), kUser, kUser), 0);
   const Platform services = makeLinuxPlatform(root);
   services.metricsStore->TBClientSetValueForScalarKey("a", 1);
@@ -326,10 +332,6 @@ TEST_F(ServicesTest, MakingThePlatformTouchesNothing) {
     EXPECT_GT(services.clock->secondsSince1970(), 1.7e9);
   }
   EXPECT_TRUE(std::filesystem::is_empty(root));
-  const struct {
-    const char *given, *prefix;
-  } cases[] = {{"/", ""}, {"", ""}, {"//", ""}, {"/a/", "/a"}, {"a", "a"}};
-  for (const auto& c : cases) EXPECT_EQ(devicePrefix(c.given), c.prefix) << c.given;
 }
 
 }  // namespace

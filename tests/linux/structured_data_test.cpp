@@ -15,11 +15,11 @@ using Names = std::vector<std::string>;
 class StructuredDataTest : public TemporaryRoot {
  protected:
   Status append(std::uint32_t type, std::int64_t value) {
-    return folder.append(type, *KvDictionary::create({{"n", KvNumber::int64(value)}}), bounds);
+    return data.append(type, *KvDictionary::create({{"n", KvNumber::int64(value)}}), bounds);
   }
   Names finish() {
     Names failures;
-    folder.finishAll(bounds, [&](const Error& error) { failures.push_back(error.message); });
+    data.finishAll(bounds, [&](const Error& error) { failures.push_back(error.message); });
     return failures;
   }
   // The values of the records in all finished logs, in order; also checks each one's type.
@@ -39,13 +39,13 @@ class StructuredDataTest : public TemporaryRoot {
   }
 
   fakes::FakeClock clock;
-  StructuredDataFolder folder{at("data"), clock};
+  StructuredDataFolder data{folder("data"), clock};
   FolderBounds bounds;
 };
 
 TEST_F(StructuredDataTest, RecordsAreGatheredByTypeAndWrittenOutOnce) {
   EXPECT_TRUE(finish().empty());
-  EXPECT_FALSE(fileIdentity(at("data"))) << "made without need";
+  EXPECT_FALSE(exists("data")) << "made without need";
   for (int i = 1; i <= 3; ++i) ASSERT_TRUE(append(172, i));
   ASSERT_TRUE(append(176, 9));
   EXPECT_EQ(names("data"), (Names{"0000000001-172.pending", "0000000002-176.pending"}));
@@ -116,12 +116,12 @@ TEST_F(StructuredDataTest, AKillLosesNoWholeRecord) {
 }
 
 TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
-  EXPECT_TRUE(rollLogs(at("absent")));
+  EXPECT_TRUE(rollLogs(folder("absent")));
   put("logs/empty.log", "");
   put("logs/other.txt", "x");
   for (int i = 1; i <= 9; ++i) {
     put("logs/a.log", std::to_string(i));
-    ASSERT_TRUE(rollLogs(at("logs")));
+    ASSERT_TRUE(rollLogs(folder("logs")));
   }
   EXPECT_EQ(names("logs"), (Names{"a.log.1", "a.log.2", "a.log.3", "a.log.4", "a.log.5", "a.log.6",
                                   "a.log.7", "empty.log", "other.txt"}));
@@ -129,7 +129,7 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
   EXPECT_EQ(get("logs/a.log.7"), "3");
   std::filesystem::remove(at("logs/a.log.3"));  // a gap, as a kill in between leaves it
   put("logs/a.log", "10");
-  ASSERT_TRUE(rollLogs(at("logs")));
+  ASSERT_TRUE(rollLogs(folder("logs")));
   EXPECT_EQ(get("logs/a.log.3"), "8");
   EXPECT_EQ(get("logs/a.log.7"), "3") << "nothing had to go";
 }
@@ -137,7 +137,7 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
 TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
   const auto preferences = std::make_shared<fakes::FakePreferences>();
   const auto enabled = [&] {
-    const auto description = std::make_shared<DeviceDescription>(at("device/device.plist"), log);
+    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
     return LinuxCrashReporting(root, log, std::make_shared<fakes::FakeClock>(), preferences,
                                description)
         .isDiagnosticSubmissionEnabled();

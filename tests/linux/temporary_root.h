@@ -15,6 +15,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/device_root.h"
 #include "base/file.h"
 #include "fakes/fake_platform.h"
 
@@ -32,6 +33,8 @@ class TemporaryRoot : public testing::Test {
   }
 
   std::string at(std::string_view path) const { return root + "/" + std::string(path); }
+  DeviceDirectory folder(std::string_view path) const { return {root, "/" + std::string(path)}; }
+  bool exists(std::string_view path) const { return std::filesystem::exists(at(path)); }
   void put(std::string_view path, std::string_view text) const {
     std::filesystem::create_directories(std::filesystem::path(at(path)).parent_path());
     std::ofstream(at(path), std::ios::binary) << text;
@@ -45,9 +48,9 @@ class TemporaryRoot : public testing::Test {
     return text ? *text : "(" + text.error().message + ")";
   }
   // The entries of a folder, without lock files.
-  std::vector<std::string> names(std::string_view folder) const {
+  std::vector<std::string> names(std::string_view path) const {
     std::vector<std::string> found;
-    const auto all = listFolder(at(folder));
+    const auto all = folder(path).list();
     EXPECT_TRUE(all);
     for (const std::string& name : *all) {
       if (!name.ends_with(".lock")) found.push_back(name);

@@ -77,7 +77,7 @@ TEST(Platform, ScopesNestAndMessagesAreFormattedOnlyWhenSeen) {
 
 TEST(Platform, AServiceCanLogWhileItEnds) {
   struct Farewell final : RunLock {
-    void enter() override {}
+    bool enter() override { return true; }
     void leave() override {}
     ~Farewell() override { logMessage(LogLevel::Error, "not written"); }
   };

@@ -33,7 +33,7 @@ std::optional<std::vector<std::byte>> DescribedFiles::bytes(const KvObject& desc
     report("neither data nor the name of a file: " + kvText(&described));
     return std::nullopt;
   }
-  const auto content = readFile(folder_ + "/" + std::string(name->view()), kDescribedBytesLimit);
+  const auto content = folder_.readFile(name->view(), kDescribedBytesLimit);
   if (!content) {
     report(content.error().message);
     return std::nullopt;

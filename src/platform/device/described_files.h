@@ -8,6 +8,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/device_root.h"
 #include "kv/value.h"
 #include "platform/system_log.h"
 
@@ -18,7 +19,7 @@ constexpr std::size_t kDescribedBytesLimit = 64u << 20;
 
 class DescribedFiles {
  public:
-  DescribedFiles(std::string folder, std::shared_ptr<SystemLog> log)
+  DescribedFiles(DeviceDirectory folder, std::shared_ptr<SystemLog> log)
       : folder_(std::move(folder)), log_(std::move(log)) {}
 
   // What a description gives as bytes: a data value itself, or the content of the file that a
@@ -29,7 +30,7 @@ class DescribedFiles {
   void report(std::string_view fault) const;
 
  private:
-  std::string folder_;
+  DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;
 };
 

@@ -5,9 +5,10 @@
 
 namespace tally {
 
-void addDeviceRegistry(Platform& services, const std::string& prefix) {
+void addDeviceRegistry(Platform& services, const DeviceRoot& root) {
   std::vector<std::unique_ptr<RegistrySource>> sources;
-  sources.push_back(std::make_unique<RegistryDescription>(prefix + "/device", services.log));
+  sources.push_back(
+      std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log));
   services.deviceRegistry = std::make_shared<SourceRegistry>(std::move(sources));
 }
 

@@ -1,13 +1,12 @@
 // The device registry of a device root.
 #pragma once
 
-#include <string>
-
+#include "base/device_root.h"
 #include "platform/platform.h"
 
 namespace tally {
 
-// Adds the registry to a platform that has a log. prefix is the root without a slash at its end.
-void addDeviceRegistry(Platform& services, const std::string& prefix);
+// Adds the registry to a platform that has a log.
+void addDeviceRegistry(Platform& services, const DeviceRoot& root);
 
 }  // namespace tally

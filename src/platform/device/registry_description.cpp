@@ -10,6 +10,7 @@ namespace tally {
 namespace {
 
 // Entries without an id are numbered from here, in the order of the file.
+constexpr std::string_view kFileName = "registry.plist";
 constexpr std::uint64_t kFirstID = 0x100;
 // What of an entry is not a property that clients see, and where it is kept for open().
 constexpr std::string_view kHub = "Hub";
@@ -77,12 +78,12 @@ std::shared_ptr<DescribedEntry> parseEntry(const KvDictionary& description, std:
 
 }  // namespace
 
-RegistryDescription::RegistryDescription(std::string folder, std::shared_ptr<SystemLog> log)
-    : path_(folder + "/registry.plist"),
-      files_(std::make_shared<DescribedFiles>(std::move(folder), std::move(log))) {}
+RegistryDescription::RegistryDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log)
+    : folder_(std::move(folder)),
+      files_(std::make_shared<DescribedFiles>(folder_, std::move(log))) {}
 
 std::shared_ptr<const RegistrySource::Entries> RegistryDescription::entries() {
-  const auto identity = fileIdentity(path_);
+  const auto identity = folder_.identity(kFileName);
   if (!entries_ || identity != identity_) {
     identity_ = identity;
     entries_ = identity ? read() : std::make_shared<const Entries>();
@@ -92,7 +93,8 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::entries() {
 
 std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
   auto entries = std::make_shared<Entries>();
-  const auto content = readFile(path_, kPlistMaximumBytes);
+  const std::string path = folder_.text() + "/" + std::string(kFileName);
+  const auto content = folder_.readFile(kFileName, kPlistMaximumBytes);
   if (!content) {
     files_->report(content.error().message);
     return entries;
@@ -101,7 +103,7 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
   const auto* dictionary = root ? kvCast<KvDictionary>(root->get()) : nullptr;
   const auto* items = dictionary != nullptr ? dictionary->getAs<KvArray>("Entries") : nullptr;
   if (items == nullptr) {
-    files_->report(path_ + ": " +
+    files_->report(path + ": " +
                    (root ? "no dictionary with an array of Entries" : root.error().message));
     return entries;
   }
@@ -117,7 +119,7 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
     if (entry) {
       entries->push_back(std::move(entry));
     } else {
-      files_->report(path_ + ": entry " + std::to_string(i + 1) + " skipped: " + fault);
+      files_->report(path + ": entry " + std::to_string(i + 1) + " skipped: " + fault);
     }
   }
   return entries;

@@ -5,7 +5,7 @@
 #include <optional>
 #include <string>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "platform/device/described_files.h"
 #include "platform/device/registry_source.h"
 
@@ -15,7 +15,7 @@ class RegistryDescription final : public RegistrySource {
  public:
   // folder holds registry.plist and the files that it names. Nothing is read before it is asked
   // for; a changed file is read again.
-  RegistryDescription(std::string folder, std::shared_ptr<SystemLog> log);
+  RegistryDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log);
 
   std::shared_ptr<const Entries> entries() override;
   std::unique_ptr<UserClient> open(const RegistryEntry& entry, std::uint32_t type,
@@ -24,7 +24,7 @@ class RegistryDescription final : public RegistrySource {
  private:
   std::shared_ptr<const Entries> read();
 
-  std::string path_;
+  DeviceDirectory folder_;
   std::shared_ptr<DescribedFiles> files_;
   std::optional<FileIdentity> identity_;
   std::shared_ptr<const Entries> entries_;

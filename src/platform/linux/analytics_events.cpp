@@ -4,7 +4,6 @@
 
 #include <algorithm>
 
-#include "base/file.h"
 #include "base/time_text.h"
 #include "kv/json_writer.h"
 #include "platform/linux/log_spool.h"
@@ -43,11 +42,12 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
   const std::uint64_t largest =
       std::min<std::uint64_t>(kLargestFile, std::max<std::uint64_t>(bounds.maximumBytes / 4, 1));
   if (line.size() > bounds.maximumBytes) return Error{"larger than the whole spool may be"};
-  if (auto made = makePrivateFolder(folder_); !made) return made;
-  const auto lock = FileLock::acquire(folder_ + "/.events.lock");
+  const auto folder = makePrivateFolder(folder_);
+  if (!folder) return folder.error();
+  const auto lock = FileLock::acquire(*folder, ".events.lock");
   if (!lock) return lock.error();
-  if (auto reserve = checkReserve(folder_, line.size()); !reserve) return reserve;
-  const auto files = listSequenced(folder_);
+  if (auto reserve = checkReserve(*folder, line.size()); !reserve) return reserve;
+  const auto files = listSequenced(*folder);
   if (!files) return files.error();
 
   const auto fileName = [](std::uint64_t sequence) {
@@ -58,7 +58,7 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
   const bool takesMore = !files->empty() && files->back().bytes + line.size() <= largest &&
                          files->back().names == std::vector{fileName(sequence)};
   if (takesMore) {
-    const auto present = readFile(folder_ + "/" + fileName(sequence), kLargestFile);
+    const auto present = folder->readFile(fileName(sequence), kLargestFile);
     if (!present) return present.error();
     end = wholeLines(*present);
   } else {
@@ -66,12 +66,11 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
     if (!next) return next.error();
     sequence = *next;
   }
-  if (auto appended = appendAt(folder_ + "/" + fileName(sequence), end, line); !appended)
-    return appended;
-  return evictOldest(folder_, bounds, sequence);
+  if (auto appended = appendAt(*folder, fileName(sequence), end, line); !appended) return appended;
+  return evictOldest(*folder, bounds, sequence);
 }
 
-LinuxAnalyticsEvents::LinuxAnalyticsEvents(std::string folder, std::shared_ptr<SystemLog> log,
+LinuxAnalyticsEvents::LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
                                            std::shared_ptr<Clock> clock,
                                            std::shared_ptr<Preferences> preferences,
                                            std::shared_ptr<DeviceDescription> description)
@@ -118,8 +117,8 @@ bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
   return static_cast<bool>(appended);
 }
 
-std::string analyticsEventsFolder(const std::string& prefix) {
-  return prefix + "/var/mobile/Library/Logs/AnalyticsEvents";
+DeviceDirectory analyticsEventsFolder(const DeviceRoot& root) {
+  return {root, "/var/mobile/Library/Logs/AnalyticsEvents"};
 }
 
 }  // namespace tally

@@ -18,14 +18,15 @@ namespace tally {
 
 // NUMBER-events.jsonl holds one JSON object a line, each a whole event; the next file is begun when
 // one is full, and the oldest files go when the folder's bounds are reached. Writers of several
-// processes take turns. A line that a killed run left half written is cut off before the next.
+// processes are serialised. A line that a killed run left half written is cut off before the next.
 class EventSpool {
  public:
-  EventSpool(std::string folder, const Clock& clock) : folder_(std::move(folder)), clock_(clock) {}
+  EventSpool(DeviceDirectory folder, const Clock& clock)
+      : folder_(std::move(folder)), clock_(clock) {}
   Status append(std::string_view event, const KvDictionary& payload, const FolderBounds& bounds);
 
  private:
-  std::string folder_;
+  DeviceDirectory folder_;
   const Clock& clock_;
 };
 
@@ -35,7 +36,7 @@ std::string eventLine(std::string_view event, double secondsSince1970, const KvD
 // The description's entry "AnalyticsEvents" says whether there is a service and what it wants.
 class LinuxAnalyticsEvents final : public AnalyticsEvents {
  public:
-  LinuxAnalyticsEvents(std::string folder, std::shared_ptr<SystemLog> log,
+  LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
                        std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
                        std::shared_ptr<DeviceDescription> description);
   bool isAvailable() override;
@@ -50,7 +51,7 @@ class LinuxAnalyticsEvents final : public AnalyticsEvents {
   EventSpool spool_;
 };
 
-// Where the events lie below a root.
-std::string analyticsEventsFolder(const std::string& prefix);
+// Where the events lie on a device.
+DeviceDirectory analyticsEventsFolder(const DeviceRoot& root);
 
 }  // namespace tally

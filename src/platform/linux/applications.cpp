@@ -1,11 +1,9 @@
 #include "platform/linux/applications.h"
 
-#include <sys/stat.h>
-
 #include <algorithm>
+#include <cerrno>
 #include <set>
 
-#include "base/file.h"
 #include "platform/linux/text_lines.h"
 
 namespace tally {
@@ -15,23 +13,22 @@ constexpr std::size_t kLargestEntry = 1u << 20;
 constexpr int kDeepestFolder = 8;
 constexpr std::string_view kEntrySuffix = ".desktop";
 
-bool isFolder(const std::string& path) {
-  struct stat status {};
-  return ::lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
-}
-
-// Calls handler(id, path) for every entry of a folder; an id is the path below it with '-' for '/'.
+// Calls handler(id, path) for every entry of a directory; the path is below it, an id is the path
+// with '-' for '/'.
 template <class Handler>
-void eachEntry(const std::string& folder, const std::string& idPrefix, int depth,
+void eachEntry(const Directory& directory, const std::string& path, int depth,
                const Handler& handler) {
-  const auto names = listFolder(folder);
+  const auto names = directory.list();
   if (!names) return;
   for (const std::string& name : *names) {
-    const std::string path = folder + "/" + name;
     if (name.ends_with(kEntrySuffix)) {
-      handler(idPrefix + name, path);
-    } else if (depth < kDeepestFolder && isFolder(path)) {
-      eachEntry(path, idPrefix + name + "-", depth + 1, handler);
+      std::string id = path + name;
+      std::ranges::replace(id, '/', '-');
+      handler(id, path + name);
+    } else if (depth < kDeepestFolder) {
+      if (const auto below = directory.openDirectory(name)) {
+        eachEntry(*below, path + name + "/", depth + 1, handler);
+      }
     }
   }
 }
@@ -54,19 +51,19 @@ bool isVisibleApplication(std::string_view desktopEntry) {
   return application && !hidden && !noDisplay;
 }
 
-std::vector<ApplicationFolder> applicationFolders(const std::string& prefix,
+std::vector<ApplicationFolder> applicationFolders(const DeviceRoot& root,
                                                   const std::string& dataHome) {
   std::vector<ApplicationFolder> folders;
-  const auto addUser = [&folders](const std::string& data) {
-    folders.push_back({data + "/applications", UserAppType});
-    folders.push_back({data + "/flatpak/exports/share/applications", UserAppType});
+  const auto addUser = [&folders, &root](const std::string& data) {
+    folders.push_back({{root, data + "/applications"}, UserAppType});
+    folders.push_back({{root, data + "/flatpak/exports/share/applications"}, UserAppType});
   };
-  const std::string mobile = prefix + "/var/mobile/.local/share";
+  const std::string mobile = "/var/mobile/.local/share";
   addUser(mobile);
   if (!dataHome.empty() && dataHome != mobile) addUser(dataHome);
-  folders.push_back({prefix + "/var/lib/flatpak/exports/share/applications", UserAppType});
-  folders.push_back({prefix + "/usr/local/share/applications", SystemAppType});
-  folders.push_back({prefix + "/usr/share/applications", SystemAppType});
+  folders.push_back({{root, "/var/lib/flatpak/exports/share/applications"}, UserAppType});
+  folders.push_back({{root, "/usr/local/share/applications"}, SystemAppType});
+  folders.push_back({{root, "/usr/share/applications"}, SystemAppType});
   return folders;
 }
 
@@ -85,11 +82,16 @@ void DesktopAppRegistry::enumerateBundles(int kind,
   }
   std::set<std::string> seen;
   for (const ApplicationFolder& folder : folders_) {
-    eachEntry(folder.path, "", 0, [&](const std::string& id, const std::string& path) {
+    const auto directory = folder.directory.open();
+    if (!directory) continue;
+    eachEntry(*directory, "", 0, [&](const std::string& id, const std::string& path) {
       // A hidden entry of the user still hides the system's.
       if (!seen.insert(id).second) return;
-      const auto entry = readFile(path, kLargestEntry);
-      if (entry && isVisibleApplication(*entry)) handler(folder.bundleType);
+      const auto entry = folder.directory.readFile(path, kLargestEntry);
+      // What is exported for a user are links, which are not followed in a user's directory; only
+      // applications are exported.
+      const bool exported = !entry && entry.error().systemError == ELOOP;
+      if (exported || (entry && isVisibleApplication(*entry))) handler(folder.bundleType);
     });
   }
 }

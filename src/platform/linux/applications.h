@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/device_root.h"
 #include "platform/applications.h"
 #include "platform/linux/device_description.h"
 
@@ -13,13 +14,13 @@ namespace tally {
 
 // Folders of desktop entries: where one id is in several folders, the earlier folder counts.
 struct ApplicationFolder {
-  std::string path;
+  DeviceDirectory directory;
   std::string_view bundleType;
 };
 
 // The folders of a device, the user's first. dataHome is the value of XDG_DATA_HOME or what stands
 // for it; empty when the program's own user has no part in the device.
-std::vector<ApplicationFolder> applicationFolders(const std::string& prefix,
+std::vector<ApplicationFolder> applicationFolders(const DeviceRoot& root,
                                                   const std::string& dataHome);
 
 // The bundles are those of the description's "Applications" (an array of bundle types), else one

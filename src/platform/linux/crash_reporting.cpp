@@ -8,16 +8,16 @@
 
 namespace tally {
 
-LinuxCrashReporting::LinuxCrashReporting(const std::string& prefix, std::shared_ptr<SystemLog> log,
+LinuxCrashReporting::LinuxCrashReporting(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                                          std::shared_ptr<Clock> clock,
                                          std::shared_ptr<Preferences> preferences,
                                          std::shared_ptr<DeviceDescription> description)
-    : fixlineFolder_(prefix + "/var/mobile/Library/Logs/Fixline"),
+    : fixlineFolder_(root, "/var/mobile/Library/Logs/Fixline"),
       log_(std::move(log)),
       clock_(std::move(clock)),
       preferences_(std::move(preferences)),
       description_(std::move(description)),
-      structuredData_(prefix + "/var/mobile/Library/Logs/StructuredData", *clock_) {}
+      structuredData_(DeviceDirectory(root, "/var/mobile/Library/Logs/StructuredData"), *clock_) {}
 
 bool LinuxCrashReporting::isDiagnosticSubmissionEnabled() {
   constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";

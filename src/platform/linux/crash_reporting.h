@@ -13,7 +13,7 @@ namespace tally {
 
 class LinuxCrashReporting final : public CrashReporting {
  public:
-  LinuxCrashReporting(const std::string& prefix, std::shared_ptr<SystemLog> log,
+  LinuxCrashReporting(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                       std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
                       std::shared_ptr<DeviceDescription> description);
   bool isDiagnosticSubmissionEnabled() override;
@@ -24,7 +24,7 @@ class LinuxCrashReporting final : public CrashReporting {
  private:
   void report(std::string_view what, const Error& error) const;
 
-  std::string fixlineFolder_;
+  DeviceDirectory fixlineFolder_;
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;

@@ -13,7 +13,7 @@ constexpr std::size_t kLimit = 64u << 20;
 
 class DescribedConfig final : public StackshotConfig {
  public:
-  DescribedConfig(std::string folder, std::shared_ptr<DeviceDescription> description,
+  DescribedConfig(DeviceDirectory folder, std::shared_ptr<DeviceDescription> description,
                   KvRef<KvDictionary> stackshot)
       : folder_(std::move(folder)),
         description_(std::move(description)),
@@ -31,7 +31,7 @@ class DescribedConfig final : public StackshotConfig {
       description_->reportEntry("Stackshot.File", "names no file of the device folder");
       return ENOENT;
     }
-    auto content = readFile(folder_ + "/" + std::string(*name), kLimit);
+    auto content = folder_.readFile(*name, kLimit);
     if (!content) {
       description_->reportEntry("Stackshot.File", content.error().message);
       return content.error().systemError != 0 ? content.error().systemError : EIO;
@@ -51,7 +51,7 @@ class DescribedConfig final : public StackshotConfig {
     return static_cast<int>(stackshot_->getInt64(key).value_or(0));
   }
 
-  std::string folder_;
+  DeviceDirectory folder_;
   std::shared_ptr<DeviceDescription> description_;
   KvRef<KvDictionary> stackshot_;
   std::string buffer_;

@@ -4,6 +4,7 @@
 #include <memory>
 #include <string>
 
+#include "base/device_root.h"
 #include "platform/linux/device_description.h"
 #include "platform/stackshot.h"
 
@@ -12,12 +13,12 @@ namespace tally {
 class DescribedStackshot final : public Stackshot {
  public:
   // folder holds the files that the description names.
-  DescribedStackshot(std::string folder, std::shared_ptr<DeviceDescription> description)
+  DescribedStackshot(DeviceDirectory folder, std::shared_ptr<DeviceDescription> description)
       : folder_(std::move(folder)), description_(std::move(description)) {}
   std::unique_ptr<StackshotConfig> stackshotConfigCreate() override;
 
  private:
-  std::string folder_;
+  DeviceDirectory folder_;
   std::shared_ptr<DeviceDescription> description_;
 };
 

@@ -4,10 +4,14 @@
 
 #include <cerrno>
 
-#include "base/file.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
+namespace {
+
+constexpr std::string_view kFileName = "device.plist";
+
+}  // namespace
 
 const KvObject* DeviceDescription::get(std::string_view key) {
   std::call_once(read_, [this] { read(); });
@@ -16,9 +20,10 @@ const KvObject* DeviceDescription::get(std::string_view key) {
 
 void DeviceDescription::read() {
   const auto report = [this](std::string_view fault) {
-    log_->write(LogLevel::Error, fmt::format("device description {}: {}", path_, fault));
+    log_->write(LogLevel::Error,
+                fmt::format("device description {}/{}: {}", folder_.text(), kFileName, fault));
   };
-  const auto document = readFile(path_, kPlistMaximumBytes);
+  const auto document = folder_.readFile(kFileName, kPlistMaximumBytes);
   if (!document) {
     if (document.error().systemError != ENOENT) report(document.error().message);
     return;
@@ -35,8 +40,8 @@ void DeviceDescription::read() {
 void DeviceDescription::reportEntry(std::string_view entry, std::string_view fault) {
   const std::lock_guard lock(reporting_);
   if (!reported_.emplace(entry).second) return;
-  log_->write(LogLevel::Error,
-              fmt::format("device description {}: entry \"{}\" {}", path_, entry, fault));
+  log_->write(LogLevel::Error, fmt::format("device description {}/{}: entry \"{}\" {}",
+                                           folder_.text(), kFileName, entry, fault));
 }
 
 }  // namespace tally

@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/device_root.h"
 #include "kv/value.h"
 #include "platform/system_log.h"
 
@@ -17,8 +18,9 @@ namespace tally {
 // an entry of the wrong type is named in one error line and counts as absent. Any thread may ask.
 class DeviceDescription {
  public:
-  DeviceDescription(std::string path, std::shared_ptr<SystemLog> log)
-      : path_(std::move(path)), log_(std::move(log)) {}
+  // The directory holds device.plist and the files that it names.
+  DeviceDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log)
+      : folder_(std::move(folder)), log_(std::move(log)) {}
 
   // Borrowed; null when it is not described.
   const KvObject* get(std::string_view key);
@@ -38,7 +40,7 @@ class DeviceDescription {
  private:
   void read();
 
-  std::string path_;
+  DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;
   std::once_flag read_;
   KvRef<KvDictionary> entries_;

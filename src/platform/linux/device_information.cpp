@@ -7,7 +7,6 @@
 #include <cctype>
 #include <iterator>
 
-#include "base/file.h"
 #include "platform/linux/os_release.h"
 
 namespace tally {
@@ -45,7 +44,7 @@ KvRef<KvObject> LinuxDeviceInformation::DeviceQuery(std::string_view question) {
 
 KvRef<KvObject> LinuxDeviceInformation::diskUsage() const {
   struct statvfs volume {};
-  if (::statvfs((prefix_ + "/").c_str(), &volume) != 0) return nullptr;
+  if (::statvfs((root_.prefix() + "/").c_str(), &volume) != 0) return nullptr;
   const auto bytes = [&volume](fsblkcnt_t blocks) {
     return KvNumber::int64(static_cast<std::int64_t>(blocks * volume.f_frsize));
   };
@@ -54,8 +53,8 @@ KvRef<KvObject> LinuxDeviceInformation::diskUsage() const {
 }
 
 KvRef<KvObject> LinuxDeviceInformation::inverseDeviceID() const {
-  for (const std::string& path : {prefix_ + "/etc/machine-id", std::string("/etc/machine-id")}) {
-    const auto text = readFile(path, kLargestTextFile);
+  for (const DeviceRoot& root : {root_, DeviceRoot("/")}) {
+    const auto text = root.readFile("/etc/machine-id", kLargestTextFile);
     const std::string identifier = text ? tally::inverseDeviceID(*text) : "";
     if (!identifier.empty()) return KvString::create(identifier);
   }
@@ -80,9 +79,9 @@ KvRef<KvDictionary> LinuxDeviceInformation::copySystemVersionDictionary() {
     return described->copy();
   }
   // A device root need not be a whole system: what it lacks is the host's.
-  for (const std::string& prefix : {prefix_, std::string()}) {
+  for (const DeviceRoot& root : {root_, DeviceRoot("/")}) {
     for (const char* const name : {"/etc/os-release", "/usr/lib/os-release"}) {
-      const auto text = readFile(prefix + name, kLargestTextFile);
+      const auto text = root.readFile(name, kLargestTextFile);
       if (text) return systemVersionFromOsRelease(*text);
     }
   }

@@ -12,8 +12,8 @@ namespace tally {
 
 class LinuxDeviceInformation final : public DeviceInformation {
  public:
-  LinuxDeviceInformation(std::string prefix, std::shared_ptr<DeviceDescription> description)
-      : prefix_(std::move(prefix)), description_(std::move(description)) {}
+  LinuxDeviceInformation(DeviceRoot root, std::shared_ptr<DeviceDescription> description)
+      : root_(std::move(root)), description_(std::move(description)) {}
   KvRef<KvObject> DeviceQuery(std::string_view question) override;
   bool HasInternalDiagnostics(std::string_view subsystem) override;
   std::string SMAOSVersion() override;
@@ -23,7 +23,7 @@ class LinuxDeviceInformation final : public DeviceInformation {
   KvRef<KvObject> diskUsage() const;
   KvRef<KvObject> inverseDeviceID() const;
 
-  std::string prefix_;
+  DeviceRoot root_;
   std::shared_ptr<DeviceDescription> description_;
 };
 

@@ -1,9 +1,7 @@
 // Files of the device, below its root.
 #pragma once
 
-#include <string>
-
-#include "base/file.h"
+#include "base/device_root.h"
 #include "platform/files.h"
 
 namespace tally {
@@ -11,13 +9,17 @@ namespace tally {
 // Paths are absolute on the device; one that climbs out of the root through ".." is refused.
 class RootedFiles final : public Files {
  public:
-  explicit RootedFiles(std::string prefix) : prefix_(std::move(prefix)) {}
-  Result<std::string> readFile(std::string_view path, std::size_t limit) override;
-  std::optional<std::uint64_t> fileSize(std::string_view path) override;
+  explicit RootedFiles(DeviceRoot root) : root_(std::move(root)) {}
+  Result<std::string> readFile(std::string_view path, std::size_t limit) override {
+    return root_.readFile(path, limit);
+  }
+  std::optional<std::uint64_t> fileSize(std::string_view path) override {
+    const auto identity = root_.identity(path);
+    return identity ? std::optional(identity->size) : std::nullopt;
+  }
 
  private:
-  std::optional<std::string> below(std::string_view path) const;
-  std::string prefix_;  // the root without a slash at its end
+  DeviceRoot root_;
 };
 
 }  // namespace tally

@@ -34,8 +34,8 @@ std::string variable(const char* name) {
 
 // The data folder of whoever runs the program, who is part of the device only when the device is
 // this machine.
-std::string userDataFolder(const std::string& prefix) {
-  if (!prefix.empty()) return "";
+std::string userDataFolder(const DeviceRoot& root) {
+  if (!root.prefix().empty()) return "";
   const std::string data = variable("XDG_DATA_HOME");
   if (data.starts_with('/')) return data;
   const std::string home = variable("HOME");
@@ -44,17 +44,15 @@ std::string userDataFolder(const std::string& prefix) {
 
 }  // namespace
 
-Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& options) {
-  const std::string prefix = devicePrefix(root);
-  const std::string data = prefix + "/var/mobile/Library/Tallybook";
+Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
+  const DeviceDirectory described(root, "/device");
   const auto log = options.log ? options.log : makeLinuxSystemLog(systemLogEnvironment().settings);
   const auto clock = std::make_shared<LinuxClock>();
-  const auto description =
-      std::make_shared<DeviceDescription>(prefix + "/device/device.plist", log);
+  const auto description = std::make_shared<DeviceDescription>(described, log);
   const auto access = options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
                                                   : PropertyListPreferences::Access::ReadWrite;
   const auto preferences = std::make_shared<PropertyListPreferences>(
-      userPreferencesFolder(prefix, kProgramUser).value(), log, 0600, access);
+      userPreferencesFolder(root, kProgramUser).value(), log, 0600, access);
   const auto eventLoop = std::make_shared<SdEventLoop>(log);
   const auto bus = std::make_shared<BusConnection>();
 
@@ -64,42 +62,38 @@ Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& 
   services.eventLoop = eventLoop;
   services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
   services.notifications = std::make_shared<BusNotifications>(bus, log);
-  services.files = std::make_shared<RootedFiles>(prefix);
-  services.runLock = std::make_shared<FileRunLock>(data + "/tallyrun.lock", log);
+  services.files = std::make_shared<RootedFiles>(root);
+  services.runLock = std::make_shared<FileRunLock>(storeDirectory(root), log);
   services.preferences = preferences;
-  services.systemConfiguration = std::make_shared<FileSystemConfiguration>(prefix, log, access);
-  services.servicesClient = std::make_shared<FileServicesClient>(prefix, log, access);
-  services.metricsStore = makeSqliteMetricsStore(metricsStorePath(prefix), log, clock);
+  services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
+  services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
+  services.metricsStore = makeSqliteMetricsStore(metricsStorePath(root), log, clock);
   services.logSubmission =
-      std::make_shared<SpoolSubmission>(spoolFolder(prefix), log, clock, preferences);
+      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences);
   services.crashReporting =
-      std::make_shared<LinuxCrashReporting>(prefix, log, clock, preferences, description);
+      std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, description);
   services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);
-  services.deviceInformation = std::make_shared<LinuxDeviceInformation>(prefix, description);
+  services.deviceInformation = std::make_shared<LinuxDeviceInformation>(root, description);
   services.appRegistry = std::make_shared<DesktopAppRegistry>(
-      applicationFolders(prefix, userDataFolder(prefix)), description);
+      applicationFolders(root, userDataFolder(root)), description);
   services.locale =
-      std::make_shared<LinuxLocale>(prefix,
+      std::make_shared<LinuxLocale>(root,
                                     LocaleEnvironment{variable("LANGUAGE"), variable("LC_ALL"),
                                                       variable("LC_MESSAGES"), variable("LANG")},
                                     description);
   services.kernelValues = std::make_shared<LinuxKernelValues>(description);
-  services.stackshot = std::make_shared<DescribedStackshot>(prefix + "/device", description);
+  services.stackshot = std::make_shared<DescribedStackshot>(described, description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   services.logHeaderFacts =
       std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
   services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
-      analyticsEventsFolder(prefix), log, clock, preferences, description);
+      analyticsEventsFolder(root), log, clock, preferences, description);
   return services;
 }
 
 std::string deviceRootFromEnvironment() {
   const std::string root = variable("TALLYRUN_ROOT");
   return root.empty() ? "/" : root;
-}
-
-std::string devicePrefix(const std::string& root) {
-  return root.substr(0, root.find_last_not_of('/') + 1);
 }
 
 }  // namespace tally

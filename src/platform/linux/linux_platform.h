@@ -17,13 +17,9 @@ struct LinuxPlatformOptions {
 
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
 // service is used.
-Platform makeLinuxPlatform(const std::string& root, const LinuxPlatformOptions& options = {});
+Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options = {});
 
 // TALLYRUN_ROOT; "/" when it is unset or empty.
 std::string deviceRootFromEnvironment();
-
-// The root without a slash at its end, so that an absolute path of the device can follow: "" is
-// the machine itself.
-std::string devicePrefix(const std::string& root);
 
 }  // namespace tally

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cctype>
 
-#include "base/file.h"
+#include "base/device_root.h"
 
 namespace tally {
 namespace {
@@ -97,10 +97,10 @@ std::vector<std::string> LinuxLocale::PreferredLanguages() {
 std::vector<std::string> LinuxLocale::SystemLanguages() {
   if (auto tags = described("SystemLanguages")) return *std::move(tags);
   std::vector<std::string> tags{"en"};
-  const std::string folder = prefix_ + "/usr/share/locale";
-  if (const auto names = listFolder(folder)) {
+  const DeviceDirectory folder(root_, "/usr/share/locale");
+  if (const auto names = folder.list()) {
     for (const std::string& name : *names) {
-      if (fileIdentity(folder + "/" + name + "/LC_MESSAGES")) addOnce(tags, languageTag(name));
+      if (folder.identity(name + "/LC_MESSAGES")) addOnce(tags, languageTag(name));
     }
   }
   return tags;

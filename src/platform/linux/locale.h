@@ -29,9 +29,9 @@ std::optional<std::string> regionCode(const LocaleEnvironment& environment);
 // system's languages are those that it has translations for, and English, which needs none.
 class LinuxLocale final : public Locale {
  public:
-  LinuxLocale(std::string prefix, LocaleEnvironment environment,
+  LinuxLocale(DeviceRoot root, LocaleEnvironment environment,
               std::shared_ptr<DeviceDescription> description)
-      : prefix_(std::move(prefix)),
+      : root_(std::move(root)),
         environment_(std::move(environment)),
         description_(std::move(description)) {}
   std::vector<std::string> PreferredLanguages() override;
@@ -41,7 +41,7 @@ class LinuxLocale final : public Locale {
  private:
   std::optional<std::vector<std::string>> described(std::string_view key);
 
-  std::string prefix_;
+  DeviceRoot root_;
   LocaleEnvironment environment_;
   std::shared_ptr<DeviceDescription> description_;
 };

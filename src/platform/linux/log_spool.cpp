@@ -3,7 +3,9 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <cerrno>
 
+#include "base/file.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
@@ -13,7 +15,7 @@ constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 constexpr std::string_view kBodySuffix = ".log";
 constexpr std::string_view kInfoSuffix = ".info.plist";
 constexpr std::size_t kLargestInfo = 1u << 20;
-// Room for the number, the longer suffix and a temporary file's mark in a file's name.
+// Space for the number, the longer suffix and a temporary file's mark in a file's name.
 constexpr std::size_t kLongestLogName = 180;
 
 std::uint64_t boundOr(std::uint64_t fallback, Preferences& preferences, std::string_view key) {
@@ -25,7 +27,7 @@ std::uint64_t boundOr(std::uint64_t fallback, Preferences& preferences, std::str
 // Counts what the writer writes against the bounds, before it reaches the disk.
 class SpoolFile final : public LogFile {
  public:
-  SpoolFile(TemporaryFile& file, const std::string& folder, std::uint64_t maximumBytes)
+  SpoolFile(TemporaryFile& file, const Directory& folder, std::uint64_t maximumBytes)
       : file_(file), folder_(folder), left_(maximumBytes) {}
 
   bool write(std::string_view bytes) override {
@@ -42,7 +44,7 @@ class SpoolFile final : public LogFile {
 
  private:
   TemporaryFile& file_;
-  const std::string& folder_;
+  const Directory& folder_;
   std::uint64_t left_;
   Status status_ = Done{};
 };
@@ -58,8 +60,8 @@ Result<std::string> makeInfo(std::string_view typeCode, std::string_view name,
 
 // Removes what runs that were killed have left: temporary files, and information whose body never
 // got its name or has been removed.
-void sweepLeftOvers(const std::string& folder) {
-  const auto names = listFolder(folder);
+void sweepLeftOvers(const Directory& folder) {
+  const auto names = folder.list();
   if (!names) return;
   for (const std::string& name : *names) {
     bool stale = isTemporaryName(name);
@@ -67,7 +69,7 @@ void sweepLeftOvers(const std::string& folder) {
       const auto body = name.substr(0, name.size() - kInfoSuffix.size()) + std::string(kBodySuffix);
       stale = stale || !std::binary_search(names->begin(), names->end(), body);
     }
-    if (stale) (void)removeFile(folder + "/" + name);
+    if (stale) (void)folder.remove(name);
   }
 }
 
@@ -104,11 +106,12 @@ bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::s
 
 Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
                                const KvDictionary* options, const Writer& writer) {
-  if (auto made = makePrivateFolder(folder_); !made) return made;
-  const auto lock = FileLock::acquire(folder_ + "/.spool.lock");
+  const auto folder = makePrivateFolder(folder_);
+  if (!folder) return folder.error();
+  const auto lock = FileLock::acquire(*folder, ".spool.lock");
   if (!lock) return lock.error();
-  sweepLeftOvers(folder_);
-  const auto logs = listSequenced(folder_);
+  sweepLeftOvers(*folder);
+  const auto logs = listSequenced(*folder);
   if (!logs) return logs.error();
   const auto sequence = nextSequence(*logs);
   if (!sequence) return sequence.error();
@@ -116,37 +119,39 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
   if (!info) return info.error();
 
   const FolderBounds bounds = folderBounds(*preferences_);
-  const std::string stem = fmt::format("{}/{}{}", folder_, sequencePrefix(*sequence), name);
-  const std::string path = stem + std::string(kBodySuffix);
-  const std::string infoPath = stem + std::string(kInfoSuffix);
-  if (auto written = writeBody(path, infoPath, *info, writer, bounds.maximumBytes); !written) {
-    (void)removeFile(path);
-    (void)removeFile(infoPath);
+  const std::string stem = fmt::format("{}{}", sequencePrefix(*sequence), name);
+  if (auto written = writeBody(*folder, stem, *info, writer, bounds.maximumBytes); !written) {
+    (void)folder->remove(stem + std::string(kBodySuffix));
+    (void)folder->remove(stem + std::string(kInfoSuffix));
     return written;
   }
   // The log is safe; that older ones cannot be removed is not its failure.
-  if (const auto evicted = evictOldest(folder_, bounds, *sequence); !evicted) {
+  if (const auto evicted = evictOldest(*folder, bounds, *sequence); !evicted) {
     log_->write(LogLevel::Error, fmt::format("log submission: {}", evicted.error().message));
   }
   return Done{};
 }
 
 // The information gets its name before the body does, so that no body is ever without.
-Status SpoolSubmission::writeBody(const std::string& path, const std::string& infoPath,
+Status SpoolSubmission::writeBody(const Directory& folder, const std::string& stem,
                                   const std::string& info, const Writer& writer,
                                   std::uint64_t maximumBytes) {
-  auto body = TemporaryFile::beside(path);
+  auto body = TemporaryFile::create(folder, stem + std::string(kBodySuffix));
   if (!body) return body.error();
-  SpoolFile file(*body, folder_, maximumBytes - std::min<std::uint64_t>(maximumBytes, info.size()));
+  SpoolFile file(*body, folder, maximumBytes - std::min<std::uint64_t>(maximumBytes, info.size()));
   writer(file);
   if (!file.status()) return file.status();
-  if (auto reserve = checkReserve(folder_, info.size()); !reserve) return reserve;
-  if (auto written = writeFileAtomically(infoPath, info); !written) return written;
+  if (auto reserve = checkReserve(folder, info.size()); !reserve) return reserve;
+  const std::string infoName = stem + std::string(kInfoSuffix);
+  if (auto written = writeFileAtomically(folder, infoName, info); !written) return written;
   return body->commit();
 }
 
 Result<std::vector<SpooledLog>> SpoolReader::list() const {
-  const auto logs = listSequenced(folder_);
+  const auto folder = folder_.open();
+  if (!folder && folder.error().systemError == ENOENT) return std::vector<SpooledLog>();
+  if (!folder) return folder.error();
+  const auto logs = listSequenced(*folder);
   if (!logs) return logs.error();
   std::vector<SpooledLog> spooled;
   for (const SequencedLog& log : *logs) {
@@ -157,9 +162,10 @@ Result<std::vector<SpooledLog>> SpoolReader::list() const {
     SpooledLog& entry = spooled.emplace_back();
     entry.sequence = log.sequence;
     entry.fileName = *body;
-    entry.bytes = fileSize(folder_ + "/" + *body).value_or(0);
+    const auto identity = folder->identity(*body);
+    entry.bytes = identity ? identity->size : 0;
     const auto stem = body->substr(0, body->size() - kBodySuffix.size());
-    const auto document = readFile(folder_ + "/" + stem + std::string(kInfoSuffix), kLargestInfo);
+    const auto document = folder->readFile(stem + std::string(kInfoSuffix), kLargestInfo);
     const auto root = document ? decodePlist(*document) : Result<KvRef<KvObject>>(document.error());
     const auto* info = root ? kvCast<KvDictionary>(root->get()) : nullptr;
     if (info == nullptr) continue;
@@ -175,11 +181,13 @@ Result<std::vector<SpooledLog>> SpoolReader::list() const {
 
 Result<std::string> SpoolReader::readBody(const SpooledLog& log, std::size_t limit) const {
   if (!isSafeFileName(log.fileName)) return Error{"not a name that a log can have"};
-  return readFile(folder_ + "/" + log.fileName, limit);
+  const auto folder = folder_.open();
+  if (!folder) return folder.error();
+  return folder->readFile(log.fileName, limit);
 }
 
-std::string spoolFolder(const std::string& prefix) {
-  return prefix + "/var/mobile/Library/Logs/Submission";
+DeviceDirectory spoolFolder(const DeviceRoot& root) {
+  return {root, "/var/mobile/Library/Logs/Submission"};
 }
 
 }  // namespace tally

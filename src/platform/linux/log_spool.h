@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "platform/clock.h"
 #include "platform/linux/sequence_folder.h"
 #include "platform/log_submission.h"
@@ -23,11 +23,11 @@ FolderBounds folderBounds(Preferences& preferences);
 
 // Submits logs into a spool folder. A log is in the spool once its body has its final name, which
 // is the last step; a killed run leaves nothing that counts, and its left-overs are swept at the
-// next submission. Submitters of several processes take turns.
+// next submission. Submitters of several processes are serialised.
 class SpoolSubmission final : public LogSubmission {
  public:
-  SpoolSubmission(std::string folder, std::shared_ptr<SystemLog> log, std::shared_ptr<Clock> clock,
-                  std::shared_ptr<Preferences> preferences)
+  SpoolSubmission(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
+                  std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences)
       : folder_(std::move(folder)),
         log_(std::move(log)),
         clock_(std::move(clock)),
@@ -39,10 +39,10 @@ class SpoolSubmission final : public LogSubmission {
  private:
   Status submit(std::string_view typeCode, std::string_view name, const KvDictionary* options,
                 const Writer& writer);
-  Status writeBody(const std::string& path, const std::string& infoPath, const std::string& info,
-                   const Writer& writer, std::uint64_t maximumBytes);
+  static Status writeBody(const Directory& folder, const std::string& stem, const std::string& info,
+                          const Writer& writer, std::uint64_t maximumBytes);
 
-  std::string folder_;
+  DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;
@@ -61,16 +61,16 @@ struct SpooledLog {
 
 class SpoolReader {
  public:
-  explicit SpoolReader(std::string folder) : folder_(std::move(folder)) {}
+  explicit SpoolReader(DeviceDirectory folder) : folder_(std::move(folder)) {}
   // Oldest first; a spool that is not there yet is empty.
   Result<std::vector<SpooledLog>> list() const;
   Result<std::string> readBody(const SpooledLog& log, std::size_t limit) const;
 
  private:
-  std::string folder_;
+  DeviceDirectory folder_;
 };
 
-// Where the logs lie below a root.
-std::string spoolFolder(const std::string& prefix);
+// Where the logs lie on a device.
+DeviceDirectory spoolFolder(const DeviceRoot& root);
 
 }  // namespace tally

@@ -10,10 +10,10 @@ constexpr unsigned kUserFileMode = 0600;
 
 }  // namespace
 
-FileSystemConfiguration::FileSystemConfiguration(const std::string& prefix,
+FileSystemConfiguration::FileSystemConfiguration(const DeviceRoot& root,
                                                  std::shared_ptr<SystemLog> log,
                                                  PropertyListPreferences::Access access)
-    : preferences_(systemPreferencesFolder(prefix), std::move(log), kSystemFileMode, access) {}
+    : preferences_(systemPreferencesFolder(root), std::move(log), kSystemFileMode, access) {}
 
 KvRef<KvObject> FileSystemConfiguration::getPreference(std::string_view key,
                                                        std::string_view domain) {
@@ -30,7 +30,7 @@ void FileServicesClient::setPreference(std::string_view key, std::string_view us
                                        std::string_view domain, KvRef<KvObject> value) {
   auto found = users_.find(user);
   if (found == users_.end()) {
-    const auto folder = userPreferencesFolder(prefix_, user);
+    const auto folder = userPreferencesFolder(root_, user);
     if (!folder) {
       log_->write(LogLevel::Error, fmt::format("preferences of {}: not a user's name", user));
       return;

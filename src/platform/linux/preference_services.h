@@ -14,7 +14,7 @@ namespace tally {
 // once, those without sync too: a removal that only this process knows of would be lost with it.
 class FileSystemConfiguration final : public SMASystemConfiguration {
  public:
-  FileSystemConfiguration(const std::string& prefix, std::shared_ptr<SystemLog> log,
+  FileSystemConfiguration(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                           PropertyListPreferences::Access access);
   KvRef<KvObject> getPreference(std::string_view key, std::string_view domain) override;
   void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
@@ -26,16 +26,16 @@ class FileSystemConfiguration final : public SMASystemConfiguration {
 
 class FileServicesClient final : public SMAServicesClient {
  public:
-  FileServicesClient(std::string prefix, std::shared_ptr<SystemLog> log,
+  FileServicesClient(DeviceRoot root, std::shared_ptr<SystemLog> log,
                      PropertyListPreferences::Access access)
-      : prefix_(std::move(prefix)), log_(std::move(log)), access_(access) {}
+      : root_(std::move(root)), log_(std::move(log)), access_(access) {}
   void setPreference(std::string_view key, std::string_view user, std::string_view domain,
                      KvRef<KvObject> value) override;
   void deletePreference(std::string_view key, std::string_view user,
                         std::string_view domain) override;
 
  private:
-  std::string prefix_;
+  DeviceRoot root_;
   std::shared_ptr<SystemLog> log_;
   PropertyListPreferences::Access access_;
   std::map<std::string, PropertyListPreferences, std::less<>> users_;

@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <utility>
 
+#include "base/file.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
@@ -14,6 +15,8 @@ constexpr std::string_view kSuffix = ".plist";
 constexpr std::string_view kLockName = ".preferences.lock";
 // Damaged files that are kept for whoever looks into the matter.
 constexpr int kDamagedFilesKept = 8;
+
+std::string fileNameOf(std::string_view domain) { return fmt::format("{}{}", domain, kSuffix); }
 
 }  // namespace
 
@@ -60,7 +63,7 @@ KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain)
 }
 
 Result<std::vector<std::string>> PropertyListPreferences::listDomains() const {
-  auto names = listFolder(folder_);
+  auto names = folder_.list();
   if (!names) return names;
   std::vector<std::string> domains;
   for (const std::string& name : *names) {
@@ -79,24 +82,22 @@ PropertyListPreferences::Domain* PropertyListPreferences::find(std::string_view 
   return &domains_.try_emplace(std::string(domain)).first->second;
 }
 
-std::string PropertyListPreferences::pathOf(std::string_view domain) const {
-  return fmt::format("{}/{}{}", folder_, domain, kSuffix);
-}
-
 // One look at the file's identity instead of reading it again.
 void PropertyListPreferences::refresh(Domain& state, std::string_view domain) {
-  if (state.read && fileIdentity(pathOf(domain)) == state.identity) return;
-  reload(state, domain, /*locked=*/false);
+  if (state.read && folder_.identity(fileNameOf(domain)) == state.identity) return;
+  reload(state, domain, nullptr);
 }
 
-void PropertyListPreferences::reload(Domain& state, std::string_view domain, bool locked) {
-  const std::string path = pathOf(domain);
+void PropertyListPreferences::reload(Domain& state, std::string_view domain,
+                                     const Directory* locked) {
+  const std::string name = fileNameOf(domain);
   // Taken first: should the file be replaced meanwhile, the next look reads it again.
-  const auto identity = fileIdentity(path);
+  const auto identity = locked != nullptr ? locked->identity(name) : folder_.identity(name);
   const bool seen = state.read && identity == state.identity;
   state.read = true;
   state.identity = identity;
-  const auto document = readFile(path, kPlistMaximumBytes);
+  const auto document = locked != nullptr ? locked->readFile(name, kPlistMaximumBytes)
+                                          : folder_.readFile(name, kPlistMaximumBytes);
   if (document) {
     auto root = decodePlist(*document);
     auto* const dictionary = root ? kvCast<KvDictionary>(root->get()) : nullptr;
@@ -129,23 +130,25 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain, boo
 
 // Makes room for a new file where there is a damaged one.
 void PropertyListPreferences::recover(Domain& state, std::string_view domain,
-                                      const std::string& fault, bool locked) {
+                                      const std::string& fault, const Directory* locked) {
   if (access_ == Access::ReadOnly) {
     state.stored = KvDictionary::create();
     report(domain, "damaged: " + fault);
     return;
   }
-  if (!locked) {
+  if (locked == nullptr) {
     // Another process may be at the same, or may just have put a sound file in its place.
-    const auto lock = lockFolder();
+    const auto folder = folder_.open();
+    const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
     if (lock) {
-      reload(state, domain, /*locked=*/true);
+      reload(state, domain, &*folder);
       return;
     }
   }
   const bool wasWritable = state.writable;
   state.stored = KvDictionary::create();
-  const auto moved = setAside(pathOf(domain));
+  const auto moved =
+      locked != nullptr ? setAside(*locked, domain) : Status(Error{"its directory is not locked"});
   state.writable = static_cast<bool>(moved);
   if (moved) {
     report(domain, fmt::format("damaged, set aside: {}", fault));
@@ -155,22 +158,23 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
   }
 }
 
-Status PropertyListPreferences::setAside(const std::string& path) const {
+Status PropertyListPreferences::setAside(const Directory& folder, std::string_view domain) const {
+  const std::string name = fileNameOf(domain);
   for (int number = 1; number <= kDamagedFilesKept; ++number) {
-    const std::string aside = fmt::format("{}.damaged-{}", path, number);
-    if (!fileIdentity(aside)) return renameFile(path, aside);
+    const std::string aside = fmt::format("{}.damaged-{}", name, number);
+    if (!folder.identity(aside)) return folder.rename(name, aside);
   }
   // A file that is damaged again and again must not fill the volume.
-  return removeFile(path);
+  return folder.remove(name);
 }
 
-Result<FileLock> PropertyListPreferences::lockFolder() {
-  auto lock = FileLock::acquire(fmt::format("{}/{}", folder_, kLockName));
+Result<FileLock> PropertyListPreferences::lockFolder(const Directory& folder) {
+  auto lock = FileLock::acquire(folder, kLockName);
   if (lock && !std::exchange(swept_, true)) {
     // Nobody else is writing here, so temporary files are those of killed runs.
-    if (const auto names = listFolder(folder_)) {
+    if (const auto names = folder.list()) {
       for (const std::string& name : *names) {
-        if (isTemporaryName(name)) (void)removeFile(folder_ + "/" + name);
+        if (isTemporaryName(name)) (void)folder.remove(name);
       }
     }
   }
@@ -178,12 +182,13 @@ Result<FileLock> PropertyListPreferences::lockFolder() {
 }
 
 bool PropertyListPreferences::writePending(Domain& state, std::string_view domain) {
-  const auto lock = lockFolder();
+  const auto folder = folder_.make();
+  const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
   if (!lock) {
     report(domain, lock.error().message);
     return false;
   }
-  reload(state, domain, /*locked=*/true);
+  reload(state, domain, &*folder);
   if (!state.writable) {
     report(domain, "not written, since what is there cannot be read");
     return false;
@@ -197,14 +202,15 @@ bool PropertyListPreferences::writePending(Domain& state, std::string_view domai
   }
   if (changed) {
     const auto text = encodeXmlPlist(*merged);
-    const std::string path = pathOf(domain);
-    const Status written = text ? writeFileAtomically(path, *text, mode_) : Status(text.error());
+    const std::string name = fileNameOf(domain);
+    const Status written =
+        text ? writeFileAtomically(*folder, name, *text, mode_) : Status(text.error());
     if (!written) {
       report(domain, written.error().message);
       return false;
     }
     state.stored = merged;
-    state.identity = fileIdentity(path);
+    state.identity = folder->identity(name);
   }
   state.pending.clear();
   return true;
@@ -214,13 +220,14 @@ void PropertyListPreferences::report(std::string_view domain, std::string_view f
   log_->write(LogLevel::Error, fmt::format("preferences {}: {}", domain, fault));
 }
 
-std::optional<std::string> userPreferencesFolder(const std::string& prefix, std::string_view user) {
+std::optional<DeviceDirectory> userPreferencesFolder(const DeviceRoot& root,
+                                                     std::string_view user) {
   if (!isSafeFileName(user)) return std::nullopt;
-  return fmt::format("{}/var/{}/Library/Preferences", prefix, user);
+  return DeviceDirectory(root, fmt::format("/var/{}/Library/Preferences", user));
 }
 
-std::string systemPreferencesFolder(const std::string& prefix) {
-  return prefix + "/Library/Preferences";
+DeviceDirectory systemPreferencesFolder(const DeviceRoot& root) {
+  return {root, "/Library/Preferences"};
 }
 
 }  // namespace tally

@@ -1,4 +1,4 @@
-// Preferences in property-list files, one per domain, in one folder.
+// Preferences in property-list files, one per domain, in one directory.
 #pragma once
 
 #include <map>
@@ -9,13 +9,13 @@
 #include <string_view>
 #include <vector>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 
 namespace tally {
 
-// The preferences of whoever owns the folder: the program's own user, another user, the system.
+// The preferences of whoever owns the directory: the program's own user, another user, the system.
 // A domain is read at its first use and again whenever another process has replaced its file.
 // Writes are kept per key and laid over what the file holds when they are synchronised, so that
 // two processes never undo each other's keys. Domains still unsynchronised are written when the
@@ -26,8 +26,8 @@ class PropertyListPreferences final : public Preferences {
   // With ReadOnly no file is touched: a damaged one stays in its place, and what is written is
   // forgotten at the end.
   enum class Access { ReadWrite, ReadOnly };
-  PropertyListPreferences(std::string folder, std::shared_ptr<SystemLog> log, unsigned mode = 0600,
-                          Access access = Access::ReadWrite)
+  PropertyListPreferences(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
+                          unsigned mode = 0600, Access access = Access::ReadWrite)
       : folder_(std::move(folder)), log_(std::move(log)), mode_(mode), access_(access) {}
   ~PropertyListPreferences() override;
   PropertyListPreferences(const PropertyListPreferences&) = delete;
@@ -53,16 +53,17 @@ class PropertyListPreferences final : public Preferences {
   };
 
   Domain* find(std::string_view domain);
-  std::string pathOf(std::string_view domain) const;
   void refresh(Domain& state, std::string_view domain);
-  void reload(Domain& state, std::string_view domain, bool locked);
-  void recover(Domain& state, std::string_view domain, const std::string& fault, bool locked);
-  Status setAside(const std::string& path) const;
-  Result<FileLock> lockFolder();
+  // In both, locked is the directory when this process holds its lock, else null.
+  void reload(Domain& state, std::string_view domain, const Directory* locked);
+  void recover(Domain& state, std::string_view domain, const std::string& fault,
+               const Directory* locked);
+  Status setAside(const Directory& folder, std::string_view domain) const;
+  Result<FileLock> lockFolder(const Directory& folder);
   bool writePending(Domain& state, std::string_view domain);
   void report(std::string_view domain, std::string_view fault) const;
 
-  std::string folder_;
+  DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;
   unsigned mode_;
   Access access_;
@@ -73,8 +74,8 @@ class PropertyListPreferences final : public Preferences {
 
 // The user whose preferences are the program's own.
 constexpr std::string_view kProgramUser = "mobile";
-// Where a user's preferences lie below a root; empty when the name cannot be a folder's.
-std::optional<std::string> userPreferencesFolder(const std::string& prefix, std::string_view user);
-std::string systemPreferencesFolder(const std::string& prefix);
+// Where a user's preferences lie on a device; empty when the name cannot be a directory's.
+std::optional<DeviceDirectory> userPreferencesFolder(const DeviceRoot& root, std::string_view user);
+DeviceDirectory systemPreferencesFolder(const DeviceRoot& root);
 
 }  // namespace tally

@@ -1,27 +1,32 @@
-// Turns between processes, by a lock file.
+// Serialises runs of several processes by a lock file.
 #pragma once
 
+#include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
 
-#include "base/file.h"
+#include "base/device_root.h"
 #include "platform/run_lock.h"
 #include "platform/system_log.h"
 
 namespace tally {
 
-// When the lock file cannot be made, one error line says so and the run goes on without turns.
+// When the lock file cannot be made, one error line says so and the run goes on without a lock: a
+// device that cannot be written is no reason to do nothing.
 class FileRunLock final : public RunLock {
  public:
-  FileRunLock(std::string path, std::shared_ptr<SystemLog> log)
-      : path_(std::move(path)), log_(std::move(log)) {}
-  void enter() override;
+  static constexpr std::chrono::minutes kPatience{10};
+  FileRunLock(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
+              std::chrono::milliseconds patience = kPatience)
+      : folder_(std::move(folder)), log_(std::move(log)), patience_(patience) {}
+  bool enter() override;
   void leave() override;
 
  private:
-  std::string path_;
+  DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;
+  std::chrono::milliseconds patience_;
   std::optional<FileLock> lock_;
   int depth_ = 0;
   bool reported_ = false;

@@ -1,6 +1,5 @@
 #include "platform/linux/sequence_folder.h"
 
-#include <fcntl.h>
 #include <fmt/format.h>
 #include <unistd.h>
 
@@ -9,7 +8,6 @@
 #include <cstring>
 #include <map>
 
-#include "base/file.h"
 #include "base/number_text.h"
 #include "base/retried.h"
 
@@ -41,15 +39,16 @@ std::optional<std::uint64_t> sequenceOf(std::string_view name) {
 
 std::string sequencePrefix(std::uint64_t sequence) { return fmt::format("{:010}-", sequence); }
 
-Result<std::vector<SequencedLog>> listSequenced(const std::string& folder) {
-  const auto names = listFolder(folder);
+Result<std::vector<SequencedLog>> listSequenced(const Directory& folder) {
+  const auto names = folder.list();
   if (!names) return names.error();
   std::vector<SequencedLog> logs;  // the sorted names bring the files of a log together
   for (const std::string& name : *names) {
     const auto sequence = sequenceOf(name);
     if (!sequence) continue;
     if (logs.empty() || logs.back().sequence != *sequence) logs.push_back({*sequence, 0, {}});
-    logs.back().bytes += fileSize(folder + "/" + name).value_or(0);
+    const auto identity = folder.identity(name);
+    logs.back().bytes += identity ? identity->size : 0;
     logs.back().names.push_back(name);
   }
   return logs;
@@ -61,7 +60,7 @@ Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs) {
   return next;
 }
 
-Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::uint64_t kept) {
+Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uint64_t kept) {
   const auto logs = listSequenced(folder);
   if (!logs) return logs.error();
   std::uint64_t count = logs->size(), bytes = 0;
@@ -70,7 +69,7 @@ Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::u
     if (count <= bounds.maximumLogs && bytes <= bounds.maximumBytes) break;
     if (log.sequence >= kept) break;  // a newer one makes its own room when it is done
     for (auto name = log.names.rbegin(); name != log.names.rend(); ++name) {
-      if (auto removed = removeFile(folder + "/" + *name); !removed) return removed;
+      if (auto removed = folder.remove(*name); !removed) return removed;
     }
     --count;
     bytes -= log.bytes;
@@ -78,40 +77,34 @@ Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::u
   return Done{};
 }
 
-Status checkReserve(const std::string& folder, std::uint64_t bytes) {
-  const auto space = freeSpace(folder);
+Status checkReserve(const Directory& folder, std::uint64_t bytes) {
+  const auto space = folder.freeSpace();
   if (space && *space < kReservedBytes + bytes) {
-    return Error{fmt::format("{} bytes are left on the volume of {}", *space, folder)};
+    return Error{fmt::format("{} bytes are left on the volume of {}", *space, folder.path())};
   }
   return Done{};
 }
 
-Status makePrivateFolder(const std::string& folder) {
-  const auto slash = folder.rfind('/');
-  if (slash != std::string::npos && slash > 0) {
-    if (auto made = makeFolders(folder.substr(0, slash)); !made) return made;
-  }
-  return makeFolders(folder, 0700);
-}
+Result<Directory> makePrivateFolder(const DeviceDirectory& folder) { return folder.make(0700); }
 
-Status appendAt(const std::string& path, std::size_t end, std::string_view bytes) {
-  const auto failure = [&path] {
-    return Error{fmt::format("cannot append to {}: {}", path, std::strerror(errno)), errno};
-  };
-  const int file = retried(
-      [&] { return ::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600); });
-  if (file < 0) return failure();
-  giveToOwnerOfFolder(file, path);
-  Status status = Done{};
+Status appendAt(const Directory& folder, std::string_view name, std::size_t end,
+                std::string_view bytes) {
+  auto file = folder.openForWriting(name);
+  const bool isNew = !file && file.error().systemError == ENOENT;
+  if (isNew) file = folder.create(name, 0600);
+  if (!file) return file.error();
   const auto start = static_cast<off_t>(end);
-  const auto cutBack = [&] { return retried([&] { return ::ftruncate(file, start); }) == 0; };
-  if (!cutBack() || !writeAllAt(file, bytes, start) ||
-      retried([&] { return ::fdatasync(file); }) != 0) {
-    status = failure();
+  const auto cutBack = [&] {
+    return retried([&] { return ::ftruncate(file->get(), start); }) == 0;
+  };
+  if (!cutBack() || !writeAllAt(file->get(), bytes, start) ||
+      retried([&] { return ::fdatasync(file->get()); }) != 0) {
+    const int code = errno;
     (void)cutBack();
+    return Error{fmt::format("cannot append to {}: {}", folder.pathOf(name), std::strerror(code)),
+                 code};
   }
-  ::close(file);
-  return status;
+  return isNew ? folder.sync() : Done{};
 }
 
 }  // namespace tally

@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/result.h"
+#include "base/device_root.h"
 
 namespace tally {
 
@@ -32,22 +32,23 @@ std::optional<std::uint64_t> sequenceOf(std::string_view name);
 std::string sequencePrefix(std::uint64_t sequence);
 
 // The logs of a folder, oldest first. Age is the number's, so that it does not depend on the clock.
-Result<std::vector<SequencedLog>> listSequenced(const std::string& folder);
+Result<std::vector<SequencedLog>> listSequenced(const Directory& folder);
 // The number for the next log.
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
 
 // Removes the oldest logs until the folder is within its bounds, but neither the log `kept` nor a
 // newer one. A log's files go last name first.
-Status evictOldest(const std::string& folder, const FolderBounds& bounds, std::uint64_t kept);
+Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uint64_t kept);
 
 // An error when writing this many more bytes would use what is reserved of the volume.
-Status checkReserve(const std::string& folder, std::uint64_t bytes);
+Status checkReserve(const Directory& folder, std::uint64_t bytes);
 
 // Makes the file end with the bytes, which are on the disk afterwards, at the place where its whole
 // records end; what a killed run left half written there is cut off.
-Status appendAt(const std::string& path, std::size_t end, std::string_view bytes);
+Status appendAt(const Directory& folder, std::string_view name, std::size_t end,
+                std::string_view bytes);
 
-// Makes the folder readable by its owner alone.
-Status makePrivateFolder(const std::string& folder);
+// The directory, made readable by its owner alone when it is missing.
+Result<Directory> makePrivateFolder(const DeviceDirectory& folder);
 
 }  // namespace tally

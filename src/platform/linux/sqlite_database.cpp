@@ -1,6 +1,5 @@
 #include "platform/linux/sqlite_database.h"
 
-#include <fcntl.h>
 #include <sqlite3.h>
 #include <unistd.h>
 
@@ -8,8 +7,7 @@
 #include <chrono>
 #include <cstring>
 
-#include "base/file.h"
-#include "base/retried.h"
+#include "base/directory.h"
 
 namespace tally {
 namespace {
@@ -47,13 +45,13 @@ std::string immutableUri(std::string_view path) {
 // beside a file gets the modes and the owner of that file. Only a file that is not there yet is
 // opened here: closing any other would drop the locks that this process holds on it.
 Status makePrivateFile(const std::string& path) {
-  const int file =
-      retried([&] { return ::open(path.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0600); });
-  if (file < 0 && errno == EEXIST) return Done{};
-  if (file < 0) return Error{"metrics store " + path + ": " + std::strerror(errno), errno};
-  giveToOwnerOfFolder(file, path);
-  ::close(file);
-  return Done{};
+  const auto slash = path.rfind('/');
+  const auto folder = Directory::open(path.substr(0, slash));
+  if (!folder) return Error{"metrics store " + path + ": " + folder.error().message};
+  const auto file = folder->create(path.substr(slash + 1), 0600);
+  if (!file && file.error().systemError == EEXIST) return Done{};
+  if (!file) return Error{"metrics store: " + file.error().message, file.error().systemError};
+  return folder->sync();
 }
 
 }  // namespace

@@ -100,8 +100,12 @@ Status makeTables(Database& database) {
 
 }  // namespace
 
-std::string metricsStorePath(const std::string& prefix) {
-  return prefix + "/var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
+DeviceDirectory storeDirectory(const DeviceRoot& root) {
+  return {root, "/var/mobile/Library/Tallybook"};
+}
+
+std::string metricsStorePath(const DeviceRoot& root) {
+  return storeDirectory(root).text() + "/TBDataStore.sqlitedb";
 }
 
 bool isStoreKey(std::string_view key) {
@@ -134,7 +138,9 @@ Result<std::optional<Database>> openStoreForWriting(const std::string& path, IfM
   const bool create = ifMissing == IfMissing::Create;
   if (*presence == Presence::Missing) {
     if (!create) return std::optional<Database>();
-    if (auto made = makeFolders(std::filesystem::path(path).parent_path()); !made) {
+    if (auto made = DeviceRoot(path.starts_with('/') ? "/" : ".")
+                        .make(std::filesystem::path(path).parent_path().native());
+        !made) {
       return Error{"metrics store " + path + ": " + made.error().message};
     }
   }

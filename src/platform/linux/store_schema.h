@@ -5,12 +5,14 @@
 #include <string>
 #include <string_view>
 
+#include "base/device_root.h"
 #include "platform/linux/sqlite_database.h"
 
 namespace tally {
 
-// The store of the device whose root, without a slash at its end, is the prefix.
-std::string metricsStorePath(const std::string& prefix);
+// Where the store lies on a device, and the path of its file.
+DeviceDirectory storeDirectory(const DeviceRoot& root);
+std::string metricsStorePath(const DeviceRoot& root);
 
 // A key of the store is valid UTF-8 of 1 to 512 bytes without a zero byte.
 bool isStoreKey(std::string_view key);

@@ -1,11 +1,10 @@
 #include "platform/linux/structured_data.h"
 
 #include <fmt/format.h>
-#include <sys/stat.h>
 
 #include <algorithm>
+#include <cerrno>
 
-#include "base/file.h"
 #include "base/number_text.h"
 #include "kv/plist_codec.h"
 
@@ -14,7 +13,7 @@ namespace {
 
 constexpr std::string_view kPendingSuffix = ".pending";
 constexpr std::string_view kFinishedSuffix = ".plist";
-constexpr std::string_view kLockName = "/.structured-data.lock";
+constexpr std::string_view kLockName = ".structured-data.lock";
 // A pending log is written out before it grows beyond this.
 constexpr std::size_t kLargestPending = 4u << 20;
 // A record is its length in ten digits, a newline, its property list and a newline.
@@ -39,32 +38,25 @@ std::string stemOf(std::string_view pendingName) {
   return std::string(pendingName.substr(0, pendingName.size() - kPendingSuffix.size()));
 }
 
-std::string finishedPath(const std::string& folder, std::string_view pendingName) {
-  return folder + "/" + stemOf(pendingName) + std::string(kFinishedSuffix);
-}
-
-bool isRegularFile(const std::string& path) {
-  struct stat status {};
-  return ::lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
+std::string finishedName(std::string_view pendingName) {
+  return stemOf(pendingName) + std::string(kFinishedSuffix);
 }
 
 // Moves generations up to the first free place, so that a run killed in between loses none. What is
 // there is known from the folder's names, since a file that cannot be examined is no free place.
-Status rollLog(const std::string& folder, const std::vector<std::string>& names,
+Status rollLog(const Directory& folder, const std::vector<std::string>& names,
                const std::string& name) {
   const auto generation = [&name](int number) { return fmt::format("{}.{}", name, number); };
-  const auto move = [&folder](const std::string& from, const std::string& to) {
-    return renameFile(folder + "/" + from, folder + "/" + to);
-  };
   int free = 1;
   while (free < kGenerationsKept &&
          std::binary_search(names.begin(), names.end(), generation(free))) {
     ++free;
   }
   for (int number = free; number > 1; --number) {
-    if (auto moved = move(generation(number - 1), generation(number)); !moved) return moved;
+    if (auto moved = folder.rename(generation(number - 1), generation(number)); !moved)
+      return moved;
   }
-  return move(name, generation(1));
+  return folder.rename(name, generation(1));
 }
 
 }  // namespace
@@ -81,35 +73,38 @@ Status StructuredDataFolder::append(std::uint32_t recordType, const KvDictionary
   if (!text) return text.error();
   const std::string frame = fmt::format("{:0{}}\n{}\n", text->size(), kLengthDigits, *text);
   if (frame.size() > kLargestPending) return Error{"the record is larger than a log may be"};
-  if (auto made = makePrivateFolder(folder_); !made) return made;
-  const auto lock = FileLock::acquire(folder_ + std::string(kLockName));
+  const auto folder = makePrivateFolder(folder_);
+  if (!folder) return folder.error();
+  const auto lock = FileLock::acquire(*folder, kLockName);
   if (!lock) return lock.error();
-  if (auto reserve = checkReserve(folder_, frame.size()); !reserve) return reserve;
+  if (auto reserve = checkReserve(*folder, frame.size()); !reserve) return reserve;
   Pending& pending = appended_[recordType];
-  if (!takesMore(pending, frame.size())) {
-    auto found = pendingFor(recordType, frame.size(), bounds);
+  if (!takesMore(*folder, pending, frame.size())) {
+    auto found = pendingFor(*folder, recordType, frame.size(), bounds);
     if (!found) return found.error();
     pending = *std::move(found);
   }
-  auto appended = appendAt(folder_ + "/" + pending.name, pending.end, frame);
+  auto appended = appendAt(*folder, pending.name, pending.end, frame);
   if (appended) pending.end += frame.size();
   return appended;
 }
 
 // True when a pending log is still as this process left it, so that it need not be read again for
 // every record.
-bool StructuredDataFolder::takesMore(const Pending& pending, std::size_t bytes) const {
-  return pending.end > 0 && pending.end + bytes <= kLargestPending &&
-         fileSize(folder_ + "/" + pending.name) == pending.end &&
-         !fileIdentity(finishedPath(folder_, pending.name));
+bool StructuredDataFolder::takesMore(const Directory& folder, const Pending& pending,
+                                     std::size_t bytes) {
+  if (pending.end == 0 || pending.end + bytes > kLargestPending) return false;
+  const auto identity = folder.identity(pending.name);
+  return identity && identity->size == pending.end && !folder.identity(finishedName(pending.name));
 }
 
 // The pending log that takes the next record of a type. One that is full, or that a killed run had
 // written out already, makes way for a new one.
-Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(std::uint32_t recordType,
+Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(const Directory& folder,
+                                                                       std::uint32_t recordType,
                                                                        std::size_t bytes,
                                                                        const FolderBounds& bounds) {
-  const auto logs = listSequenced(folder_);
+  const auto logs = listSequenced(folder);
   if (!logs) return logs.error();
   const auto next = nextSequence(*logs);
   if (!next) return next.error();
@@ -119,36 +114,38 @@ Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(std::uint
     if (!std::binary_search(log.names.begin(), log.names.end(), name)) continue;
     const bool finished = log.names.size() > 1;
     if (!finished && log.bytes + bytes <= kLargestPending) {
-      const auto records = readFile(folder_ + "/" + name, kLargestPending);
+      const auto records = folder.readFile(name, kLargestPending);
       if (!records) return records.error();
       return Pending{name, wholeRecords(*records)};
     }
-    if (auto done = finish(name, bounds); !done) return done.error();
+    if (auto done = finish(folder, name, bounds); !done) return done.error();
   }
   return Pending{fmt::format("{}{}{}", sequencePrefix(*next), recordType, kPendingSuffix), 0};
 }
 
 void StructuredDataFolder::finishAll(const FolderBounds& bounds,
                                      const std::function<void(const Error&)>& report) {
-  if (!fileIdentity(folder_)) return;  // nothing was ever logged
-  const auto lock = FileLock::acquire(folder_ + std::string(kLockName));
+  const auto folder = folder_.open();
+  if (!folder && folder.error().systemError == ENOENT) return;  // nothing was ever logged
+  if (!folder) return report(folder.error());
+  const auto lock = FileLock::acquire(*folder, kLockName);
   if (!lock) return report(lock.error());
-  const auto names = listFolder(folder_);
+  const auto names = folder->list();
   if (!names) return report(names.error());
   for (const std::string& name : *names) {
     if (isTemporaryName(name)) {
-      (void)removeFile(folder_ + "/" + name);
+      (void)folder->remove(name);
     } else if (sequenceOf(name) && name.ends_with(kPendingSuffix)) {
-      if (const auto done = finish(name, bounds); !done) report(done.error());
+      if (const auto done = finish(*folder, name, bounds); !done) report(done.error());
     }
   }
 }
 
-Status StructuredDataFolder::finish(const std::string& pendingName, const FolderBounds& bounds) {
-  const std::string pending = folder_ + "/" + pendingName;
-  const std::string finished = finishedPath(folder_, pendingName);
-  if (fileIdentity(finished)) return removeFile(pending);
-  const auto bytes = readFile(pending, kLargestPending);
+Status StructuredDataFolder::finish(const Directory& folder, const std::string& pendingName,
+                                    const FolderBounds& bounds) {
+  const std::string finished = finishedName(pendingName);
+  if (folder.identity(finished)) return folder.remove(pendingName);
+  const auto bytes = folder.readFile(pendingName, kLargestPending);
   if (!bytes) return bytes.error();
   const auto records = KvArray::create();
   std::size_t dropped = 0;
@@ -170,25 +167,28 @@ Status StructuredDataFolder::finish(const std::string& pendingName, const Folder
                                {"CreationTime", KvDate::create(clock_.secondsSince1970())},
                                {"Records", records}}));
     if (!document) return document.error();
-    if (auto reserve = checkReserve(folder_, document->size()); !reserve) return reserve;
-    if (auto written = writeFileAtomically(finished, *document); !written) return written;
+    if (auto reserve = checkReserve(folder, document->size()); !reserve) return reserve;
+    if (auto written = writeFileAtomically(folder, finished, *document); !written) return written;
   }
-  if (auto removed = removeFile(pending); !removed) return removed;
-  if (auto evicted = evictOldest(folder_, bounds, sequence); !evicted) return evicted;
-  if (dropped > 0) return Error{fmt::format("{}: {} damaged records dropped", pending, dropped)};
+  if (auto removed = folder.remove(pendingName); !removed) return removed;
+  if (auto evicted = evictOldest(folder, bounds, sequence); !evicted) return evicted;
+  if (dropped > 0)
+    return Error{
+        fmt::format("{}: {} damaged records dropped", folder.pathOf(pendingName), dropped)};
   return Done{};
 }
 
-Status rollLogs(const std::string& folder) {
-  const auto names = listFolder(folder);
+Status rollLogs(const DeviceDirectory& place) {
+  const auto folder = place.open();
+  if (!folder && folder.error().systemError == ENOENT) return Done{};
+  if (!folder) return folder.error();
+  const auto names = folder->list();
   if (!names) return names.error();
   Status status = Done{};
   for (const std::string& name : *names) {
-    const std::string path = folder + "/" + name;
-    if (!name.ends_with(".log") || !isRegularFile(path) || fileSize(path).value_or(0) == 0) {
-      continue;
-    }
-    if (auto rolled = rollLog(folder, *names, name); !rolled) status = rolled;
+    const auto identity = name.ends_with(".log") ? folder->identity(name) : std::nullopt;
+    if (!identity || !identity->regular || identity->size == 0) continue;
+    if (auto rolled = rollLog(*folder, *names, name); !rolled) status = rolled;
   }
   return status;
 }

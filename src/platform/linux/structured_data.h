@@ -20,23 +20,24 @@ namespace tally {
 // are kept, and none is written out twice.
 class StructuredDataFolder {
  public:
-  StructuredDataFolder(std::string folder, const Clock& clock)
+  StructuredDataFolder(DeviceDirectory folder, const Clock& clock)
       : folder_(std::move(folder)), clock_(clock) {}
   Status append(std::uint32_t recordType, const KvDictionary& record, const FolderBounds& bounds);
   // Writes out every pending log; report is told of each that cannot be.
   void finishAll(const FolderBounds& bounds, const std::function<void(const Error&)>& report);
 
  private:
-  Status finish(const std::string& pendingName, const FolderBounds& bounds);
+  Status finish(const Directory& folder, const std::string& pendingName,
+                const FolderBounds& bounds);
   struct Pending {
     std::string name;
     std::size_t end = 0;  // of its whole records
   };
-  bool takesMore(const Pending& pending, std::size_t bytes) const;
-  Result<Pending> pendingFor(std::uint32_t recordType, std::size_t bytes,
+  static bool takesMore(const Directory& folder, const Pending& pending, std::size_t bytes);
+  Result<Pending> pendingFor(const Directory& folder, std::uint32_t recordType, std::size_t bytes,
                              const FolderBounds& bounds);
 
-  std::string folder_;
+  DeviceDirectory folder_;
   const Clock& clock_;
   std::map<std::uint32_t, Pending> appended_;  // as this process left them, by type
 };
@@ -46,6 +47,6 @@ std::size_t wholeRecords(std::string_view bytes);
 
 // Renames LOG to LOG.1 for every log (*.log) of the folder that is not empty, its former
 // generations one further; the seventh is the last.
-Status rollLogs(const std::string& folder);
+Status rollLogs(const DeviceDirectory& folder);
 
 }  // namespace tally

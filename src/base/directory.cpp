@@ -1,0 +1,256 @@
+#include "base/directory.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <limits.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include "base/file.h"
+#include "base/retried.h"
+
+namespace tally {
+namespace {
+
+Error systemError(std::string_view what, const std::string& path, int code = errno) {
+  return {std::string(what) + " " + path + ": " + std::strerror(code), code};
+}
+
+bool isTrusted(uid_t user) { return user == 0 || user == ::geteuid(); }
+
+bool writableByOthers(const struct stat& directory) {
+  return !isTrusted(directory.st_uid) || (directory.st_mode & (S_IWGRP | S_IWOTH)) != 0;
+}
+
+DirectoryTrust trustOf(const struct stat& directory, DirectoryTrust above) {
+  if (writableByOthers(directory)) above.exclusive = false;
+  if (!isTrusted(directory.st_uid)) above.user = directory.st_uid;
+  return above;
+}
+
+// Opens a directory; one that may be passed through but not listed still leads to its files.
+int openDirectoryAt(int parent, const char* name, int flags) {
+  const auto open = [&](int access) {
+    return retried(
+        [&] { return ::openat(parent, name, access | flags | O_DIRECTORY | O_CLOEXEC); });
+  };
+  const int descriptor = open(O_RDONLY);
+  return descriptor < 0 && errno == EACCES ? open(O_PATH) : descriptor;
+}
+
+bool isEmptyDirectory(int directory) {
+  const int descriptor = openDirectoryAt(directory, ".", 0);
+  if (descriptor < 0) return false;
+  DIR* const listing = ::fdopendir(descriptor);
+  if (listing == nullptr) {
+    ::close(descriptor);
+    return false;
+  }
+  int entries = 0;
+  while (entries <= 2 && ::readdir(listing) != nullptr) ++entries;
+  ::closedir(listing);
+  return entries <= 2;
+}
+
+}  // namespace
+
+int Descriptor::close() {
+  const int descriptor = std::exchange(value_, -1);
+  return descriptor >= 0 ? ::close(descriptor) : 0;
+}
+
+Directory::Directory(Descriptor descriptor, std::string path, DirectoryTrust above)
+    : descriptor_(std::make_shared<Descriptor>(std::move(descriptor))), path_(std::move(path)) {
+  struct stat status {};
+  if (::fstat(descriptor_->get(), &status) == 0) {
+    trust_ = trustOf(status, above);
+    owner_ = status.st_uid;
+    group_ = status.st_gid;
+  } else {
+    trust_.exclusive = false;
+  }
+}
+
+Result<Directory> Directory::open(const std::string& path) {
+  Descriptor descriptor(openDirectoryAt(AT_FDCWD, path.c_str(), 0));
+  if (!descriptor) return systemError("cannot open", path);
+  return Directory(std::move(descriptor), path, {});
+}
+
+std::string Directory::pathOf(std::string_view name) const {
+  return path_ + (path_.ends_with('/') ? "" : "/") + std::string(name);
+}
+
+Result<Directory> Directory::openDirectory(std::string_view name) const {
+  const std::string path = pathOf(name);
+  Descriptor opened(openDirectoryAt(descriptor(), std::string(name).c_str(), O_NOFOLLOW));
+  if (opened) return Directory(std::move(opened), path, trust_);
+  int code = errno;
+  struct stat status {};
+  // The kernel calls a link no directory.
+  if (code == ENOTDIR &&
+      ::fstatat(descriptor(), std::string(name).c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+      S_ISLNK(status.st_mode)) {
+    code = ELOOP;
+  }
+  if (code == ELOOP) return Error{path + " is a symbolic link, which is not followed", ELOOP};
+  return systemError("cannot open", path, code);
+}
+
+// By the descriptor, since the directory's owner may have put something else at the name by now.
+void Directory::giveToOwner(int made, const struct stat& status) const {
+  if (::geteuid() != 0 || owner_ == 0 || status.st_uid != 0) return;
+  // A volume without owners is no reason to write nothing.
+  if (::fchown(made, owner_, group_) != 0) return;
+}
+
+Result<Directory> Directory::makeDirectory(std::string_view name, unsigned mode) const {
+  const std::string text(name);
+  if (::mkdirat(descriptor(), text.c_str(), mode) != 0) {
+    if (errno != EEXIST) return systemError("cannot make directory", pathOf(name));
+    return openDirectory(name);
+  }
+  auto made = openDirectory(name);
+  if (!made) return made;
+  struct stat status {};
+  // The owner of this directory can put another one in the place of the new one, also one that root
+  // made elsewhere; only an empty one is given away.
+  if (owner_ != 0 && ::fstat(made->descriptor(), &status) == 0 &&
+      isEmptyDirectory(made->descriptor())) {
+    giveToOwner(made->descriptor(), status);
+    made->owner_ = owner_;
+    made->group_ = group_;
+    made->trust_ = trust_;
+  }
+  if (auto synced = sync(); !synced) return synced.error();
+  return made;
+}
+
+Status Directory::check(int file, std::string_view name) const {
+  struct stat status {};
+  if (::fstat(file, &status) != 0) return systemError("cannot examine", pathOf(name));
+  if (!S_ISREG(status.st_mode)) return Error{pathOf(name) + " is not a regular file"};
+  if (trust_.exclusive) return Done{};
+  if (status.st_nlink != 1) {
+    return Error{pathOf(name) + " has more than one name, so it may be a foreign file", EMLINK};
+  }
+  if (!isTrusted(status.st_uid) && status.st_uid != trust_.user) {
+    return Error{pathOf(name) + " belongs to user " + std::to_string(status.st_uid), EPERM};
+  }
+  return Done{};
+}
+
+// Non-blocking, so that a pipe or a device in a file's place cannot hold the run up.
+Result<Descriptor> Directory::openFile(std::string_view name, int flags) const {
+  Descriptor file(retried([&] {
+    return ::openat(descriptor(), std::string(name).c_str(),
+                    flags | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC);
+  }));
+  if (!file && errno == ELOOP) {
+    return Error{pathOf(name) + " is a symbolic link, which is not followed", ELOOP};
+  }
+  // What a pipe without a reader and a device without a driver answer.
+  if (!file && errno == ENXIO) return Error{pathOf(name) + " is not a regular file"};
+  if (!file) return systemError("cannot open", pathOf(name));
+  if (auto checked = check(file.get(), name); !checked) return checked.error();
+  return file;
+}
+
+Result<std::string> Directory::readFile(std::string_view name, std::size_t limit) const {
+  const auto file = openFile(name, O_RDONLY);
+  if (!file) return file.error();
+  return readDescriptor(file->get(), pathOf(name), limit);
+}
+
+Result<Descriptor> Directory::openForWriting(std::string_view name) const {
+  return openFile(name, O_WRONLY);
+}
+
+Result<Descriptor> Directory::create(std::string_view name, unsigned mode) const {
+  Descriptor file(retried([&] {
+    return ::openat(descriptor(), std::string(name).c_str(),
+                    O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode);
+  }));
+  if (!file) return systemError("cannot create", pathOf(name));
+  struct stat status {};
+  if (owner_ != 0 && ::fstat(file.get(), &status) == 0) giveToOwner(file.get(), status);
+  return file;
+}
+
+std::optional<FileIdentity> Directory::identity(std::string_view name) const {
+  struct stat status {};
+  if (::fstatat(descriptor(), std::string(name).c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
+    return std::nullopt;
+  }
+  return FileIdentity{status.st_dev, status.st_ino, static_cast<std::uint64_t>(status.st_size),
+                      std::int64_t{status.st_mtim.tv_sec} * 1'000'000'000 + status.st_mtim.tv_nsec,
+                      S_ISREG(status.st_mode)};
+}
+
+std::optional<std::string> Directory::trustedLink(std::string_view name) const {
+  if (!trust_.exclusive) return std::nullopt;
+  struct stat status {};
+  const std::string text(name);
+  if (::fstatat(descriptor(), text.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0 ||
+      !S_ISLNK(status.st_mode) || !isTrusted(status.st_uid)) {
+    return std::nullopt;
+  }
+  char target[PATH_MAX];
+  const auto length = ::readlinkat(descriptor(), text.c_str(), target, sizeof target);
+  if (length <= 0 || length == sizeof target) return std::nullopt;
+  return std::string(target, static_cast<std::size_t>(length));
+}
+
+Result<std::vector<std::string>> Directory::list() const {
+  Descriptor listed(openDirectoryAt(descriptor(), ".", 0));
+  if (!listed) return systemError("cannot list", path_);
+  std::unique_ptr<DIR, int (*)(DIR*)> listing(::fdopendir(listed.get()), ::closedir);
+  if (!listing) return systemError("cannot list", path_);
+  listed.release();
+  std::vector<std::string> names;
+  for (;;) {
+    errno = 0;
+    const dirent* entry = ::readdir(listing.get());
+    if (entry == nullptr) {
+      if (errno != 0) return systemError("cannot list", path_);
+      break;
+    }
+    std::string_view name = entry->d_name;
+    if (name != "." && name != "..") names.emplace_back(name);
+  }
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+Status Directory::remove(std::string_view name) const {
+  if (::unlinkat(descriptor(), std::string(name).c_str(), 0) == 0 || errno == ENOENT) return Done{};
+  return systemError("cannot remove", pathOf(name));
+}
+
+Status Directory::rename(std::string_view from, std::string_view to) const {
+  if (::renameat(descriptor(), std::string(from).c_str(), descriptor(), std::string(to).c_str()) ==
+      0) {
+    return Done{};
+  }
+  return systemError("cannot rename", pathOf(from));
+}
+
+Status Directory::sync() const {
+  if (retried([&] { return ::fsync(descriptor()); }) != 0) {
+    return systemError("cannot sync directory", path_);
+  }
+  return Done{};
+}
+
+std::optional<std::uint64_t> Directory::freeSpace() const {
+  struct statvfs status {};
+  if (::fstatvfs(descriptor(), &status) != 0) return std::nullopt;
+  return std::uint64_t{status.f_bavail} * status.f_frsize;
+}
+
+}  // namespace tally

@@ -1,0 +1,152 @@
+// Directory: an open directory, through which every file of the device is reached.
+//
+// Root works in directories that users own and change while it works. A path is looked up anew by
+// each call, so what was checked and what is used may differ; an open directory stays the one it
+// is. Names are single components, and a symbolic link at a name is never followed.
+#pragma once
+
+#include <sys/types.h>
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/descriptor.h"
+#include "base/result.h"
+
+struct stat;
+
+namespace tally {
+
+// Distinguishes a file from the one seen before: every atomic replacement changes it.
+struct FileIdentity {
+  std::uint64_t device = 0, inode = 0, size = 0;
+  std::int64_t modifiedNanoseconds = 0;
+  bool regular = false;
+  bool operator==(const FileIdentity&) const = default;
+};
+
+// Who may change what is reached through a directory.
+struct DirectoryTrust {
+  // Only root and the program's own user can write the directory and those above it, up to the
+  // device root.
+  bool exclusive = true;
+  // The user in whose directory it lies, where another user's directory is on the way to it.
+  std::optional<uid_t> user;
+};
+
+// Copies share one descriptor. Errors name the path, for people alone.
+class Directory {
+ public:
+  // Opens a path that the caller chose, links included.
+  static Result<Directory> open(const std::string& path);
+
+  const std::string& path() const { return path_; }
+  std::string pathOf(std::string_view name) const;
+  int descriptor() const { return descriptor_->get(); }
+  const DirectoryTrust& trust() const { return trust_; }
+
+  // The directory at a name. An error (ELOOP) when a link is there.
+  Result<Directory> openDirectory(std::string_view name) const;
+  // The same, made durably when it is missing. What root makes in the directory of another user
+  // belongs to that user, who could not read it otherwise: directories and files alike.
+  Result<Directory> makeDirectory(std::string_view name, unsigned mode = 0755) const;
+
+  // The whole file; larger ones than limit are refused without reading them. Only a regular file is
+  // opened, and below a directory that another user can write only one that has a single name and
+  // belongs to that user or to root: any other may be a foreign file in disguise (EPERM, EMLINK).
+  Result<std::string> readFile(std::string_view name, std::size_t limit) const;
+  // Opens a file for writing under the same conditions.
+  Result<Descriptor> openForWriting(std::string_view name) const;
+  // Makes a file, which must not be there yet (EEXIST).
+  Result<Descriptor> create(std::string_view name, unsigned mode) const;
+  // Whether a file that was opened in this directory meets the conditions above.
+  Status check(int file, std::string_view name) const;
+
+  // Empty when nothing is there or it cannot be examined. A link is examined itself.
+  std::optional<FileIdentity> identity(std::string_view name) const;
+  // The target of a link in this directory that may be followed: it belongs to root or the
+  // program's own user, and nobody else can write here. Empty for anything else.
+  std::optional<std::string> trustedLink(std::string_view name) const;
+  // Names of the entries, sorted.
+  Result<std::vector<std::string>> list() const;
+  // Removing what is not there succeeds.
+  Status remove(std::string_view name) const;
+  Status rename(std::string_view from, std::string_view to) const;
+  // Makes what was made, renamed and removed here survive a power cut.
+  Status sync() const;
+  // Bytes that an ordinary user can still write on the volume.
+  std::optional<std::uint64_t> freeSpace() const;
+
+ private:
+  Directory(Descriptor descriptor, std::string path, DirectoryTrust above);
+  Result<Descriptor> openFile(std::string_view name, int flags) const;
+  void giveToOwner(int descriptor, const struct stat& made) const;
+
+  std::shared_ptr<Descriptor> descriptor_;
+  std::string path_;
+  DirectoryTrust trust_;
+  uid_t owner_ = 0;
+  gid_t group_ = 0;
+};
+
+// A file being written under a temporary name. Unless commit() succeeds the destructor removes it.
+class TemporaryFile {
+ public:
+  // Makes a new file in the directory that will be called name.
+  static Result<TemporaryFile> create(const Directory& directory, std::string_view name,
+                                      unsigned mode = 0600);
+  TemporaryFile(TemporaryFile&& other) noexcept;
+  TemporaryFile& operator=(TemporaryFile&&) = delete;
+  ~TemporaryFile();
+  // Writes all bytes or fails.
+  Status write(std::string_view bytes);
+  // fsync, rename to the final name, fsync of the directory.
+  Status commit();
+
+ private:
+  TemporaryFile(Directory directory, std::string name, std::string temporary, Descriptor file)
+      : directory_(std::move(directory)),
+        name_(std::move(name)),
+        temporary_(std::move(temporary)),
+        file_(std::move(file)) {}
+  Directory directory_;
+  std::string name_, temporary_;
+  Descriptor file_;
+};
+
+// Replaces a file so that, whenever the process or the machine dies, it is the old one or the new
+// one. Nothing is left over on failure.
+Status writeFileAtomically(const Directory& directory, std::string_view name,
+                           std::string_view contents, unsigned mode = 0600);
+
+// True for the names that TemporaryFile gives, so that what a killed run left can be removed.
+bool isTemporaryName(std::string_view name);
+
+// An exclusive lock on a file, released when the object or the process ends, however it ends.
+class FileLock {
+ public:
+  // Makes the file if needed and waits for the lock, at most for the given time; then an error
+  // (EWOULDBLOCK) names the process that holds it.
+  static Result<FileLock> acquire(const Directory& directory, std::string_view name,
+                                  std::chrono::milliseconds patience);
+  // The same with what is left of the process's patience, one minute in all, so that whoever never
+  // releases one lock or many delays a run by no more than that.
+  static Result<FileLock> acquire(const Directory& directory, std::string_view name);
+
+ private:
+  explicit FileLock(Descriptor file) : file_(std::move(file)) {}
+  Descriptor file_;
+};
+
+// The process that holds the lock on a file of this kind, from the text of /proc/locks; empty when
+// it does not say.
+std::optional<std::int64_t> lockHolder(std::string_view locks, std::uint64_t device,
+                                       std::uint64_t inode);
+
+}  // namespace tally
