@@ -1,7 +1,9 @@
 #include "driver/daily_job.h"
 
+#include <cerrno>
 #include <string_view>
 
+#include "config/whitelist_file.h"
 #include "platform/platform.h"
 #include "report/report.h"
 
@@ -10,6 +12,14 @@ namespace {
 
 // The scheduled mode ends when no event came for this long.
 constexpr double kQuietSeconds = 10.0;
+
+// True when the device has no whitelist yet. One that is there but cannot be read or parsed is a
+// fault of its own, which the report names.
+bool whitelistIsMissing() {
+  // A limit of nothing: a file that is there is rejected by its size, unread.
+  const auto bytes = platform().files->readFile(kWhitelistPath, 0);
+  return !bytes && bytes.error().systemError == ENOENT;
+}
 
 }  // namespace
 
@@ -65,7 +75,15 @@ void DailyJob::runIfNewDay(const KvArray* appInfo) {
     logMessage(LogLevel::Default, "Day unchanged since last run");
     return;
   }
+  // Asked before the day's work: a whitelist that arrives meanwhile has admitted nothing yet.
+  const bool nothingAdmits = whitelistIsMissing();
   runDaily(yesterday, appInfo);
+  if (nothingAdmits) {
+    logMessage(LogLevel::Default,
+               "no whitelist is installed yet, so day {} stays unprocessed until there is one",
+               yesterday);
+    return;
+  }
   preferences.SMAPreferencesSetValue(kLastProcessedDay, KvNumber::int32(yesterday), kProgramDomain);
   preferences.SMAPreferencesSynchronize(kProgramDomain);
 }
