@@ -1,4 +1,9 @@
 # The libraries as other programs get them: shared, with a version, only what is public to be seen.
+if(CMAKE_LIBRARY_ARCHITECTURE AND EXISTS "${CMAKE_SYSROOT}/etc/debian_version")
+  # Debian's linkers look there below /usr and /usr/local alike, so that libraries of several
+  # processors can be installed at once. What is packaged is configured with another prefix.
+  set(CMAKE_INSTALL_LIBDIR lib/${CMAKE_LIBRARY_ARCHITECTURE} CACHE PATH "Object code libraries")
+endif()
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 

@@ -1,8 +1,10 @@
 # The Debian packages: component of the install rules, name, section, what it depends on beside the
 # libraries that it is linked with, description. A component without install rules in this build is
-# left out. @VERSION@ is the version of the packages.
+# left out. @VERSION@ is the version of the packages, @USER@ what makes the user and its directories.
+set(TALLYRUN_USER_TOOLS "systemd | systemd-standalone-sysusers | systemd-sysusers, \
+systemd | systemd-standalone-tmpfiles | systemd-tmpfiles")
 set(TALLYRUN_PACKAGES
-  "tallyrun|tallyrun|admin||once-a-day analytics job and its operator's tool"
+  "tallyrun|tallyrun|admin|@USER@|once-a-day analytics job and its operator's tool"
   "tallykv|libtallykv0|libs||property values of the telemetry libraries"
   "tallykv-dev|libtallykv-dev|libdevel|libtallykv0 (= @VERSION@)|property values of the telemetry libraries, development files"
   "hwreport|libhwreport0|libs|libtallykv0 (= @VERSION@)|statistics channels of drivers"

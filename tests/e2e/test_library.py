@@ -138,7 +138,7 @@ class Library(unittest.TestCase):
             self.assertRegex(symbol, r"^HwReport(Error|Subscription)::")
         for symbol in exported["libtallykv.so"]:
             self.assertRegex(symbol, r"^tally::[Kk]v[A-Z]")
-        self.assertEqual((self.library / "libhwreport.so.0").resolve().name, "libhwreport.so.0.1.0")
+        self.assertRegex((self.library / "libhwreport.so.0").resolve().name, r"^libhwreport\.so\.0\.")
 
     def test_each_public_header_compiles_alone(self):
         headers = sorted((self.prefix / "include").glob("**/*.h"))
