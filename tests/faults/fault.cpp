@@ -30,6 +30,7 @@ Notes& notes() {
 
 void arm(const Fault& fault, long n, const std::string& folder) {
   armed = &fault;
+  forgetDirectories();
   wanted = n;
   counted = 0;
   watched = folder;

@@ -34,6 +34,8 @@ constexpr int kKilledStatus = 86;
 // its own, with one thread, that has nothing open there.
 void arm(const Fault& fault, long n, const std::string& folder);
 void disarm();
+// Directories that were entered before count as new.
+void forgetDirectories();
 // Of this process, or of the last child that was forked after this was first asked.
 bool& faultWasMet();
 std::string describeCall();

@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <cmath>
 #include <cstdarg>
+#include <set>
 #include <utility>
 
 #include "faults/fault.h"
@@ -25,6 +26,7 @@ struct OpenFile {
 };
 std::array<OpenFile, 1024> openFiles;
 double clockSeconds = 0;
+std::set<std::string> entered;
 
 OpenFile& openFile(int descriptor) {
   static OpenFile none;
@@ -66,6 +68,8 @@ ssize_t writeJudged(const char* call, int file, size_t count, const Write& write
 
 }  // namespace
 
+void forgetDirectories() { entered.clear(); }
+
 void setClock(double secondsSince1970) { clockSeconds = secondsSince1970; }
 
 }  // namespace tally::faults
@@ -98,8 +102,9 @@ int __wrap_openat(int directory, const char* name, int flags, ...) {
   va_end(arguments);
   const bool creates = (flags & O_CREAT) != 0;
   const std::string path = pathAt(directory, name);
-  // The way down to a file is a dozen directories, for which one kind of failure is enough.
-  const unsigned possible = (flags & O_DIRECTORY) != 0 ? kDenied
+  // The way down to each file is half a dozen directories, each of which need not fail more than
+  // once, and in one way.
+  const unsigned possible = (flags & O_DIRECTORY) != 0 ? (entered.insert(path).second ? kDenied : 0)
                                                        : kInputOutput | kDenied | kInterrupted |
                                                              (creates ? kNoSpace | kLastCall : 0);
   if (fails(creates ? "create" : "open", path, possible)) return -1;

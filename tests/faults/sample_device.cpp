@@ -109,9 +109,10 @@ void SampleDevice::record(const std::vector<std::int32_t>& days) const {
 }
 
 void SampleDevice::restore(bool withStore) const {
+  if (fs::exists(at("/device"))) fs::rename(at("/device"), folder_ / "device");
   fs::remove_all(at(""));
   fs::copy(folder_ / "original", at(""), fs::copy_options::recursive);
-  fs::create_directory_symlink(folder_ / "device", at("/device"));
+  fs::rename(folder_ / "device", at("/device"));
   if (!withStore) fs::remove_all(at("/var/mobile/Library/Tallybook"));
 }
 
