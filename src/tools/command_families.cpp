@@ -2,6 +2,7 @@
 #include "tools/channel_commands.h"
 #include "tools/doctor_command.h"
 #include "tools/explain_command.h"
+#include "tools/forget_command.h"
 #include "tools/nand_commands.h"
 #include "tools/prefs_commands.h"
 #include "tools/report_commands.h"
@@ -17,7 +18,7 @@ std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
       addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
       addNandCommands,  addChannelCommands,   addPrefsCommands,  addDoctorCommand,
-      addSendCommands,  addTaskingCommands,
+      addSendCommands,  addTaskingCommands,   addForgetCommand,
   };
   return kFamilies;
 }

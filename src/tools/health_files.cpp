@@ -4,6 +4,7 @@
 
 #include "base/device_root.h"
 #include "kv/plist_codec.h"
+#include "platform/linux/device_information.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/log_spool.h"
 #include "platform/linux/property_list_preferences.h"
@@ -34,7 +35,8 @@ void examineRoot(const DeviceRoot& root, Lines& lines) {
   const auto directory = root.open("/");
   lines.push_back({directory ? Health::Ok : Health::Wrong, "device root",
                    directory ? directory->path() : directory.error().message});
-  const auto space = directory ? directory->freeSpace() : std::nullopt;
+  const auto volume = openDataVolume(root);
+  const auto space = volume ? volume->freeSpace() : std::nullopt;
   if (!space) return;
   const bool enough = *space > kReservedBytes;
   lines.push_back(
@@ -124,7 +126,7 @@ void examineWhitelist(Lines& lines) {
 void examineStore(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "metrics store";
   const std::string path = metricsStorePath(root);
-  const auto identity = storeDirectory(root).identity("TBDataStore.sqlitedb");
+  const auto identity = storeDirectory(root).identity(kStoreFile);
   if (!identity) {
     lines.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
     return;

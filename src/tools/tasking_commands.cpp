@@ -154,6 +154,7 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   const PlatformScope scope(std::move(variant));
   std::unique_ptr<RunTurn> turn;
   if (!arguments.dryRun) turn = std::make_unique<RunTurn>(*platform().runLock);
+  if (turn && !*turn) return kWrong;  // the lock has said so
   TaskingInputs inputs = readTaskingInputs();
   inputs.schedule = *std::move(schedule);
   const TaskingPlan plan = planTasking(inputs);

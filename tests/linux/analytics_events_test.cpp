@@ -13,10 +13,18 @@ using Names = std::vector<std::string>;
 
 class EventSpoolTest : public TemporaryRoot {
  protected:
-  EventSpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
+  EventSpoolTest() {
+    preferences->calls = std::make_shared<fakes::CallLog>();
+    putPlist("device.plist", "<dict/>");
+  }
   LinuxAnalyticsEvents service() {
-    return {analyticsEventsFolder(root), log, clock, preferences,
-            std::make_shared<DeviceDescription>(TemporaryRoot::folder(""), log)};
+    const auto description = std::make_shared<DeviceDescription>(TemporaryRoot::folder(""), log);
+    return {analyticsEventsFolder(root),
+            log,
+            clock,
+            preferences,
+            description,
+            std::make_shared<SubmissionConsent>(root, log, preferences, description)};
   }
   bool send(std::string_view name, std::string_view text = "x") {
     return service().PulseSendEventLazy(name, [&] {

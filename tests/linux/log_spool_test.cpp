@@ -13,7 +13,11 @@ using Names = std::vector<std::string>;
 class SpoolTest : public TemporaryRoot {
  protected:
   SpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
-  SpoolSubmission spool() { return {folder("spool"), log, clock, preferences}; }
+  std::shared_ptr<SubmissionConsent> consent() {
+    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
+    return std::make_shared<SubmissionConsent>(root, log, preferences, description);
+  }
+  SpoolSubmission spool() { return {folder("spool"), log, clock, preferences, consent()}; }
   bool submit(std::string_view body, std::string_view name = "log-test",
               const KvDictionary* options = nullptr) {
     return spool().SMAWriteLogForSubmission("193", name, options, nullptr,

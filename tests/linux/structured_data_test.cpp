@@ -136,17 +136,54 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
 
 TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
   const auto preferences = std::make_shared<fakes::FakePreferences>();
-  const auto enabled = [&] {
+  const auto service = [&] {
     const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
-    return LinuxCrashReporting(root, log, std::make_shared<fakes::FakeClock>(), preferences,
-                               description)
-        .isDiagnosticSubmissionEnabled();
+    return LinuxCrashReporting(
+        root, log, std::make_shared<fakes::FakeClock>(), preferences,
+        std::make_shared<SubmissionConsent>(root, log, preferences, description));
   };
+  const auto enabled = [&] { return service().isDiagnosticSubmissionEnabled(); };
   EXPECT_TRUE(enabled());
   preferences->put("DiagnosticSubmissionEnabled", KvBoolean::of(false), "vellum.tallyd");
   EXPECT_FALSE(enabled());
   putPlist("device/device.plist", "<dict><key>DiagnosticSubmissionEnabled</key><true/></dict>");
   EXPECT_TRUE(enabled());
+}
+
+TEST_F(StructuredDataTest, WhatWaitsIsDeletedOrHeldWhenTheUserForbidsIt) {
+  const auto preferences = std::make_shared<fakes::FakePreferences>();
+  const std::string logs = "var/mobile/Library/Logs/";
+  const std::vector<std::string> waiting = {
+      "Submission/0000000001-a.log", "Submission/0000000001-a.info.plist",
+      "StructuredData/0000000002-172.pending", "AnalyticsEvents/0000000003-events.jsonl"};
+  const auto allow = [&](bool allowed) {
+    preferences->put("DiagnosticSubmissionEnabled", KvBoolean::of(allowed), "vellum.tallyd");
+    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
+    SubmissionConsent consent(root, log, preferences, description);
+    EXPECT_EQ(consent.permits("x"), allowed);
+    consent.enforce();
+  };
+  const auto state = [&] {
+    std::size_t present = 0, held = 0;
+    for (const std::string& name : waiting) {
+      present += exists(logs + name) ? 1 : 0;
+      held += exists(logs + name + ".held") ? 1 : 0;
+    }
+    return std::pair(present, held);
+  };
+  for (const std::string& name : waiting) put(logs + name, "x");
+  put(logs + "Submission/notes.txt", "not ours");
+  allow(true);
+  EXPECT_EQ(state(), std::pair(std::size_t{4}, std::size_t{0}));
+  preferences->put("WithdrawnLogs", KvString::create("hold"), "vellum.tallyd.tallyrun");
+  allow(false);
+  EXPECT_EQ(state(), std::pair(std::size_t{0}, std::size_t{4}));
+  allow(true);
+  EXPECT_EQ(state(), std::pair(std::size_t{4}, std::size_t{0}));
+  preferences->put("WithdrawnLogs", nullptr, "vellum.tallyd.tallyrun");
+  allow(false);
+  EXPECT_EQ(state(), std::pair(std::size_t{0}, std::size_t{0}));
+  EXPECT_TRUE(exists(logs + "Submission/notes.txt"));
 }
 
 }  // namespace

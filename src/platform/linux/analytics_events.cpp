@@ -7,6 +7,7 @@
 #include "base/time_text.h"
 #include "kv/json_writer.h"
 #include "platform/linux/log_spool.h"
+#include "platform/linux/waiting_logs.h"
 
 namespace tally {
 namespace {
@@ -44,7 +45,7 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
   if (line.size() > bounds.maximumBytes) return Error{"larger than the whole spool may be"};
   const auto folder = makePrivateFolder(folder_);
   if (!folder) return folder.error();
-  const auto lock = FileLock::acquire(*folder, ".events.lock");
+  const auto lock = FileLock::acquire(*folder, kAnalyticsEventLogs.lock);
   if (!lock) return lock.error();
   if (auto reserve = checkReserve(*folder, line.size()); !reserve) return reserve;
   const auto files = listSequenced(*folder);
@@ -73,16 +74,19 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
 LinuxAnalyticsEvents::LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
                                            std::shared_ptr<Clock> clock,
                                            std::shared_ptr<Preferences> preferences,
-                                           std::shared_ptr<DeviceDescription> description)
+                                           std::shared_ptr<DeviceDescription> description,
+                                           std::shared_ptr<SubmissionConsent> consent)
     : log_(std::move(log)),
       clock_(std::move(clock)),
       preferences_(std::move(preferences)),
       description_(std::move(description)),
+      consent_(std::move(consent)),
       spool_(std::move(folder), *clock_) {}
 
 bool LinuxAnalyticsEvents::isAvailable() {
   const auto* described = description_->getAs<KvDictionary>(kEntry);
-  return described == nullptr || !described->getBool("Absent").value_or(false);
+  if (described == nullptr) return description_->exists();
+  return !described->getBool("Absent").value_or(false);
 }
 
 bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
@@ -106,7 +110,9 @@ bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
 
 bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
                                               const PayloadBuilder& builder) {
-  if (!isAvailable() || !isEventWanted(eventName)) return false;
+  if (!isAvailable() || !isEventWanted(eventName) || !consent_->permits("analytics events")) {
+    return false;
+  }
   const auto payload = builder();
   if (!payload) return false;
   const auto appended = spool_.append(eventName, *payload, folderBounds(*preferences_));
@@ -118,7 +124,7 @@ bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
 }
 
 DeviceDirectory analyticsEventsFolder(const DeviceRoot& root) {
-  return {root, "/var/mobile/Library/Logs/AnalyticsEvents"};
+  return kAnalyticsEventLogs.on(root);
 }
 
 }  // namespace tally

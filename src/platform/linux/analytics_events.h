@@ -11,6 +11,7 @@
 #include "platform/clock.h"
 #include "platform/linux/device_description.h"
 #include "platform/linux/sequence_folder.h"
+#include "platform/linux/submission_consent.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 
@@ -33,12 +34,14 @@ class EventSpool {
 // {"event": NAME, "time": "2026-03-01T12:30:00Z", "payload": {...}} and a newline.
 std::string eventLine(std::string_view event, double secondsSince1970, const KvDictionary& payload);
 
-// The description's entry "AnalyticsEvents" says whether there is a service and what it wants.
+// A device without a description has no such service. The description's entry "AnalyticsEvents"
+// says otherwise, and what the service wants.
 class LinuxAnalyticsEvents final : public AnalyticsEvents {
  public:
   LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
                        std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
-                       std::shared_ptr<DeviceDescription> description);
+                       std::shared_ptr<DeviceDescription> description,
+                       std::shared_ptr<SubmissionConsent> consent);
   bool isAvailable() override;
   bool isEventWanted(std::string_view eventName) override;
   bool PulseSendEventLazy(std::string_view eventName, const PayloadBuilder& builder) override;
@@ -48,6 +51,7 @@ class LinuxAnalyticsEvents final : public AnalyticsEvents {
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;
   std::shared_ptr<DeviceDescription> description_;
+  std::shared_ptr<SubmissionConsent> consent_;
   EventSpool spool_;
 };
 

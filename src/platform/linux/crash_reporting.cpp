@@ -5,35 +5,33 @@
 #include <algorithm>
 
 #include "platform/linux/log_spool.h"
+#include "platform/linux/waiting_logs.h"
 
 namespace tally {
 
 LinuxCrashReporting::LinuxCrashReporting(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                                          std::shared_ptr<Clock> clock,
                                          std::shared_ptr<Preferences> preferences,
-                                         std::shared_ptr<DeviceDescription> description)
+                                         std::shared_ptr<SubmissionConsent> consent)
     : fixlineFolder_(root, "/var/mobile/Library/Logs/Fixline"),
       log_(std::move(log)),
       clock_(std::move(clock)),
       preferences_(std::move(preferences)),
-      description_(std::move(description)),
-      structuredData_(DeviceDirectory(root, "/var/mobile/Library/Logs/StructuredData"), *clock_) {}
+      consent_(std::move(consent)),
+      structuredData_(kStructuredDataLogs.on(root), *clock_) {}
 
-bool LinuxCrashReporting::isDiagnosticSubmissionEnabled() {
-  constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";
-  if (const auto* described = description_->getAs<KvBoolean>(kSwitch)) return described->value();
-  bool exists = false;
-  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, "vellum.tallyd", &exists);
-  return enabled || !exists;
-}
+bool LinuxCrashReporting::isDiagnosticSubmissionEnabled() { return consent_->given(); }
 
 void LinuxCrashReporting::FDLogStructuredData(std::uint32_t recordType,
                                               const KvDictionary& record) {
+  if (!consent_->permits("structured data")) return;
   const auto appended = structuredData_.append(recordType, record, folderBounds(*preferences_));
   if (!appended) report(fmt::format("structured data of type {}", recordType), appended.error());
 }
 
 void LinuxCrashReporting::FDDumpAllOldStructuredDataLogs() {
+  consent_->enforce();
+  if (!consent_->given()) return;
   structuredData_.finishAll(folderBounds(*preferences_),
                             [this](const Error& error) { report("structured data", error); });
 }

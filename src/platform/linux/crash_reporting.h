@@ -7,6 +7,7 @@
 #include "platform/crash_reporting.h"
 #include "platform/linux/device_description.h"
 #include "platform/linux/structured_data.h"
+#include "platform/linux/submission_consent.h"
 #include "platform/preferences.h"
 
 namespace tally {
@@ -15,7 +16,7 @@ class LinuxCrashReporting final : public CrashReporting {
  public:
   LinuxCrashReporting(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                       std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
-                      std::shared_ptr<DeviceDescription> description);
+                      std::shared_ptr<SubmissionConsent> consent);
   bool isDiagnosticSubmissionEnabled() override;
   void FDLogStructuredData(std::uint32_t recordType, const KvDictionary& record) override;
   void FDDumpAllOldStructuredDataLogs() override;
@@ -28,7 +29,7 @@ class LinuxCrashReporting final : public CrashReporting {
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;
-  std::shared_ptr<DeviceDescription> description_;
+  std::shared_ptr<SubmissionConsent> consent_;
   StructuredDataFolder structuredData_;
 };
 

@@ -18,6 +18,11 @@ const KvObject* DeviceDescription::get(std::string_view key) {
   return entries_ ? entries_->get(key) : nullptr;
 }
 
+bool DeviceDescription::exists() {
+  std::call_once(read_, [this] { read(); });
+  return static_cast<bool>(entries_);
+}
+
 void DeviceDescription::read() {
   const auto report = [this](std::string_view fault) {
     log_->write(LogLevel::Error,

@@ -22,6 +22,8 @@ class DeviceDescription {
   DeviceDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log)
       : folder_(std::move(folder)), log_(std::move(log)) {}
 
+  // Whether there is a description that can be read.
+  bool exists();
   // Borrowed; null when it is not described.
   const KvObject* get(std::string_view key);
   // Borrowed; null when it is not described or of another type.

@@ -32,6 +32,14 @@ std::string inverseDeviceID(std::string_view machineId) {
   return std::string(digits, kMachineIdDigits);
 }
 
+Result<Directory> openDataVolume(const DeviceRoot& root) {
+  for (const char* const path : {"/var/mobile", "/var"}) {
+    auto directory = root.open(path);
+    if (directory) return directory;
+  }
+  return root.open("/");
+}
+
 KvRef<KvObject> LinuxDeviceInformation::DeviceQuery(std::string_view question) {
   if (const auto* answers = description_->getAs<KvDictionary>("DeviceAnswers")) {
     if (auto* answer = answers->get(question)) return KvRef<KvObject>::share(answer);
@@ -44,7 +52,8 @@ KvRef<KvObject> LinuxDeviceInformation::DeviceQuery(std::string_view question) {
 
 KvRef<KvObject> LinuxDeviceInformation::diskUsage() const {
   struct statvfs volume {};
-  if (::statvfs((root_.prefix() + "/").c_str(), &volume) != 0) return nullptr;
+  const auto directory = openDataVolume(root_);
+  if (!directory || ::fstatvfs(directory->descriptor(), &volume) != 0) return nullptr;
   const auto bytes = [&volume](fsblkcnt_t blocks) {
     return KvNumber::int64(static_cast<std::int64_t>(blocks * volume.f_frsize));
   };

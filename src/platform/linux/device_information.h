@@ -27,6 +27,10 @@ class LinuxDeviceInformation final : public DeviceInformation {
   std::shared_ptr<DeviceDescription> description_;
 };
 
+// A directory on the volume that holds what is recorded: the home of the program's user, or the
+// nearest one above it that is there. The root's own volume is often read-only.
+Result<Directory> openDataVolume(const DeviceRoot& root);
+
 // An identifier that is stable for a machine and a stranger to its machine id, which it is a hash
 // of: 32 hexadecimal digits. Empty when the text holds no machine id.
 std::string inverseDeviceID(std::string_view machineId);

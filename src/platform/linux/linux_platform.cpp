@@ -22,6 +22,7 @@
 #include "platform/linux/property_list_preferences.h"
 #include "platform/linux/run_lock.h"
 #include "platform/linux/store_schema.h"
+#include "platform/linux/submission_consent.h"
 #include "platform/linux/system_log.h"
 
 namespace tally {
@@ -56,6 +57,8 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   const auto eventLoop = std::make_shared<SdEventLoop>(log);
   const auto bus = std::make_shared<BusConnection>();
 
+  const auto consent = std::make_shared<SubmissionConsent>(root, log, preferences, description);
+
   Platform services;
   services.log = log;
   services.clock = clock;
@@ -69,9 +72,9 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
   services.metricsStore = makeSqliteMetricsStore(metricsStorePath(root), log, clock);
   services.logSubmission =
-      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences);
+      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences, consent);
   services.crashReporting =
-      std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, description);
+      std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, consent);
   services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);
   services.deviceInformation = std::make_shared<LinuxDeviceInformation>(root, description);
   services.appRegistry = std::make_shared<DesktopAppRegistry>(
@@ -87,7 +90,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.logHeaderFacts =
       std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
   services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
-      analyticsEventsFolder(root), log, clock, preferences, description);
+      analyticsEventsFolder(root), log, clock, preferences, description, consent);
   return services;
 }
 

@@ -7,6 +7,7 @@
 
 #include "base/file.h"
 #include "kv/plist_codec.h"
+#include "platform/linux/waiting_logs.h"
 
 namespace tally {
 namespace {
@@ -86,6 +87,7 @@ bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::s
                                                const KvDictionary* options,
                                                const KvObject* reserved, const Writer& writer) {
   Status submitted = Done{};
+  if (!consent_->permits("submitted logs")) return false;
   if (reserved != nullptr) {
     submitted = Error{"the reserved argument is in use"};
   } else if (!isSafeFileName(name) || isTemporaryName(name) || name.size() > kLongestLogName) {
@@ -108,7 +110,7 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
                                const KvDictionary* options, const Writer& writer) {
   const auto folder = makePrivateFolder(folder_);
   if (!folder) return folder.error();
-  const auto lock = FileLock::acquire(*folder, ".spool.lock");
+  const auto lock = FileLock::acquire(*folder, kSubmittedLogs.lock);
   if (!lock) return lock.error();
   sweepLeftOvers(*folder);
   const auto logs = listSequenced(*folder);
@@ -186,8 +188,6 @@ Result<std::string> SpoolReader::readBody(const SpooledLog& log, std::size_t lim
   return folder->readFile(log.fileName, limit);
 }
 
-DeviceDirectory spoolFolder(const DeviceRoot& root) {
-  return {root, "/var/mobile/Library/Logs/Submission"};
-}
+DeviceDirectory spoolFolder(const DeviceRoot& root) { return kSubmittedLogs.on(root); }
 
 }  // namespace tally

@@ -11,6 +11,7 @@
 #include "base/device_root.h"
 #include "platform/clock.h"
 #include "platform/linux/sequence_folder.h"
+#include "platform/linux/submission_consent.h"
 #include "platform/log_submission.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
@@ -23,15 +24,18 @@ FolderBounds folderBounds(Preferences& preferences);
 
 // Submits logs into a spool folder. A log is in the spool once its body has its final name, which
 // is the last step; a killed run leaves nothing that counts, and its left-overs are swept at the
-// next submission. Submitters of several processes are serialised.
+// next submission. Submitters of several processes are
+// serialised. What the user has forbidden is refused with one info line.
 class SpoolSubmission final : public LogSubmission {
  public:
   SpoolSubmission(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
-                  std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences)
+                  std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
+                  std::shared_ptr<SubmissionConsent> consent)
       : folder_(std::move(folder)),
         log_(std::move(log)),
         clock_(std::move(clock)),
-        preferences_(std::move(preferences)) {}
+        preferences_(std::move(preferences)),
+        consent_(std::move(consent)) {}
   bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
                                 const KvDictionary* options, const KvObject* reserved,
                                 const Writer& writer) override;
@@ -46,6 +50,7 @@ class SpoolSubmission final : public LogSubmission {
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;
+  std::shared_ptr<SubmissionConsent> consent_;
   bool submitting_ = false;
 };
 

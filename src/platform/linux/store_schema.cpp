@@ -100,12 +100,14 @@ Status makeTables(Database& database) {
 
 }  // namespace
 
+const std::string kStoreFile = "TBDataStore.sqlitedb";
+
 DeviceDirectory storeDirectory(const DeviceRoot& root) {
   return {root, "/var/mobile/Library/Tallybook"};
 }
 
 std::string metricsStorePath(const DeviceRoot& root) {
-  return storeDirectory(root).text() + "/TBDataStore.sqlitedb";
+  return storeDirectory(root).text() + "/" + kStoreFile;
 }
 
 bool isStoreKey(std::string_view key) {

@@ -10,7 +10,8 @@
 
 namespace tally {
 
-// Where the store lies on a device, and the path of its file.
+// Where the store lies on a device, its name there, and its path.
+extern const std::string kStoreFile;
 DeviceDirectory storeDirectory(const DeviceRoot& root);
 std::string metricsStorePath(const DeviceRoot& root);
 

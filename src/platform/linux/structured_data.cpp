@@ -7,13 +7,13 @@
 
 #include "base/number_text.h"
 #include "kv/plist_codec.h"
+#include "platform/linux/waiting_logs.h"
 
 namespace tally {
 namespace {
 
 constexpr std::string_view kPendingSuffix = ".pending";
 constexpr std::string_view kFinishedSuffix = ".plist";
-constexpr std::string_view kLockName = ".structured-data.lock";
 // A pending log is written out before it grows beyond this.
 constexpr std::size_t kLargestPending = 4u << 20;
 // A record is its length in ten digits, a newline, its property list and a newline.
@@ -75,7 +75,7 @@ Status StructuredDataFolder::append(std::uint32_t recordType, const KvDictionary
   if (frame.size() > kLargestPending) return Error{"the record is larger than a log may be"};
   const auto folder = makePrivateFolder(folder_);
   if (!folder) return folder.error();
-  const auto lock = FileLock::acquire(*folder, kLockName);
+  const auto lock = FileLock::acquire(*folder, kStructuredDataLogs.lock);
   if (!lock) return lock.error();
   if (auto reserve = checkReserve(*folder, frame.size()); !reserve) return reserve;
   Pending& pending = appended_[recordType];
@@ -128,7 +128,7 @@ void StructuredDataFolder::finishAll(const FolderBounds& bounds,
   const auto folder = folder_.open();
   if (!folder && folder.error().systemError == ENOENT) return;  // nothing was ever logged
   if (!folder) return report(folder.error());
-  const auto lock = FileLock::acquire(*folder, kLockName);
+  const auto lock = FileLock::acquire(*folder, kStructuredDataLogs.lock);
   if (!lock) return report(lock.error());
   const auto names = folder->list();
   if (!names) return report(names.error());

@@ -1,0 +1,57 @@
+#include "platform/linux/submission_consent.h"
+
+#include <fmt/format.h>
+
+#include "platform/linux/waiting_logs.h"
+
+namespace tally {
+namespace {
+
+constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";
+constexpr std::string_view kSwitchDomain = "vellum.tallyd";
+constexpr std::string_view kWithdrawn = "WithdrawnLogs";
+constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
+
+bool holds(Preferences& preferences) {
+  const auto value = preferences.SMAPreferencesGetValue(kWithdrawn, kProgramDomain);
+  const auto* const text = kvCast<KvString>(value.get());
+  return text != nullptr && text->view() == "hold";
+}
+
+}  // namespace
+
+bool SubmissionConsent::given() const {
+  if (const auto* described = description_->getAs<KvBoolean>(kSwitch)) return described->value();
+  bool exists = false;
+  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &exists);
+  return enabled || !exists;
+}
+
+bool SubmissionConsent::permits(std::string_view what) {
+  if (given()) return true;
+  const std::lock_guard lock(mutex_);
+  if (refused_.emplace(what).second) {
+    log_->write(LogLevel::Info,
+                fmt::format("{}: not kept, the user does not allow submission", what));
+  }
+  return false;
+}
+
+void SubmissionConsent::enforce() {
+  const bool allowed = given();
+  const WaitingAction action = allowed                ? WaitingAction::Release
+                               : holds(*preferences_) ? WaitingAction::Hold
+                                                      : WaitingAction::Erase;
+  const auto handled = handleWaiting(root_, action);
+  if (!handled) {
+    log_->write(LogLevel::Error, fmt::format("waiting logs: {}", handled.error().message));
+  } else if (*handled > 0) {
+    log_->write(LogLevel::Default, fmt::format("submission is {}: {} waiting files {}",
+                                               allowed ? "allowed again" : "not allowed", *handled,
+                                               allowed                         ? "are released"
+                                               : action == WaitingAction::Hold ? "are held back"
+                                                                               : "are deleted"));
+  }
+}
+
+}  // namespace tally

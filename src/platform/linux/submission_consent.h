@@ -1,0 +1,45 @@
+// Whether the user allows logs to leave the device, and what follows when not.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+
+#include "base/device_root.h"
+#include "platform/linux/device_description.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// Every service that puts files where they wait to be taken away asks here first. Any thread may.
+class SubmissionConsent {
+ public:
+  SubmissionConsent(DeviceRoot root, std::shared_ptr<SystemLog> log,
+                    std::shared_ptr<Preferences> preferences,
+                    std::shared_ptr<DeviceDescription> description)
+      : root_(std::move(root)),
+        log_(std::move(log)),
+        preferences_(std::move(preferences)),
+        description_(std::move(description)) {}
+
+  // The description's word, else the user's preference; allowed when neither says anything.
+  bool given() const;
+  // The same, with one info line for each kind of thing that is therefore not recorded.
+  bool permits(std::string_view what);
+  // When the user no longer allows submission, deletes what still waits from before, or holds it
+  // back where the preference "WithdrawnLogs" of the program is "hold"; when the user allows it
+  // again, what was held waits again. One line says how many files were concerned.
+  void enforce();
+
+ private:
+  DeviceRoot root_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<Preferences> preferences_;
+  std::shared_ptr<DeviceDescription> description_;
+  std::mutex mutex_;
+  std::set<std::string, std::less<>> refused_;
+};
+
+}  // namespace tally
