@@ -36,6 +36,8 @@ void arm(const Fault& fault, long n, const std::string& folder) {
   watched = folder;
 }
 
+void endWithPowerCut() { cutPower(armed->loss, static_cast<unsigned>(wanted)); }
+
 void disarm() { armed = nullptr; }
 
 bool& faultWasMet() { return notes().met; }
@@ -60,6 +62,9 @@ Verdict judge(const char* call, std::string_view path, unsigned possible) {
   }
   switch (armed->effect) {
     case Fault::Effect::Kill:
+      die();
+    case Fault::Effect::PowerCut:
+      endWithPowerCut();
       die();
     case Fault::Effect::KillHalfWay:
       return Verdict::KillHalfWay;

@@ -8,6 +8,8 @@
 #include <string>
 #include <string_view>
 
+#include "faults/disk.h"
+
 namespace tally::faults {
 
 // What can become of a call, one bit each.
@@ -17,12 +19,13 @@ constexpr unsigned kHalfWrite = 32;  // only half of its bytes may get there bef
 constexpr unsigned kShortWrite = 64;  // it may take half of its bytes and say so
 
 struct Fault {
-  enum class Effect { Fail, Kill, KillHalfWay, WriteHalf };
+  enum class Effect { Fail, Kill, KillHalfWay, WriteHalf, PowerCut };
   const char* name;
   Effect effect;
-  unsigned possible;   // where: the calls of which this is true are counted
-  int code = 0;        // with which errno a call fails
-  bool lasts = false;  // whether the calls after it fail like it
+  unsigned possible;             // where: the calls of which this is true are counted
+  int code = 0;                  // with which errno a call fails
+  bool lasts = false;            // whether the calls after it fail like it
+  Loss loss = Loss::Everything;  // of a power cut
   // The run must not so much as notice.
   bool isHarmless() const { return possible == kInterrupted || effect == Effect::WriteHalf; }
 };
@@ -34,6 +37,8 @@ constexpr int kKilledStatus = 86;
 // its own, with one thread, that has nothing open there.
 void arm(const Fault& fault, long n, const std::string& folder);
 void disarm();
+// The power cut that the run has not met so far.
+void endWithPowerCut();
 // Directories that were entered before count as new.
 void forgetDirectories();
 // Of this process, or of the last child that was forked after this was first asked.

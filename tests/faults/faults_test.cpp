@@ -6,10 +6,14 @@
 //   of the day's tasks have been gone through. A task that failed by itself does not count: the day
 //   is noted all the same, and an error line says what it cost. A run that died before has not
 //   noted it, so that the next one does the day.
+// - What a service has acknowledged survives a power cut, at once or later.
 // - The next run in which nothing fails ends with everything done, whatever is left over.
 #include <gtest/gtest.h>
 
+#include <fmt/format.h>
+
 #include <cerrno>
+#include <filesystem>
 #include <fstream>
 #include <optional>
 #include <set>
@@ -17,7 +21,9 @@
 #include "base/directory.h"
 #include "base/file.h"
 #include "faults/sample_device.h"
+#include "platform/linux/sequence_folder.h"
 #include "platform/linux/sqlite_database.h"
+#include "platform/linux/structured_data.h"
 
 namespace tally::faults {
 
@@ -25,6 +31,7 @@ void PrintTo(const Fault& fault, std::ostream* out) { *out << fault.name; }
 
 namespace {
 
+namespace fs = std::filesystem;
 using Effect = Fault::Effect;
 
 const Fault kFaults[] = {
@@ -37,6 +44,9 @@ const Fault kFaults[] = {
     // Killed right after a call is killed before the next: between two calls nothing changes.
     {"Killed", Effect::Kill, kLastCall},
     {"KilledHalfWay", Effect::KillHalfWay, kHalfWrite},
+    {"PowerCut", Effect::PowerCut, kLastCall},
+    {"PowerCutAfterNames", Effect::PowerCut, kLastCall, 0, false, Loss::Contents},
+    {"PowerCutAtRandom", Effect::PowerCut, kLastCall, 0, false, Loss::AtRandom},
     {"Interrupted", Effect::Fail, kInterrupted, EINTR},
     {"HalfWritten", Effect::WriteHalf, kShortWrite},
 };
@@ -59,7 +69,17 @@ constexpr long kFewestCalls = 20;
 // Of one day.
 constexpr std::size_t kStorageRecords = 9;
 
+std::size_t countIn(std::string_view text, std::string_view part) {
+  std::size_t count = 0;
+  for (auto at = text.find(part); at != std::string_view::npos; at = text.find(part, at + 1)) {
+    ++count;
+  }
+  return count;
+}
+
 const char* const kSpool = "/var/mobile/Library/Logs/Submission";
+const char* const kStructuredData = "/var/mobile/Library/Logs/StructuredData";
+const char* const kRepairLogs = "/var/mobile/Library/Logs/Fixline";
 const char* const kPreferences = "/var/mobile/Library/Preferences";
 
 class FaultWalk : public testing::TestWithParam<Fault> {
@@ -120,6 +140,11 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     for (const std::string& path : device->files("/var/mobile/Library/Tallybook")) {
       EXPECT_EQ(std::filesystem::status(path).permissions(), std::filesystem::perms{0600}) << path;
     }
+    std::multiset<std::string> repairLogs;
+    for (const std::string& path : device->files(kRepairLogs)) {
+      repairLogs.insert(*readFile(path, 100));
+    }
+    EXPECT_EQ(repairLogs, (std::multiset<std::string>{"new", "old", "older"}));
     (void)loggedDays();
     const auto noted = notedDay();
     EXPECT_TRUE(noted == kFormerRun - 1 || noted == scenario.day - 1) << noted;
@@ -161,41 +186,85 @@ class FaultWalk : public testing::TestWithParam<Fault> {
 
   // After a run of that day in which nothing failed.
   void checkDone(std::int32_t day, const char* tasking = "present") const {
+    checkRecorded(day, tasking);
+    for (const std::string& path : device->files("")) {
+      EXPECT_FALSE(isTemporaryName(path) || path.ends_with(".pending")) << path;
+    }
+    checkEvents();
+    checkRepairLogs();
+  }
+
+  // The same but for what the next run tidies up.
+  void checkRecorded(std::int32_t day, const char* tasking) const {
     EXPECT_EQ(notedDay(), day - 1);
     if (scenario.hasStore) {
       EXPECT_TRUE(loggedDays().contains(day - 1));
     }
-    for (const std::string& path : device->files("")) {
-      EXPECT_FALSE(isTemporaryName(path) || path.ends_with(".pending")) << path;
-    }
-    checkStructuredData();
-    checkEvents();
+    checkStructuredData(kStorageRecords);
     checkStore(day);
     checkTasking(tasking);
-    checkRepairLogs();
   }
 
-  // The last log of the storage has at least the records of one day.
-  void checkStructuredData() const {
-    std::size_t records = 0;
-    for (const std::string& path : device->files("/var/mobile/Library/Logs/StructuredData")) {
+  // The last log of the storage, which is newer than the one of that number, has at least so many
+  // records.
+  void checkStructuredData(std::size_t records, std::uint64_t formerLog = 0) const {
+    std::size_t found = 0;
+    for (const std::string& path : device->files(kStructuredData)) {
+      if (sequenceOf(fs::path(path).filename().native()).value_or(0) <= formerLog) continue;
+      if (path.ends_with(fmt::format("-{}.pending", kStorageRecordType))) {
+        const auto bytes = readFile(path, 1u << 24);
+        found = countIn(bytes->substr(0, wholeRecords(*bytes)), "</plist>");
+      }
       if (!path.ends_with(".plist")) continue;
       const auto log = dictionaryIn(path);
       ASSERT_TRUE(log) << path;
-      if (log->getInt64("RecordType") == 176) records = log->getAs<KvArray>("Records")->size();
+      if (log->getInt64("RecordType") == kStorageRecordType) {
+        found = log->getAs<KvArray>("Records")->size();
+      }
     }
-    EXPECT_GE(records, kStorageRecords);
+    EXPECT_GE(found, records);
   }
 
-  // Each line is one whole event.
-  void checkEvents() const {
+  // How many lines are one whole event; the rest is said to be damaged.
+  std::size_t wholeEvents(std::string* damaged = nullptr) const {
+    std::size_t whole = 0;
     for (const std::string& path : device->files("/var/mobile/Library/Logs/AnalyticsEvents")) {
       if (!path.ends_with(".jsonl")) continue;
       std::ifstream lines(path);
       for (std::string line; std::getline(lines, line);) {
-        EXPECT_TRUE(line.rfind("{\"event\":") == 0 && line.ends_with("}}")) << line;
+        const bool isWhole = line.rfind("{\"event\":") == 0 && line.ends_with("}}") &&
+                             line.find('\0') == std::string::npos;
+        whole += isWhole;
+        if (!isWhole && damaged != nullptr) *damaged = line;
       }
     }
+    return whole;
+  }
+  void checkEvents() const {
+    std::string damaged;
+    (void)wholeEvents(&damaged);
+    EXPECT_EQ(damaged, "");
+  }
+
+  // The number of a folder's newest log.
+  std::uint64_t lastLog(const char* folder) const {
+    const auto logs = listSequenced(*Directory::open(device->at(folder)));
+    return logs->empty() ? 0 : logs->back().sequence;
+  }
+
+  // What was there before a run.
+  struct Before {
+    std::size_t events;
+    std::uint64_t lastLog, lastStructuredData;
+  };
+
+  // After a power cut.
+  void checkAcknowledged(const Acknowledged& done, const Before& before) const {
+    EXPECT_GE(wholeEvents(), before.events + done.events);
+    EXPECT_GE(lastLog(kSpool), before.lastLog + done.logs);
+    if (done.records > 0) checkStructuredData(done.records, before.lastStructuredData);
+    if (done.swept) checkStore(scenario.day);
+    if (done.tasked) checkTasking("present");
   }
 
   // The scheduled tasking is in force, and nothing of another one is left.
@@ -214,23 +283,25 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     EXPECT_FALSE(own->contains("TaskingUnfinished"));
   }
 
-  // Rolled, and none of them lost.
   void checkRepairLogs() const {
-    std::multiset<std::string> contents;
-    for (const std::string& path : device->files("/var/mobile/Library/Logs/Fixline")) {
-      EXPECT_FALSE(path.ends_with(".log")) << path;
-      contents.insert(*readFile(path, 100));
+    for (const std::string& path : device->files(kRepairLogs)) {
+      EXPECT_FALSE(path.ends_with(".log")) << path << " is not rolled";
     }
-    EXPECT_EQ(contents, (std::multiset<std::string>{"new", "old", "older"}));
   }
 
-  void checkEnding(const Ending& ending) const {
+  void checkEnding(const Ending& ending, const Before& before) const {
     ASSERT_TRUE(ending.sound) << testing::PrintToString(ending.errors);
     checkNothingIsDamaged();
     const bool noted = notedDay() == scenario.day - 1;
     if (fault().isHarmless()) {
       EXPECT_EQ(ending.errors, std::vector<std::string>());
       EXPECT_TRUE(noted);
+    }
+    if (fault().effect == Effect::PowerCut) {
+      checkAcknowledged(ending.acknowledged, before);
+      EXPECT_TRUE(ending.killed || noted);
+      if (noted) checkRecorded(scenario.day, "present");
+      return;
     }
     if (ending.killed ? noted : fault().isHarmless()) checkDone(scenario.day);
     if (ending.killed) return;
@@ -241,15 +312,16 @@ class FaultWalk : public testing::TestWithParam<Fault> {
   // False when the walk is at its end.
   bool tryPoint(long point) {
     device->restore(scenario.hasStore);
+    const Before before{wholeEvents(), lastLog(kSpool), lastLog(kStructuredData)};
     const Ending ending = device->run(scenario.day, &fault(), point, scenario.folder);
     SCOPED_TRACE("call " + std::to_string(point) + ": " + describeCall() +
                  "; errors: " + testing::PrintToString(ending.errors));
     if (!ending.met) {
       EXPECT_EQ(ending.errors, std::vector<std::string>());
-      checkDone(scenario.day);
-      return false;
+      if (fault().effect != Effect::PowerCut) checkDone(scenario.day);
     }
-    checkEnding(ending);
+    if (ending.met || fault().effect == Effect::PowerCut) checkEnding(ending, before);
+    if (!ending.met) return false;
     if (fault().isHarmless()) return true;
     // A day that is noted is not done again, so the next run with something to do is tomorrow's.
     const std::int32_t next = scenario.day + (notedDay() == scenario.day - 1 ? 1 : 0);

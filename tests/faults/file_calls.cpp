@@ -14,6 +14,7 @@
 #include <set>
 #include <utility>
 
+#include "faults/disk.h"
 #include "faults/fault.h"
 
 namespace tally::faults {
@@ -49,6 +50,7 @@ bool fails(const char* call, std::string_view path, unsigned possible) {
 
 template <class Write>
 ssize_t writeJudged(const char* call, int file, size_t count, const Write& write) {
+  contentsChange(openFile(file).path);
   switch (judge(call, openFile(file).path,
                 kNoSpace | kInputOutput | kInterrupted | kLastCall |
                     (count > 1 ? kHalfWrite | kShortWrite : 0))) {
@@ -64,6 +66,18 @@ ssize_t writeJudged(const char* call, int file, size_t count, const Write& write
       break;
   }
   return write(count);
+}
+
+// A directory's contents are its names.
+int syncJudged(const char* call, int file, int (*sync)(int)) {
+  const std::string& path = openFile(file).path;
+  if (fails(call, path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) return -1;
+  const int result = sync(file);
+  if (result == 0) {
+    contentsSynced(path);
+    namesSynced(path);
+  }
+  return result;
 }
 
 }  // namespace
@@ -108,7 +122,8 @@ int __wrap_openat(int directory, const char* name, int flags, ...) {
                                                        : kInputOutput | kDenied | kInterrupted |
                                                              (creates ? kNoSpace | kLastCall : 0);
   if (fails(creates ? "create" : "open", path, possible)) return -1;
-  const int file = __real_openat(directory, name, flags, mode);
+  const NameChange change(NameChange::Kind::Create, creates ? path : "");
+  const int file = change.done(__real_openat(directory, name, flags, mode));
   if (file >= 0) openFile(file) = {path, (flags & O_ACCMODE) != O_RDONLY};
   return file;
 }
@@ -135,22 +150,13 @@ ssize_t __wrap_pwrite(int file, const void* bytes, size_t count, off_t offset) {
                      [=](size_t part) { return __real_pwrite(file, bytes, part, offset); });
 }
 
-int __wrap_fsync(int file) {
-  if (fails("fsync", openFile(file).path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) {
-    return -1;
-  }
-  return __real_fsync(file);
-}
+int __wrap_fsync(int file) { return syncJudged("fsync", file, __real_fsync); }
 
-int __wrap_fdatasync(int file) {
-  if (fails("fdatasync", openFile(file).path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) {
-    return -1;
-  }
-  return __real_fdatasync(file);
-}
+int __wrap_fdatasync(int file) { return syncJudged("fdatasync", file, __real_fdatasync); }
 
 int __wrap_ftruncate(int file, off_t size) {
   if (fails("ftruncate", openFile(file).path, kInputOutput | kInterrupted | kLastCall)) return -1;
+  contentsChange(openFile(file).path);
   return __real_ftruncate(file, size);
 }
 
@@ -170,22 +176,24 @@ int __wrap_fstatat(int directory, const char* name, struct stat* status, int fla
 }
 
 int __wrap_renameat(int from, const char* name, int to, const char* newName) {
-  if (fails("rename to", pathAt(to, newName), kNoSpace | kInputOutput | kDenied | kLastCall)) {
-    return -1;
-  }
-  return __real_renameat(from, name, to, newName);
+  const std::string path = pathAt(to, newName);
+  if (fails("rename to", path, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
+  const NameChange change(NameChange::Kind::Rename, pathAt(from, name), path);
+  return change.done(__real_renameat(from, name, to, newName));
 }
 
 int __wrap_unlinkat(int directory, const char* name, int flags) {
-  if (fails("unlink", pathAt(directory, name), kInputOutput | kDenied | kLastCall)) return -1;
-  return __real_unlinkat(directory, name, flags);
+  const std::string path = pathAt(directory, name);
+  if (fails("unlink", path, kInputOutput | kDenied | kLastCall)) return -1;
+  const NameChange change(NameChange::Kind::Remove, path);
+  return change.done(__real_unlinkat(directory, name, flags));
 }
 
 int __wrap_mkdirat(int directory, const char* name, mode_t mode) {
-  if (fails("mkdir", pathAt(directory, name), kNoSpace | kInputOutput | kDenied | kLastCall)) {
-    return -1;
-  }
-  return __real_mkdirat(directory, name, mode);
+  const std::string path = pathAt(directory, name);
+  if (fails("mkdir", path, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
+  const NameChange change(NameChange::Kind::Create, path);
+  return change.done(__real_mkdirat(directory, name, mode));
 }
 
 DIR* __wrap_fdopendir(int directory) {

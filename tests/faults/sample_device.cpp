@@ -3,12 +3,14 @@
 #include <fcntl.h>
 #include <fmt/format.h>
 #include <fmt/ranges.h>
+#include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstdlib>
 #include <fstream>
 #include <memory>
+#include <new>
 #include <numeric>
 
 #include "base/file.h"
@@ -39,6 +41,54 @@ fs::path placeForDevices() {
   return ::access("/dev/shm", W_OK) == 0 ? fs::path("/dev/shm") : fs::temp_directory_path();
 }
 
+// Written by the child, read by its parent.
+Acknowledged& acknowledged() {
+  static void* const shared = ::mmap(nullptr, sizeof(Acknowledged), PROT_READ | PROT_WRITE,
+                                     MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+  require(shared != MAP_FAILED, "no shared memory");
+  static Acknowledged* const record = new (shared) Acknowledged;
+  return *record;
+}
+
+// Services that note what the real ones acknowledge.
+
+struct NotedSubmission final : LogSubmission {
+  explicit NotedSubmission(std::shared_ptr<LogSubmission> service) : real(std::move(service)) {}
+  bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
+                                const KvDictionary* options, const KvObject* reserved,
+                                const Writer& writer) override {
+    const bool written = real->SMAWriteLogForSubmission(typeCode, name, options, reserved, writer);
+    acknowledged().logs += written;
+    return written;
+  }
+  std::shared_ptr<LogSubmission> real;
+};
+
+struct NotedEvents final : AnalyticsEvents {
+  explicit NotedEvents(std::shared_ptr<AnalyticsEvents> service) : real(std::move(service)) {}
+  bool isAvailable() override { return real->isAvailable(); }
+  bool isEventWanted(std::string_view name) override { return real->isEventWanted(name); }
+  bool PulseSendEventLazy(std::string_view name, const PayloadBuilder& builder) override {
+    const bool sent = real->PulseSendEventLazy(name, builder);
+    acknowledged().events += sent;
+    return sent;
+  }
+  std::shared_ptr<AnalyticsEvents> real;
+};
+
+struct NotedCrashReporting final : CrashReporting {
+  explicit NotedCrashReporting(std::shared_ptr<CrashReporting> service)
+      : real(std::move(service)) {}
+  bool isDiagnosticSubmissionEnabled() override { return real->isDiagnosticSubmissionEnabled(); }
+  void FDLogStructuredData(std::uint32_t type, const KvDictionary& record) override {
+    real->FDLogStructuredData(type, record);
+    acknowledged().records += type == kStorageRecordType;
+  }
+  void FDDumpAllOldStructuredDataLogs() override { real->FDDumpAllOldStructuredDataLogs(); }
+  void rollFixlineLogs() override { real->rollFixlineLogs(); }
+  std::shared_ptr<CrashReporting> real;
+};
+
 // The day check as the program does it; returns what it said at error level.
 std::vector<std::string> dayCheck(const std::string& root) {
   const auto log = std::make_shared<fakes::FakeSystemLog>();
@@ -48,12 +98,23 @@ std::vector<std::string> dayCheck(const std::string& root) {
   {
     Platform services = makeHostPlatform(root, {.log = log});
     services.notifications = notifications;
+    services.logSubmission = std::make_shared<NotedSubmission>(services.logSubmission);
+    services.analyticsEvents = std::make_shared<NotedEvents>(services.analyticsEvents);
+    services.crashReporting = std::make_shared<NotedCrashReporting>(services.crashReporting);
     const PlatformScope scope(std::move(services));
     DailyJob job({
         .startListener = nullptr,
         .stopListener = nullptr,
-        .runTelemetrySweep = [] { runTelemetrySweep(programSweepCapabilities()); },
-        .updateTaskingState = updateTaskingState,
+        .runTelemetrySweep =
+            [] {
+              runTelemetrySweep(programSweepCapabilities());
+              acknowledged().swept = true;
+            },
+        .updateTaskingState =
+            [] {
+              updateTaskingState();
+              acknowledged().tasked = true;
+            },
     });
     const char* const arguments[] = {"tallyrun", "-d"};
     job.run(arguments);
@@ -120,6 +181,7 @@ Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
                          const std::string& folder) const {
   const std::string output = folder_ / "output", errors = folder_ / "errors";
   faultWasMet() = false;
+  acknowledged() = {};
   const pid_t child = ::fork();
   require(child >= 0, "no process");
   if (child == 0) {
@@ -127,8 +189,11 @@ Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
     ::dup2(::open(output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600), STDERR_FILENO);
     setClock(day * kSecondsPerDay + kSecondsPerDay / 2);
     std::ofstream(errors, std::ios::trunc).close();
+    const bool cut = fault != nullptr && fault->effect == Fault::Effect::PowerCut;
+    if (cut) followDisk(at(""), folder_ / "kept");
     if (fault != nullptr) arm(*fault, n, at(folder));
     const auto said = dayCheck(at(""));
+    if (cut) endWithPowerCut();
     disarm();
     std::ofstream list(errors);
     for (const std::string& line : said) list << line << '\n';
@@ -139,6 +204,7 @@ Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
   require(::waitpid(child, &status, 0) == child, "no child");
   Ending ending;
   ending.met = faultWasMet();
+  ending.acknowledged = acknowledged();
   ending.killed = WIFEXITED(status) && WEXITSTATUS(status) == kKilledStatus;
   ending.sound = ending.killed || (WIFEXITED(status) && WEXITSTATUS(status) == 0);
   std::ifstream list(errors);
@@ -173,7 +239,7 @@ std::vector<std::string> SampleDevice::files(std::string_view folder) const {
 std::string SampleDevice::copyOfStore() const {
   const std::string store = metricsStorePath(at("")), copy = folder_ / "copy";
   // Without the map of the log, which its next reader makes anew.
-  for (const char* suffix : {"", "-wal"}) {
+  for (const char* suffix : {"", "-wal", "-journal"}) {
     fs::remove(copy + suffix);
     if (fs::exists(store + suffix)) fs::copy_file(store + suffix, copy + suffix);
   }

@@ -18,6 +18,14 @@ constexpr std::int32_t kDay = FAULT_DAY;
 // The day that was processed last, long enough ago that the storage log is due again.
 constexpr std::int32_t kFormerRun = kDay - 9;
 constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
+// Of the structured data that a day has several records of.
+constexpr std::uint32_t kStorageRecordType = 176;
+
+// What services told the run that they had done.
+struct Acknowledged {
+  int logs = 0, records = 0, events = 0;
+  bool swept = false, tasked = false;
+};
 
 // How a run ended and what it complained of.
 struct Ending {
@@ -25,6 +33,7 @@ struct Ending {
   bool killed = false;  // by it
   bool sound = false;   // neither crashed nor ended by itself with an error
   std::vector<std::string> errors;
+  Acknowledged acknowledged;
 };
 
 class SampleDevice {

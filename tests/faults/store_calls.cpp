@@ -3,7 +3,10 @@
 
 #include <cerrno>
 #include <cstdlib>
+#include <filesystem>
+#include <utility>
 
+#include "faults/disk.h"
 #include "faults/fault.h"
 
 namespace tally::faults {
@@ -16,6 +19,7 @@ sqlite3_vfs* real() {
 
 struct WatchedFile : sqlite3_file {
   const char* path;  // null for a temporary file; SQLite keeps it until the file is closed
+  bool syncsName;    // with its first sync, as SQLite does for a journal that it makes
   sqlite3_file* inner() { return reinterpret_cast<sqlite3_file*>(this + 1); }
 };
 
@@ -31,6 +35,10 @@ bool fails(const char* call, const char* path, unsigned possible) {
   return path != nullptr && judge(call, path, possible) == Verdict::Fail;
 }
 
+std::string folderOf(const char* path) {
+  return std::filesystem::path(path).parent_path().native();
+}
+
 int read(sqlite3_file* file, void* bytes, int count, sqlite3_int64 offset) {
   if (fails("store: read", watched(file).path, kInputOutput)) return SQLITE_IOERR_READ;
   return forward(&sqlite3_io_methods::xRead, file, bytes, count, offset);
@@ -42,6 +50,7 @@ int write(sqlite3_file* file, const void* bytes, int count, sqlite3_int64 offset
                                        : judge("store: write", path,
                                                kNoSpace | kInputOutput | kLastCall | kHalfWrite);
   if (verdict == Verdict::Fail) return faultCode() == ENOSPC ? SQLITE_FULL : SQLITE_IOERR_WRITE;
+  if (path != nullptr) contentsChange(path);
   if (verdict == Verdict::KillHalfWay) {
     forward(&sqlite3_io_methods::xWrite, file, bytes, count / 2, offset);
     die();
@@ -53,6 +62,7 @@ int truncate(sqlite3_file* file, sqlite3_int64 size) {
   if (fails("store: truncate", watched(file).path, kInputOutput | kLastCall)) {
     return SQLITE_IOERR_TRUNCATE;
   }
+  if (watched(file).path != nullptr) contentsChange(watched(file).path);
   return forward(&sqlite3_io_methods::xTruncate, file, size);
 }
 
@@ -60,7 +70,12 @@ int sync(sqlite3_file* file, int flags) {
   if (fails("store: sync", watched(file).path, kNoSpace | kInputOutput | kLastCall)) {
     return SQLITE_IOERR_FSYNC;
   }
-  return forward(&sqlite3_io_methods::xSync, file, flags);
+  const int code = forward(&sqlite3_io_methods::xSync, file, flags);
+  WatchedFile& self = watched(file);
+  if (code != SQLITE_OK || self.path == nullptr) return code;
+  contentsSynced(self.path);
+  if (std::exchange(self.syncsName, false)) namesSynced(folderOf(self.path));
+  return code;
 }
 
 int size(sqlite3_file* file, sqlite3_int64* result) {
@@ -138,14 +153,22 @@ int open(sqlite3_vfs*, const char* path, sqlite3_file* file, int flags, int* ope
   }
   WatchedFile& self = watched(file);
   self.path = path;
+  constexpr int kJournals = SQLITE_OPEN_WAL | SQLITE_OPEN_MAIN_JOURNAL | SQLITE_OPEN_SUPER_JOURNAL;
+  self.syncsName = creates && (flags & kJournals) != 0;
+  const NameChange change(NameChange::Kind::Create, creates && path != nullptr ? path : "");
   const int code = real()->xOpen(real(), path, self.inner(), flags, opened);
+  change.done(code == SQLITE_OK ? 0 : -1);
   if (self.inner()->pMethods != nullptr) file->pMethods = &kMethods;
   return code;
 }
 
 int remove(sqlite3_vfs*, const char* path, int syncFolder) {
   if (fails("store: remove", path, kInputOutput | kDenied | kLastCall)) return SQLITE_IOERR_DELETE;
-  return real()->xDelete(real(), path, syncFolder);
+  const NameChange change(NameChange::Kind::Remove, path);
+  const int code = real()->xDelete(real(), path, syncFolder);
+  change.done(code == SQLITE_OK ? 0 : -1);
+  if (code == SQLITE_OK && syncFolder != 0) namesSynced(folderOf(path));
+  return code;
 }
 
 int access(sqlite3_vfs*, const char* path, int flags, int* result) {

@@ -68,9 +68,10 @@ TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {
   ASSERT_TRUE(append(172, 1));
   const std::string whole = get("data/0000000001-172.pending");
   EXPECT_EQ(wholeRecords(whole), whole.size());
-  for (const std::string_view torn :
-       {"0", "0000000099", "0000000099\nabc", "9999999999\n", "-000000001\n", "garbage garbage"}) {
-    EXPECT_EQ(wholeRecords(whole + std::string(torn)), whole.size()) << torn;
+  for (const std::string& torn : std::vector<std::string>{
+           "0", "0000000099", "0000000099\nabc", "9999999999\n", "-000000001\n", "garbage garbage",
+           "0000000003\n<" + std::string(1, '\0') + ">\n"}) {
+    EXPECT_EQ(wholeRecords(whole + torn), whole.size()) << torn;
   }
   for (std::size_t cut = 0; cut < whole.size(); ++cut) {
     EXPECT_EQ(wholeRecords(whole.substr(0, cut)), 0u) << cut;

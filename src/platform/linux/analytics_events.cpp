@@ -16,8 +16,10 @@ constexpr std::string_view kEntry = "AnalyticsEvents";
 constexpr std::string_view kName = "events.jsonl";
 constexpr std::size_t kLargestFile = 1u << 20;
 
-// The length of the whole lines that the bytes begin with.
+// The length of the whole lines that the bytes begin with. No line has a zero byte; zeros are what
+// a power cut leaves where bytes did not arrive.
 std::size_t wholeLines(std::string_view bytes) {
+  bytes = bytes.substr(0, bytes.find('\0'));
   const std::size_t last = bytes.rfind('\n');
   return last == std::string_view::npos ? 0 : last + 1;
 }

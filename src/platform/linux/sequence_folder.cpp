@@ -1,6 +1,7 @@
 #include "platform/linux/sequence_folder.h"
 
 #include <fmt/format.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -97,8 +98,13 @@ Status appendAt(const Directory& folder, std::string_view name, std::size_t end,
   const auto cutBack = [&] {
     return retried([&] { return ::ftruncate(file->get(), start); }) == 0;
   };
-  if (!cutBack() || !writeAllAt(file->get(), bytes, start) ||
-      retried([&] { return ::fdatasync(file->get()); }) != 0) {
+  const auto sync = [&] { return retried([&] { return ::fdatasync(file->get()); }) == 0; };
+  // What is cut off is off the disk before anything takes its place: a power cut could leave pieces
+  // of both, which together might pass for a record.
+  struct stat status {};
+  const bool ready =
+      ::fstat(file->get(), &status) == 0 && (status.st_size == start || (cutBack() && sync()));
+  if (!ready || !writeAllAt(file->get(), bytes, start) || !sync()) {
     const int code = errno;
     (void)cutBack();
     return Error{fmt::format("cannot append to {}: {}", folder.pathOf(name), std::strerror(code)),

@@ -62,6 +62,8 @@ Status rollLog(const Directory& folder, const std::vector<std::string>& names,
 }  // namespace
 
 std::size_t wholeRecords(std::string_view bytes) {
+  // No record has a zero byte. Zeros are what a power cut leaves where bytes did not arrive.
+  bytes = bytes.substr(0, bytes.find('\0'));
   std::size_t end = 0;
   while (const auto record = recordAt(bytes, end)) end += record->size() + kFrameBytes;
   return end;
@@ -149,9 +151,9 @@ Status StructuredDataFolder::finish(const Directory& folder, const std::string& 
   if (!bytes) return bytes.error();
   const auto records = KvArray::create();
   std::size_t dropped = 0;
-  for (std::size_t offset = 0; offset < bytes->size();) {
+  const std::size_t end = wholeRecords(*bytes);
+  for (std::size_t offset = 0; offset < end;) {
     const auto record = recordAt(*bytes, offset);
-    if (!record) break;
     if (const auto value = decodePlist(*record)) {
       records->append(*value);
     } else {
@@ -185,11 +187,14 @@ Status rollLogs(const DeviceDirectory& place) {
   const auto names = folder->list();
   if (!names) return names.error();
   Status status = Done{};
+  bool changed = false;
   for (const std::string& name : *names) {
     const auto identity = name.ends_with(".log") ? folder->identity(name) : std::nullopt;
     if (!identity || !identity->regular || identity->size == 0) continue;
     if (auto rolled = rollLog(*folder, *names, name); !rolled) status = rolled;
+    changed = true;
   }
+  if (changed && status) status = folder->sync();
   return status;
 }
 
