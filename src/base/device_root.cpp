@@ -3,6 +3,9 @@
 #include <cerrno>
 #include <deque>
 #include <filesystem>
+#include <mutex>
+#include <optional>
+#include <vector>
 
 namespace tally {
 namespace {
@@ -24,17 +27,20 @@ bool putFirst(std::deque<std::string>& components, std::string_view path, bool m
   return true;
 }
 
+Error noPath(std::string_view path) {
+  return {std::string(path) + " does not name a file of the device", EINVAL};
+}
+
 // The way down from the root. Directories on it stay open, since a link may lead up again.
 class Walk {
  public:
-  static Result<Walk> start(const std::string& prefix, std::string_view path) {
+  static Result<Walk> start(const Result<Directory>& root, std::string_view path) {
     std::deque<std::string> components;
     if (!putFirst(components, path, /*mayClimb=*/false)) {
-      return Error{std::string(path) + " does not name a file of the device", EINVAL};
+      return noPath(path);
     }
-    auto root = Directory::open(prefix.empty() ? "/" : prefix);
     if (!root) return root.error();
-    return Walk(*std::move(root), std::move(components));
+    return Walk(*root, std::move(components));
   }
 
   const Directory& here() const { return way_.back(); }
@@ -80,12 +86,45 @@ Result<Directory> enterExisting(const Directory& parent, const std::string& name
 
 }  // namespace
 
-DeviceRoot::DeviceRoot(std::string path) : prefix_(std::move(path)) {
+struct DeviceRoot::Opened {
+  std::mutex mutex;
+  std::optional<Directory> root;
+};
+
+DeviceRoot::DeviceRoot(std::string path)
+    : prefix_(std::move(path)), opened_(std::make_shared<Opened>()) {
   prefix_.resize(prefix_.find_last_not_of('/') + 1);
 }
 
+Result<Directory> DeviceRoot::openRoot() const {
+  const std::lock_guard lock(opened_->mutex);
+  if (opened_->root) return *opened_->root;
+  auto root = Directory::open(prefix_.empty() ? "/" : prefix_);
+  if (root) opened_->root = *root;
+  return root;
+}
+
+// In one call where there is no link on the way; else, and on kernels without that call, one
+// component at a time.
 Result<Directory> DeviceRoot::open(std::string_view path) const {
-  auto walk = Walk::start(prefix_, path);
+  std::deque<std::string> components;
+  if (!putFirst(components, path, /*mayClimb=*/false)) return noPath(path);
+  const auto root = openRoot();
+  if (!root) return root;
+  const std::string_view below = path.substr(std::min(path.find_first_not_of('/'), path.size()));
+  if (below.empty()) return root;
+  auto opened = root->openBelow(below);
+  if (opened) return opened;
+  const int code = opened.error().systemError;
+  if (code != ENOENT) return walk(path);
+  if (root->exists()) return opened;
+  const std::lock_guard lock(opened_->mutex);
+  opened_->root.reset();  // somebody has replaced it; the next use finds the new one
+  return opened;
+}
+
+Result<Directory> DeviceRoot::walk(std::string_view path) const {
+  auto walk = Walk::start(openRoot(), path);
   if (!walk) return walk.error();
   while (!walk->left().empty()) {
     if (auto stepped = walk->step(enterExisting); !stepped) return stepped.error();
@@ -95,6 +134,8 @@ Result<Directory> DeviceRoot::open(std::string_view path) const {
 
 Result<Directory> DeviceRoot::make(std::string_view path, unsigned mode) const {
   constexpr unsigned kParentMode = 0755;
+  auto existing = open(path);
+  if (existing || existing.error().systemError != ENOENT) return existing;
   if (!prefix_.empty()) {
     std::error_code failure;
     std::filesystem::create_directories(prefix_, failure);
@@ -102,7 +143,7 @@ Result<Directory> DeviceRoot::make(std::string_view path, unsigned mode) const {
       return Error{"cannot make directory " + prefix_ + ": " + failure.message(), failure.value()};
     }
   }
-  auto walk = Walk::start(prefix_, path);
+  auto walk = Walk::start(openRoot(), path);
   if (!walk) return walk.error();
   while (!walk->left().empty()) {
     const unsigned made = walk->left().size() == 1 ? mode : kParentMode;
@@ -116,11 +157,19 @@ Result<Directory> DeviceRoot::make(std::string_view path, unsigned mode) const {
   return walk->here();
 }
 
-Result<DeviceRoot::Location> DeviceRoot::locate(std::string_view path) const {
+Result<DeviceRoot::Location> DeviceRoot::locate(std::string_view path, bool followsLinks) const {
   if (!path.starts_with('/')) {
     return Error{std::string(path) + " is not an absolute path of the device", EINVAL};
   }
-  auto walk = Walk::start(prefix_, path);
+  // A last component that is a link shows itself when it is opened, so that this is asked for then.
+  const std::size_t slash = path.rfind('/');
+  const std::string_view name = path.substr(slash + 1);
+  if (!followsLinks && !name.empty() && name != "." && name != "..") {
+    const auto directory = open(path.substr(0, slash));
+    if (!directory) return directory.error();
+    return Location{*directory, std::string(name)};
+  }
+  auto walk = Walk::start(openRoot(), path);
   if (!walk) return walk.error();
   while (!walk->left().empty()) {
     if (walk->left().size() == 1 && walk->left().front() != "..") {
@@ -133,13 +182,20 @@ Result<DeviceRoot::Location> DeviceRoot::locate(std::string_view path) const {
 }
 
 Result<std::string> DeviceRoot::readFile(std::string_view path, std::size_t limit) const {
-  const auto location = locate(path);
-  if (!location) return location.error();
-  return location->directory.readFile(location->name, limit);
+  const auto direct = locate(path, /*followsLinks=*/false);
+  if (!direct) return direct.error();
+  auto content = direct->directory.readFile(direct->name, limit);
+  if (content || content.error().systemError != ELOOP) return content;
+  const auto target = locate(path, /*followsLinks=*/true);
+  if (!target) return target.error();
+  return target->directory.readFile(target->name, limit);
 }
 
 std::optional<FileIdentity> DeviceRoot::identity(std::string_view path) const {
-  const auto location = locate(path);
+  auto location = locate(path, /*followsLinks=*/false);
+  auto identity = location ? location->directory.identity(location->name) : std::nullopt;
+  if (!identity || identity->regular) return identity;
+  location = locate(path, /*followsLinks=*/true);
   return location ? location->directory.identity(location->name) : std::nullopt;
 }
 

@@ -1,6 +1,7 @@
 // The device root: where every path of the device begins, and the walk down from it.
 #pragma once
 
+#include <memory>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -35,9 +36,14 @@ class DeviceRoot {
     Directory directory;
     std::string name;
   };
-  Result<Location> locate(std::string_view path) const;
+  struct Opened;
+  Result<Directory> openRoot() const;
+  Result<Directory> walk(std::string_view path) const;
+  // followsLinks: for the last component; on the way they always are.
+  Result<Location> locate(std::string_view path, bool followsLinks) const;
 
   std::string prefix_;
+  std::shared_ptr<Opened> opened_;  // the root once it was found, shared by copies
 };
 
 // A directory of a device, opened anew whenever it is needed.

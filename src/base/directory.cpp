@@ -3,8 +3,10 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <limits.h>
+#include <linux/openat2.h>
 #include <sys/stat.h>
 #include <sys/statvfs.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -25,12 +27,6 @@ bool isTrusted(uid_t user) { return user == 0 || user == ::geteuid(); }
 
 bool writableByOthers(const struct stat& directory) {
   return !isTrusted(directory.st_uid) || (directory.st_mode & (S_IWGRP | S_IWOTH)) != 0;
-}
-
-DirectoryTrust trustOf(const struct stat& directory, DirectoryTrust above) {
-  if (writableByOthers(directory)) above.exclusive = false;
-  if (!isTrusted(directory.st_uid)) above.user = directory.st_uid;
-  return above;
 }
 
 // Opens a directory; one that may be passed through but not listed still leads to its files.
@@ -64,22 +60,46 @@ int Descriptor::close() {
   return descriptor >= 0 ? ::close(descriptor) : 0;
 }
 
-Directory::Directory(Descriptor descriptor, std::string path, DirectoryTrust above)
+Directory::Directory(Descriptor descriptor, std::string path, const Directory* root)
     : descriptor_(std::make_shared<Descriptor>(std::move(descriptor))), path_(std::move(path)) {
   struct stat status {};
+  // One that cannot be examined belongs to nobody, so nothing is given away there.
   if (::fstat(descriptor_->get(), &status) == 0) {
-    trust_ = trustOf(status, above);
     owner_ = status.st_uid;
     group_ = status.st_gid;
-  } else {
-    trust_.exclusive = false;
   }
+  root_ = root != nullptr ? root->root_ : Place{status.st_dev, status.st_ino};
+}
+
+Directory::Trust Directory::trust() const {
+  constexpr int kDeepest = 256;
+  Trust trust;
+  Descriptor above;
+  int here = descriptor();
+  for (int depth = 0; depth < kDeepest; ++depth) {
+    struct stat status {};
+    if (::fstat(here, &status) != 0) break;
+    if (writableByOthers(status)) trust.exclusive = false;
+    if (!trust.user && !isTrusted(status.st_uid)) trust.user = status.st_uid;
+    if (Place{status.st_dev, status.st_ino} == root_) return trust;
+    above = Descriptor(retried(
+        [&] { return ::openat(here, "..", O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC); }));
+    if (!above) break;
+    here = above.get();
+  }
+  trust.exclusive = false;  // the way up does not lead to the root
+  return trust;
+}
+
+bool Directory::exists() const {
+  struct stat status {};
+  return ::fstat(descriptor(), &status) == 0 && status.st_nlink > 0;
 }
 
 Result<Directory> Directory::open(const std::string& path) {
   Descriptor descriptor(openDirectoryAt(AT_FDCWD, path.c_str(), 0));
   if (!descriptor) return systemError("cannot open", path);
-  return Directory(std::move(descriptor), path, {});
+  return Directory(std::move(descriptor), path, nullptr);
 }
 
 std::string Directory::pathOf(std::string_view name) const {
@@ -89,7 +109,7 @@ std::string Directory::pathOf(std::string_view name) const {
 Result<Directory> Directory::openDirectory(std::string_view name) const {
   const std::string path = pathOf(name);
   Descriptor opened(openDirectoryAt(descriptor(), std::string(name).c_str(), O_NOFOLLOW));
-  if (opened) return Directory(std::move(opened), path, trust_);
+  if (opened) return Directory(std::move(opened), path, this);
   int code = errno;
   struct stat status {};
   // The kernel calls a link no directory.
@@ -100,6 +120,17 @@ Result<Directory> Directory::openDirectory(std::string_view name) const {
   }
   if (code == ELOOP) return Error{path + " is a symbolic link, which is not followed", ELOOP};
   return systemError("cannot open", path, code);
+}
+
+Result<Directory> Directory::openBelow(std::string_view path) const {
+  open_how how{};
+  how.flags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS;
+  const std::string text(path);
+  Descriptor opened(static_cast<int>(retried(
+      [&] { return ::syscall(SYS_openat2, descriptor(), text.c_str(), &how, sizeof how); })));
+  if (!opened) return systemError("cannot open", pathOf(path));
+  return Directory(std::move(opened), pathOf(path), this);
 }
 
 // By the descriptor, since the directory's owner may have put something else at the name by now.
@@ -125,7 +156,6 @@ Result<Directory> Directory::makeDirectory(std::string_view name, unsigned mode)
     giveToOwner(made->descriptor(), status);
     made->owner_ = owner_;
     made->group_ = group_;
-    made->trust_ = trust_;
   }
   if (auto synced = sync(); !synced) return synced.error();
   return made;
@@ -135,11 +165,14 @@ Status Directory::check(int file, std::string_view name) const {
   struct stat status {};
   if (::fstat(file, &status) != 0) return systemError("cannot examine", pathOf(name));
   if (!S_ISREG(status.st_mode)) return Error{pathOf(name) + " is not a regular file"};
-  if (trust_.exclusive) return Done{};
-  if (status.st_nlink != 1) {
+  const bool single = status.st_nlink == 1;
+  if (single && (isTrusted(status.st_uid) || status.st_uid == owner_)) return Done{};
+  const Trust here = trust();
+  if (here.exclusive) return Done{};
+  if (!single) {
     return Error{pathOf(name) + " has more than one name, so it may be a foreign file", EMLINK};
   }
-  if (!isTrusted(status.st_uid) && status.st_uid != trust_.user) {
+  if (status.st_uid != here.user) {
     return Error{pathOf(name) + " belongs to user " + std::to_string(status.st_uid), EPERM};
   }
   return Done{};
@@ -193,11 +226,10 @@ std::optional<FileIdentity> Directory::identity(std::string_view name) const {
 }
 
 std::optional<std::string> Directory::trustedLink(std::string_view name) const {
-  if (!trust_.exclusive) return std::nullopt;
   struct stat status {};
   const std::string text(name);
   if (::fstatat(descriptor(), text.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0 ||
-      !S_ISLNK(status.st_mode) || !isTrusted(status.st_uid)) {
+      !S_ISLNK(status.st_mode) || !isTrusted(status.st_uid) || !trust().exclusive) {
     return std::nullopt;
   }
   char target[PATH_MAX];

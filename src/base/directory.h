@@ -31,28 +31,22 @@ struct FileIdentity {
   bool operator==(const FileIdentity&) const = default;
 };
 
-// Who may change what is reached through a directory.
-struct DirectoryTrust {
-  // Only root and the program's own user can write the directory and those above it, up to the
-  // device root.
-  bool exclusive = true;
-  // The user in whose directory it lies, where another user's directory is on the way to it.
-  std::optional<uid_t> user;
-};
-
 // Copies share one descriptor. Errors name the path, for people alone.
 class Directory {
  public:
-  // Opens a path that the caller chose, links included.
+  // Opens a path that the caller chose, links included. It is the device root of what is opened
+  // through it.
   static Result<Directory> open(const std::string& path);
 
   const std::string& path() const { return path_; }
   std::string pathOf(std::string_view name) const;
   int descriptor() const { return descriptor_->get(); }
-  const DirectoryTrust& trust() const { return trust_; }
+  // Whether it still has a name.
+  bool exists() const;
 
-  // The directory at a name. An error (ELOOP) when a link is there.
+  // The directory at a name, or at a path of several. An error (ELOOP) when there is a link on it.
   Result<Directory> openDirectory(std::string_view name) const;
+  Result<Directory> openBelow(std::string_view path) const;
   // The same, made durably when it is missing. What root makes in the directory of another user
   // belongs to that user, who could not read it otherwise: directories and files alike.
   Result<Directory> makeDirectory(std::string_view name, unsigned mode = 0755) const;
@@ -84,13 +78,27 @@ class Directory {
   std::optional<std::uint64_t> freeSpace() const;
 
  private:
-  Directory(Descriptor descriptor, std::string path, DirectoryTrust above);
+  struct Place {
+    std::uint64_t device = 0, inode = 0;
+    bool operator==(const Place&) const = default;
+  };
+  // Who may change what is reached through the directory.
+  struct Trust {
+    // Only root and the program's own user can write it and those above it, up to the device root.
+    bool exclusive = true;
+    // The other user in whose directory it lies.
+    std::optional<uid_t> user;
+  };
+  // Without a root, the directory is one.
+  Directory(Descriptor descriptor, std::string path, const Directory* root);
   Result<Descriptor> openFile(std::string_view name, int flags) const;
   void giveToOwner(int descriptor, const struct stat& made) const;
+  // Looks at the directories above, so it is asked for only where something is unusual.
+  Trust trust() const;
 
   std::shared_ptr<Descriptor> descriptor_;
   std::string path_;
-  DirectoryTrust trust_;
+  Place root_;
   uid_t owner_ = 0;
   gid_t group_ = 0;
 };

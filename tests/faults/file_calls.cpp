@@ -93,6 +93,7 @@ using namespace tally::faults;
 extern "C" {
 
 int __real_openat(int, const char*, int, ...);
+long __real_syscall(long, ...);
 int __real_close(int);
 ssize_t __real_read(int, void*, size_t);
 ssize_t __real_write(int, const void*, size_t);
@@ -125,6 +126,15 @@ int __wrap_openat(int directory, const char* name, int flags, ...) {
   const NameChange change(NameChange::Kind::Create, creates ? path : "");
   const int file = change.done(__real_openat(directory, name, flags, mode));
   if (file >= 0) openFile(file) = {path, (flags & O_ACCMODE) != O_RDONLY};
+  return file;
+}
+
+// The one call that the system library has no name for.
+long __wrap_syscall(long number, int directory, const char* name, const void* how, size_t size) {
+  const std::string path = pathAt(directory, name);
+  if (fails("open", path, entered.insert(path).second ? kDenied : 0)) return -1;
+  const long file = __real_syscall(number, directory, name, how, size);
+  if (file >= 0) openFile(static_cast<int>(file)) = {path, false};
   return file;
 }
 

@@ -82,22 +82,24 @@ PropertyListPreferences::Domain* PropertyListPreferences::find(std::string_view 
   return &domains_.try_emplace(std::string(domain)).first->second;
 }
 
-// One look at the file's identity instead of reading it again.
+// One look at the file's identity, without walking to it and reading it again.
 void PropertyListPreferences::refresh(Domain& state, std::string_view domain) {
-  if (state.read && folder_.identity(fileNameOf(domain)) == state.identity) return;
+  if (state.read && opened_ && opened_->identity(fileNameOf(domain)) == state.identity) return;
   reload(state, domain, nullptr);
 }
 
 void PropertyListPreferences::reload(Domain& state, std::string_view domain,
                                      const Directory* locked) {
   const std::string name = fileNameOf(domain);
+  auto folder = locked != nullptr ? Result<Directory>(*locked) : folder_.open();
+  opened_ = folder ? std::optional(*folder) : std::nullopt;
   // Taken first: should the file be replaced meanwhile, the next look reads it again.
-  const auto identity = locked != nullptr ? locked->identity(name) : folder_.identity(name);
+  const auto identity = folder ? folder->identity(name) : std::nullopt;
   const bool seen = state.read && identity == state.identity;
   state.read = true;
   state.identity = identity;
-  const auto document = locked != nullptr ? locked->readFile(name, kPlistMaximumBytes)
-                                          : folder_.readFile(name, kPlistMaximumBytes);
+  const auto document =
+      folder ? folder->readFile(name, kPlistMaximumBytes) : Result<std::string>(folder.error());
   if (document) {
     auto root = decodePlist(*document);
     auto* const dictionary = root ? kvCast<KvDictionary>(root->get()) : nullptr;

@@ -67,7 +67,8 @@ class PropertyListPreferences final : public Preferences {
   std::shared_ptr<SystemLog> log_;
   unsigned mode_;
   Access access_;
-  std::mutex mutex_;  // of all below
+  std::mutex mutex_;                 // of all below
+  std::optional<Directory> opened_;  // as the last reload found it
   bool swept_ = false;
   std::map<std::string, Domain, std::less<>> domains_;
 };
