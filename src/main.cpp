@@ -3,6 +3,7 @@
 
 #include <span>
 
+#include "base/process.h"
 #include "driver/app_info_listener.h"
 #include "driver/daily_job.h"
 #include "driver/tasking.h"
@@ -12,6 +13,7 @@
 #include "platform/platform.h"
 
 int main(int count, char** arguments) {
+  tally::surviveFailedWrites();
   // A run is short: memory that it gave back to the kernel it would soon ask for again, at the
   // price of a fault for each page.
   constexpr int kKeptBytes = 64 << 20;

@@ -1,6 +1,7 @@
 // tallyctl: the operator's tool.
 #include <span>
 
+#include "base/process.h"
 #include "host_platform.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/tool.h"
@@ -8,6 +9,7 @@
 
 int main(int count, char** arguments) {
   using namespace tally;
+  surviveFailedWrites();
   tools::ToolContext context;
   context.root = deviceRootFromEnvironment();
   context.output = terminalOf(1);

@@ -3,12 +3,18 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 
 namespace tally {
 
 std::string programName() { return ::program_invocation_short_name; }
 
 int processID() { return ::getpid(); }
+
+void surviveFailedWrites() {
+  std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
+}
 
 std::ptrdiff_t writeOnce(int descriptor, std::string_view bytes) {
   return ::write(descriptor, bytes.data(), bytes.size());

@@ -142,7 +142,7 @@ class Spool(DeviceTest):
         device = self.simple()
         device.write(SPOOL, b"a file in the folder's place")
         messages = device.run("-d")
-        self.assertEqual(texts(messages, "error")[-1], "Failed to write tallyd log")
+        self.assertIn("Failed to write tallyd log", texts(messages, "error"))
         self.assertEqual((device.root / SPOOL).read_bytes(), b"a file in the folder's place")
         self.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
 
@@ -211,6 +211,30 @@ class Rivals(DeviceTest):
         with sqlite3.connect(device.root / STORE) as database:
             self.assertEqual(database.execute("PRAGMA integrity_check").fetchone(), ("ok",))
         database.close()
+
+    def test_writes_that_fail_end_nothing(self):
+        def limited(size):
+            return lambda device: subprocess.Popen(
+                ["prlimit", f"--fsize={size}", *device.command("-d")], stderr=subprocess.PIPE,
+                env=device.environment(TODAY))
+
+        def closed_pipe(device):
+            run = device.start("-d")
+            run.stderr.close()
+            return run
+
+        for name, start in {"a closed pipe": closed_pipe, "no bytes": limited(0),
+                            "a page": limited(1 << 12), "some pages": limited(1 << 14)}.items():
+            with self.subTest(name):
+                device = self.simple()
+                run = start(device)
+                if not run.stderr.closed:
+                    self.assertTrue(texts(parse_messages(run.stderr.read()), "error"))
+                    run.stderr.close()
+                self.assertEqual(run.wait(timeout=120), 0)
+                messages = device.run("-d", day=TODAY + 1)
+                self.assertEqual(texts(messages, "error"), [])
+                self.assertIn(TODAY, self.logged_days(device))
 
     def test_a_terminated_wait_ends_in_order(self):
         device = self.simple()

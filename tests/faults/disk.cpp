@@ -141,20 +141,21 @@ void namesSynced(const std::string& directory) {
 }
 
 void cutPower(Loss loss, unsigned seed) {
+  const Disk left = *std::exchange(disk, nullptr);  // what is done here is no longer followed
   Random random(seed);
-  for (const auto& [inode, contents] : std::exchange(disk->contents, {})) {
+  for (const auto& [inode, contents] : left.contents) {
     if (!contents.changed) continue;
     const std::string bytes = arrived(contents, loss, random);
     require(::ftruncate(contents.file, 0) == 0 &&
             ::pwrite(contents.file, bytes.data(), bytes.size(), 0) == std::ssize(bytes));
   }
-  for (const auto& [directory, changes] : std::exchange(disk->names, {})) {
+  for (const auto& [directory, changes] : left.names) {
     const std::size_t arrive = loss == Loss::Everything ? 0
                                : loss == Loss::Contents ? changes.size()
                                                         : random() % (changes.size() + 1);
     for (std::size_t i = changes.size(); i > arrive; --i) undo(directory, changes[i - 1]);
   }
-  fs::remove_all(disk->kept);
+  fs::remove_all(left.kept);
 }
 
 }  // namespace tally::faults

@@ -28,6 +28,10 @@ Notes& notes() {
 
 }  // namespace
 
+bool memoryRunsOut(const char* call) {
+  return armed != nullptr && judge(call, watched, kNoMemory) == Verdict::Fail;
+}
+
 void arm(const Fault& fault, long n, const std::string& folder) {
   armed = &fault;
   forgetDirectories();

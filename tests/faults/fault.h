@@ -1,8 +1,9 @@
 // One fault in one run: which call of those below a folder fails, or is the run's last.
 //
 // The calls are those of the program's own objects, which the linker leads here first
-// (file_calls.cpp), and SQLite's, by a file system that stands before its own (store_calls.cpp). So
-// the program is tested as it is: it has no seam for this, and no call can be made around it.
+// (file_calls.cpp), and SQLite's, by a file system that stands before its own (store_calls.cpp);
+// its allocations, and those of SQLite, are the test's (memory_calls.cpp). So the program is tested
+// as it is: it has no seam for this, and no call can be made around it.
 #pragma once
 
 #include <string>
@@ -17,6 +18,7 @@ constexpr unsigned kNoSpace = 1, kInputOutput = 2, kDenied = 4, kInterrupted = 8
 constexpr unsigned kLastCall = 16;   // it changes something, so it matters whether it is still made
 constexpr unsigned kHalfWrite = 32;  // only half of its bytes may get there before the run ends
 constexpr unsigned kShortWrite = 64;  // it may take half of its bytes and say so
+constexpr unsigned kNoMemory = 128;   // it is no call on a file, but asks for memory
 
 struct Fault {
   enum class Effect { Fail, Kill, KillHalfWay, WriteHalf, PowerCut };
@@ -24,6 +26,7 @@ struct Fault {
   Effect effect;
   unsigned possible;             // where: the calls of which this is true are counted
   int code = 0;                  // with which errno a call fails
+  long stride = 1;               // from one call that meets it to the next
   bool lasts = false;            // whether the calls after it fail like it
   Loss loss = Loss::Everything;  // of a power cut
   // The run must not so much as notice.
@@ -48,6 +51,8 @@ std::string describeCall();
 enum class Verdict { Go, Fail, WriteHalf, KillHalfWay };
 // Asked at each call; does not return when the run ends before it.
 Verdict judge(const char* call, std::string_view path, unsigned possible);
+// Asked at each allocation.
+bool memoryRunsOut(const char* call);
 // For a half write that is the run's last call.
 [[noreturn]] void die();
 // errno of the armed fault.

@@ -34,21 +34,24 @@ namespace {
 namespace fs = std::filesystem;
 using Effect = Fault::Effect;
 
+// What lasts meets most calls many times, so that every third start will do.
 const Fault kFaults[] = {
     {"NoSpace", Effect::Fail, kNoSpace, ENOSPC},
-    {"NoSpaceFromThere", Effect::Fail, kNoSpace, ENOSPC, true},
+    {"NoSpaceFromThere", Effect::Fail, kNoSpace, ENOSPC, 3, true},
     {"InputOutput", Effect::Fail, kInputOutput, EIO},
-    {"InputOutputFromThere", Effect::Fail, kInputOutput, EIO, true},
+    {"InputOutputFromThere", Effect::Fail, kInputOutput, EIO, 3, true},
     {"Denied", Effect::Fail, kDenied, EACCES},
-    {"DeniedFromThere", Effect::Fail, kDenied, EACCES, true},
+    {"DeniedFromThere", Effect::Fail, kDenied, EACCES, 3, true},
     // Killed right after a call is killed before the next: between two calls nothing changes.
     {"Killed", Effect::Kill, kLastCall},
     {"KilledHalfWay", Effect::KillHalfWay, kHalfWrite},
     {"PowerCut", Effect::PowerCut, kLastCall},
-    {"PowerCutAfterNames", Effect::PowerCut, kLastCall, 0, false, Loss::Contents},
-    {"PowerCutAtRandom", Effect::PowerCut, kLastCall, 0, false, Loss::AtRandom},
+    {"PowerCutAfterNames", Effect::PowerCut, kLastCall, 0, 1, false, Loss::Contents},
+    {"PowerCutAtRandom", Effect::PowerCut, kLastCall, 0, 1, false, Loss::AtRandom},
     {"Interrupted", Effect::Fail, kInterrupted, EINTR},
     {"HalfWritten", Effect::WriteHalf, kShortWrite},
+    // A run allocates some ten thousand times; a prime, so as not to keep step with any loop.
+    {"OutOfMemory", Effect::Fail, kNoMemory, ENOMEM, 311},
 };
 
 struct Scenario {
@@ -339,8 +342,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
   // How many points were tried.
   long walk() {
     constexpr int kFailuresShown = 3;
-    // What lasts meets most calls many times, so that every third start will do.
-    const long stride = FAULT_STRIDE * (fault().lasts ? 3 : 1);
+    const long stride = FAULT_STRIDE * fault().stride;
     long tried = 0;
     int failures = 0;
     for (long point = 1; tryPoint(point); point += stride) {
@@ -370,3 +372,10 @@ INSTANTIATE_TEST_SUITE_P(, FaultWalk, testing::ValuesIn(kFaults),
 
 }  // namespace
 }  // namespace tally::faults
+
+// An exception ends a child as it ends the program, without anybody to catch it on its way.
+int main(int count, char** arguments) {
+  testing::InitGoogleTest(&count, arguments);
+  GTEST_FLAG_SET(catch_exceptions, false);
+  return RUN_ALL_TESTS();
+}

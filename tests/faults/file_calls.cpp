@@ -3,6 +3,7 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/mman.h>
 #include <sys/stat.h>
 #include <time.h>
 #include <unistd.h>
@@ -108,6 +109,7 @@ int __real_renameat(int, const char*, int, const char*);
 int __real_unlinkat(int, const char*, int);
 int __real_mkdirat(int, const char*, mode_t);
 DIR* __real_fdopendir(int);
+void* __real_mmap(void*, size_t, int, int, int, off_t);
 int __real_clock_gettime(clockid_t, timespec*);
 
 int __wrap_openat(int directory, const char* name, int flags, ...) {
@@ -209,6 +211,12 @@ int __wrap_mkdirat(int directory, const char* name, mode_t mode) {
 DIR* __wrap_fdopendir(int directory) {
   if (fails("list", openFile(directory).path, kInputOutput | kDenied)) return nullptr;
   return __real_fdopendir(directory);
+}
+
+void* __wrap_mmap(void* place, size_t size, int access, int flags, int file, off_t offset) {
+  if (!memoryRunsOut("mmap")) return __real_mmap(place, size, access, flags, file, offset);
+  errno = ENOMEM;
+  return MAP_FAILED;
 }
 
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {

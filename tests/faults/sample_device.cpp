@@ -4,9 +4,11 @@
 #include <fmt/format.h>
 #include <fmt/ranges.h>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstdlib>
 #include <fstream>
 #include <memory>
@@ -185,6 +187,8 @@ Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
   const pid_t child = ::fork();
   require(child >= 0, "no process");
   if (child == 0) {
+    constexpr rlimit kNoCore{0, 0};
+    ::setrlimit(RLIMIT_CORE, &kNoCore);
     // What the storage library says on standard error; a sanitizer's report, too.
     ::dup2(::open(output.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600), STDERR_FILENO);
     setClock(day * kSecondsPerDay + kSecondsPerDay / 2);
@@ -205,7 +209,10 @@ Ending SampleDevice::run(std::int32_t day, const Fault* fault, long n,
   Ending ending;
   ending.met = faultWasMet();
   ending.acknowledged = acknowledged();
-  ending.killed = WIFEXITED(status) && WEXITSTATUS(status) == kKilledStatus;
+  // A program that has no memory may end at once.
+  ending.killed = (WIFEXITED(status) && WEXITSTATUS(status) == kKilledStatus) ||
+                  (ending.met && fault->possible == kNoMemory && WIFSIGNALED(status) &&
+                   WTERMSIG(status) == SIGABRT);
   ending.sound = ending.killed || (WIFEXITED(status) && WEXITSTATUS(status) == 0);
   std::ifstream list(errors);
   for (std::string line; std::getline(list, line);) ending.errors.push_back(line);

@@ -31,12 +31,19 @@ int forward(Call sqlite3_io_methods::*method, sqlite3_file* file, Arguments... a
   return (inner->pMethods->*method)(inner, arguments...);
 }
 
+// Names of a store lead through the descriptor of its directory.
+std::string realPath(const char* name) {
+  const std::filesystem::path path(name), folder = path.parent_path();
+  if (!folder.native().starts_with("/proc/self/fd/")) return name;
+  return std::filesystem::read_symlink(folder) / path.filename();
+}
+
 bool fails(const char* call, const char* path, unsigned possible) {
-  return path != nullptr && judge(call, path, possible) == Verdict::Fail;
+  return path != nullptr && judge(call, realPath(path), possible) == Verdict::Fail;
 }
 
 std::string folderOf(const char* path) {
-  return std::filesystem::path(path).parent_path().native();
+  return std::filesystem::path(realPath(path)).parent_path().native();
 }
 
 int read(sqlite3_file* file, void* bytes, int count, sqlite3_int64 offset) {
@@ -47,10 +54,10 @@ int read(sqlite3_file* file, void* bytes, int count, sqlite3_int64 offset) {
 int write(sqlite3_file* file, const void* bytes, int count, sqlite3_int64 offset) {
   const char* const path = watched(file).path;
   const auto verdict = path == nullptr ? Verdict::Go
-                                       : judge("store: write", path,
+                                       : judge("store: write", realPath(path),
                                                kNoSpace | kInputOutput | kLastCall | kHalfWrite);
   if (verdict == Verdict::Fail) return faultCode() == ENOSPC ? SQLITE_FULL : SQLITE_IOERR_WRITE;
-  if (path != nullptr) contentsChange(path);
+  if (path != nullptr) contentsChange(realPath(path));
   if (verdict == Verdict::KillHalfWay) {
     forward(&sqlite3_io_methods::xWrite, file, bytes, count / 2, offset);
     die();
@@ -62,7 +69,7 @@ int truncate(sqlite3_file* file, sqlite3_int64 size) {
   if (fails("store: truncate", watched(file).path, kInputOutput | kLastCall)) {
     return SQLITE_IOERR_TRUNCATE;
   }
-  if (watched(file).path != nullptr) contentsChange(watched(file).path);
+  if (watched(file).path != nullptr) contentsChange(realPath(watched(file).path));
   return forward(&sqlite3_io_methods::xTruncate, file, size);
 }
 
@@ -73,7 +80,7 @@ int sync(sqlite3_file* file, int flags) {
   const int code = forward(&sqlite3_io_methods::xSync, file, flags);
   WatchedFile& self = watched(file);
   if (code != SQLITE_OK || self.path == nullptr) return code;
-  contentsSynced(self.path);
+  contentsSynced(realPath(self.path));
   if (std::exchange(self.syncsName, false)) namesSynced(folderOf(self.path));
   return code;
 }
@@ -155,7 +162,8 @@ int open(sqlite3_vfs*, const char* path, sqlite3_file* file, int flags, int* ope
   self.path = path;
   constexpr int kJournals = SQLITE_OPEN_WAL | SQLITE_OPEN_MAIN_JOURNAL | SQLITE_OPEN_SUPER_JOURNAL;
   self.syncsName = creates && (flags & kJournals) != 0;
-  const NameChange change(NameChange::Kind::Create, creates && path != nullptr ? path : "");
+  const NameChange change(NameChange::Kind::Create,
+                          creates && path != nullptr ? realPath(path) : "");
   const int code = real()->xOpen(real(), path, self.inner(), flags, opened);
   change.done(code == SQLITE_OK ? 0 : -1);
   if (self.inner()->pMethods != nullptr) file->pMethods = &kMethods;
@@ -164,7 +172,7 @@ int open(sqlite3_vfs*, const char* path, sqlite3_file* file, int flags, int* ope
 
 int remove(sqlite3_vfs*, const char* path, int syncFolder) {
   if (fails("store: remove", path, kInputOutput | kDenied | kLastCall)) return SQLITE_IOERR_DELETE;
-  const NameChange change(NameChange::Kind::Remove, path);
+  const NameChange change(NameChange::Kind::Remove, realPath(path));
   const int code = real()->xDelete(real(), path, syncFolder);
   change.done(code == SQLITE_OK ? 0 : -1);
   if (code == SQLITE_OK && syncFolder != 0) namesSynced(folderOf(path));
@@ -176,9 +184,24 @@ int access(sqlite3_vfs*, const char* path, int flags, int* result) {
   return real()->xAccess(real(), path, flags, result);
 }
 
+// Before SQLite is used for the first time.
+void watchStoreMemory() {
+  static sqlite3_mem_methods memory;
+  if (::sqlite3_config(SQLITE_CONFIG_GETMALLOC, &memory) != SQLITE_OK) std::abort();
+  static const sqlite3_mem_methods system = memory;
+  memory.xMalloc = [](int bytes) {
+    return memoryRunsOut("store: allocation") ? nullptr : system.xMalloc(bytes);
+  };
+  memory.xRealloc = [](void* old, int bytes) {
+    return memoryRunsOut("store: allocation") ? nullptr : system.xRealloc(old, bytes);
+  };
+  if (::sqlite3_config(SQLITE_CONFIG_MALLOC, &memory) != SQLITE_OK) std::abort();
+}
+
 }  // namespace
 
 void watchStore() {
+  watchStoreMemory();
   static sqlite3_vfs watching = *real();
   watching.zName = "watched";
   watching.szOsFile = static_cast<int>(sizeof(WatchedFile)) + real()->szOsFile;
