@@ -25,6 +25,14 @@ class Elements {
     std::memcpy(bytes_.data() + index * element::kSize + element::slot(number), &value,
                 sizeof(value));
   }
+  // All slots of all elements: a run may have more of them than a 16-bit count tells.
+  void invalidate() {
+    for (std::size_t index = 0; index < bytes_.size() / element::kSize; ++index) {
+      for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
+        setSlot(index, slot, kHwReportInvalidValue);
+      }
+    }
+  }
   void storeIn(KvDictionary& channel, KvArena* arena) const {
     channel.set(keys().rawElements, KvData::create(bytes_, arena));
   }
@@ -51,11 +59,7 @@ bool subtractSimple(const Pair& pair, OtherSlots others) {
   if (!isValid(laterBits) || !isValid(earlierBits)) return false;
   const auto* const basis = pair.earlier->getAs<KvData>(*keys().rawElements);
   Elements elements(basis->bytes());
-  if (others == OtherSlots::Invalidate) {
-    for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
-      elements.setSlot(0, slot, kHwReportInvalidValue);
-    }
-  }
+  if (others == OtherSlots::Invalidate) elements.invalidate();
   elements.setSlot(0, simple_slot::kValue, laterBits - earlierBits);
   elements.storeIn(*pair.result, pair.arena);
   return true;

@@ -53,7 +53,7 @@ std::string_view SnapshotDescription::parseFields(std::span<const std::byte> blo
   const auto count = reader.read<std::uint32_t>(tableOffset);
   if (!count || !reader.has(tableOffset, kTableHeaderBytes)) return "its table lies outside";
   if (*count == 0) return "it describes no field";
-  if (*count > kMostFields) return "it describes more fields than a record can have";
+  if (*count > kMostFields) return "it describes more than the 256 fields that are read";
   fieldCount_ = 0;
   for (std::size_t i = 0; i < *count; ++i) {
     const auto descriptor = reader.slice(

@@ -21,8 +21,8 @@ struct SnapshotField {
   LabelFormat label;
 };
 
-// A block that can be honoured in full. It borrows the block, and lives on the stack: no more
-// fields are taken than any record has.
+// A block that can be honoured in full. It borrows the block, and lives on the stack, which is why
+// the fields have a bound.
 class SnapshotDescription {
  public:
   static constexpr std::size_t kMostFields = 256;

@@ -102,7 +102,9 @@ int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_
   for (std::size_t at = 0; at < reader.size();) {
     const std::uint32_t key = reader.read<std::uint32_t>(at).value_or(0);
     const std::uint32_t count = reader.read<std::uint32_t>(at + kCountOffset).value_or(0);
-    const auto values = reader.slice(at + kUnit, count * kUnit);
+    // Compared in units: in bytes the product would wrap where sizes have 32 bits.
+    const std::size_t unitsLeft = (reader.size() - at) / kUnit - 1;
+    const auto values = count <= unitsLeft ? reader.slice(at + kUnit, count * kUnit) : std::nullopt;
     if (key > kHighestKey || !values) return fail(*context);
     if (!appendRecord(*context, key, Values(*values))) return fail(*context);
     at += kUnit + values->size();

@@ -15,7 +15,7 @@ using tests::DescribedDevice;
 constexpr std::uint32_t kStart = 0, kConfigure = 2, kUpdate = 3;
 constexpr std::uint64_t kState = 2;  // the format of a state channel
 
-// A driver with three channels: 1 counts over three frames, 2 has two states, 3 is malformed.
+// A driver with three channels: 1 counts over four frames, 2 has two states, 3 is malformed.
 std::string described(const std::string& hub) {
   return "<dict><key>Entries</key><array><dict><key>Class</key><string>HwReportHub</string>"
          "<key>Hub</key><dict>" +
@@ -26,7 +26,7 @@ std::string described(const std::string& hub) {
         <array><integer>1</integer><integer>1</integer></array></array></dict></array>
       <key>HwReportValues</key><array>
       <dict><key>Channel</key><integer>1</integer><key>Frames</key><array>
-        <integer>10</integer><integer>17</integer><integer>-1</integer></array></dict>
+        <integer>10</integer><integer>17</integer><integer>-1</integer><real>-2.5</real></array></dict>
       <dict><key>Channel</key><integer>2</integer><key>Value</key><array>
         <dict><key>ID</key><string>IDLE</string><key>InTransitions</key><integer>3</integer>
           <key>Residency</key><integer>99</integer><key>Time</key><integer>8</integer></dict>
@@ -149,7 +149,8 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   } refreshes[] = {{"first", 10},
                    {"second", 17},
                    {"third", ~std::uint64_t{0}},
-                   {"after the last", ~std::uint64_t{0}}};
+                   {"a real", ~std::uint64_t{1}},
+                   {"after the last", ~std::uint64_t{1}}};
   for (const auto& refresh : refreshes) {
     SCOPED_TRACE(refresh.name);
     ASSERT_EQ(hub.update(), 0u);

@@ -84,6 +84,11 @@ TEST(Delta, EveryFormatAndFailure) {
     EXPECT_EQ(slotsOf(*c.earlier) + slotsOf(*c.later), before) << c.what;
   }
   KvRef<HwReportError> error;
+  const auto wrapped = sampled(1, std::vector<Element>(65537, {{3}}), 1);  // a 16-bit count of 1
+  const auto delta = HwReportCreateSamplesDelta(flat({wrapped}).get(), flat({wrapped}).get());
+  const auto* last = delta->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(0);
+  EXPECT_EQ(slotOf(*last, 0, 0), 0u);
+  EXPECT_EQ(slotOf(*last, 65536, 0), kInvalid);
   EXPECT_FALSE(
       HwReportSampleCreateDelta(sampled(1, {{{1}}}).get(), sampled(4, {{{1}}}).get(), &error));
   EXPECT_EQ(errorText(error), "E00002C2 mismatched formats");

@@ -16,9 +16,15 @@ constexpr struct {
 } kSlotNames[] = {{"ID", 0},      {"InTransitions", 1}, {"Residency", 2}, {"Hits", 0},
                   {"Minimum", 1}, {"Maximum", 2},       {"Sum", 3}};
 
+// A slot holds signed values too; a real gives its whole part, as in a legend.
+std::uint64_t slotOf(const KvNumber& number) {
+  const bool isNegativeReal = number.isReal() && number.asDouble() < 0;
+  return isNegativeReal ? static_cast<std::uint64_t>(number.asInt64()) : number.asUInt64();
+}
+
 // A state's id may be given as its name of up to eight characters.
 std::optional<std::uint64_t> slotValue(const KvObject& value) {
-  if (const auto* number = kvCast<KvNumber>(&value)) return number->asUInt64();
+  if (const auto* number = kvCast<KvNumber>(&value)) return slotOf(*number);
   const auto* text = kvCast<KvString>(&value);
   if (text == nullptr || text->view().empty() || text->view().size() > 8) return std::nullopt;
   std::uint64_t id = 0;
@@ -45,7 +51,7 @@ std::optional<std::vector<ElementValues>> parseElements(const KvArray& items) {
   for (const auto& item : items) {
     if (const auto* number = kvCast<KvNumber>(item.get())) {
       if (numbers % 4 == 0) elements.emplace_back();
-      elements.back().slots[numbers++ % 4] = number->asUInt64();
+      elements.back().slots[numbers++ % 4] = slotOf(*number);
     } else if (const auto* dictionary = kvCast<KvDictionary>(item.get())) {
       const auto element = parseElement(*dictionary);
       if (!element) return std::nullopt;
@@ -61,7 +67,7 @@ std::optional<std::vector<ElementValues>> parseElements(const KvArray& items) {
 std::optional<std::vector<ElementValues>> parseFrame(const KvObject& frame) {
   if (const auto* number = kvCast<KvNumber>(&frame)) {
     ElementValues element;
-    element.slots[0] = number->asUInt64();
+    element.slots[0] = slotOf(*number);
     return std::vector{element};
   }
   const auto* items = kvCast<KvArray>(&frame);
