@@ -29,7 +29,8 @@ class TBConfig::Loader final : public WhitelistVisitor {
   bool beginGroup(std::string_view name) override {
     const GroupState state = groupState(name);
     if (state == GroupState::DisabledByTasking) {
-      logMessage(LogLevel::Default, "keyGroup {} is disabled by tasking", name);
+      logBounded(LogLevel::Default, "keyGroups disabled by tasking",
+                 "keyGroup {} is disabled by tasking", name);
     }
     return state == GroupState::InForce;
   }
@@ -41,16 +42,18 @@ class TBConfig::Loader final : public WhitelistVisitor {
   }
   void malformed(const WhitelistPlace& place) override {
     if (place.option) {
-      logMessage(LogLevel::Error, "whitelist: group {}, {}, key {}: malformed option {} skipped",
-                 place.group, *place.section, *place.key, *place.option);
+      logFault("whitelist: malformed options",
+               "whitelist: group {}, {}, key {}: malformed option {} skipped", place.group,
+               *place.section, *place.key, *place.option);
     } else if (place.key) {
-      logMessage(LogLevel::Error, "whitelist: group {}, {}: malformed options of key {}, skipped",
-                 place.group, *place.section, *place.key);
+      logFault("whitelist: malformed keys",
+               "whitelist: group {}, {}: malformed options of key {}, skipped", place.group,
+               *place.section, *place.key);
     } else if (place.section) {
-      logMessage(LogLevel::Error, "whitelist: group {}: malformed section {} skipped", place.group,
-                 *place.section);
+      logFault("whitelist: malformed sections", "whitelist: group {}: malformed section {} skipped",
+               place.group, *place.section);
     } else {
-      logMessage(LogLevel::Error, "whitelist: malformed group {} skipped", place.group);
+      logFault("whitelist: malformed groups", "whitelist: malformed group {} skipped", place.group);
     }
   }
 

@@ -23,6 +23,7 @@ PlatformScope::~PlatformScope() {
   ending.log = services_.log;
   std::swap(ending, services_);
   ending = Platform();
+  if (services_.log) services_.log->writeOmitted();
   current = former_;
 }
 

@@ -85,6 +85,21 @@ class PlatformScope {
   Platform* former_;
 };
 
+// A fault in the program's own words; see SystemLog::fault.
+template <class... Arguments>
+void logFault(std::string_view kind, fmt::format_string<Arguments...> format,
+              Arguments&&... arguments) {
+  platform().log->fault(kind, format, std::forward<Arguments>(arguments)...);
+}
+
+// A message of a fixed text when input decides how often it comes; see SystemLog::bounded.
+template <class... Arguments>
+void logBounded(LogLevel level, std::string_view kind, fmt::format_string<Arguments...> format,
+                Arguments&&... arguments) {
+  platform().log->bounded(level, SystemLog::kRepeatsWritten, kind, format,
+                          std::forward<Arguments>(arguments)...);
+}
+
 // Writes a formatted message; the arguments are not formatted when nobody would see it.
 template <class... Arguments>
 void logMessage(LogLevel level, fmt::format_string<Arguments...> format, Arguments&&... arguments) {

@@ -67,7 +67,7 @@ DistributionResult summariseDistribution(DistributionValues& values, std::string
     if (result.hasHistogram) {
       counts = {counters.get(), intervals->bucketCount()};
     } else {
-      logMessage(LogLevel::Default,
+      logBounded(LogLevel::Default, "distributions without a histogram",
                  "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
                  key);
     }

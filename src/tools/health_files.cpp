@@ -24,6 +24,7 @@ using Lines = std::vector<HealthLine>;
 // Keeps the errors that a check provokes, so that they stand in its own lines.
 class ErrorCollector final : public SystemLog {
  public:
+  ErrorCollector() : SystemLog(Repeats::All) {}
   std::vector<std::string> errors;
   bool enabled(LogLevel level) const override { return level == LogLevel::Error; }
   void write(LogLevel level, std::string_view message) override {

@@ -27,8 +27,11 @@ struct FakeSystemLog final : SystemLog {
     std::string text;
     bool operator==(const Line&) const = default;
   };
+  using SystemLog::Repeats;
   LogLevel lowest = LogLevel::Debug;
   std::vector<Line> lines;
+
+  explicit FakeSystemLog(Repeats repeats = Repeats::All) : SystemLog(repeats) {}
 
   bool enabled(LogLevel level) const override { return level >= lowest; }
   void write(LogLevel level, std::string_view message) override {

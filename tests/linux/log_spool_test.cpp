@@ -188,10 +188,15 @@ TEST_F(SpoolTest, StrangeFilesInTheFolderDoNotMatter) {
   put("spool/0000000007-old.info.plist", "damaged");
   put("spool/0000000009-gone.info.plist", "its body was removed");
   put("spool/0000000003-x.log.tmp~1.0", "left by a killed run");
+  put("spool/0999999999-stray.log", "its number leaves too few");
+  put("spool/9999999999-x.log", "its number leaves none");
+  useBoundedLog();
   ASSERT_TRUE(submit("new"));
   EXPECT_EQ(names("spool"),
             (Names{"0000000007-old.info.plist", "0000000007-old.log",
-                   "0000000008-log-test.info.plist", "0000000008-log-test.log", "notes.txt"}));
+                   "0000000008-log-test.info.plist", "0000000008-log-test.log", "notes.txt",
+                   "set-aside-0999999999-stray.log", "set-aside-9999999999-x.log"}));
+  EXPECT_EQ(errors().size(), 1u);
   const auto logs = list();
   ASSERT_EQ(logs.size(), 2u);
   EXPECT_EQ(logs[0].typeCode, "");

@@ -290,7 +290,7 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
     store()->TBClientSetValueForScalarKey("a", 1);
     c.spoil();
     const std::string before = get("data/TBDataStore.sqlitedb");
-    log->lines.clear();
+    useBoundedLog();
     const auto spoiled = store();
     spoiled->TBClientCheckpoint();
     spoiled->openHistory()->enumerateScalars(

@@ -39,7 +39,7 @@ class StructuredDataTest : public TemporaryRoot {
   }
 
   fakes::FakeClock clock;
-  StructuredDataFolder data{folder("data"), clock};
+  StructuredDataFolder data{folder("data"), clock, *log};
   FolderBounds bounds;
 };
 

@@ -57,6 +57,10 @@ class TemporaryRoot : public testing::Test {
     }
     return found;
   }
+  // From here on services get a new log, which writes a fault of each kind once.
+  void useBoundedLog() {
+    log = std::make_shared<fakes::FakeSystemLog>(fakes::FakeSystemLog::Repeats::Bounded);
+  }
   std::vector<std::string> errors() const { return log->texts(LogLevel::Error); }
 
   std::string root;

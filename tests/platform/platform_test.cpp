@@ -90,6 +90,27 @@ TEST(Platform, AServiceCanLogWhileItEnds) {
   EXPECT_TRUE(fake.log->has(LogLevel::Error, "not written"));
 }
 
+TEST(Platform, FaultsOfAKindAreOneLineAndTheirNumber) {
+  auto fake = fakes::makeFakePlatform();
+  fake.log = std::make_shared<fakes::FakeSystemLog>(fakes::FakeSystemLog::Repeats::Bounded);
+  {
+    const auto scope = fake.install();
+    for (int i = 0; i < 1000; ++i) logFault("a", "a {}", i);
+    logFault("b", "b");
+    for (int i = 0; i < 3; ++i) fake.log->bounded(LogLevel::Info, 2, "c", "c {}", i);
+    fake.log->writeOmitted();
+    logFault("a", "again");
+  }
+  using Line = fakes::FakeSystemLog::Line;
+  EXPECT_EQ(fake.log->lines, (std::vector<Line>{{LogLevel::Error, "a 0"},
+                                                {LogLevel::Error, "b"},
+                                                {LogLevel::Info, "c 0"},
+                                                {LogLevel::Info, "c 1"},
+                                                {LogLevel::Error, "a: 999 more"},
+                                                {LogLevel::Info, "c: 1 more"},
+                                                {LogLevel::Error, "a: 1 more"}}));
+}
+
 TEST(DayToDate, IsTheDaysFirstInstant) {
   EXPECT_EQ(DayToDate(20049)->secondsSince1970(), 20049 * 86400.0);
   EXPECT_EQ(DayToDate(INT32_MIN)->secondsSince1970(), -2147483648.0 * 86400.0);

@@ -30,19 +30,19 @@ std::optional<std::vector<std::byte>> DescribedFiles::bytes(const KvObject& desc
   }
   const auto* name = kvCast<KvString>(&described);
   if (name == nullptr || !isSafeRelativePath(name->view())) {
-    report("neither data nor the name of a file: " + kvText(&described));
+    report("not bytes", "neither data nor the name of a file: " + kvText(&described));
     return std::nullopt;
   }
   const auto content = folder_.readFile(name->view(), kDescribedBytesLimit);
   if (!content) {
-    report(content.error().message);
+    report("unreadable files", content.error().message);
     return std::nullopt;
   }
   return toBytes(*content);
 }
 
-void DescribedFiles::report(std::string_view fault) const {
-  log_->write(LogLevel::Error, "device registry: " + std::string(fault));
+void DescribedFiles::report(std::string_view kind, std::string_view fault) const {
+  log_->fault(fmt::format("device registry: {}", kind), "device registry: {}", fault);
 }
 
 }  // namespace tally

@@ -26,8 +26,8 @@ class DescribedFiles {
   // string names. Empty, with one error line, when that is missing, leads out of the folder, or is
   // too large.
   std::optional<std::vector<std::byte>> bytes(const KvObject& described);
-  // One error line about the description.
-  void report(std::string_view fault) const;
+  // A fault of the description; the kind is as for SystemLog::fault.
+  void report(std::string_view kind, std::string_view fault) const;
 
  private:
   DeviceDirectory folder_;

@@ -122,8 +122,9 @@ ChannelsByID describedChannels(const RegistryEntry& driver, DescribedFiles& file
     const auto id = description != nullptr ? description->getInt64("Channel") : std::nullopt;
     auto frames = id ? parseChannelFrames(*description) : std::nullopt;
     if (!frames) {
-      files.report("driver " + driver.name + ": malformed values of a channel, skipped: " +
-                   (id ? std::to_string(*id) : std::string("no channel")));
+      files.report("values of channels skipped",
+                   "driver " + driver.name + ": malformed values of a channel, skipped: " +
+                       (id ? std::to_string(*id) : std::string("no channel")));
       continue;
     }
     const auto key = static_cast<std::uint64_t>(*id);

@@ -96,15 +96,16 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
   const std::string path = folder_.text() + "/" + std::string(kFileName);
   const auto content = folder_.readFile(kFileName, kPlistMaximumBytes);
   if (!content) {
-    files_->report(content.error().message);
+    files_->report("unreadable", content.error().message);
     return entries;
   }
   const auto root = decodePlist(*content);
   const auto* dictionary = root ? kvCast<KvDictionary>(root->get()) : nullptr;
   const auto* items = dictionary != nullptr ? dictionary->getAs<KvArray>("Entries") : nullptr;
   if (items == nullptr) {
-    files_->report(path + ": " +
-                   (root ? "no dictionary with an array of Entries" : root.error().message));
+    files_->report(
+        "damaged",
+        path + ": " + (root ? "no dictionary with an array of Entries" : root.error().message));
     return entries;
   }
   std::set<std::uint64_t> ids;
@@ -119,7 +120,8 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
     if (entry) {
       entries->push_back(std::move(entry));
     } else {
-      files_->report(path + ": entry " + std::to_string(i + 1) + " skipped: " + fault);
+      files_->report("entries skipped",
+                     path + ": entry " + std::to_string(i + 1) + " skipped: " + fault);
     }
   }
   return entries;

@@ -1,7 +1,5 @@
 #include "platform/linux/analytics_events.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 
 #include "base/time_text.h"
@@ -50,7 +48,7 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
   const auto lock = FileLock::acquire(*folder, kAnalyticsEventLogs.lock);
   if (!lock) return lock.error();
   if (auto reserve = checkReserve(*folder, line.size()); !reserve) return reserve;
-  const auto files = listSequenced(*folder);
+  const auto files = listForWriting(*folder, log_);
   if (!files) return files.error();
 
   const auto fileName = [](std::uint64_t sequence) {
@@ -83,7 +81,7 @@ LinuxAnalyticsEvents::LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_p
       preferences_(std::move(preferences)),
       description_(std::move(description)),
       consent_(std::move(consent)),
-      spool_(std::move(folder), *clock_) {}
+      spool_(std::move(folder), *clock_, *log_) {}
 
 bool LinuxAnalyticsEvents::isAvailable() {
   const auto* described = description_->getAs<KvDictionary>(kEntry);
@@ -119,8 +117,8 @@ bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
   if (!payload) return false;
   const auto appended = spool_.append(eventName, *payload, folderBounds(*preferences_));
   if (!appended) {
-    log_->write(LogLevel::Error,
-                fmt::format("analytics event {}: {}", eventName, appended.error().message));
+    log_->fault(faultKind("analytics events", appended.error()), "analytics event {}: {}",
+                eventName, appended.error().message);
   }
   return static_cast<bool>(appended);
 }

@@ -22,13 +22,14 @@ namespace tally {
 // processes are serialised. A line that a killed run left half written is cut off before the next.
 class EventSpool {
  public:
-  EventSpool(DeviceDirectory folder, const Clock& clock)
-      : folder_(std::move(folder)), clock_(clock) {}
+  EventSpool(DeviceDirectory folder, const Clock& clock, SystemLog& log)
+      : folder_(std::move(folder)), clock_(clock), log_(log) {}
   Status append(std::string_view event, const KvDictionary& payload, const FolderBounds& bounds);
 
  private:
   DeviceDirectory folder_;
   const Clock& clock_;
+  SystemLog& log_;
 };
 
 // {"event": NAME, "time": "2026-03-01T12:30:00Z", "payload": {...}} and a newline.

@@ -1,7 +1,5 @@
 #include "platform/linux/crash_reporting.h"
 
-#include <fmt/format.h>
-
 #include <algorithm>
 
 #include "platform/linux/log_spool.h"
@@ -18,7 +16,7 @@ LinuxCrashReporting::LinuxCrashReporting(const DeviceRoot& root, std::shared_ptr
       clock_(std::move(clock)),
       preferences_(std::move(preferences)),
       consent_(std::move(consent)),
-      structuredData_(kStructuredDataLogs.on(root), *clock_) {}
+      structuredData_(kStructuredDataLogs.on(root), *clock_, *log_) {}
 
 bool LinuxCrashReporting::isDiagnosticSubmissionEnabled() { return consent_->given(); }
 
@@ -26,7 +24,10 @@ void LinuxCrashReporting::FDLogStructuredData(std::uint32_t recordType,
                                               const KvDictionary& record) {
   if (!consent_->permits("structured data")) return;
   const auto appended = structuredData_.append(recordType, record, folderBounds(*preferences_));
-  if (!appended) report(fmt::format("structured data of type {}", recordType), appended.error());
+  if (!appended) {
+    log_->fault(faultKind("structured data", appended.error()), "structured data of type {}: {}",
+                recordType, appended.error().message);
+  }
 }
 
 void LinuxCrashReporting::FDDumpAllOldStructuredDataLogs() {
@@ -43,7 +44,7 @@ void LinuxCrashReporting::rollFixlineLogs() {
 }
 
 void LinuxCrashReporting::report(std::string_view what, const Error& error) const {
-  log_->write(LogLevel::Error, fmt::format("{}: {}", what, error.message));
+  log_->fault(faultKind(what, error), "{}: {}", what, error.message);
 }
 
 bool LinuxCrashSupportLibrary::open(std::string_view) {

@@ -25,8 +25,8 @@ bool DeviceDescription::exists() {
 
 void DeviceDescription::read() {
   const auto report = [this](std::string_view fault) {
-    log_->write(LogLevel::Error,
-                fmt::format("device description {}/{}: {}", folder_.text(), kFileName, fault));
+    log_->fault("device description: damaged", "device description {}/{}: {}", folder_.text(),
+                kFileName, fault);
   };
   const auto document = folder_.readFile(kFileName, kPlistMaximumBytes);
   if (!document) {
@@ -43,10 +43,8 @@ void DeviceDescription::read() {
 }
 
 void DeviceDescription::reportEntry(std::string_view entry, std::string_view fault) {
-  const std::lock_guard lock(reporting_);
-  if (!reported_.emplace(entry).second) return;
-  log_->write(LogLevel::Error, fmt::format("device description {}/{}: entry \"{}\" {}",
-                                           folder_.text(), kFileName, entry, fault));
+  log_->fault(fmt::format("device description: entry \"{}\"", entry),
+              "device description {}/{}: entry \"{}\" {}", folder_.text(), kFileName, entry, fault);
 }
 
 }  // namespace tally

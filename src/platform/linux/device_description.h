@@ -4,7 +4,6 @@
 
 #include <memory>
 #include <mutex>
-#include <set>
 #include <string>
 #include <string_view>
 
@@ -46,8 +45,6 @@ class DeviceDescription {
   std::shared_ptr<SystemLog> log_;
   std::once_flag read_;
   KvRef<KvDictionary> entries_;
-  std::mutex reporting_;
-  std::set<std::string, std::less<>> reported_;
 };
 
 }  // namespace tally

@@ -100,8 +100,8 @@ bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::s
     submitting_ = false;
   }
   if (!submitted) {
-    log_->write(LogLevel::Error,
-                fmt::format("log submission of {}: {}", name, submitted.error().message));
+    log_->fault(faultKind("log submission", submitted.error()), "log submission of {}: {}", name,
+                submitted.error().message);
   }
   return static_cast<bool>(submitted);
 }
@@ -113,7 +113,7 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
   const auto lock = FileLock::acquire(*folder, kSubmittedLogs.lock);
   if (!lock) return lock.error();
   sweepLeftOvers(*folder);
-  const auto logs = listSequenced(*folder);
+  const auto logs = listForWriting(*folder, *log_);
   if (!logs) return logs.error();
   const auto sequence = nextSequence(*logs);
   if (!sequence) return sequence.error();
@@ -129,7 +129,7 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
   }
   // The log is safe; that older ones cannot be removed is not its failure.
   if (const auto evicted = evictOldest(*folder, bounds, *sequence); !evicted) {
-    log_->write(LogLevel::Error, fmt::format("log submission: {}", evicted.error().message));
+    log_->fault("log submission: older logs stay", "log submission: {}", evicted.error().message);
   }
   return Done{};
 }

@@ -56,9 +56,7 @@ class SqliteMetricsStore final : public MetricsStore {
   };
 
   void report(const Status& status) {
-    if (status || status.error().message == reported_) return;
-    reported_ = status.error().message;
-    log_->write(LogLevel::Error, reported_);
+    if (!status) log_->fault(status.error().message, "{}", status.error().message);
   }
 
   // The connection stays open, since a run writes more than once. Null: there is no store.
@@ -121,7 +119,6 @@ class SqliteMetricsStore final : public MetricsStore {
   std::optional<StoreWriter> writer_;
   std::vector<Scalar> batch_;
   int batchDepth_ = 0;
-  std::string reported_;
 };
 
 }  // namespace

@@ -1,7 +1,5 @@
 #include "platform/linux/preference_services.h"
 
-#include <fmt/format.h>
-
 namespace tally {
 namespace {
 
@@ -32,7 +30,7 @@ void FileServicesClient::setPreference(std::string_view key, std::string_view us
   if (found == users_.end()) {
     const auto folder = userPreferencesFolder(root_, user);
     if (!folder) {
-      log_->write(LogLevel::Error, fmt::format("preferences of {}: not a user's name", user));
+      log_->fault("preferences: not a user's name", "preferences of {}: not a user's name", user);
       return;
     }
     found = users_.try_emplace(std::string(user), *folder, log_, kUserFileMode, access_).first;

@@ -76,7 +76,7 @@ PropertyListPreferences::Domain* PropertyListPreferences::find(std::string_view 
   if (const auto known = domains_.find(domain); known != domains_.end()) return &known->second;
   // A name that looks like a temporary file's would be swept with them.
   if (!isSafeFileName(domain) || isTemporaryName(domain)) {
-    report(domain, "not a name that a domain can have");
+    report(domain, "not a name that a domain can have", "");
     return nullptr;
   }
   return &domains_.try_emplace(std::string(domain)).first->second;
@@ -124,7 +124,8 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain,
   }
   // What cannot be read now may be sound, so nothing is written over it, and what this very file
   // held before still counts.
-  if (std::exchange(state.writable, false)) report(domain, document.error().message);
+  if (std::exchange(state.writable, false))
+    report(domain, "cannot be read", document.error().message);
   if (seen) return;
   state.stored = KvDictionary::create();
   state.read = false;  // the next use tries again
@@ -135,7 +136,7 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
                                       const std::string& fault, const Directory* locked) {
   if (access_ == Access::ReadOnly) {
     state.stored = KvDictionary::create();
-    report(domain, "damaged: " + fault);
+    report(domain, "damaged", fault);
     return;
   }
   if (locked == nullptr) {
@@ -153,10 +154,10 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
       locked != nullptr ? setAside(*locked, domain) : Status(Error{"its directory is not locked"});
   state.writable = static_cast<bool>(moved);
   if (moved) {
-    report(domain, fmt::format("damaged, set aside: {}", fault));
+    report(domain, "damaged, set aside", fault);
     state.identity.reset();
   } else if (wasWritable) {
-    report(domain, fmt::format("damaged: {}; {}", fault, moved.error().message));
+    report(domain, "damaged", fmt::format("{}; {}", fault, moved.error().message));
   }
 }
 
@@ -187,12 +188,12 @@ bool PropertyListPreferences::writePending(Domain& state, std::string_view domai
   const auto folder = folder_.make();
   const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
   if (!lock) {
-    report(domain, lock.error().message);
+    report(domain, "not written", lock.error().message);
     return false;
   }
   reload(state, domain, &*folder);
   if (!state.writable) {
-    report(domain, "not written, since what is there cannot be read");
+    report(domain, "not written", "what is there cannot be read");
     return false;
   }
   const auto merged = state.stored->copy();
@@ -208,7 +209,7 @@ bool PropertyListPreferences::writePending(Domain& state, std::string_view domai
     const Status written =
         text ? writeFileAtomically(*folder, name, *text, mode_) : Status(text.error());
     if (!written) {
-      report(domain, written.error().message);
+      report(domain, "not written", written.error().message);
       return false;
     }
     state.stored = merged;
@@ -218,8 +219,10 @@ bool PropertyListPreferences::writePending(Domain& state, std::string_view domai
   return true;
 }
 
-void PropertyListPreferences::report(std::string_view domain, std::string_view fault) const {
-  log_->write(LogLevel::Error, fmt::format("preferences {}: {}", domain, fault));
+void PropertyListPreferences::report(std::string_view domain, std::string_view fault,
+                                     std::string_view reason) const {
+  log_->fault(fmt::format("preferences: {}", fault), "preferences {}: {}{}{}", domain, fault,
+              reason.empty() ? "" : ": ", reason);
 }
 
 std::optional<DeviceDirectory> userPreferencesFolder(const DeviceRoot& root,

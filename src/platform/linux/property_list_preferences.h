@@ -61,7 +61,8 @@ class PropertyListPreferences final : public Preferences {
   Status setAside(const Directory& folder, std::string_view domain) const;
   Result<FileLock> lockFolder(const Directory& folder);
   bool writePending(Domain& state, std::string_view domain);
-  void report(std::string_view domain, std::string_view fault) const;
+  // The reason may be empty.
+  void report(std::string_view domain, std::string_view fault, std::string_view reason) const;
 
   DeviceDirectory folder_;
   std::shared_ptr<SystemLog> log_;

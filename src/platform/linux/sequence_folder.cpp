@@ -17,6 +17,12 @@ namespace {
 
 constexpr std::size_t kDigits = 10;
 constexpr std::uint64_t kLastSequence = 9'999'999'999;
+// A log a second for thirty years.
+constexpr std::uint64_t kLastReachable = 999'999'999;
+// Once a stray file's number was nearly out of reach, the logs after it have such numbers too; they
+// go with it, or each later log would follow the stray file again.
+constexpr std::uint64_t kStrayMargin = 1'000'000;
+constexpr std::string_view kAsidePrefix = "set-aside-";
 
 // A volume that runs full takes a part before it says so.
 bool writeAllAt(int file, std::string_view bytes, off_t offset) {
@@ -55,6 +61,21 @@ Result<std::vector<SequencedLog>> listSequenced(const Directory& folder) {
   return logs;
 }
 
+Result<std::vector<SequencedLog>> listForWriting(const Directory& folder, SystemLog& log) {
+  auto logs = listSequenced(folder);
+  if (!logs || logs->empty() || logs->back().sequence <= kLastReachable) return logs;
+  while (!logs->empty() && logs->back().sequence > kLastReachable - kStrayMargin) {
+    for (const std::string& name : logs->back().names) {
+      const auto renamed = folder.rename(name, std::string(kAsidePrefix) + name);
+      // One that keeps its name is ignored all the same.
+      log.fault("log set aside", "{}: set aside, since no log can have this number{}",
+                folder.pathOf(name), renamed ? "" : "; " + renamed.error().message);
+    }
+    logs->pop_back();
+  }
+  return logs;
+}
+
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs) {
   const std::uint64_t next = logs.empty() ? 1 : logs.back().sequence + 1;
   if (next > kLastSequence) return Error{"the logs' numbers are used up"};
@@ -81,7 +102,8 @@ Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uin
 Status checkReserve(const Directory& folder, std::uint64_t bytes) {
   const auto space = folder.freeSpace();
   if (space && *space < kReservedBytes + bytes) {
-    return Error{fmt::format("{} bytes are left on the volume of {}", *space, folder.path())};
+    return Error{fmt::format("{} bytes are left on the volume of {}", *space, folder.path()),
+                 ENOSPC};
   }
   return Done{};
 }

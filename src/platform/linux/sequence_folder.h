@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "base/device_root.h"
+#include "platform/system_log.h"
 
 namespace tally {
 
@@ -33,6 +34,10 @@ std::string sequencePrefix(std::uint64_t sequence);
 
 // The logs of a folder, oldest first. Age is the number's, so that it does not depend on the clock.
 Result<std::vector<SequencedLog>> listSequenced(const Directory& folder);
+// The same for whoever writes there, with the folder's lock held: logs whose numbers no run can
+// have reached are renamed to "set-aside-NAME" with one error line, so that a stray file of a huge
+// number does not leave later logs without one.
+Result<std::vector<SequencedLog>> listForWriting(const Directory& folder, SystemLog& log);
 // The number for the next log.
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
 

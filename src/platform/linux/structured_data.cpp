@@ -106,7 +106,7 @@ Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(const Dir
                                                                        std::uint32_t recordType,
                                                                        std::size_t bytes,
                                                                        const FolderBounds& bounds) {
-  const auto logs = listSequenced(folder);
+  const auto logs = listForWriting(folder, log_);
   if (!logs) return logs.error();
   const auto next = nextSequence(*logs);
   if (!next) return next.error();

@@ -20,8 +20,8 @@ namespace tally {
 // are kept, and none is written out twice.
 class StructuredDataFolder {
  public:
-  StructuredDataFolder(DeviceDirectory folder, const Clock& clock)
-      : folder_(std::move(folder)), clock_(clock) {}
+  StructuredDataFolder(DeviceDirectory folder, const Clock& clock, SystemLog& log)
+      : folder_(std::move(folder)), clock_(clock), log_(log) {}
   Status append(std::uint32_t recordType, const KvDictionary& record, const FolderBounds& bounds);
   // Writes out every pending log; report is told of each that cannot be.
   void finishAll(const FolderBounds& bounds, const std::function<void(const Error&)>& report);
@@ -39,6 +39,7 @@ class StructuredDataFolder {
 
   DeviceDirectory folder_;
   const Clock& clock_;
+  SystemLog& log_;
   std::map<std::uint32_t, Pending> appended_;  // as this process left them, by type
 };
 

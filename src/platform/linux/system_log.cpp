@@ -1,5 +1,6 @@
 #include "platform/linux/system_log.h"
 
+#include <fmt/format.h>
 #include <sys/uio.h>
 #define SD_JOURNAL_SUPPRESS_LOCATION  // every message would name this file
 #include <systemd/sd-journal.h>
@@ -35,6 +36,12 @@ constexpr std::array kLevels{
 const LevelName& levelName(LogLevel level) { return kLevels[static_cast<std::size_t>(level)]; }
 
 iovec field(std::string_view text) { return {const_cast<char*>(text.data()), text.size()}; }
+
+// What may stand in a line of an environment variable.
+std::string shortText(std::string_view value) {
+  constexpr std::size_t kShown = 40;
+  return printable(repairUtf8(value.substr(0, kShown))) + (value.size() > kShown ? "..." : "");
+}
 
 // The message as valid UTF-8 of bounded length.
 std::string readable(std::string_view message) {
@@ -103,9 +110,11 @@ SystemLogEnvironment systemLogEnvironment() {
   SystemLogEnvironment found{systemLogSettings(destination, level), ""};
   const auto isSet = [](const char* value) { return value != nullptr && *value != '\0'; };
   if (isSet(destination) && !found.settings.forceStandardError) {
-    found.fault = "TALLYRUN_LOG is neither empty nor stderr";
+    found.fault =
+        fmt::format("TALLYRUN_LOG is neither empty nor stderr but {}", shortText(destination));
   } else if (isSet(level) && levelText(found.settings.lowest) != level) {
-    found.fault = "TALLYRUN_LOG_LEVEL is no level";
+    found.fault = fmt::format("TALLYRUN_LOG_LEVEL is not debug, info, default or error but {}",
+                              shortText(level));
   }
   return found;
 }
