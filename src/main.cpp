@@ -23,7 +23,7 @@ int main(int count, char** arguments) {
   tally::AppInfoListener listener;
   tally::DailyJob job({
       .startListener = [&listener](tally::DailyJob& self) { return listener.start(self); },
-      .stopListener = [&listener] { listener.stop(); },
+      .stopListener = [&listener] { return listener.stop(); },
       .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
       .updateTaskingState = tally::updateTaskingState,
   });

@@ -20,6 +20,11 @@ const KvNumber* int64Field(const KvDictionary& dictionary, std::string_view key)
   return number != nullptr && number->kind() == KvNumberKind::Int64 ? number : nullptr;
 }
 
+std::int64_t int64Or0(const KvDictionary& dictionary, std::string_view key) {
+  const KvNumber* const number = int64Field(dictionary, key);
+  return number != nullptr ? number->asInt64() : 0;
+}
+
 // Of 8-4-4-4-12 hexadecimal digits, in upper case.
 std::string uuidText(std::span<const std::byte> bytes) {
   std::string text;
@@ -38,23 +43,20 @@ Result<KvRef<KvDictionary>> makeApplication(const KvObject* element) {
   if (bundle == nullptr) return Error{"no text \"bundle_id\""};
   auto* const version = fields->getAs<KvString>("version");
   if (version == nullptr) return Error{"no text \"version\""};
-  const KvNumber* const adamID = int64Field(*fields, "adam_id");
-  if (adamID == nullptr) return Error{"no 64-bit integer \"adam_id\""};
-  const KvNumber* const arch = int64Field(*fields, "arch");
-  if (arch == nullptr) return Error{"no 64-bit integer \"arch\""};
   const auto* const uuid = fields->getAs<KvData>("uuid");
   if (uuid == nullptr || uuid->bytes().size() != kUuidBytes) {
     return Error{"no \"uuid\" of 16 bytes"};
   }
   return KvDictionary::create({{"bundle", KvRef<KvString>::share(bundle)},
                                {"version", KvRef<KvString>::share(version)},
-                               {"adamID", KvNumber::int64(adamID->asInt64())},
-                               {"arch", KvNumber::int64(arch->asInt64())},
+                               {"adamID", KvNumber::int64(int64Or0(*fields, "adam_id"))},
+                               {"arch", KvNumber::int64(int64Or0(*fields, "arch"))},
                                {"uuid", KvString::create(uuidText(uuid->bytes()))}});
 }
 
 void reportSkipped(std::string_view what) {
-  logMessage(LogLevel::Error, "message skipped: {}", what);
+  const std::string line = fmt::format("message skipped: {}", what);
+  logFault(line, "{}", line);
 }
 
 }  // namespace
@@ -71,8 +73,8 @@ KvRef<KvArray> makeAppInformation(const KvArray& appData) {
     }
   }
   if (const auto skipped = appData.size() - information->size(); skipped > 0) {
-    logMessage(LogLevel::Error, "app_data: {} of {} elements skipped; {}", skipped, appData.size(),
-               firstFault);
+    logFault("app_data: lists with elements skipped", "app_data: {} of {} elements skipped; {}",
+             skipped, appData.size(), firstFault);
   }
   return information;
 }
@@ -82,7 +84,7 @@ bool AppInfoListener::start(DailyJob& job) {
       kServiceName, [this, &job](const KvDictionary& message) { handleMessage(job, message); });
 }
 
-void AppInfoListener::stop() { platform().ipcEndpoint->stopListening(); }
+bool AppInfoListener::stop() { return platform().ipcEndpoint->stopListening(); }
 
 void AppInfoListener::handleMessage(DailyJob& job, const KvDictionary& message) {
   const KvNumber* const operation = int64Field(message, "operation");
@@ -120,7 +122,7 @@ void AppInfoListener::receiveAppData(DailyJob& job, const KvDictionary& message)
   const auto information = makeAppInformation(*appData);
   // The text of a long list is worth making only for somebody who reads it.
   if (platform().log->enabled(LogLevel::Default)) {
-    logMessage(LogLevel::Default, "tallyrun got {}AAI:\n{}",
+    logBounded(LogLevel::Default, "tallyrun got AAI", "tallyrun got {}AAI:\n{}",
                job.appInfoRequested ? "requested" : "(unsolicited -- so ignoring) ",
                kvText(information.get()));
   }

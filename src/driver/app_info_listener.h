@@ -23,8 +23,8 @@ class AppInfoListener {
  public:
   // Listens for peers on behalf of the job; false when the endpoint cannot be created.
   bool start(DailyJob& job);
-  // Ends the listening; messages that had arrived are handled first.
-  void stop();
+  // Ends the listening, unless a message had arrived: then it is handled and the result is true.
+  bool stop();
 
   // Does what a message asks for. One that is not of the form its operation needs is skipped with
   // a line.
@@ -38,8 +38,8 @@ class AppInfoListener {
 };
 
 // The elements of "app_data" in their order, each as {"bundle", "version", "adamID", "arch",
-// "uuid"}. Elements that lack a field or have one of another type are left out; one line says how
-// many and why the first.
+// "uuid"}. Elements without "bundle_id", "version" or "uuid" are left out, and one line says how
+// many and why the first; a number that is missing or of another type is 0.
 KvRef<KvArray> makeAppInformation(const KvArray& appData);
 
 }  // namespace tally

@@ -30,6 +30,7 @@ int DailyJob::run(std::span<const char* const> arguments) {
   } else if (arguments.size() > 1) {
     runSwitch(arguments[1]);
   }
+  platform().log->writeOmitted();
   logMessage(LogLevel::Default, "tallyrun ended");
   return 0;
 }
@@ -37,16 +38,22 @@ int DailyJob::run(std::span<const char* const> arguments) {
 void DailyJob::runScheduled() {
   // Without a listener the loop still runs its time: a peer may only be late.
   if (capabilities_.startListener) capabilities_.startListener(*this);
-  for (;;) {
-    const SliceResult slice = platform().eventLoop->runMainLoopSlice(kQuietSeconds, true);
-    // A loop without sources will never deliver: starting it again at once would only spin.
-    if (slice == SliceResult::TimedOut || slice == SliceResult::Finished) break;
-  }
-  // A message that comes from here on starts a new process; one that is already here still counts.
-  if (capabilities_.stopListener) capabilities_.stopListener();
+  // A message that comes once the listening has ended starts a new process. One that came before
+  // gets a whole quiet period like any other, since its sender may be about to send the next.
+  do {
+    waitForQuiet();
+  } while (capabilities_.stopListener && capabilities_.stopListener());
   if (!appInfoRequested) return;
   logMessage(LogLevel::Default, "never received requested AAI, so moving along without it");
   runIfNewDay(nullptr);
+}
+
+void DailyJob::waitForQuiet() {
+  for (;;) {
+    const SliceResult slice = platform().eventLoop->runMainLoopSlice(kQuietSeconds, true);
+    // A loop without sources will never deliver: starting it again at once would only spin.
+    if (slice == SliceResult::TimedOut || slice == SliceResult::Finished) return;
+  }
 }
 
 void DailyJob::runSwitch(const char* argument) {

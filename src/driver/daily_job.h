@@ -16,8 +16,9 @@ class DailyJob;
 struct DailyCapabilities {
   // Starts the IPC listener of the scheduled mode; false when it cannot be created.
   std::function<bool(DailyJob&)> startListener;
-  // Ends the listening; messages that had arrived are handled first.
-  std::function<void()> stopListener;
+  // Ends the listening, unless a message had arrived: then it is handled, the listening goes on,
+  // and the result is true.
+  std::function<bool()> stopListener;
   // Records device health values as scalars of the day in progress.
   std::function<void()> runTelemetrySweep;
   // Notices system updates and applies scheduled preference changes.
@@ -45,6 +46,7 @@ class DailyJob {
 
  private:
   void runScheduled();
+  void waitForQuiet();
   void runSwitch(const char* argument);
 
   DailyCapabilities capabilities_;

@@ -21,9 +21,10 @@ class IpcEndpoint {
   // in which they arrived. False when that cannot be done; the reason is logged. A peer never gets
   // an answer to what its message says.
   virtual bool listen(std::string_view name, MessageHandler handler) = 0;
-  // Gives the name up, so that later messages start a new process, and delivers those that had
-  // arrived until then. Without a listener it does nothing.
-  virtual void stopListening() = 0;
+  // Releases the name, so that later messages start a new process, and delivers those that had
+  // arrived by then. True when there was one: the endpoint then has its name again, so that what is
+  // sent in answer to that message reaches this process too. Without a listener it does nothing.
+  virtual bool stopListening() = 0;
 };
 
 }  // namespace tally

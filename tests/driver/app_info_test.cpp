@@ -148,17 +148,20 @@ TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
   EXPECT_TRUE(kvEqual(good->get(0), expected.get())) << kvText(good->get(0));
   EXPECT_THAT(fake.log->lines, IsEmpty());
 
+  auto numberless = application();
+  numberless->set("adam_id", nullptr);
+  numberless->set("arch", text("arm"));
+  const auto zeros = makeAppInformation(*KvArray::create({numberless}));
+  ASSERT_EQ(zeros->size(), 1u);
+  EXPECT_EQ(zeros->getAs<KvDictionary>(0)->getInt64("adamID"), 0);
+  EXPECT_EQ(zeros->getAs<KvDictionary>(0)->getInt64("arch"), 0);
+
   auto list = KvArray::create({text("no dictionary")});
-  const std::pair<const char*, KvRef<KvObject>> spoiled[] = {{"bundle_id", nullptr},
-                                                             {"bundle_id", KvNumber::int64(1)},
-                                                             {"version", nullptr},
-                                                             {"adam_id", nullptr},
-                                                             {"adam_id", KvNumber::uint64(1)},
-                                                             {"arch", text("arm")},
-                                                             {"uuid", nullptr},
-                                                             {"uuid", uuid(15)},
-                                                             {"uuid", uuid(17)},
-                                                             {"uuid", text(kUuidText)}};
+  const std::pair<const char*, KvRef<KvObject>> spoiled[] = {
+      {"bundle_id", nullptr},   {"bundle_id", KvNumber::int64(1)},
+      {"version", nullptr},     {"uuid", nullptr},
+      {"uuid", uuid(15)},       {"uuid", uuid(17)},
+      {"uuid", text(kUuidText)}};
   for (const auto& [key, value] : spoiled) {
     auto element = application();
     element->set(key, value);
@@ -171,7 +174,7 @@ TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
   ASSERT_EQ(kept->size(), 1u);
   EXPECT_EQ(kept->getAs<KvDictionary>(0)->getString("bundle"), "last");
   EXPECT_THAT(fake.log->texts(LogLevel::Error),
-              ElementsAre("app_data: 11 of 12 elements skipped; element 0: not a dictionary"));
+              ElementsAre("app_data: 8 of 9 elements skipped; element 0: not a dictionary"));
 }
 
 }  // namespace

@@ -32,7 +32,10 @@ class DailyJobTest : public testing::Test {
               fake.calls->push_back("listener");
               return true;
             },
-            [this] { fake.calls->push_back("stop listening"); },
+            [this] {
+              fake.calls->push_back("stop listening");
+              return std::exchange(arrivedAtTheEnd, false);
+            },
             [this] { fake.calls->push_back("sweep"); },
             [this] { fake.calls->push_back("tasking"); }};
   }
@@ -54,6 +57,7 @@ class DailyJobTest : public testing::Test {
     return kvText(fake.preferences->SMAPreferencesGetValue(kLastDay, kProgramDomain).get());
   }
 
+  bool arrivedAtTheEnd = false;  // a message, when the listening ends for the first time
   fakes::FakePlatform fake = fakes::makeFakePlatform();
   std::unique_ptr<PlatformScope> scope = fake.install();
 };
@@ -138,6 +142,13 @@ TEST_F(DailyJobTest, TheScheduledModeWaitsOutAQuietSlice) {
   EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening"));
   EXPECT_THAT(fake.log->texts(LogLevel::Default),
               ElementsAre("tallyrun started", "tallyrun ended"));
+}
+
+TEST_F(DailyJobTest, AMessageAtTheEndGetsAQuietPeriodToo) {
+  arrivedAtTheEnd = true;
+  run({}, allCapabilities());
+  EXPECT_EQ(fake.eventLoop->slices.size(), 2u);
+  EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening", "stop listening"));
 }
 
 TEST_F(DailyJobTest, ALoopWithoutSourcesIsNotSpun) {

@@ -1,5 +1,6 @@
 """A private message bus that starts the program for a device, as the machine's own bus would."""
 import contextlib
+import os
 import pathlib
 import shutil
 import signal
@@ -22,6 +23,17 @@ CONFIG = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configurat
 <servicedir>{folder}/services</servicedir>{limits}
 <policy context="default"><allow user="*"/><allow own="*"/>
 <allow send_destination="*" eavesdrop="true"/><allow eavesdrop="true"/></policy></busconfig>"""
+# As the machine's system bus has it: what no policy allows is refused.
+SHIPPED_CONFIG = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configuration 1.0//EN"
+ "http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd">
+<busconfig><type>system</type><listen>unix:path={folder}/socket</listen>
+<servicedir>{folder}/services</servicedir>{limits}
+<policy context="default"><allow user="*"/><deny own="*"/><deny send_type="method_call"/>
+<allow send_type="signal"/><allow send_requested_reply="true" send_type="method_return"/>
+<allow send_requested_reply="true" send_type="error"/><allow receive_type="method_call"/>
+<allow receive_type="method_return"/><allow receive_type="error"/><allow receive_type="signal"/>
+<allow send_destination="org.freedesktop.DBus"/></policy>
+<include>%s/packaging/dbus/system.conf</include></busconfig>""" % pathlib.Path(__file__).parents[2]
 # So that a test can have many messages under way.
 LIMITS = '<limit name="max_replies_per_connection">50000</limit>'
 
@@ -30,8 +42,9 @@ class BusDevice(Device):
     """A device, a bus, and the messages of every run that the bus started."""
     today = TODAY
 
-    def __init__(self, root=None):
+    def __init__(self, root=None, shipped_policy=False):
         super().__init__(root)
+        self.shipped_policy = shipped_policy
         self.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-bus-"))
         self.folder.chmod(0o755)  # another user has to reach the socket
         self.address = f"unix:path={self.folder}/socket"
@@ -51,7 +64,7 @@ class BusDevice(Device):
         (self.folder / "services" / f"{NAME}.service").write_text(
             f"[D-BUS Service]\nName={NAME}\nExec={starter}\nUser=root\n")
         config = self.folder / "config"
-        config.write_text(CONFIG.format(folder=self.folder, limits=LIMITS))
+        config.write_text((SHIPPED_CONFIG if shipped_policy else CONFIG).format(folder=self.folder, limits=LIMITS))
         with open(self.folder / "daemon", "wb") as errors:
             self.daemon = subprocess.Popen(["dbus-daemon", f"--config-file={config}", "--nofork",
                                             "--nopidfile", "--nosyslog"], stderr=errors)
@@ -115,13 +128,13 @@ class BusDevice(Device):
 
     @contextlib.contextmanager
     def kept_awake(self):
-        """A slow machine may take more than ten seconds for what comes next: the run, in which something
-        was asked for already, gets messages meanwhile that mean nothing to it."""
+        """A slow machine may take more than ten seconds for what comes next: the run gets messages meanwhile
+        that mean nothing to it."""
         done = threading.Event()
 
         def ping():
             while not done.wait(2):
-                self.busctl("operation", "x", "9")
+                self.dbus_send("string:ping")
         thread = threading.Thread(target=ping)
         thread.start()
         try:
@@ -129,6 +142,16 @@ class BusDevice(Device):
         finally:
             done.set()
             thread.join()
+
+    @contextlib.contextmanager
+    def suspended(self):
+        """The running program, for as long as it takes to send what it must not see being sent."""
+        process = int((self.folder / "pid").read_text())
+        os.kill(process, signal.SIGSTOP)
+        try:
+            yield
+        finally:
+            os.kill(process, signal.SIGCONT)
 
     def kill_daemon(self):
         self.daemon.send_signal(signal.SIGKILL)

@@ -51,6 +51,7 @@ class RawPeer:
 
     def send(self, body, flags=NO_REPLY, signature="a{sv}"):
         self.socket.sendall(self.call(NAME, OBJECT, NAME, "Send", signature, body, flags))
+        return self.socket
 
     def wait_for_answers(self, count):
         """Reads until so many replies came; the number of bytes is all that matters of them."""

@@ -2,8 +2,10 @@
 // turns, the event loop and the lines of the log.
 #include <fcntl.h>
 #include <gmock/gmock.h>
+#include <sys/epoll.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <systemd/sd-event.h>
 
 #include <chrono>
 #include <cstring>
@@ -70,13 +72,14 @@ TEST(SystemLogSettings, ComeFromTheEnvironment) {
 TEST_F(ServicesTest, DescriptionFaultsAreOneLineEach) {
   EXPECT_FALSE(describe("")->get("OSVersion")) << "no description at all";
   EXPECT_TRUE(errors().empty());
+  useBoundedLog();
   const auto wrong = describe("<key>OSVersion</key><integer>1</integer>");
   EXPECT_FALSE(wrong->getAs<KvString>("OSVersion"));
   EXPECT_FALSE(wrong->getAs<KvString>("OSVersion"));
   ASSERT_EQ(errors().size(), 1u);
   EXPECT_NE(errors()[0].find("\"OSVersion\""), std::string::npos);
   for (const char* damaged : {"<plist><dict>", "<plist version=\"1.0\"><array/></plist>"}) {
-    log->lines.clear();
+    useBoundedLog();
     put("device.plist", damaged);
     const auto description = describe("");
     EXPECT_FALSE(description->get("OSVersion"));
@@ -290,6 +293,14 @@ TEST_F(ServicesTest, TurnsNestAndEndWithTheProcess) {
   EXPECT_NE(errors().back().find(holder), std::string::npos) << errors().back();
 }
 
+// Takes a byte at a time and handles one: "o".
+int onInput(sd_event_source*, int file, std::uint32_t, void* loop) {
+  char byte = 0;
+  const bool handled = ::read(file, &byte, 1) == 1 && byte == 'o';
+  if (handled) static_cast<SdEventLoop*>(loop)->noteHandledEvent();
+  return 0;
+}
+
 TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
   runTogether(1, [this](int) {
     SdEventLoop loop(log);
@@ -297,6 +308,13 @@ TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
     bool right = loop.runMainLoopSlice(0.05, true) == SliceResult::TimedOut;
     right = right && std::chrono::steady_clock::now() - start >= std::chrono::milliseconds(50);
     right = right && loop.runMainLoopSlice(-1, false) == SliceResult::TimedOut;
+    // A source's work is an event only if the source says so.
+    int pipes[2];
+    right = right && ::pipe(pipes) == 0 && ::write(pipes[1], "x", 1) == 1;
+    ::sd_event_add_io(loop.event(), nullptr, pipes[0], EPOLLIN, onInput, &loop);
+    right = right && loop.runMainLoopSlice(0.05, true) == SliceResult::TimedOut;
+    right = right && ::write(pipes[1], "ok", 2) == 2;
+    right = right && loop.runMainLoopSlice(30, true) == SliceResult::HandledEvent;
     ::kill(::getpid(), SIGTERM);
     right = right && loop.runMainLoopSlice(30, true) == SliceResult::Stopped;
     return right && loop.runMainLoopSlice(30, true) == SliceResult::TimedOut;

@@ -16,13 +16,11 @@ namespace {
 // A run in progress answers only when it is done with the day.
 constexpr std::uint64_t kAnswerMicroseconds = 10ull * 60 * 1'000'000;
 
-struct MessageDeleter {
-  void operator()(sd_bus_message* message) const { ::sd_bus_message_unref(message); }
-};
-
 }  // namespace
 
 void BusDeleter::operator()(sd_bus* bus) const { ::sd_bus_flush_close_unref(bus); }
+
+void MessageDeleter::operator()(sd_bus_message* message) const { ::sd_bus_message_unref(message); }
 
 Result<BusHandle> openBus() {
   const bool system = ::geteuid() == 0;
@@ -69,7 +67,7 @@ Status sendToEndpoint(std::string_view name, const KvDictionary& message) {
   int result = ::sd_bus_message_new_method_call(bus->get(), &made, destination.c_str(),
                                                 busObjectPath(name).c_str(), destination.c_str(),
                                                 kBusMethod);
-  const std::unique_ptr<sd_bus_message, MessageDeleter> call(made);
+  const MessageHandle call(made);
   if (result < 0) return Error{std::strerror(-result), -result};
   if (Status content = appendBusDictionary(call.get(), message); !content) return content;
   sd_bus_error error{};

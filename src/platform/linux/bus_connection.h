@@ -9,6 +9,7 @@
 #include "kv/value.h"
 
 struct sd_bus;
+struct sd_bus_message;
 
 namespace tally {
 
@@ -17,6 +18,11 @@ struct BusDeleter {
   void operator()(sd_bus* bus) const;
 };
 using BusHandle = std::unique_ptr<sd_bus, BusDeleter>;
+
+struct MessageDeleter {
+  void operator()(sd_bus_message* message) const;
+};
+using MessageHandle = std::unique_ptr<sd_bus_message, MessageDeleter>;
 
 // A new connection; the error names the bus.
 Result<BusHandle> openBus();
@@ -41,6 +47,10 @@ std::pair<std::string, std::string> splitNotification(std::string_view name);
 
 constexpr const char* kBusMethod = "Send";
 constexpr const char* kBusMethodSignature = "a{sv}";
+// The bus itself, and a question of it that is always answered, after all messages before it.
+constexpr const char* kBusDriver = "org.freedesktop.DBus";
+constexpr const char* kBusDriverObject = "/org/freedesktop/DBus";
+constexpr const char* kBusDriverQuestion = "GetId";
 // Where signals come from that stand for notifications.
 constexpr const char* kNotificationObject = "/vellum";
 

@@ -6,10 +6,11 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 
-#include "base/printable.h"
 #include "platform/linux/bus_message.h"
+#include "platform/linux/bus_policy.h"
 #include "platform/linux/property_list_preferences.h"
 
 namespace tally {
@@ -19,9 +20,15 @@ int onSend(sd_bus_message* message, void* endpoint, sd_bus_error*) {
   return static_cast<BusEndpoint*>(endpoint)->take(message);
 }
 
+int onFirstAnswer(sd_bus_message* answer, void* endpoint, sd_bus_error*) {
+  if (!::sd_bus_message_is_method_error(answer, nullptr)) {
+    static_cast<BusEndpoint*>(endpoint)->noteStarted();
+  }
+  return 1;
+}
+
 int onAnyMessage(sd_bus_message* message, void* endpoint, sd_bus_error*) {
-  static_cast<BusEndpoint*>(endpoint)->look(message);
-  return 0;  // whoever it is for gets it
+  return static_cast<BusEndpoint*>(endpoint)->look(message);
 }
 
 // Access is checked here, by user, and not by the capabilities of the sender.
@@ -36,6 +43,13 @@ Status statusOf(std::string_view step, int result) {
   return Done{};
 }
 
+// By the bus or by the service manager: nobody starts the program like that but for a message.
+bool isStartedForAMessage() {
+  const char* const managed = std::getenv("SYSTEMD_EXEC_PID");
+  return std::getenv("DBUS_STARTER_ADDRESS") != nullptr ||
+         (managed != nullptr && managed == std::to_string(::getpid()));
+}
+
 }  // namespace
 
 BusEndpoint::~BusEndpoint() {
@@ -43,22 +57,22 @@ BusEndpoint::~BusEndpoint() {
 }
 
 bool BusEndpoint::listen(std::string_view name, MessageHandler handler) {
+  name_ = name;
   handler_ = std::move(handler);
-  heardUsers_ = {0, ::geteuid()};
+  acceptedUsers_ = {0, ::geteuid()};
   if (const auto* mobile = ::getpwnam(std::string(kProgramUser).c_str())) {
-    heardUsers_.insert(mobile->pw_uid);
+    acceptedUsers_.insert(mobile->pw_uid);
   }
-  const Status started = start(std::string(name));
-  if (started) {
-    name_ = name;
-  } else {
-    log_->write(LogLevel::Error,
-                fmt::format("endpoint {}: cannot listen: {}", name, started.error().message));
+  const Status started = start();
+  listening_ = static_cast<bool>(started);
+  if (!started) {
+    log_->fault("endpoint: cannot listen", "endpoint {}: cannot listen: {}", name_,
+                started.error().message);
   }
-  return static_cast<bool>(started);
+  return listening_;
 }
 
-Status BusEndpoint::start(const std::string& name) {
+Status BusEndpoint::start() {
   const auto bus = connection_->get();
   if (!bus) return bus.error();
   sd_event* const loop = loop_->event();
@@ -67,80 +81,134 @@ Status BusEndpoint::start(const std::string& name) {
   if (status) status = statusOf("filter", ::sd_bus_add_filter(*bus, nullptr, onAnyMessage, this));
   if (status) {
     status =
-        statusOf("object", ::sd_bus_add_object_vtable(*bus, nullptr, busObjectPath(name).c_str(),
-                                                      name.c_str(), kMethods, this));
+        statusOf("object", ::sd_bus_add_object_vtable(*bus, nullptr, busObjectPath(name_).c_str(),
+                                                      name_.c_str(), kMethods, this));
   }
   // Last, for from here on messages come.
-  if (status) status = statusOf("name", ::sd_bus_request_name(*bus, name.c_str(), 0));
+  if (status) status = statusOf("name", ::sd_bus_request_name(*bus, name_.c_str(), 0));
+  if (!status) return status;
+  ::sd_bus_call_method_async(*bus, nullptr, kBusDriver, kBusDriverObject, kBusDriver,
+                             kBusDriverQuestion, onFirstAnswer, this, "");
+  const auto asker = questions_.get();
+  busRefusesOthers_ = asker && busRefusesOthers(*asker, name_);
   return status;
 }
 
-void BusEndpoint::stopListening() {
-  if (name_.empty()) return;
+// The answer to a question that was asked right after the name was requested: messages that had
+// waited for the name came before it.
+void BusEndpoint::noteStarted() {
+  if (arrived_ || !isStartedForAMessage()) return;
+  // The bus drops the message that starts a program if its sender is gone by the time the program
+  // has the name.
+  log_->fault(
+      "endpoint: lost message",
+      "endpoint {}: the message that started this run is lost, since its sender did not wait "
+      "until it was taken",
+      name_);
+}
+
+bool BusEndpoint::stopListening() {
+  if (!listening_) return false;
   sd_bus* const bus = connection_->existing();
   ::sd_bus_release_name(bus, name_.c_str());
-  // The answer stood behind all that had been sent to the name, which is now in the queue. What
-  // comes later was not sent to it, and must not keep the program.
+  listening_ = false;
+  // The answer came after all that had been sent to the name, which is now in the queue. What comes
+  // later was not sent to it, and must not keep the program.
   std::uint64_t waiting = 0;
   ::sd_bus_get_n_queued_read(bus, &waiting);
-  while (waiting > 0 && ::sd_bus_process(bus, nullptr) > 0)
+  while (!listening_ && waiting > 0 && ::sd_bus_process(bus, nullptr) > 0)
     ::sd_bus_get_n_queued_read(bus, &waiting);
-  name_.clear();
+  return listening_;
+}
+
+// A message that was sent before the name was released is about to be handled, and what its sender
+// does next is meant for this process.
+void BusEndpoint::listenAgain() {
+  const int result = ::sd_bus_request_name(connection_->existing(), name_.c_str(), 0);
+  listening_ = result >= 0;
+  if (!listening_) {
+    log_->fault("endpoint: cannot listen", "endpoint {}: cannot listen again: {}", name_,
+                std::strerror(-result));
+  }
 }
 
 int BusEndpoint::take(sd_bus_message* message) {
-  if (const Status heard = checkSender(message); !heard) {
-    return refuse(message, SD_BUS_ERROR_ACCESS_DENIED, heard.error().message);
-  }
+  if (!isFromAcceptedSender(message)) return 1;
   const auto dictionary = readBusDictionary(message);
-  if (!dictionary) return refuse(message, SD_BUS_ERROR_LIMITS_EXCEEDED, dictionary.error().message);
-  ::sd_bus_reply_method_return(message, nullptr);
+  if (!dictionary) {
+    refuse(message, SD_BUS_ERROR_LIMITS_EXCEEDED, "above the limits", dictionary.error().message);
+    return 1;
+  }
+  accept(message);
   handler_(**dictionary);
   return 1;
 }
 
-// A call of another form is answered by the bus library; here it gets its line.
-void BusEndpoint::look(sd_bus_message* message) {
+// The bus library would answer a call of another form with an error.
+int BusEndpoint::look(sd_bus_message* message) {
+  if (::sd_bus_message_is_method_call(message, name_.c_str(), kBusMethod) <= 0) return 0;
+  arrived_ = true;
   const char* const signature = ::sd_bus_message_get_signature(message, 1);
-  if (::sd_bus_message_is_method_call(message, name_.c_str(), kBusMethod) > 0 &&
-      signature != nullptr && std::strcmp(signature, kBusMethodSignature) != 0) {
-    log_->write(LogLevel::Error,
-                fmt::format("endpoint {}: a message is refused: not a dictionary but \"{}\"", name_,
-                            printable(signature)));
+  const char* const path = ::sd_bus_message_get_path(message);
+  const bool isDictionary =
+      signature == nullptr || std::strcmp(signature, kBusMethodSignature) == 0;
+  if (isDictionary || path == nullptr || path != busObjectPath(name_)) return 0;
+  if (isFromAcceptedSender(message)) accept(message);
+  return 1;
+}
+
+bool BusEndpoint::isFromAcceptedSender(sd_bus_message* message) {
+  const Status checked = checkSender(message);
+  if (!checked) {
+    refuse(message, SD_BUS_ERROR_ACCESS_DENIED, "not from an accepted sender",
+           checked.error().message);
   }
+  return static_cast<bool>(checked);
 }
 
 Status BusEndpoint::checkSender(sd_bus_message* message) {
   const char* const sender = ::sd_bus_message_get_sender(message);
   if (sender == nullptr) return Error{"it has no sender"};
   const auto user = userOf(sender);
-  if (!user) return user.error();
-  if (!heardUsers_.contains(*user)) return Error{fmt::format("user {} is not heard", *user)};
-  return Done{};
+  if (user && acceptedUsers_.contains(*user)) return Done{};
+  if (user) return Error{fmt::format("user {} is not accepted", *user)};
+  const bool isGone = user.error().systemError == ENXIO;
+  if (isGone && busRefusesOthers_) return Done{};
+  return user.error();
 }
 
 Result<std::uint32_t> BusEndpoint::userOf(const char* sender) {
   if (lastSender_ == sender) return lastUser_;
   const auto bus = questions_.get();
-  if (!bus) return bus.error();
+  if (!bus) return Error{bus.error().message};
   sd_bus_creds* credentials = nullptr;
   uid_t user = 0;
   int result = ::sd_bus_get_name_creds(*bus, sender, SD_BUS_CREDS_EUID, &credentials);
   if (result >= 0) result = ::sd_bus_creds_get_euid(credentials, &user);
   ::sd_bus_creds_unref(credentials);
-  if (result == -ENXIO) return Error{"its sender did not wait until it was taken"};
+  if (result == -ENXIO) {
+    return Error{"its sender did not wait until it was taken, and this bus lets anybody send",
+                 ENXIO};
+  }
   if (result < 0) {
-    return Error{fmt::format("its sender cannot be told: {}", std::strerror(-result))};
+    return Error{fmt::format("its sender cannot be identified: {}", std::strerror(-result))};
   }
   lastSender_ = sender;
   lastUser_ = user;
   return lastUser_;
 }
 
-int BusEndpoint::refuse(sd_bus_message* message, const char* errorName, const std::string& reason) {
-  log_->write(LogLevel::Error, fmt::format("endpoint {}: a message is refused: {}", name_, reason));
+void BusEndpoint::accept(sd_bus_message* message) {
+  if (!listening_) listenAgain();
+  loop_->noteHandledEvent();
+  ::sd_bus_reply_method_return(message, nullptr);
+}
+
+void BusEndpoint::refuse(sd_bus_message* message, const char* errorName, std::string_view kind,
+                         const std::string& reason) {
+  log_->fault(fmt::format("endpoint: messages refused, {}", kind),
+              "endpoint {}: a message is refused: {}", name_, reason);
   ::sd_bus_reply_method_errorf(message, errorName, "%s", reason.c_str());
-  return 1;
 }
 
 }  // namespace tally

@@ -1,6 +1,5 @@
 #include "platform/linux/bus_notifications.h"
 
-#include <fmt/format.h>
 #include <systemd/sd-bus.h>
 
 #include <cstring>
@@ -25,8 +24,8 @@ Status emit(BusConnection& connection, std::string_view name) {
 
 void BusNotifications::postSystemNotification(std::string_view name) {
   if (const Status posted = emit(*connection_, name); !posted) {
-    log_->write(LogLevel::Error,
-                fmt::format("notification {} is not posted: {}", name, posted.error().message));
+    log_->fault(faultKind("notifications", posted.error()), "notification {} is not posted: {}",
+                name, posted.error().message);
   }
 }
 

@@ -1,6 +1,5 @@
 #include "platform/linux/event_loop.h"
 
-#include <fmt/format.h>
 #include <signal.h>
 #include <systemd/sd-event.h>
 
@@ -40,8 +39,7 @@ sd_event* SdEventLoop::event() {
     result = ::sd_event_add_signal(event_, nullptr, number, requestStop, &stopRequested_);
   }
   if (result < 0) {
-    log_->write(LogLevel::Error,
-                fmt::format("event loop: cannot be made: {}", std::strerror(-result)));
+    log_->fault("event loop", "event loop: cannot be made: {}", std::strerror(-result));
     event_ = ::sd_event_unref(event_);
   }
   return event_;
@@ -53,20 +51,19 @@ SliceResult SdEventLoop::runMainLoopSlice(double seconds, bool returnAfterOneEve
   const double bounded = std::isnan(seconds) ? 0 : std::clamp(seconds, 0.0, kLongestSlice);
   const auto end = SteadyClock::now() + std::chrono::duration_cast<SteadyClock::duration>(
                                             std::chrono::duration<double>(bounded));
-  bool handled = false;
+  handled_ = false;
   while (loop != nullptr) {
     const auto left = std::chrono::duration_cast<std::chrono::microseconds>(
         std::max(end - SteadyClock::now(), SteadyClock::duration::zero()));
     const int result = ::sd_event_run(loop, static_cast<std::uint64_t>(left.count()));
     if (stopRequested_) return SliceResult::Stopped;
     if (result < 0) {
-      log_->write(LogLevel::Error, fmt::format("event loop: {}", std::strerror(-result)));
+      log_->fault("event loop", "event loop: {}", std::strerror(-result));
       break;
     }
-    if (result > 0) handled = true;
-    if (result > 0 && returnAfterOneEvent) return SliceResult::HandledEvent;
-    if (result == 0 && SteadyClock::now() >= end) {
-      return handled ? SliceResult::HandledEvent : SliceResult::TimedOut;
+    if (handled_ && returnAfterOneEvent) return SliceResult::HandledEvent;
+    if (SteadyClock::now() >= end) {
+      return handled_ ? SliceResult::HandledEvent : SliceResult::TimedOut;
     }
   }
   // Without a loop the time still passes, so that a caller never spins.
