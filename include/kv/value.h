@@ -285,8 +285,12 @@ class TALLY_API KvDictionary final : public KvObject {
   std::unique_ptr<class HashIndex> index_;  // null while the dictionary is small
 };
 
-// Same type and same content, at any depth to 512. Numbers compare by value, whatever their width.
+// Same type and same content, at any depth to 512. Numbers compare by exact value, whatever their
+// kind.
 TALLY_API bool kvEqual(const KvObject* a, const KvObject* b);
+// The same, except that an integer never equals a real, nor 0.0 equals -0.0, and that a NaN equals
+// a NaN: what a property list can tell apart.
+TALLY_API bool kvIdentical(const KvObject* a, const KvObject* b);
 
 // The one text form of a value, as messages and labels show it: a string is itself, integers are
 // decimal, reals the shortest text that reads back equal ("inf", "-inf", "nan"), booleans "1" and

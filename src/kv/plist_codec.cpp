@@ -164,4 +164,18 @@ Result<std::string> encodeXmlPlist(const KvObject& root, std::size_t maximumByte
   return writeXmlPlist(root, maximumBytes);
 }
 
+KvRef<KvObject> storedForm(KvRef<KvObject> value, int levels) {
+  for (int i = 0; i < levels; ++i) value = KvArray::create({std::move(value)});
+  const auto document = encodeXmlPlist(*value);
+  if (!document) return nullptr;
+  auto read = decodePlist(*document);
+  if (!read) return nullptr;
+  KvRef<KvObject> part = *std::move(read);
+  for (int i = 0; i < levels && part; ++i) {
+    const auto* const array = kvCast<KvArray>(part.get());
+    part = KvRef<KvObject>::share(array != nullptr ? array->get(0) : nullptr);
+  }
+  return part;
+}
+
 }  // namespace tally

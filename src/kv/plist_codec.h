@@ -28,4 +28,8 @@ Result<KvRef<KvObject>> decodePlist(std::string_view document,
 Result<std::string> encodeXmlPlist(const KvObject& root,
                                    std::size_t maximumBytes = kPlistMaximumBytes);
 
+// What is read again when the value is written as a part of an XML property list, `levels`
+// containers below its root. Null when it cannot be written there at all.
+KvRef<KvObject> storedForm(KvRef<KvObject> value, int levels = 1);
+
 }  // namespace tally

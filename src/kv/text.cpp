@@ -1,5 +1,6 @@
 // Text form and equality of values.
 #include <algorithm>
+#include <cmath>
 
 #include "base/number_text.h"
 #include "base/time_text.h"
@@ -89,21 +90,44 @@ void appendText(std::string& out, const KvObject* value, int depth) {
   }
 }
 
-bool equalNumbers(const KvNumber& a, const KvNumber& b) {
-  if (a.isReal() || b.isReal()) return a.asDouble() == b.asDouble();
+enum class Numbers { ByValue, Identical };
+
+// Not as doubles, which would round the integer.
+bool equalIntegerAndReal(const KvNumber& integer, double real) {
+  constexpr double kTwoTo63 = 9223372036854775808.0;
+  if (std::trunc(real) != real) return false;
+  if (integer.kind() == KvNumberKind::UInt64) {
+    return real >= 0 && real < 2 * kTwoTo63 &&
+           static_cast<std::uint64_t>(real) == integer.asUInt64();
+  }
+  return real >= -kTwoTo63 && real < kTwoTo63 &&
+         static_cast<std::int64_t>(real) == integer.asInt64();
+}
+
+bool equalNumbers(const KvNumber& a, const KvNumber& b, Numbers numbers) {
+  if (a.isReal() && b.isReal()) {
+    const double x = a.asDouble(), y = b.asDouble();
+    if (numbers == Numbers::ByValue) return x == y;
+    return std::isnan(x) ? std::isnan(y) : x == y && std::signbit(x) == std::signbit(y);
+  }
+  if (a.isReal() || b.isReal()) {
+    if (numbers == Numbers::Identical) return false;
+    return a.isReal() ? equalIntegerAndReal(b, a.asDouble()) : equalIntegerAndReal(a, b.asDouble());
+  }
   const bool aHuge = a.kind() == KvNumberKind::UInt64 && a.asInt64() < 0;
   const bool bHuge = b.kind() == KvNumberKind::UInt64 && b.asInt64() < 0;
   return aHuge == bHuge && a.asInt64() == b.asInt64();
 }
 
-bool equal(const KvObject* a, const KvObject* b, int depth) {
+bool equal(const KvObject* a, const KvObject* b, Numbers numbers, int depth) {
   if (a == b) return true;
   if (a == nullptr || b == nullptr || a->type() != b->type() || depth > kMaximumDepth) return false;
   switch (a->type()) {
     case KvType::String:
       return static_cast<const KvString*>(a)->view() == static_cast<const KvString*>(b)->view();
     case KvType::Number:
-      return equalNumbers(*static_cast<const KvNumber*>(a), *static_cast<const KvNumber*>(b));
+      return equalNumbers(*static_cast<const KvNumber*>(a), *static_cast<const KvNumber*>(b),
+                          numbers);
     case KvType::Boolean:
       return false;  // each value exists once
     case KvType::Date:
@@ -119,7 +143,7 @@ bool equal(const KvObject* a, const KvObject* b, int depth) {
       const auto& y = *static_cast<const KvArray*>(b);
       if (x.size() != y.size()) return false;
       for (std::size_t i = 0; i < x.size(); ++i) {
-        if (!equal(x.get(i), y.get(i), depth + 1)) return false;
+        if (!equal(x.get(i), y.get(i), numbers, depth + 1)) return false;
       }
       return true;
     }
@@ -128,7 +152,7 @@ bool equal(const KvObject* a, const KvObject* b, int depth) {
       const auto& y = *static_cast<const KvDictionary*>(b);
       if (x.size() != y.size()) return false;
       for (const auto& entry : x) {
-        if (!equal(entry.value.get(), y.get(entry.key->view()), depth + 1)) return false;
+        if (!equal(entry.value.get(), y.get(entry.key->view()), numbers, depth + 1)) return false;
       }
       return true;
     }
@@ -138,7 +162,10 @@ bool equal(const KvObject* a, const KvObject* b, int depth) {
 
 }  // namespace
 
-bool kvEqual(const KvObject* a, const KvObject* b) { return equal(a, b, 0); }
+bool kvEqual(const KvObject* a, const KvObject* b) { return equal(a, b, Numbers::ByValue, 0); }
+bool kvIdentical(const KvObject* a, const KvObject* b) {
+  return equal(a, b, Numbers::Identical, 0);
+}
 
 std::string kvText(const KvObject* value) {
   std::string out;

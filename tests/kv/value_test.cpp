@@ -94,12 +94,21 @@ TEST(KvNumber, ConversionsAreDefinedForEveryValue) {
 }
 
 TEST(KvEqual, ComparesContentNotWidth) {
+  constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
   const auto list = [](KvRef<KvObject> item) { return KvArray::create({std::move(item)}); };
   const struct {
     KvRef<KvObject> a, b;
     bool equal;
+    bool identical = equal;
   } cases[] = {
-      {KvNumber::int8(5), KvNumber::float64(5), true},
+      {KvNumber::int8(5), KvNumber::float64(5), true, false},
+      {KvNumber::int8(5), KvNumber::uint64(5), true},
+      {KvNumber::int64(9007199254740993), KvNumber::float64(9007199254740992.0), false},
+      {KvNumber::uint64(UINT64_MAX), KvNumber::float64(18446744073709551616.0), false},
+      {KvNumber::int64(INT64_MIN), KvNumber::float64(-9223372036854775808.0), true, false},
+      {list(KvNumber::int8(0)), list(KvNumber::float64(0)), true, false},
+      {KvNumber::float64(0.0), KvNumber::float64(-0.0), true, false},
+      {KvNumber::float64(kNan), KvNumber::float64(kNan), false, true},
       {KvNumber::int64(-1), KvNumber::uint64(UINT64_MAX), false},
       {KvNumber::int32(1), KvBoolean::of(true), false},
       {KvBoolean::of(true), KvBoolean::of(true), true},
@@ -113,8 +122,11 @@ TEST(KvEqual, ComparesContentNotWidth) {
       {nullptr, nullptr, true},
       {nullptr, KvString::create(""), false},
   };
-  for (const auto& c : cases)
+  for (const auto& c : cases) {
     EXPECT_EQ(kvEqual(c.a.get(), c.b.get()), c.equal) << kvText(c.a.get());
+    EXPECT_EQ(kvEqual(c.b.get(), c.a.get()), c.equal) << kvText(c.a.get());
+    EXPECT_EQ(kvIdentical(c.a.get(), c.b.get()), c.identical) << kvText(c.a.get());
+  }
 }
 
 TEST(KvText, OneFormForAll) {
