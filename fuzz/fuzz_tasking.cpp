@@ -1,7 +1,10 @@
 // Taskings: schedules and records of any shape, as a run finds them, and what it plans to write.
+#include <set>
+
 #include "base/file.h"
 #include "driver/tasking_plan.h"
 #include "fuzz_values.h"
+#include "kv/plist_codec.h"
 
 using namespace tally;
 using fuzz::require;
@@ -14,28 +17,37 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   } else {
     const auto given = input.take<std::uint8_t>();
     fuzz::ValueReader values(input);
-    KvRef<KvObject>* const all[] = {&inputs.schedule,        &inputs.unfinishedPayload,
-                                    &inputs.recordedPayload, &inputs.recordedID,
-                                    &inputs.recordedOS,      &inputs.build,
+    KvRef<KvObject>* const all[] = {&inputs.schedule,   &inputs.unfinished, &inputs.recordedPayload,
+                                    &inputs.recordedID, &inputs.recordedOS, &inputs.build,
                                     &inputs.lastUpdate};
     for (std::size_t i = 0; i < std::size(all); ++i) {
       if ((given >> i & 1) != 0) *all[i] = values.take();
     }
+    inputs.build = KvRef<KvString>::share(kvCast<KvString>(inputs.build.get()));
   }
 
   const TaskingPlan plan = planTasking(inputs);
-  bool isNoted = false;
-  for (const TaskingStep& step : plan.steps) {
-    const auto* const write = std::get_if<PreferenceWrite>(&step);
-    if (write == nullptr) continue;
-    require(isSafeFileName(write->user) && isSafeFileName(write->domain),
-            "a write stays in the folder of its user");
-    const bool isOwn = write->owner == PreferenceWrite::Owner::Program &&
-                       write->domain == "vellum.tallyd.tallyrun";
-    require(isNoted || isOwn, "what is about to be written is noted first");
-    isNoted = isNoted || write->key == "TaskingUnfinished";
+  if (!plan.change) return 0;
+  const TaskingChange& change = *plan.change;
+  std::set<PreferenceName> removed, written;
+  for (const PreferenceWrite& removal : change.removals) {
+    require(removed.insert(removal.name()).second, "a preference is removed once");
   }
-  require(!isNoted || std::holds_alternative<DomainFlush>(plan.steps.back()),
-          "a change ends with its record made durable");
+  for (const PreferenceWrite& write : change.writes) {
+    require(isSafeFileName(write.user) && isSafeFileName(write.domain),
+            "a write stays in the folder of its user");
+    require(written.insert(write.name()).second, "a preference is written once");
+    require(change.payload && write.entry < change.payload->size(), "a write is an entry's");
+  }
+
+  // A run that dies now is resumed by the next one, with the same work to do.
+  TaskingInputs next = inputs;
+  next.recordedID = nullptr;
+  next.unfinished = storedForm(unfinishedRecord(change));
+  require(static_cast<bool>(next.unfinished), "the change can be noted");
+  const TaskingPlan again = planTasking(next);
+  require(again.change && again.change->writes.size() == change.writes.size() &&
+              again.change->removals.size() == change.removals.size(),
+          "an interrupted change is resumed");
   return 0;
 }

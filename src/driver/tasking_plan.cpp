@@ -2,14 +2,15 @@
 
 #include <fmt/format.h>
 
-#include <array>
+#include <map>
 #include <set>
 #include <utility>
 
 #include "base/directory.h"
 #include "base/file.h"
 #include "base/result.h"
-#include "report/report.h"
+#include "base/utf8.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {
@@ -19,7 +20,48 @@ using Owner = PreferenceWrite::Owner;
 constexpr std::string_view kProgramUserName = "mobile";
 constexpr std::string_view kSystemUserName = "__sysmetra__";
 
-enum class Direction { Apply, RollBack };
+// Keys of the record of a change, beside those of a tasking in force.
+constexpr std::string_view kUnremoved = "Unremoved";  // entries without value
+constexpr std::string_view kUnwritten = "Unwritten";  // indexes of the payload
+// Containers around an entry in that record: domain, record, payload.
+constexpr int kEntryLevel = 3;
+
+// The preference that an entry names. The same checks in both directions, so that what was not
+// written is not removed either.
+Result<PreferenceWrite> preferenceIn(const KvObject* entry) {
+  const auto* const fields = kvCast<KvDictionary>(entry);
+  if (fields == nullptr) return Error{"not a dictionary"};
+  for (const char* name : {"Domain", "User", "Key"}) {
+    const auto text = fields->getString(name);
+    if (!text) return Error{fmt::format("no text \"{}\"", name)};
+    if (replaceNonXmlCharacters(*text) != *text) {
+      return Error{fmt::format("its \"{}\" has characters that no property list holds", name)};
+    }
+  }
+  const std::string_view domain = *fields->getString("Domain");
+  const std::string_view user = *fields->getString("User");
+  // Both become names of files; a key is text inside of one.
+  for (const auto& [name, text] : {std::pair("Domain", domain), std::pair("User", user)}) {
+    if (!isSafeFileName(text) || isTemporaryName(text)) {
+      return Error{fmt::format("its \"{}\" cannot be a file's name: {}", name, text)};
+    }
+  }
+  const Owner owner = user == kProgramUserName  ? Owner::Program
+                      : user == kSystemUserName ? Owner::System
+                                                : Owner::User;
+  return PreferenceWrite{owner, std::string(user), std::string(domain),
+                         std::string(*fields->getString("Key")), nullptr};
+}
+
+bool isStorable(const KvRef<KvObject>& entry) {
+  return kvIdentical(entry.get(), storedForm(entry, kEntryLevel).get());
+}
+
+// What is recorded was written to a file, where characters may have been replaced.
+bool isRecordOf(const KvObject* recorded, const KvRef<KvObject>& value) {
+  if (!value || recorded == nullptr) return !value && recorded == nullptr;
+  return kvIdentical(recorded, value.get()) || kvIdentical(recorded, storedForm(value).get());
+}
 
 class Planner {
  public:
@@ -35,41 +77,110 @@ class Planner {
   void noteSystemUpdate() {
     const auto* const last = kvCast<KvDictionary>(inputs_.lastUpdate.get());
     const KvObject* const version = last != nullptr ? last->get("version") : nullptr;
-    if (!inputs_.build || (version != nullptr && kvEqual(version, inputs_.build.get()))) return;
+    if (!inputs_.build || isRecordOf(version, inputs_.build)) return;
     say(fmt::format("OS change since last run ({} -> {})", kvText(version),
                     kvText(inputs_.build.get())));
-    record("LastOSUpdate", KvDictionary::create({{"version", inputs_.build},
-                                                 {"day", KvNumber::int32(inputs_.today)}}));
+    plan_.lastUpdate =
+        KvDictionary::create({{"version", inputs_.build}, {"day", KvNumber::int32(inputs_.today)}});
   }
 
   void updateTasking() {
-    const auto* const schedule = kvCast<KvDictionary>(inputs_.schedule.get());
-    if (inputs_.schedule && schedule == nullptr) fault("the schedule is not a dictionary");
-    if (schedule == nullptr || !schedule->contains("TaskingID")) return;
-    KvString* const newID = schedule->getAs<KvString>("TaskingID");
-    if (newID == nullptr) {
-      fault("the schedule's \"TaskingID\" is not a text");
+    const auto* const schedule = scheduled();
+    if (schedule == nullptr) {
+      // What was begun is finished: a tasking that is withdrawn stays in force as well.
+      if (isResumable()) resume();
       return;
     }
-    const bool unfinished = static_cast<bool>(inputs_.unfinishedPayload);
+    const auto newID = KvRef<KvObject>::share(schedule->get("TaskingID"));
     if (inputs_.recordedID) {
-      const bool sameSystem = inputs_.build ? kvEqual(inputs_.recordedOS.get(), inputs_.build.get())
-                                            : !inputs_.recordedOS;
-      if (kvEqual(inputs_.recordedID.get(), newID) && sameSystem && !unfinished) return;
+      if (isRecordOf(inputs_.recordedID.get(), newID) &&
+          isRecordOf(inputs_.recordedOS.get(), inputs_.build) && !inputs_.unfinished) {
+        return;
+      }
       say(fmt::format("Tasking update ({} -> {}, {} -> {})", kvText(inputs_.recordedID.get()),
-                      kvText(newID), kvText(inputs_.recordedOS.get()),
+                      kvText(newID.get()), kvText(inputs_.recordedOS.get()),
                       kvText(inputs_.build.get())));
     }
-    KvArray* const newPayload = payloadOf(schedule->get("TaskingPayload"), "the schedule's");
-    KvArray* const oldPayload =
-        inputs_.recordedID ? payloadOf(inputs_.recordedPayload.get(), "the recorded") : nullptr;
-    if (newPayload != nullptr || oldPayload != nullptr || unfinished) {
-      beginChange(newPayload);
-      rollBack(oldPayload);
-      if (newPayload != nullptr) apply(*schedule, newPayload);
-      endChange();
+    KvArray* const payload = payloadOf(schedule->get("TaskingPayload"), "the schedule's");
+    if (isResumable() && leadsTo(newID, payload)) return resume();
+    startOver(*schedule, newID, payload);
+  }
+
+  // Null when nothing is scheduled that could be applied.
+  const KvDictionary* scheduled() {
+    const auto* const schedule = kvCast<KvDictionary>(inputs_.schedule.get());
+    if (inputs_.schedule && schedule == nullptr) fault("the schedule is not a dictionary");
+    if (schedule == nullptr || !schedule->contains("TaskingID")) return nullptr;
+    if (schedule->getAs<KvString>("TaskingID") != nullptr) return schedule;
+    fault("the schedule's \"TaskingID\" is not a text");
+    return nullptr;
+  }
+
+  const KvDictionary* unfinished() const { return kvCast<KvDictionary>(inputs_.unfinished.get()); }
+  bool isResumable() const { return unfinished() != nullptr && !inputs_.recordedID; }
+  bool leadsTo(const KvRef<KvObject>& newID, const KvArray* payload) const {
+    return isRecordOf(unfinished()->get("TaskingID"), newID) &&
+           isRecordOf(unfinished()->get("TaskingOS"), inputs_.build) &&
+           (payload == nullptr || unfinished()->getAs<KvArray>("TaskingPayload") != nullptr);
+  }
+
+  void resume() {
+    TaskingChange change = unfinishedChange();
+    say(fmt::format("an unfinished tasking update is resumed: {} to remove, {} to set",
+                    change.removals.size(), change.writes.size()));
+    plan_.change = std::move(change);
+    plan_.isDue = true;
+  }
+
+  // An unreadable list of what was not written means all of it: to write again does no harm.
+  TaskingChange unfinishedChange() {
+    const KvDictionary& record = *unfinished();
+    TaskingChange change;
+    for (auto [field, key] :
+         {std::pair(&change.id, "TaskingID"), std::pair(&change.system, "TaskingOS"),
+          std::pair(&change.digest, "TaskingDigest")}) {
+      *field = KvRef<KvObject>::share(record.get(key));
     }
-    plan_.postsNotification = true;
+    change.payload = KvRef<KvArray>::share(record.getAs<KvArray>("TaskingPayload"));
+    change.removals = removalsOf({record.getAs<KvArray>(kUnremoved)});
+    if (!change.payload) return change;
+    change.writes = writesOf(*change.payload);
+    if (const auto* const unwritten = record.getAs<KvArray>(kUnwritten)) {
+      std::set<std::int64_t> indexes;
+      for (const auto& index : *unwritten) {
+        if (const auto* number = kvCast<KvNumber>(index.get())) indexes.insert(number->asInt64());
+      }
+      std::erase_if(change.writes, [&](const PreferenceWrite& write) {
+        return !indexes.contains(static_cast<std::int64_t>(write.entry));
+      });
+    }
+    return change;
+  }
+
+  void startOver(const KvDictionary& schedule, KvRef<KvObject> newID, const KvArray* newPayload) {
+    plan_.isDue = true;
+    const KvArray* const oldPayload =
+        inputs_.recordedID ? payloadOf(inputs_.recordedPayload.get(), "the recorded") : nullptr;
+    if (newPayload == nullptr && oldPayload == nullptr && !inputs_.unfinished) return;
+    plan_.endsRecorded = inputs_.recordedID && (oldPayload != nullptr || newPayload != nullptr);
+    if (inputs_.unfinished) say("what an unfinished tasking update has written is removed");
+    TaskingChange change{std::move(newID), inputs_.build, nullptr, nullptr, {}, {}};
+    // Earlier versions noted no more than what they were about to write.
+    const auto* const former = unfinished();
+    change.removals =
+        removalsOf({oldPayload, kvCast<KvArray>(inputs_.unfinished.get()),
+                    former != nullptr ? former->getAs<KvArray>("TaskingPayload") : nullptr,
+                    former != nullptr ? former->getAs<KvArray>(kUnremoved) : nullptr});
+    if (newPayload != nullptr) {
+      change.digest = KvRef<KvObject>::share(schedule.get("TaskingDigest"));
+      if (change.digest && !storedForm(change.digest, kEntryLevel)) {
+        fault("the digest is left out, since it cannot be recorded");
+        change.digest = nullptr;
+      }
+      change.payload = recordable(*newPayload);
+      change.writes = writesOf(*change.payload);
+    }
+    plan_.change = std::move(change);
   }
 
   KvArray* payloadOf(KvObject* value, std::string_view whose) {
@@ -80,106 +191,85 @@ class Planner {
     return payload;
   }
 
-  // What an earlier run left behind stays noted until all is done: this run may die as well, on its
-  // way to another payload.
-  void beginChange(const KvArray* newPayload) {
-    auto note = KvArray::create();
-    std::set<std::array<std::string, 3>> noted;
-    const KvArray* const payloads[] = {kvCast<KvArray>(inputs_.unfinishedPayload.get()),
-                                       newPayload};
+  // The payload without the entries that are never written. The record must not hold those: read
+  // again, an entry that a file cannot hold as it is may name another preference.
+  KvRef<KvArray> recordable(const KvArray& payload) {
+    auto kept = KvArray::create();
+    for (std::size_t i = 0; i < payload.size(); ++i) {
+      auto entry = KvRef<KvObject>::share(payload.get(i));
+      const auto preference = preferenceIn(entry.get());
+      if (preference && isStorable(entry)) {
+        kept->append(std::move(entry));
+        continue;
+      }
+      fault(fmt::format("entry {} of the scheduled payload is skipped: {}", i,
+                        preference ? "no property list holds its \"Value\" as it is"
+                                   : preference.error().message));
+    }
+    return kept;
+  }
+
+  static std::vector<PreferenceWrite> writesOf(const KvArray& payload) {
+    std::vector<PreferenceWrite> writes;
+    std::map<PreferenceName, std::size_t> last;
+    for (std::size_t i = 0; i < payload.size(); ++i) {
+      auto write = preferenceIn(payload.get(i));
+      if (!write) continue;
+      // An entry without a value clears the preference.
+      write->value = KvRef<KvObject>::share(kvCast<KvDictionary>(payload.get(i))->get("Value"));
+      write->entry = i;
+      last[write->name()] = i;
+      writes.push_back(*std::move(write));
+    }
+    std::erase_if(writes,
+                  [&](const PreferenceWrite& write) { return last[write.name()] != write.entry; });
+    return writes;
+  }
+
+  static std::vector<PreferenceWrite> removalsOf(std::initializer_list<const KvArray*> payloads) {
+    std::vector<PreferenceWrite> removals;
+    std::set<PreferenceName> known;
     for (const KvArray* payload : payloads) {
-      if (payload == nullptr) continue;
-      for (const auto& entry : *payload) {
-        const auto write = makeWrite(entry.get());
-        if (write && noted.insert({write->user, write->domain, write->key}).second) {
-          note->append(entry);
+      for (std::size_t i = 0; payload != nullptr && i < payload->size(); ++i) {
+        auto removal = preferenceIn(payload->get(i));
+        if (removal && known.insert(removal->name()).second) {
+          removals.push_back(*std::move(removal));
         }
       }
     }
-    record("TaskingUnfinished", std::move(note));
-    plan_.steps.push_back(DomainFlush{std::string(kProgramDomain)});
+    return removals;
   }
 
-  void rollBack(KvArray* oldPayload) {
-    if (const auto* unfinished = kvCast<KvArray>(inputs_.unfinishedPayload.get())) {
-      say("a tasking update was interrupted; what it wrote is removed");
-      writeAll(*unfinished, Direction::RollBack);
-    }
-    if (oldPayload == nullptr) return;
-    writeAll(*oldPayload, Direction::RollBack);
-    for (const char* key : {"TaskingID", "TaskingDigest", "TaskingPayload"}) record(key, nullptr);
-  }
-
-  void apply(const KvDictionary& schedule, KvArray* newPayload) {
-    writeAll(*newPayload, Direction::Apply);
-    record("TaskingID", KvRef<KvObject>::share(schedule.get("TaskingID")));
-    record("TaskingOS", inputs_.build);
-    record("TaskingDigest", KvRef<KvObject>::share(schedule.get("TaskingDigest")));
-    record("TaskingPayload", KvRef<KvArray>::share(newPayload));
-  }
-
-  void endChange() {
-    record("TaskingUnfinished", nullptr);
-    domains_.erase(std::string(kProgramDomain));
-    for (const std::string& domain : domains_) plan_.steps.push_back(DomainFlush{domain});
-    plan_.steps.push_back(DomainFlush{std::string(kProgramDomain)});
-  }
-
-  void writeAll(const KvArray& payload, Direction direction) {
-    for (std::size_t i = 0; i < payload.size(); ++i) {
-      auto write = makeWrite(payload.get(i));
-      if (!write) {
-        fault(fmt::format("entry {} of the {} payload is skipped: {}", i,
-                          direction == Direction::Apply ? "scheduled" : "former",
-                          write.error().message));
-        continue;
-      }
-      if (direction == Direction::RollBack) write->value = nullptr;
-      if (write->owner == Owner::Program) domains_.insert(write->domain);
-      plan_.steps.push_back(*std::move(write));
-    }
-  }
-
-  // The same checks in both directions, so that what was not written is not removed either.
-  static Result<PreferenceWrite> makeWrite(const KvObject* entry) {
-    const auto* const fields = kvCast<KvDictionary>(entry);
-    if (fields == nullptr) return Error{"not a dictionary"};
-    for (const char* name : {"Domain", "User", "Key"}) {
-      const auto text = fields->getString(name);
-      if (!text) return Error{fmt::format("no text \"{}\"", name)};
-      if (!isSafeFileName(*text)) {
-        return Error{fmt::format("its \"{}\" would leave its folder: {}", name, *text)};
-      }
-    }
-    const std::string_view domain = *fields->getString("Domain");
-    if (isTemporaryName(domain)) return Error{fmt::format("not a domain: {}", domain)};
-    if (!fields->contains("Value")) return Error{"no \"Value\""};
-    const std::string_view user = *fields->getString("User");
-    const Owner owner = user == kProgramUserName  ? Owner::Program
-                        : user == kSystemUserName ? Owner::System
-                                                  : Owner::User;
-    return PreferenceWrite{owner, std::string(user), std::string(domain),
-                           std::string(*fields->getString("Key")),
-                           KvRef<KvObject>::share(fields->get("Value"))};
-  }
-
-  void record(std::string_view key, KvRef<KvObject> value) {
-    plan_.steps.push_back(PreferenceWrite{Owner::Program, std::string(kProgramUserName),
-                                          std::string(kProgramDomain), std::string(key),
-                                          std::move(value)});
-  }
-  void say(std::string text) { plan_.steps.push_back(TaskingMessage{false, std::move(text)}); }
-  void fault(const std::string& text) {
-    plan_.steps.push_back(TaskingMessage{true, "tasking: " + text});
-  }
+  void say(std::string text) { plan_.messages.push_back({false, std::move(text)}); }
+  void fault(const std::string& text) { plan_.messages.push_back({true, "tasking: " + text}); }
 
   const TaskingInputs& inputs_;
   TaskingPlan plan_;
-  std::set<std::string> domains_;  // of the program's own user, to be flushed
 };
 
 }  // namespace
 
 TaskingPlan planTasking(const TaskingInputs& inputs) { return Planner(inputs).plan(); }
+
+KvRef<KvDictionary> unfinishedRecord(const TaskingChange& change) {
+  auto unremoved = KvArray::create(change.removals.size());
+  for (const PreferenceWrite& removal : change.removals) {
+    unremoved->append(KvDictionary::create({{"User", KvString::create(removal.user)},
+                                            {"Domain", KvString::create(removal.domain)},
+                                            {"Key", KvString::create(removal.key)}}));
+  }
+  auto unwritten = KvArray::create(change.writes.size());
+  for (const PreferenceWrite& write : change.writes) {
+    unwritten->append(KvNumber::int64(static_cast<std::int64_t>(write.entry)));
+  }
+  auto record = KvDictionary::create();
+  record->set("TaskingID", change.id);
+  record->set("TaskingOS", change.system);
+  record->set("TaskingDigest", change.digest);
+  record->set("TaskingPayload", change.payload);
+  record->set(kUnremoved, std::move(unremoved));
+  record->set(kUnwritten, std::move(unwritten));
+  return record;
+}
 
 }  // namespace tally

@@ -8,8 +8,25 @@
 
 namespace tally {
 
-// Values by key and domain. Writes are seen by later reads at once and reach storage at
-// SMAPreferencesSynchronize of their domain, or when the program ends normally.
+// How a write ended. True when it is done.
+class WriteResult {
+ public:
+  enum Kind {
+    Written,
+    Failed,   // this time: the same write may succeed later
+    Refused,  // the store never takes such a write
+  };
+  constexpr WriteResult(Kind kind) : kind_(kind) {}
+  constexpr explicit operator bool() const { return kind_ == Written; }
+  constexpr bool isRefused() const { return kind_ == Refused; }
+
+ private:
+  Kind kind_;
+};
+
+// Values by key and domain. A key is any text, the empty one too. Writes are seen by later reads at
+// once and reach storage at SMAPreferencesSynchronize of their domain, or when the program ends
+// normally.
 class Preferences {
  public:
   virtual ~Preferences() = default;
@@ -18,9 +35,10 @@ class Preferences {
   // A null value removes the key.
   virtual void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
                                       std::string_view domain) = 0;
-  // Makes the domain's writes durable, in one atomic replacement. False when that failed; the
-  // reason is logged and the writes are kept for the next attempt.
-  virtual bool SMAPreferencesSynchronize(std::string_view domain) = 0;
+  // Makes the domain's writes durable, in one atomic replacement. The reason of a failure is logged
+  // once until a write to the domain succeeds, and the writes are kept for the next attempt;
+  // refused ones are forgotten.
+  virtual WriteResult SMAPreferencesSynchronize(std::string_view domain) = 0;
 
   // 0 when the key is absent or not a number.
   std::int32_t SMAPreferencesGetIntegerValue(std::string_view key, std::string_view domain);

@@ -4,6 +4,7 @@
 #include <string_view>
 
 #include "kv/value.h"
+#include "platform/preferences.h"
 
 namespace tally {
 
@@ -15,20 +16,18 @@ class SMASystemConfiguration {
   virtual KvRef<KvObject> getPreference(std::string_view key, std::string_view domain) = 0;
   // A null value removes the key. With sync the write is durable when the call returns; without, it
   // is safe from the end of this process, however it ends, but perhaps not yet from a power cut.
-  // A write that fails costs a log line.
-  virtual void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
-                             bool sync) = 0;
+  virtual WriteResult setPreference(std::string_view key, KvRef<KvObject> value,
+                                    std::string_view domain, bool sync) = 0;
 };
 
-// Writes the preferences of a named user. A write is durable when the call returns; one that fails
-// costs a log line.
+// Writes the preferences of a named user. A write is durable when the call returns.
 class SMAServicesClient {
  public:
   virtual ~SMAServicesClient() = default;
-  virtual void setPreference(std::string_view key, std::string_view user, std::string_view domain,
-                             KvRef<KvObject> value) = 0;
-  virtual void deletePreference(std::string_view key, std::string_view user,
-                                std::string_view domain) = 0;
+  virtual WriteResult setPreference(std::string_view key, std::string_view user,
+                                    std::string_view domain, KvRef<KvObject> value) = 0;
+  virtual WriteResult deletePreference(std::string_view key, std::string_view user,
+                                       std::string_view domain) = 0;
 };
 
 }  // namespace tally

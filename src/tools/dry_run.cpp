@@ -19,7 +19,7 @@ class OverlayPreferences final : public Preferences {
                               std::string_view domain) override {
     written_.insert_or_assign({std::string(domain), std::string(key)}, std::move(value));
   }
-  bool SMAPreferencesSynchronize(std::string_view) override { return true; }
+  WriteResult SMAPreferencesSynchronize(std::string_view) override { return WriteResult::Written; }
 
  private:
   std::shared_ptr<Preferences> base_;

@@ -29,14 +29,11 @@ std::size_t entriesOf(const KvObject* payload) {
 // The writes of a plan as rows, its messages as lines.
 class PlanView {
  public:
-  explicit PlanView(const TaskingPlan& plan) : postsNotification_(plan.postsNotification) {
-    for (const TaskingStep& step : plan.steps) {
-      if (const auto* write = std::get_if<PreferenceWrite>(&step)) {
-        add(*write);
-      } else if (const auto* message = std::get_if<TaskingMessage>(&step)) {
-        messages_.push_back(*message);
-      }
-    }
+  explicit PlanView(const TaskingPlan& plan) : messages_(plan.messages), isDue_(plan.isDue) {
+    if (!plan.change) return;
+    for (const PreferenceWrite& removal : plan.change->removals) add(removal);
+    for (const PreferenceWrite& write : plan.change->writes) add(write);
+    if (plan.change->payload) recorded_ = plan.change->id;
   }
   bool hasFaults() const { return std::ranges::any_of(messages_, &TaskingMessage::isFault); }
   Json json() const {
@@ -44,8 +41,10 @@ class PlanView {
     for (const TaskingMessage& message : messages_) {
       messages.push_back({{"fault", message.isFault}, {"text", message.text}});
     }
-    return {
-        {"messages", std::move(messages)}, {"writes", writes_}, {"notifies", postsNotification_}};
+    return {{"messages", std::move(messages)},
+            {"writes", writes_},
+            {"records", jsonOf(recorded_.get())},
+            {"notifies", isDue_}};
   }
   void print(const ToolContext& context) const {
     for (const TaskingMessage& message : messages_) {
@@ -56,7 +55,10 @@ class PlanView {
     } else {
       table_.print(context);
     }
-    if (postsNotification_) {
+    if (recorded_) {
+      printLine(context, fmt::format("then {} is in force", valueText(recorded_.get())));
+    }
+    if (isDue_) {
       printLine(context, fmt::format("then {} is posted", kTaskingNotification));
     }
   }
@@ -74,8 +76,9 @@ class PlanView {
     writes_.push_back(std::move(one));
   }
 
-  bool postsNotification_;
   std::vector<TaskingMessage> messages_;
+  KvRef<KvObject> recorded_;  // what will be in force; null: no tasking, or no other one
+  bool isDue_;
   Json writes_ = Json::array();
   Table table_{{{""},
                 {"user", Align::Left, true},
@@ -114,7 +117,7 @@ int show(const ToolContext& context, const TaskingArguments&) {
               {{"inForce", std::move(inForce)},
                {"scheduled", taskingJson(scheduled("TaskingID"), scheduled("TaskingDigest"),
                                          scheduled("TaskingPayload"))},
-               {"unfinished", static_cast<bool>(inputs.unfinishedPayload)},
+               {"unfinished", static_cast<bool>(inputs.unfinished)},
                {"change", plan.json()}});
   } else {
     Table table({{""}, {"", Align::Left, true}});
@@ -123,7 +126,7 @@ int show(const ToolContext& context, const TaskingArguments&) {
     table.add({"scheduled", taskingLine(scheduled("TaskingID"), scheduled("TaskingDigest"),
                                         scheduled("TaskingPayload"))});
     table.add({"system", kvText(inputs.build.get())});
-    if (inputs.unfinishedPayload) table.add({"unfinished", "an update was interrupted"});
+    if (inputs.unfinished) table.add({"unfinished", "an update is not complete"});
     table.print(context);
     printHeading(context, "The next run");
     plan.print(context);
@@ -164,8 +167,8 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   } else {
     view.print(context);
   }
-  if (!arguments.dryRun) carryOut(plan);
-  return view.hasFaults() ? kWrong : kSuccess;
+  const bool done = arguments.dryRun || carryOut(plan);
+  return done && !view.hasFaults() ? kSuccess : kWrong;
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 
 #include <functional>
 #include <map>
+#include <set>
 
 #include "fakes/fake_platform.h"
 #include "report/report.h"
@@ -71,38 +72,32 @@ TEST_F(TaskingTest, AppliesAndRollsBackInOrder) {
   const auto payloadText = [](const KvDictionary& tasking) {
     return kvText(tasking.get("TaskingPayload"));
   };
+  const std::string notes = "set " + kOwn + " TaskingUnfinished=";
   fake.preferences->put("LastOSUpdate", KvDictionary::create({{"version", text("1A1")}}),
                         kProgramDomain);
   EXPECT_THAT(
       update(taskingA()),
-      ElementsAre("set " + kOwn + " TaskingUnfinished=" + payloadText(*taskingA()),
-                  "synchronize " + kOwn, "set vellum.da G=a", "system sys S=a",
-                  "user guest dom K=a", "set vellum.da common=a", "set " + kOwn + " TaskingID=A",
-                  "set " + kOwn + " TaskingOS=1A1", "set " + kOwn + " TaskingDigest=digest of A",
+      ElementsAre(HasSubstr(notes), "synchronize " + kOwn, "set vellum.da G=a", "system sys S=a",
+                  "user guest dom K=a", "set vellum.da common=a", "synchronize vellum.da",
+                  "set " + kOwn + " TaskingID=A", "set " + kOwn + " TaskingOS=1A1",
+                  "set " + kOwn + " TaskingDigest=digest of A",
                   "set " + kOwn + " TaskingPayload=" + payloadText(*taskingA()),
-                  "remove " + kOwn + " TaskingUnfinished", "synchronize vellum.da",
-                  "synchronize " + kOwn, "post vellum.da.tasking_changed"));
+                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn,
+                  "post vellum.da.tasking_changed"));
   EXPECT_THAT(fake.log->lines, IsEmpty());
 
   EXPECT_THAT(update(taskingA()), IsEmpty());
   EXPECT_THAT(update(nullptr), IsEmpty()) << "a withdrawn schedule leaves the tasking in force";
 
   // Without a payload the former tasking goes, and nothing takes its place.
-  const std::vector<std::string> removal = {
-      "set " + kOwn + " TaskingUnfinished=" + kvText(KvArray::create().get()),
-      "synchronize " + kOwn,
-      "remove vellum.da G",
-      "system sys S removed unsynced",
-      "user guest dom K deleted",
-      "remove vellum.da common",
-      "remove " + kOwn + " TaskingID",
-      "remove " + kOwn + " TaskingDigest",
-      "remove " + kOwn + " TaskingPayload",
-      "remove " + kOwn + " TaskingUnfinished",
-      "synchronize vellum.da",
-      "synchronize " + kOwn,
-      "post vellum.da.tasking_changed"};
-  EXPECT_EQ(update(schedule("E", nullptr)), removal);
+  EXPECT_THAT(
+      update(schedule("E", nullptr)),
+      ElementsAre(HasSubstr(notes), "remove " + kOwn + " TaskingID",
+                  "remove " + kOwn + " TaskingDigest", "remove " + kOwn + " TaskingPayload",
+                  "synchronize " + kOwn, "remove vellum.da G", "system sys S removed unsynced",
+                  "user guest dom K deleted", "remove vellum.da common", "synchronize vellum.da",
+                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn,
+                  "post vellum.da.tasking_changed"));
   EXPECT_TRUE(fake.log->has(LogLevel::Default, "Tasking update (A -> E, 1A1 -> 1A1)"));
   EXPECT_EQ(own("TaskingOS"), "1A1");
   EXPECT_THAT(update(schedule("E", nullptr)), ElementsAre("post vellum.da.tasking_changed"));
@@ -115,6 +110,10 @@ TEST_F(TaskingTest, StatesOfTheRecordAndTheSchedule) {
   const auto otherSystem = [](TaskingTest& t) {
     t.update(taskingA());
     t.fake.preferences->put("TaskingOS", text("0Z9"), kProgramDomain);
+  };
+  const auto controlled = [](TaskingTest& t) {
+    t.fake.preferences->put("TaskingID", text("\uFFFD"), kProgramDomain);
+    t.fake.preferences->put("TaskingOS", text("1A1"), kProgramDomain);
   };
   const auto withoutPayload = [](TaskingTest& t) {
     t.update(taskingA());
@@ -134,6 +133,8 @@ TEST_F(TaskingTest, StatesOfTheRecordAndTheSchedule) {
       {"none, without payload", none, schedule("E", nullptr), "(null)", "(null)", "(null)", true,
        ""},
       {"current", inForce, taskingA(), "A", "a", "(null)", false, ""},
+      {"an ID that is stored in another form", controlled, schedule("\x01", KvArray::create()),
+       "\uFFFD", "(null)", "(null)", false, ""},
       {"another system", otherSystem, taskingA(), "A", "a", "(null)", true,
        "Tasking update (A -> A, 0Z9 -> 1A1)"},
       {"another ID", inForce, taskingB(), "B", "(null)", "b", true,
@@ -176,39 +177,53 @@ TEST_F(TaskingTest, ASystemUpdateIsNotedOnce) {
   EXPECT_THAT(update(nullptr), IsEmpty()) << "an unknown build is no change";
 }
 
-TEST_F(TaskingTest, BadEntriesAreSkippedWithALine) {
+TEST_F(TaskingTest, EntriesThatCanNeverBeWrittenAreSkippedWithALine) {
   const auto without = [](const char* field) {
     auto one = entry("mobile", "d", "k", "v");
     one->remove(field);
     return one;
   };
+  auto deep = KvArray::create();
+  for (int i = 0; i < 512; ++i) deep = KvArray::create({deep});
+  auto tooDeep = entry("mobile", "d", "k", "v");
+  tooDeep->set("Value", deep);
+  const auto good =
+      KvArray::create({entry("mobile", "d", "Wi-Fi / Cellular", "v"), entry("mobile", "d", "", "v"),
+                       entry("mobile", "d", "..", "v"), entry("mobile", "d", "twice", "first"),
+                       entry("mobile", "d", "twice", "last"), without("Value")});
   const auto payload = KvArray::create(
-      {text("x"), without("Domain"), without("User"), without("Key"), without("Value"),
+      {text("x"), without("Domain"), without("User"), without("Key"),
        entry("mobile", "../d", "k", "v"), entry("mobile", "..", "k", "v"),
        entry("a/b", "d", "k", "v"), entry("..", "d", "k", "v"), entry("", "d", "k", "v"),
-       entry("mobile", "d", "k/../k", "v"), entry("__sysmetra__", "/etc/d", "k", "v"),
+       entry("mobile", "d\x01", "k", "v"), entry("__sysmetra__", "/etc/d", "k", "v"),
        KvDictionary::create({{"User", KvNumber::int32(0)}, {"Domain", text("d")}}),
-       entry("mobile", "d", "good", "v")});
+       entry("mobile", "d", "k\x01", "v"), entry("mobile", "d", "k", "v\x01"), tooDeep});
+  const std::size_t bad = payload->size();
+  for (const auto& one : *good) payload->append(one);
   std::vector<std::string> effects;
   for (const std::string& call : update(schedule("A", payload))) {
     if (call.find(kOwn) == call.npos) effects.push_back(call);
   }
   EXPECT_THAT(effects,
-              ElementsAre("set d good=v", "synchronize d", "post vellum.da.tasking_changed"));
-  EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), payload->size() - 1);
+              ElementsAre("set d Wi-Fi / Cellular=v", "set d =v", "set d ..=v", "set d twice=last",
+                          "remove d k", "synchronize d", "post vellum.da.tasking_changed"));
+  EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), bad);
   EXPECT_TRUE(fake.log->has(LogLevel::Error,
-                            "tasking: entry 5 of the scheduled payload is skipped: its \"Domain\" "
-                            "would leave its folder: ../d"));
+                            "tasking: entry 4 of the scheduled payload is skipped: its \"Domain\" "
+                            "cannot be a file's name: ../d"));
+  EXPECT_EQ(own("TaskingID"), "A") << "what can never be written keeps no tasking out of force";
   EXPECT_TRUE(
       kvEqual(fake.preferences->SMAPreferencesGetValue("TaskingPayload", kProgramDomain).get(),
-              payload.get()));
+              good.get()));
 }
 
 // The device's storage, and a process that dies at its n-th operation: what it did not flush is
-// gone with it.
+// gone with it. Some of it may fail to be written.
 struct Dead {};
 struct Device {
   std::map<std::string, std::string> own, system, users;
+  std::set<std::string> failing, refusing;  // "DOMAIN", "DOMAIN KEY", "USER DOMAIN KEY"
+  std::vector<std::string> attempts;        // to write; "-" before a removal
   KvRef<KvObject> scheduled;
   std::map<std::string, KvRef<KvObject>> record;  // the program's own domain, with its types
 };
@@ -228,8 +243,9 @@ class MortalStores final : public Preferences,
     live();
     pending_[std::string(domain)].insert_or_assign(std::string(key), std::move(value));
   }
-  bool SMAPreferencesSynchronize(std::string_view domain) override {
+  WriteResult SMAPreferencesSynchronize(std::string_view domain) override {
     live();
+    if (const WriteResult result = resultOf(std::string(domain)); !result) return result;
     for (const auto& [key, value] : pending_[std::string(domain)]) {
       if (domain == kProgramDomain) {
         device_.record[key] = value;
@@ -239,37 +255,45 @@ class MortalStores final : public Preferences,
       }
     }
     pending_.erase(std::string(domain));
-    return true;
+    return WriteResult::Written;
   }
   KvRef<KvObject> getPreference(std::string_view key, std::string_view) override {
     return key == kScheduleKey ? device_.scheduled : nullptr;
   }
-  void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
-                     bool) override {
+  WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
+                            bool) override {
     live();
-    store(device_.system, std::string(domain) + " " + std::string(key), value.get());
+    return store(device_.system, std::string(domain) + " " + std::string(key), value.get());
   }
-  void setPreference(std::string_view key, std::string_view user, std::string_view domain,
-                     KvRef<KvObject> value) override {
+  WriteResult setPreference(std::string_view key, std::string_view user, std::string_view domain,
+                            KvRef<KvObject> value) override {
     live();
-    store(device_.users, fakes::FakeServicesClient::nameOf(key, user, domain), value.get());
+    return store(device_.users, fakes::FakeServicesClient::nameOf(key, user, domain), value.get());
   }
-  void deletePreference(std::string_view key, std::string_view user,
-                        std::string_view domain) override {
-    setPreference(key, user, domain, nullptr);
+  WriteResult deletePreference(std::string_view key, std::string_view user,
+                               std::string_view domain) override {
+    return setPreference(key, user, domain, nullptr);
   }
 
  private:
   void live() {
     if (life_-- == 0) throw Dead();
   }
-  static void store(std::map<std::string, std::string>& values, const std::string& name,
+  WriteResult resultOf(const std::string& name) const {
+    if (device_.refusing.contains(name)) return WriteResult::Refused;
+    return device_.failing.contains(name) ? WriteResult::Failed : WriteResult::Written;
+  }
+  WriteResult store(std::map<std::string, std::string>& values, const std::string& name,
                     const KvObject* value) {
+    device_.attempts.push_back((value != nullptr ? "" : "-") + name);
+    const WriteResult result = resultOf(name);
+    if (!result) return result;
     if (value == nullptr) {
       values.erase(name);
     } else {
       values[name] = kvText(value);
     }
+    return result;
   }
   Device& device_;
   int life_;
@@ -281,6 +305,9 @@ class MortalRunTest : public TaskingTest {
   // False when the run died.
   bool run(Device& device, const KvRef<KvDictionary>& scheduled, int life = 1'000'000) {
     device.scheduled = scheduled;
+    device.attempts.clear();
+    fake.log->lines.clear();
+    fake.calls->clear();
     const auto stores = std::make_shared<MortalStores>(device, life);
     Platform services = fake.services();
     services.preferences = stores;
@@ -302,6 +329,120 @@ class MortalRunTest : public TaskingTest {
     return all;
   }
 };
+
+TEST_F(MortalRunTest, WhatFailedIsTriedAgainAndNothingElse) {
+  const auto B = taskingB(), A = taskingA(), E = schedule("E", nullptr);
+  const KvRef<KvDictionary> none;
+  using Names = std::vector<std::string>;
+  // Tasking A is in force, and B is scheduled.
+  const struct {
+    const char* name;
+    std::set<std::string> failing, refusing;  // while B is applied for the first time
+    std::size_t lines;                        // about them
+    const char* inForce;                      // then
+    KvRef<KvDictionary> next;                 // scheduled for the second run, which meets no fault
+    Names attempts;                           // of it
+    const char* inForceAtLast;
+    const char* newBuild = nullptr;  // since the second run
+  } cases[] = {
+      {"nothing fails", {}, {}, 0, "B", B, {}, "B"},
+      {"a system write", {"sys T"}, {}, 1, "(null)", B, {"sys T"}, "B"},
+      {"a user's write", {"guest dom L"}, {}, 1, "(null)", B, {"guest dom L"}, "B"},
+      {"a domain of the program's user", {"zz"}, {}, 1, "(null)", B, {"zz H"}, "B"},
+      {"both directions of one domain",
+       {"vellum.da"},
+       {},
+       2,
+       "(null)",
+       B,
+       {"-vellum.da G", "vellum.da common"},
+       "B"},
+      {"a removal", {"sys S"}, {}, 1, "(null)", B, {"-sys S"}, "B"},
+      {"a refused write", {}, {"sys T"}, 1, "B", B, {}, "B"},
+      {"a refused removal", {}, {"guest dom K"}, 1, "B", B, {}, "B"},
+      {"the note",
+       {kOwn},
+       {},
+       1,
+       "A",
+       B,
+       {"-sys S", "-guest dom K", "sys T", "guest dom L", "-vellum.da G", "vellum.da common",
+        "zz H"},
+       "B"},
+      {"withdrawn while failing", {"sys T"}, {}, 1, "(null)", none, {"sys T"}, "B"},
+      {"the former one again",
+       {"sys T", "guest dom K"},
+       {},
+       2,
+       "(null)",
+       A,
+       {"-sys T", "-guest dom L", "-guest dom K", "sys S", "guest dom K", "-zz H", "vellum.da G",
+        "vellum.da common"},
+       "A"},
+      {"no payload any more",
+       {"sys T"},
+       {},
+       1,
+       "(null)",
+       E,
+       {"-sys T", "-guest dom L", "-zz H", "-vellum.da common"},
+       "(null)"},
+      {"a system update while failing",
+       {"sys T"},
+       {},
+       1,
+       "(null)",
+       B,
+       {"-sys T", "-guest dom L", "sys T", "guest dom L", "zz H", "vellum.da common"},
+       "B",
+       "1A2"},
+  };
+  const auto systemVersion = fake.deviceInformation->systemVersion;
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    Device device, expected;
+    fake.deviceInformation->systemVersion = systemVersion;
+    run(device, A);
+    device.failing = c.failing;
+    device.refusing = c.refusing;
+    const auto inForce = [&] {
+      const auto found = device.record.find("TaskingID");
+      return kvText(found == device.record.end() ? nullptr : found->second.get());
+    };
+    run(device, B);
+    EXPECT_EQ(inForce(), c.inForce);
+    EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), c.lines);
+    EXPECT_EQ(fake.calls->empty(), c.failing.contains(kOwn)) << "posted when something changed";
+    const bool isFinished = inForce() == "B";
+    // Once more with the same faults, which changes nothing.
+    if (!isFinished && !c.failing.contains(kOwn)) {
+      const auto before = everything(device);
+      run(device, B);
+      EXPECT_EQ(everything(device), before);
+      EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), c.lines);
+      EXPECT_THAT(*fake.calls, IsEmpty()) << "nothing changed";
+    }
+    device.failing.clear();
+    device.refusing.clear();
+    if (c.newBuild != nullptr) {
+      fake.deviceInformation->systemVersion =
+          KvDictionary::create({{"ProductBuildVersion", text(c.newBuild)}});
+    }
+    run(device, c.next);
+    EXPECT_EQ(device.attempts, c.attempts);
+    EXPECT_EQ(inForce(), c.inForceAtLast);
+    EXPECT_THAT(fake.log->texts(LogLevel::Error), IsEmpty());
+    EXPECT_EQ(*fake.calls, isFinished ? Names{} : Names{"post vellum.da.tasking_changed"});
+    if (!c.refusing.empty()) continue;
+    run(expected, c.next ? c.next : B);
+    auto found = everything(device), wanted = everything(expected);
+    for (auto* all : {&found, &wanted}) {
+      all->erase("record LastOSUpdate");
+      if (!device.record.contains("TaskingID")) all->erase("record TaskingOS");
+    }
+    EXPECT_EQ(found, wanted);
+  }
+}
 
 TEST_F(MortalRunTest, DeathsBetweenAnyStepsAreRepaired) {
   const auto taskingC = schedule("C", KvArray::create({entry("mobile", "vellum.da", "c", "c"),

@@ -4,7 +4,7 @@ import random
 import time
 import unittest
 
-from device import DeviceTest, LAST_DAY, TODAY, texts
+from device import DeviceTest, LAST_DAY, PREFERENCES, PROGRAM_DOMAIN, TODAY, texts
 
 SCHEDULE = "Library/Preferences/vellum.Ferryman.plist"
 FILES = {"mobile": "var/mobile/Library/Preferences/dom.plist", "__sysmetra__": "Library/Preferences/dom.plist",
@@ -19,8 +19,8 @@ def payload(identifier, count=1):
 
 class Tasking(DeviceTest):
     def schedule(self, device, identifier, entries):
-        device.write(SCHEDULE, {"ScheduledTasking": {"TaskingID": identifier, "TaskingDigest": b"\1\2",
-                                                     "TaskingPayload": entries}})
+        schedule = {"TaskingID": identifier, "TaskingDigest": b"\1\2", "TaskingPayload": entries}
+        device.write(SCHEDULE, plistlib.dumps({"ScheduledTasking": schedule}, fmt=plistlib.FMT_BINARY))
 
     def values(self, device):
         found = {}
@@ -61,16 +61,42 @@ class Tasking(DeviceTest):
         self.assertEqual(device.preferences()["TaskingID"], "B")
         self.assertNotIn("TaskingUnfinished", device.preferences())
 
+    def test_what_could_not_be_written_is_tried_again(self):
+        device = self.simple()
+        device.describe(SystemVersion={"ProductBuildVersion": "16S46"})
+        device.write("var/guest", b"a file in the folder's place")
+        # The record cannot hold this identifier as it is, and still tells that it is in force.
+        self.schedule(device, "A\x01", payload("A"))
+        for _ in range(2):
+            errors = texts(device.run("-f"), "error")
+            self.assertEqual(len([text for text in errors if text.startswith("tasking: ")]), 1, errors)
+            self.assertNotIn("TaskingID", device.preferences())
+            self.assertIn("TaskingUnfinished", device.preferences())
+        written = (device.root / FILES["mobile"]).stat()
+        (device.root / "var/guest").unlink()
+        self.assertEqual(texts(device.run("-f"), "error"), [])
+        self.assertEqual(self.values(device), {user: {"A0": 0} for user in FILES})
+        self.assertEqual((device.root / FILES["mobile"]).stat(), written)
+        record = device.preferences()
+        self.assertEqual([record.get(key) for key in RECORD],
+                         ["A\ufffd", "16S46", b"\1\2", payload("A"), None])
+        before = (device.root / PREFERENCES / f"{PROGRAM_DOMAIN}.plist").stat()
+        device.run("-f")
+        self.assertEqual((device.root / PREFERENCES / f"{PROGRAM_DOMAIN}.plist").stat(), before)
+
     def test_nothing_outside_the_folders_is_written(self):
         device = self.simple()
         names = ["../../../escaped", "..", ".", "", "a/b", "/etc/escaped"]
-        entries = [dict(payload("A")[0], **{field: name}) for field in ("Domain", "User", "Key")
-                   for name in names]
-        self.schedule(device, "A", entries + payload("A"))
+        entries = [dict(payload("A")[0], **{field: name}) for field in ("Domain", "User") for name in names]
+        # A key is text inside of a file; a group of the whitelist may be named like that.
+        keys = [dict(payload("A")[0], Key=name) for name in names + ["Wi-Fi / Cellular"]]
+        self.schedule(device, "A", entries + keys + payload("A"))
         before = {path for path in device.root.rglob("*")}
         messages = device.run("-f")
         self.assertEqual(sum("is skipped" in text for text in texts(messages, "error")), len(entries))
-        self.assertEqual(self.values(device), {user: {"A0": 0} for user in FILES})
+        written = {user: {"A0": 0} for user in FILES}
+        written["mobile"].update({entry["Key"]: 0 for entry in keys})
+        self.assertEqual(self.values(device), written)
         made = {str(path.relative_to(device.root)) for path in device.root.rglob("*")} - \
             {str(path.relative_to(device.root)) for path in before}
         self.assertEqual([path for path in made if "escaped" in path], [])

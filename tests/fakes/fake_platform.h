@@ -122,9 +122,10 @@ struct FakePreferences final : Preferences {
     calls->push_back(value ? "set " + name + "=" + kvText(value.get()) : "remove " + name);
     put(key, std::move(value), domain);
   }
-  bool SMAPreferencesSynchronize(std::string_view domain) override {
+  WriteResult SMAPreferencesSynchronize(std::string_view domain) override {
     calls->push_back("synchronize " + std::string(domain));
-    return !failingDomains.contains(std::string(domain));
+    return failingDomains.contains(std::string(domain)) ? WriteResult::Failed
+                                                        : WriteResult::Written;
   }
   // Sets a value without a record of it; null removes.
   void put(std::string_view key, KvRef<KvObject> value, std::string_view domain) {
@@ -153,11 +154,12 @@ struct FakeSystemConfiguration final : SMASystemConfiguration {
     const auto found = values.find({std::string(domain), std::string(key)});
     return found == values.end() ? nullptr : found->second;
   }
-  void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
-                     bool sync) override {
+  WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
+                            bool sync) override {
     calls->push_back("system " + std::string(domain) + " " + std::string(key) +
                      (value ? "=" + kvText(value.get()) : " removed") + (sync ? "" : " unsynced"));
     values[{std::string(domain), std::string(key)}] = std::move(value);
+    return WriteResult::Written;
   }
 };
 
@@ -165,16 +167,18 @@ struct FakeServicesClient final : SMAServicesClient {
   std::shared_ptr<CallLog> calls;
   std::map<std::string, KvRef<KvObject>> values;  // by "USER DOMAIN KEY"
 
-  void setPreference(std::string_view key, std::string_view user, std::string_view domain,
-                     KvRef<KvObject> value) override {
+  WriteResult setPreference(std::string_view key, std::string_view user, std::string_view domain,
+                            KvRef<KvObject> value) override {
     const std::string name = nameOf(key, user, domain);
     calls->push_back("user " + name + "=" + kvText(value.get()));
     values[name] = std::move(value);
+    return WriteResult::Written;
   }
-  void deletePreference(std::string_view key, std::string_view user,
-                        std::string_view domain) override {
+  WriteResult deletePreference(std::string_view key, std::string_view user,
+                               std::string_view domain) override {
     calls->push_back("user " + nameOf(key, user, domain) + " deleted");
     values.erase(nameOf(key, user, domain));
+    return WriteResult::Written;
   }
   static std::string nameOf(std::string_view key, std::string_view user, std::string_view domain) {
     return std::string(user) + " " + std::string(domain) + " " + std::string(key);

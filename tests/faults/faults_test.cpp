@@ -84,6 +84,8 @@ const char* const kSpool = "/var/mobile/Library/Logs/Submission";
 const char* const kStructuredData = "/var/mobile/Library/Logs/StructuredData";
 const char* const kRepairLogs = "/var/mobile/Library/Logs/Fixline";
 const char* const kPreferences = "/var/mobile/Library/Preferences";
+const char* const kTaskedFolders[] = {kPreferences, "/Library/Preferences",
+                                      "/var/guest/Library/Preferences"};
 
 class FaultWalk : public testing::TestWithParam<Fault> {
  protected:
@@ -149,6 +151,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     }
     EXPECT_EQ(repairLogs, (std::multiset<std::string>{"new", "old", "older"}));
     (void)loggedDays();
+    checkRecordedTasking();
     const auto noted = notedDay();
     EXPECT_TRUE(noted == kFormerRun - 1 || noted == scenario.day - 1) << noted;
     checkStore();
@@ -270,10 +273,19 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     if (done.tasked) checkTasking("present");
   }
 
+  // What is recorded as in force has been written, all of it.
+  void checkRecordedTasking() const {
+    const auto own = dictionaryIn(device->at(kPreferences) + "/vellum.tallyd.tallyrun.plist");
+    const auto tasking = own ? own->getString("TaskingID") : std::nullopt;
+    for (const char* const folder : kTaskedFolders) {
+      const auto domain = dictionaryIn(device->at(folder) + "/dom.plist");
+      EXPECT_TRUE(!tasking || (domain && domain->contains(*tasking))) << folder;
+    }
+  }
+
   // The scheduled tasking is in force, and nothing of another one is left.
   void checkTasking(const char* tasking) const {
-    for (const char* const folder : {"/var/mobile/Library/Preferences", "/Library/Preferences",
-                                     "/var/guest/Library/Preferences"}) {
+    for (const char* const folder : kTaskedFolders) {
       const auto domain = dictionaryIn(device->at(folder) + "/dom.plist");
       ASSERT_TRUE(domain) << folder;
       EXPECT_EQ(kvText(domain.get()),

@@ -42,17 +42,40 @@ TEST_F(PreferencesTest, WritesReachStorageAtSynchroniseOrAtTheEnd) {
   EXPECT_TRUE(errors().empty());
 }
 
-TEST_F(PreferencesTest, NothingIsWrittenWhenNothingChanges) {
-  auto preferences = open();
-  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
-  preferences.SMAPreferencesSynchronize(kDomain);
-  const auto before = DeviceRoot(root).identity(kFile);
-  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
-  preferences.SMAPreferencesSetValue("absent", nullptr, kDomain);
-  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
-  EXPECT_TRUE(preferences.SMAPreferencesSynchronize("vellum.never"));
-  EXPECT_EQ(DeviceRoot(root).identity(kFile), before);
-  EXPECT_FALSE(exists("prefs/vellum.never.plist"));
+TEST_F(PreferencesTest, OnlyWhatChangesIsWritten) {
+  const auto list = [](KvRef<KvObject> item) { return KvArray::create({std::move(item)}); };
+  const struct {
+    const char* name;
+    const char* key;
+    KvRef<KvObject> former, next;  // null: absent
+    bool writes;
+  } cases[] = {
+      {"the same", "a", number(1), number(1), false},
+      {"absent", "a", nullptr, nullptr, false},
+      {"another width", "a", number(1), KvNumber::int8(1), false},
+      {"an integer over a real", "a", KvNumber::float64(1), number(1), true},
+      {"inside of an array", "a", list(KvNumber::float64(1)), list(number(1)), true},
+      {"an integer that doubles round", "a", KvNumber::float64(9007199254740992.0),
+       number(9007199254740993), true},
+      {"a boolean over a number", "a", number(1), KvBoolean::of(true), true},
+      {"the empty key", "", number(1), number(2), true},
+      {"a key with a slash", "Wi-Fi / Cellular", number(1), number(2), true},
+      {"a key that names a folder", "..", number(1), nullptr, true},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("prefs"));
+    auto preferences = open();
+    preferences.SMAPreferencesSetValue(c.key, c.former, kDomain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    const auto before = DeviceRoot(root).identity(kFile);
+    EXPECT_EQ(before.has_value(), static_cast<bool>(c.former)) << "a file without a value";
+    preferences.SMAPreferencesSetValue(c.key, c.next, kDomain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_EQ(DeviceRoot(root).identity(kFile) != before, c.writes);
+    EXPECT_TRUE(kvIdentical(open().SMAPreferencesGetValue(c.key, kDomain).get(), c.next.get()));
+  }
+  EXPECT_TRUE(errors().empty());
 }
 
 TEST_F(PreferencesTest, SeesAndKeepsWhatOtherProcessesWrite) {
@@ -73,7 +96,7 @@ TEST_F(PreferencesTest, SeesAndKeepsWhatOtherProcessesWrite) {
     bool whole = true;
     for (int i = 0; i < kKeys; ++i) {
       preferences.SMAPreferencesSetValue(std::to_string(process * 100 + i), number(1), kDomain);
-      whole = preferences.SMAPreferencesSynchronize(kDomain) && whole;
+      whole = static_cast<bool>(preferences.SMAPreferencesSynchronize(kDomain)) && whole;
     }
     return whole;
   });
@@ -154,7 +177,7 @@ TEST_F(PreferencesTest, UnsafeDomainsAreRefused) {
     log->lines.clear();
     auto preferences = open();
     preferences.SMAPreferencesSetValue("a", number(1), domain);
-    EXPECT_FALSE(preferences.SMAPreferencesSynchronize(domain)) << domain;
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(domain).isRefused()) << domain;
     EXPECT_FALSE(preferences.SMAPreferencesGetValue("a", domain)) << domain;
     EXPECT_EQ(errors().size(), 3u) << domain;
   }
@@ -169,11 +192,26 @@ TEST_F(PreferencesTest, AFailedWriteKeepsTheChangesForTheNextAttempt) {
   auto preferences = open();
   preferences.SMAPreferencesSetValue("a", number(1), kDomain);
   EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain));
-  EXPECT_EQ(errors().size(), 1u);
+  EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
+  EXPECT_EQ(errors().size(), 1u) << "said once";
   EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 1);
   std::filesystem::remove(at("prefs"));
   EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
   EXPECT_EQ(stored("a"), 1);
+}
+
+TEST_F(PreferencesTest, AValueThatNoFileHoldsFailsNoLaterWrite) {
+  auto deep = KvArray::create();
+  for (int i = 0; i < kPlistMaximumDepth; ++i) deep = KvArray::create({deep});
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("deep", deep, kDomain);
+  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
+  EXPECT_FALSE(exists(kFile)) << "half of what belongs together";
+  preferences.SMAPreferencesSetValue("a", number(2), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(stored("a"), 2);
+  EXPECT_EQ(errors().size(), 1u);
 }
 
 TEST_F(PreferencesTest, AFullDiskLeavesTheOldFile) {

@@ -76,7 +76,7 @@ TEST_F(TaskingCommandsTest, BadTaskingsAreNamed) {
   putPlist("fault.plist", tasking("F", entryText("../../etc", "dom", "K")));
   const auto fault = run({"tasking", "apply", at("fault.plist"), "--dry-run"});
   EXPECT_EQ(fault.status, kWrong);
-  EXPECT_THAT(fault.out, HasSubstr("its \"User\" would leave its folder: ../../etc"));
+  EXPECT_THAT(fault.out, HasSubstr("its \"User\" cannot be a file's name: ../../etc"));
   put("text", "no property list");
   putPlist("unnamed", "<dict><key>TaskingPayload</key><array/></dict>");
   for (const char* name : {"text", "absent", "unnamed"}) {

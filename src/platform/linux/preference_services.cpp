@@ -18,30 +18,30 @@ KvRef<KvObject> FileSystemConfiguration::getPreference(std::string_view key,
   return preferences_.SMAPreferencesGetValue(key, domain);
 }
 
-void FileSystemConfiguration::setPreference(std::string_view key, KvRef<KvObject> value,
-                                            std::string_view domain, bool) {
+WriteResult FileSystemConfiguration::setPreference(std::string_view key, KvRef<KvObject> value,
+                                                   std::string_view domain, bool) {
   preferences_.SMAPreferencesSetValue(key, std::move(value), domain);
-  preferences_.SMAPreferencesSynchronize(domain);
+  return preferences_.SMAPreferencesSynchronize(domain);
 }
 
-void FileServicesClient::setPreference(std::string_view key, std::string_view user,
-                                       std::string_view domain, KvRef<KvObject> value) {
+WriteResult FileServicesClient::setPreference(std::string_view key, std::string_view user,
+                                              std::string_view domain, KvRef<KvObject> value) {
   auto found = users_.find(user);
   if (found == users_.end()) {
     const auto folder = userPreferencesFolder(root_, user);
     if (!folder) {
       log_->fault("preferences: not a user's name", "preferences of {}: not a user's name", user);
-      return;
+      return WriteResult::Refused;
     }
     found = users_.try_emplace(std::string(user), *folder, log_, kUserFileMode, access_).first;
   }
   found->second.SMAPreferencesSetValue(key, std::move(value), domain);
-  found->second.SMAPreferencesSynchronize(domain);
+  return found->second.SMAPreferencesSynchronize(domain);
 }
 
-void FileServicesClient::deletePreference(std::string_view key, std::string_view user,
-                                          std::string_view domain) {
-  setPreference(key, user, domain, nullptr);
+WriteResult FileServicesClient::deletePreference(std::string_view key, std::string_view user,
+                                                 std::string_view domain) {
+  return setPreference(key, user, domain, nullptr);
 }
 
 }  // namespace tally

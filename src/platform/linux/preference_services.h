@@ -17,8 +17,8 @@ class FileSystemConfiguration final : public SMASystemConfiguration {
   FileSystemConfiguration(const DeviceRoot& root, std::shared_ptr<SystemLog> log,
                           PropertyListPreferences::Access access);
   KvRef<KvObject> getPreference(std::string_view key, std::string_view domain) override;
-  void setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
-                     bool sync) override;
+  WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
+                            bool sync) override;
 
  private:
   PropertyListPreferences preferences_;
@@ -29,10 +29,10 @@ class FileServicesClient final : public SMAServicesClient {
   FileServicesClient(DeviceRoot root, std::shared_ptr<SystemLog> log,
                      PropertyListPreferences::Access access)
       : root_(std::move(root)), log_(std::move(log)), access_(access) {}
-  void setPreference(std::string_view key, std::string_view user, std::string_view domain,
-                     KvRef<KvObject> value) override;
-  void deletePreference(std::string_view key, std::string_view user,
-                        std::string_view domain) override;
+  WriteResult setPreference(std::string_view key, std::string_view user, std::string_view domain,
+                            KvRef<KvObject> value) override;
+  WriteResult deletePreference(std::string_view key, std::string_view user,
+                               std::string_view domain) override;
 
  private:
   DeviceRoot root_;

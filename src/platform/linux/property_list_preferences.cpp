@@ -2,6 +2,7 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <utility>
 
@@ -45,11 +46,12 @@ void PropertyListPreferences::SMAPreferencesSetValue(std::string_view key, KvRef
   if (Domain* const state = find(domain)) state->pending.insert_or_assign(std::string(key), value);
 }
 
-bool PropertyListPreferences::SMAPreferencesSynchronize(std::string_view domain) {
+WriteResult PropertyListPreferences::SMAPreferencesSynchronize(std::string_view domain) {
   const std::lock_guard lock(mutex_);
   Domain* const state = find(domain);
-  if (state == nullptr || access_ == Access::ReadOnly) return state != nullptr;
-  return state->pending.empty() || writePending(*state, domain);
+  if (state == nullptr) return WriteResult::Refused;
+  if (access_ == Access::ReadOnly || state->pending.empty()) return WriteResult::Written;
+  return writePending(*state, domain);
 }
 
 KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain) {
@@ -184,39 +186,52 @@ Result<FileLock> PropertyListPreferences::lockFolder(const Directory& folder) {
   return lock;
 }
 
-bool PropertyListPreferences::writePending(Domain& state, std::string_view domain) {
-  const auto folder = folder_.make();
-  const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
-  if (!lock) {
-    report(domain, "not written", lock.error().message);
-    return false;
-  }
-  reload(state, domain, &*folder);
-  if (!state.writable) {
-    report(domain, "not written", "what is there cannot be read");
-    return false;
-  }
-  const auto merged = state.stored->copy();
-  bool changed = false;
-  for (const auto& [key, value] : state.pending) {
-    if (kvEqual(merged->get(key), value.get())) continue;
-    merged->set(key, value);
-    changed = true;
-  }
-  if (changed) {
+// True when the file, as it was last read, needs no change.
+bool PropertyListPreferences::isStored(const Domain& state) {
+  return state.read && state.writable &&
+         std::all_of(state.pending.begin(), state.pending.end(), [&](const auto& change) {
+           return kvIdentical(state.stored->get(change.first), change.second.get());
+         });
+}
+
+WriteResult PropertyListPreferences::writePending(Domain& state, std::string_view domain) {
+  // A removal of what is not there needs no right to write, and makes no directory. After a failure
+  // the file may be the new one already, and yet not durable.
+  refresh(state, domain);
+  if (state.failing || !isStored(state)) {
+    const auto folder = folder_.make();
+    const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
+    if (!lock && !state.writable) return WriteResult::Failed;  // the line about reading says why
+    if (!lock) return failed(state, domain, lock.error().message);
+    reload(state, domain, &*folder);
+    if (!state.writable) {
+      return failed(state, domain, "what is there cannot be read");
+    }
+    const auto merged = state.stored->copy();
+    for (const auto& [key, value] : state.pending) merged->set(key, value);
     const auto text = encodeXmlPlist(*merged);
+    if (!text) {
+      // Kept, they would fail every later write of the domain as well.
+      state.pending.clear();
+      report(domain, "not written", text.error().message);
+      return WriteResult::Refused;
+    }
     const std::string name = fileNameOf(domain);
-    const Status written =
-        text ? writeFileAtomically(*folder, name, *text, mode_) : Status(text.error());
-    if (!written) {
-      report(domain, "not written", written.error().message);
-      return false;
+    if (const Status written = writeFileAtomically(*folder, name, *text, mode_); !written) {
+      return failed(state, domain, written.error().message);
     }
     state.stored = merged;
     state.identity = folder->identity(name);
   }
   state.pending.clear();
-  return true;
+  state.failing = false;
+  return WriteResult::Written;
+}
+
+WriteResult PropertyListPreferences::failed(Domain& state, std::string_view domain,
+                                            const std::string& fault) const {
+  if (!std::exchange(state.failing, true)) report(domain, "not written", fault);
+  return WriteResult::Failed;
 }
 
 void PropertyListPreferences::report(std::string_view domain, std::string_view fault,

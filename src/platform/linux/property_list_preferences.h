@@ -36,7 +36,7 @@ class PropertyListPreferences final : public Preferences {
   KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view domain) override;
   void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
                               std::string_view domain) override;
-  bool SMAPreferencesSynchronize(std::string_view domain) override;
+  WriteResult SMAPreferencesSynchronize(std::string_view domain) override;
 
   // All keys of a domain as they read now; empty when there are none.
   KvRef<KvDictionary> copyDomain(std::string_view domain);
@@ -50,6 +50,7 @@ class PropertyListPreferences final : public Preferences {
     std::optional<FileIdentity> identity;                         // of the file that was read
     bool read = false;
     bool writable = true;  // false while the file holds something that could not be read
+    bool failing = false;  // the last write failed, which was said
   };
 
   Domain* find(std::string_view domain);
@@ -60,7 +61,9 @@ class PropertyListPreferences final : public Preferences {
                const Directory* locked);
   Status setAside(const Directory& folder, std::string_view domain) const;
   Result<FileLock> lockFolder(const Directory& folder);
-  bool writePending(Domain& state, std::string_view domain);
+  static bool isStored(const Domain& state);
+  WriteResult writePending(Domain& state, std::string_view domain);
+  WriteResult failed(Domain& state, std::string_view domain, const std::string& fault) const;
   // The reason may be empty.
   void report(std::string_view domain, std::string_view fault, std::string_view reason) const;
 
