@@ -80,6 +80,12 @@ void DailyJob::runIfNewDay(const KvArray* appInfo) {
       preferences.SMAPreferencesGetIntegerValue(kLastProcessedDay, kProgramDomain);
   if (last >= yesterday) {
     logMessage(LogLevel::Default, "Day unchanged since last run");
+    if (last > yesterday) {
+      logMessage(LogLevel::Error,
+                 "day {} counts as processed, but by the clock it is not over: no day is processed "
+                 "until then; see tallyctl doctor",
+                 last);
+    }
     return;
   }
   // Asked before the day's work: a whitelist that arrives meanwhile has admitted nothing yet.

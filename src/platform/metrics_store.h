@@ -48,7 +48,7 @@ class MetricsStore {
   virtual ~MetricsStore() = default;
   // Whole days since 1970-01-01 UTC, now.
   virtual std::int32_t TBDaysSince1970() = 0;
-  // Folds new samples into their day's chunks and forgets days older than 30.
+  // Folds new samples into their day's chunks and forgets old days.
   virtual void TBClientCheckpoint() = 0;
   // Sets the scalar for the day in progress; a store that does not exist yet is created. A failure
   // is logged.

@@ -27,11 +27,19 @@ int examine(const ToolContext& context) {
     const HealthName& health = kNames[static_cast<std::size_t>(line.health)];
     table.add({Cell(fmt::format("[{}]", health.name), health.ink), line.subject, line.text});
     document.push_back({{"health", health.name}, {"subject", line.subject}, {"text", line.text}});
+    if (!line.repair.empty()) document.back()["repair"] = line.repair;
   }
   if (context.json) {
     printJson(context, document);
   } else {
     print(context.out, table.render(context.output, 0));
+    for (const HealthLine& line : lines) {  // whole, so that it can be copied
+      if (line.repair.empty()) continue;
+      print(context.out, "\n");
+      printLine(context,
+                fmt::format("If the clock is right now, this repairs the {}:", line.subject));
+      printLine(context, "  " + line.repair);
+    }
     print(context.out, "\n");
     printLine(context, wrong == 0 ? "nothing is wrong" : fmt::format("{} wrong", wrong),
               wrong == 0 ? Ink::Good : Ink::Bad);

@@ -17,6 +17,7 @@ enum class Health {
 struct HealthLine {
   Health health;
   std::string subject, text;
+  std::string repair = {};  // a command line for a shell; empty: none is known
 };
 
 // Every check, in the order in which a day's run meets what they look at. Nothing is changed.
@@ -24,7 +25,7 @@ std::vector<HealthLine> examineDevice(const ToolContext& context);
 
 // Those of the files below the root, of the services, and of the drivers.
 void examineFiles(const ToolContext& context, std::vector<HealthLine>& lines);
-void examineServices(std::vector<HealthLine>& lines);
+void examineServices(const ToolContext& context, std::vector<HealthLine>& lines);
 void examineDrivers(std::vector<HealthLine>& lines);
 
 }  // namespace tally::tools

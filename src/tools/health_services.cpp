@@ -4,6 +4,7 @@
 
 #include "base/time_text.h"
 #include "config/internal_device.h"
+#include "platform/linux/store_retention.h"
 #include "platform/linux/system_log.h"
 #include "platform/platform.h"
 #include "report/report.h"
@@ -16,8 +17,8 @@ namespace {
 using Lines = std::vector<HealthLine>;
 
 void examineClock(Lines& lines) {
-  constexpr double kFirstSane = 1704067200;  // 2024-01-01: older than any device that runs this
-  constexpr double kLastSane = 4102444800;   // 2100-01-01
+  constexpr double kFirstSane = kFirstPlausibleDay * kSecondsPerDay;
+  constexpr double kLastSane = 4102444800;  // 2100-01-01
   const double now = platform().clock->secondsSince1970();
   std::string text;
   appendTimestamp(text, now);
@@ -26,7 +27,14 @@ void examineClock(Lines& lines) {
                    sane ? text : text + " cannot be now: it was never set"});
 }
 
-void examineDay(Lines& lines) {
+// The text as one word of a POSIX shell.
+std::string shellWord(std::string_view text) {
+  std::string word = "'";
+  for (const char c : text) word += c == '\'' ? std::string("'\\''") : std::string(1, c);
+  return word + "'";
+}
+
+void examineDay(const ToolContext& context, Lines& lines) {
   constexpr const char* kSubject = "last day";
   const std::int32_t yesterday = platform().metricsStore->TBDaysSince1970() - 1;
   const std::int32_t last =
@@ -34,10 +42,15 @@ void examineDay(Lines& lines) {
   if (last == 0) {
     lines.push_back({Health::Missing, kSubject, "tallyrun -d has processed no day yet"});
   } else if (last > yesterday) {
-    lines.push_back({Health::Wrong, kSubject,
-                     fmt::format("{} was processed, which is not over: the clock went back, and "
-                                 "no day is processed until then",
-                                 dayName(last))});
+    // With a clock that was never set, it is the clock that has to be repaired.
+    const bool clockIsSet = yesterday >= kFirstPlausibleDay;
+    lines.push_back(
+        {Health::Wrong, kSubject,
+         fmt::format("{} was processed, which is not over: no day is processed until then",
+                     dayName(last)),
+         clockIsSet ? fmt::format("tallyctl --root {} prefs set {} {}", shellWord(context.root),
+                                  kLastProcessedDay, yesterday - 1)
+                    : ""});
   } else {
     lines.push_back({last == yesterday ? Health::Ok : Health::Missing, kSubject,
                      fmt::format("{} was processed{}", dayName(last),
@@ -144,9 +157,9 @@ void examineKernel(Lines& lines) {
 
 }  // namespace
 
-void examineServices(Lines& lines) {
+void examineServices(const ToolContext& context, Lines& lines) {
   examineClock(lines);
-  examineDay(lines);
+  examineDay(context, lines);
   examineLogging(lines);
   examineIdentity(lines);
   examineUser(lines);
@@ -157,7 +170,7 @@ void examineServices(Lines& lines) {
 std::vector<HealthLine> examineDevice(const ToolContext& context) {
   Lines lines;
   examineFiles(context, lines);
-  examineServices(lines);
+  examineServices(context, lines);
   examineDrivers(lines);
   return lines;
 }

@@ -93,6 +93,7 @@ TEST_F(DailyJobTest, SwitchesProcessTheirDay) {
     const auto messages = fake.log->texts(LogLevel::Default);
     EXPECT_EQ(messages.front(), "tallyrun started");
     EXPECT_EQ(messages.back(), "tallyrun ended");
+    EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), c.stored > kToday - 1 ? 1u : 0u);
     if (!c.message.empty()) {
       EXPECT_THAT(messages, ElementsAre("tallyrun started", c.message, "tallyrun ended"));
     }

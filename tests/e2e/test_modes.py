@@ -1,7 +1,10 @@
 """Run modes, days and switches of the real program."""
+import json
+import os
+import subprocess
 import unittest
 
-from device import DeviceTest, LAST_DAY, TODAY, WHITELIST, group, texts
+from device import BIN, DeviceTest, LAST_DAY, TODAY, WHITELIST, group, texts
 
 YESTERDAY = TODAY - 1
 UNCHANGED = "Day unchanged since last run"
@@ -38,6 +41,40 @@ class Modes(DeviceTest):
             device.run("-d", day=day)
         self.assertEqual(self.logged_days(device), [TODAY - 1, TODAY + 1])
         self.assertEqual(device.preferences()[LAST_DAY], TODAY + 1)
+
+    def test_a_wrong_clock_costs_no_day_and_no_row(self):
+        cases = {  # the days of the runs under the wrong clock
+            "one run ten years ahead": [TODAY + 3650],
+            "a week ten years ahead": range(TODAY + 3650, TODAY + 3657),
+            "a week of boots in 1970": [0, 0, 0, 1, 2, 0, 3],
+        }
+        first = TODAY - 29
+        for name, wrong in cases.items():
+            with self.subTest(name):
+                device = self.fresh()
+                device.root = device.root / "a device's"  # for the quotes in the repair
+                device.describe()
+                device.whitelist(G=group({"a": {}}))
+                device.store([("a", day, day) for day in range(first, TODAY + 1)])
+                device.run("-d")
+                for day in wrong:
+                    device.run("-d", day=day)
+                    device.store([("a", day, day)])
+                device.store([("a", TODAY + 1, TODAY + 1)])
+                ahead = max(wrong) > TODAY
+                messages = device.run("-d", day=TODAY + 2)
+                stuck = [text for text in texts(messages, "error") if "counts as processed" in text]
+                self.assertEqual(len(stuck), ahead)
+                findings = json.loads(device.tool("doctor", "--json", status=None, day=TODAY + 2))
+                repairs = [line["repair"] for line in findings if "repair" in line]
+                self.assertEqual(len(repairs), ahead)
+                for repair in repairs:
+                    subprocess.run(["/bin/sh", "-c", repair], check=True, env=dict(os.environ, PATH=BIN))
+                    device.run("-d", day=TODAY + 2)
+                self.assertLessEqual({YESTERDAY, TODAY + 1}, set(self.logged_days(device)))
+                rows = device.tool("store", "dump").splitlines()
+                kept = {int(row.split(",")[2]) for row in rows if row.startswith("scalar,a,")}
+                self.assertLessEqual(set(range(first + 2, TODAY + 2)), kept)
 
     def test_the_day_changes_at_midnight_utc(self):
         device = self.simple()

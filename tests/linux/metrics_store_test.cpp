@@ -212,17 +212,79 @@ TEST_F(StoreTest, DistributionsOfBothTablesAreOneSeriesInOrder) {
   EXPECT_THAT(keys, ElementsAre("a", "b", "c", "a"));
 }
 
-TEST_F(StoreTest, ACheckpointForgetsDaysOlderThanThirty) {
-  for (const std::int32_t day : {kToday - 31, kToday - 30, kToday, kToday + 5}) {
-    ASSERT_TRUE(push(day, "d", {1, 2}));
-    ASSERT_TRUE(write([&](StoreWriter& writer) { return writer.setScalar(day, "s", 1); }));
+TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClockGoes) {
+  const auto record = [&](std::int32_t first, std::int32_t last) {
+    ASSERT_TRUE(write([&](StoreWriter& writer) -> Status {
+      for (std::int32_t day = first; day <= last; ++day) {
+        const double value = 1;
+        const std::uint32_t offset = 0;
+        if (auto set = writer.setScalar(day, "s", day); !set) return set;
+        if (auto pushed = writer.pushSamples(day, "d", {&value, 1}, {&offset, 1}); !pushed) {
+          return pushed;
+        }
+      }
+      return Done{};
+    }));
+  };
+  const auto checkpointOn = [&](std::int32_t day, std::uint64_t most = kMostStoreBytes) {
+    clock->setDay(day);
+    makeSqliteMetricsStore(path, log, clock, most)->TBClientCheckpoint();
+  };
+  const auto left = [&](std::int32_t first, std::int32_t last) {
+    return scalars("s", first - 1, last).size() + distributions("d", first - 1, last).size();
+  };
+  constexpr std::int32_t kDays = 30;
+  const struct {
+    const char* name;
+    std::vector<std::int32_t> wrong;  // the days of runs under the wrong clock
+    std::size_t wrongLeft;            // of them, after the clock is right again
+  } cases[] = {
+      {"none", {}, 0},
+      {"one run ten days ahead", {kToday + 10}, 1},
+      {"a week ten years ahead", {24000, 24001, 24002, 24003, 24004, 24005, 24006}, 7},
+      {"a week of boots in 1970", {0, 0, 0, 1, 0, 2}, 0},
+      {"a week a year ago", {20100, 20101, 20102, 20103, 20104, 20105, 20106}, 0},
+      {"the ends of time", {kFirst, kLast - 1, kToday + 4000, kLast, 0}, 3},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("data"));
+    record(kToday - kDays - 4, kToday - 1);
+    checkpointOn(kToday - 1);
+    for (const std::int32_t day : c.wrong) {
+      checkpointOn(day);
+      record(day, day);
+      EXPECT_EQ(left(kToday - kDays, kToday - 1), 2u * kDays) << "after a run on day " << day;
+    }
+    checkpointOn(kToday);
+    EXPECT_EQ(left(kToday - kDays, kToday - 1), 2u * kDays);
+    EXPECT_EQ(scalars().size(), kDays + c.wrongLeft);
+    EXPECT_THAT(errors(), IsEmpty());
   }
-  store()->TBClientCheckpoint();
-  EXPECT_THAT(scalars(), ElementsAre("20484 s=1", "20514 s=1", "20519 s=1"));
-  EXPECT_THAT(lengths(), ElementsAre("20484 d x2", "20514 d x2", "20519 d x2"));
-  clock->setDay(kToday + 1);
-  store()->TBClientCheckpoint();
-  EXPECT_EQ(lengths().size(), 2u) << "also with nothing to fold";
+  checkpointOn(kToday, 24u << 10);  // less than the tables alone take
+  EXPECT_THAT(lengths(), ElementsAre("20513 d x1")) << "what is still to be reported stays";
+  EXPECT_EQ(log->texts(LogLevel::Default).size(), 1u);
+}
+
+TEST_F(StoreTest, AStoreThatIsTooLargeFirstLosesWhatAWrongClockRecorded) {
+  const struct {
+    std::vector<std::int32_t> days;  // from the newest on
+    std::vector<std::int32_t> order;
+  } cases[] = {
+      {{20014, 20013, 20012, 20011, 3, 2}, {2, 3, 20011, 20012}},
+      {{24000, 20014, 20013, 20012, 19970, 19969}, {24000, 19969, 19970, 20012}},
+      {{24001, 24000, 20000, 19999}, {24000, 24001, 19999, 20000}},  // as long: the farthest first
+      {{20014, 20013}, {}},
+  };
+  for (const auto& c : cases) EXPECT_EQ(leastCredibleDays(c.days, 20014), c.order);
+  store()->TBClientSetValueForScalarKey("a", 1);
+  sql("WITH RECURSIVE n(d) AS (SELECT 1 UNION ALL SELECT d + 40 FROM n LIMIT 5000) "
+      "INSERT INTO scalars SELECT d, 'x', 0 FROM n");
+  sql("INSERT INTO scalars VALUES (-1.5, 'x', 0), ('x', 'x', 0), (9e18, 'x', 0)");
+  for (int run = 0; run < 3; ++run) store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT count(DISTINCT day) FROM scalars"), std::to_string(kMostDaysKept + 3))
+      << "one day for each row: only the damaged rows are left beside the bound";
+  EXPECT_THAT(scalars("a"), ElementsAre("20514 a=1"));
 }
 
 TEST_F(StoreTest, ABatchIsOneTransactionOfTheDayInProgress) {

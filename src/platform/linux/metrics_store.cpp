@@ -6,14 +6,15 @@
 #include <utility>
 #include <vector>
 
+#include <fmt/format.h>
+
 #include "base/time_text.h"
 #include "platform/linux/store_history.h"
+#include "platform/linux/store_retention.h"
 #include "platform/linux/store_writer.h"
 
 namespace tally {
 namespace {
-
-constexpr std::int32_t kDaysKept = 30;
 
 // A checkpoint of millions of new samples takes minutes, for which nobody who records would wait.
 // It lets the others in between, long enough for those who look only ten times a second.
@@ -23,8 +24,11 @@ constexpr std::chrono::milliseconds kPauseForOthers{150};
 class SqliteMetricsStore final : public MetricsStore {
  public:
   SqliteMetricsStore(std::string path, std::shared_ptr<SystemLog> log,
-                     std::shared_ptr<const Clock> clock)
-      : path_(std::move(path)), log_(std::move(log)), clock_(std::move(clock)) {}
+                     std::shared_ptr<const Clock> clock, std::uint64_t maximumBytes)
+      : path_(std::move(path)),
+        log_(std::move(log)),
+        clock_(std::move(clock)),
+        maximumBytes_(maximumBytes) {}
 
   std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock_->secondsSince1970()); }
 
@@ -83,20 +87,62 @@ class SqliteMetricsStore final : public MetricsStore {
     if (!opened) return opened.error();
     if (*opened == nullptr) return Done{};
     StoreWriter& store = **opened;
-    const std::int32_t oldest = TBDaysSince1970() - kDaysKept;
-    const auto needed = store.needsCheckpoint(oldest);
+    const auto needed = needsCheckpoint(store);
     if (!needed) return needed.error();
     if (!*needed) return Done{};
     for (bool complete = false;;) {
+      std::size_t dropped = 0;
       auto done = transaction(store, [&]() -> Status {
         const auto folded = store.foldRecentUntil(std::chrono::steady_clock::now() + kLongestTurn);
         if (!folded) return folded.error();
         complete = *folded;
-        return complete ? store.forgetBefore(oldest) : Status(Done{});
+        return complete ? forgetDays(store, dropped) : Status(Done{});
       });
+      if (done && dropped > 0) {
+        log_->write(
+            LogLevel::Default,
+            fmt::format("metrics store {}: too large, {} days are removed before their time", path_,
+                        dropped));
+      }
       if (!done || complete) return done;
       std::this_thread::sleep_for(kPauseForOthers);
     }
+  }
+
+  Result<bool> isTooLarge(StoreWriter& store, std::size_t days) const {
+    const auto used = store.usedBytes();
+    if (!used) return used.error();
+    return days > kMostDaysKept || *used > maximumBytes_;
+  }
+
+  // Looks without the lock whether a checkpoint has anything to do.
+  Result<bool> needsCheckpoint(StoreWriter& store) {
+    const auto recent = store.hasRecent();
+    if (!recent || *recent) return recent;
+    const auto days = store.days();
+    if (!days) return days.error();
+    if (firstDayKept(*days, TBDaysSince1970())) return true;
+    const auto tooLarge = isTooLarge(store, days->size());
+    if (!tooLarge) return tooLarge;
+    return *tooLarge && !leastCredibleDays(*days, TBDaysSince1970()).empty();
+  }
+
+  Status forgetDays(StoreWriter& store, std::size_t& dropped) {
+    auto days = store.days();
+    if (!days) return days.error();
+    const std::int32_t today = TBDaysSince1970();
+    if (const auto first = firstDayKept(*days, today)) {
+      if (auto done = store.forgetBefore(*first); !done) return done;
+      while (days->back() < *first) days->pop_back();
+    }
+    for (const std::int32_t day : leastCredibleDays(*days, today)) {
+      const auto tooLarge = isTooLarge(store, days->size() - dropped);
+      if (!tooLarge) return tooLarge.error();
+      if (!*tooLarge) break;
+      if (auto done = store.forgetDay(day); !done) return done;
+      ++dropped;
+    }
+    return Done{};
   }
 
   void writeBatch() {
@@ -116,6 +162,7 @@ class SqliteMetricsStore final : public MetricsStore {
   std::string path_;
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<const Clock> clock_;
+  std::uint64_t maximumBytes_;
   std::optional<StoreWriter> writer_;
   std::vector<Scalar> batch_;
   int batchDepth_ = 0;
@@ -125,8 +172,10 @@ class SqliteMetricsStore final : public MetricsStore {
 
 std::shared_ptr<MetricsStore> makeSqliteMetricsStore(std::string path,
                                                      std::shared_ptr<SystemLog> log,
-                                                     std::shared_ptr<const Clock> clock) {
-  return std::make_shared<SqliteMetricsStore>(std::move(path), std::move(log), std::move(clock));
+                                                     std::shared_ptr<const Clock> clock,
+                                                     std::uint64_t maximumBytes) {
+  return std::make_shared<SqliteMetricsStore>(std::move(path), std::move(log), std::move(clock),
+                                              maximumBytes);
 }
 
 }  // namespace tally

@@ -11,6 +11,8 @@ namespace {
 
 // Far above what a day can hold; a number beyond it was not written by this program.
 constexpr std::int64_t kMostChunks = std::numeric_limits<std::int32_t>::max();
+// No clock makes so many, but a damaged file may hold one for each row.
+constexpr std::size_t kMostDaysListed = 4096;
 
 }  // namespace
 
@@ -226,24 +228,56 @@ Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point 
   return step == Step::Done;
 }
 
-Status StoreWriter::forgetBefore(std::int32_t day) {
-  for (const char* text :
-       {"DELETE FROM scalars WHERE day < ?1", "DELETE FROM chunks WHERE day < ?1",
-        "DELETE FROM recent WHERE day < ?1"}) {
-    auto statement = database_.prepare(text);
+Status StoreWriter::forget(std::string_view which, std::int32_t day) {
+  for (const char* table : {"scalars", "chunks", "recent"}) {
+    auto statement =
+        database_.prepare("DELETE FROM " + std::string(table) + " WHERE day " + std::string(which));
     if (!statement) return statement.error();
     if (!statement->bind(1, std::int64_t{day}).run()) return database_.error();
   }
   return Done{};
 }
 
-Result<bool> StoreWriter::needsCheckpoint(std::int32_t day) {
+Status StoreWriter::forgetBefore(std::int32_t day) { return forget("< ?1", day); }
+
+Status StoreWriter::forgetDay(std::int32_t day) { return forget("= ?1", day); }
+
+Result<bool> StoreWriter::hasRecent() {
+  const auto some = database_.integer("SELECT EXISTS(SELECT 1 FROM recent)");
+  if (!some) return some.error();
+  return *some != 0;
+}
+
+Result<std::vector<std::int32_t>> StoreWriter::days() {
   auto query = database_.prepare(
-      "SELECT EXISTS(SELECT 1 FROM recent) OR EXISTS(SELECT 1 FROM scalars WHERE day < ?1) "
-      "OR EXISTS(SELECT 1 FROM chunks WHERE day < ?1)");
+      "SELECT max(day) FROM (SELECT max(day) AS day FROM scalars WHERE day < ?1 "
+      "UNION ALL SELECT max(day) FROM chunks WHERE day < ?1 "
+      "UNION ALL SELECT max(day) FROM recent WHERE day < ?1)");
   if (!query) return query.error();
-  if (query->bind(1, std::int64_t{day}).step() != Step::Row) return database_.error();
-  return query->integer(0) != 0;
+  using Limits = std::numeric_limits<std::int32_t>;
+  std::vector<std::int32_t> found;
+  std::int64_t before = std::int64_t{Limits::max()} + 1;
+  while (found.size() < kMostDaysListed && before > Limits::min()) {
+    if (query->bind(1, before).step() != Step::Row) return database_.error();
+    if (query->type(0) == ColumnType::Null) break;
+    // A damaged row's day may be a real, which is cut to a whole number that is not below it.
+    before = std::min(query->integer(0), before - 1);
+    query->reset();
+    if (before >= Limits::min()) found.push_back(static_cast<std::int32_t>(before));
+  }
+  return found;
+}
+
+Result<std::uint64_t> StoreWriter::usedBytes() {
+  std::int64_t figures[3];
+  const char* const kPragmas[] = {"PRAGMA page_count", "PRAGMA freelist_count", "PRAGMA page_size"};
+  for (std::size_t i = 0; i < std::size(kPragmas); ++i) {
+    const auto figure = database_.integer(kPragmas[i]);
+    if (!figure) return figure.error();
+    figures[i] = *figure;
+  }
+  return static_cast<std::uint64_t>(std::max<std::int64_t>(figures[0] - figures[1], 0)) *
+         static_cast<std::uint64_t>(figures[2]);
 }
 
 }  // namespace tally

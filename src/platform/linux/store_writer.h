@@ -8,6 +8,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "platform/linux/store_schema.h"
 
@@ -38,9 +39,15 @@ class StoreWriter {
   // The same until the time is up, but for one row at least. False when there may be more.
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
   Status forgetBefore(std::int32_t day);
+  Status forgetDay(std::int32_t day);
 
-  // Whether foldRecent() or forgetBefore(day) would find something to do.
-  Result<bool> needsCheckpoint(std::int32_t day);
+  // Whether foldRecent() would find something to do.
+  Result<bool> hasRecent();
+  // The days that hold data, from the newest on; of more than 4096 the newest. Costs one look into
+  // the tables for each day, however many rows it has.
+  Result<std::vector<std::int32_t>> days();
+  // What the pages that hold something take.
+  Result<std::uint64_t> usedBytes();
 
  private:
   struct Statements {
@@ -50,6 +57,7 @@ class StoreWriter {
   StoreWriter(Database database, Statements statements)
       : database_(std::move(database)), statements_(std::move(statements)) {}
   Status checkKey(std::string_view key) const;
+  Status forget(std::string_view which, std::int32_t day);
 
   Database database_;
   Statements statements_;
