@@ -27,7 +27,7 @@ volatile double keep;  // what is computed must not be optimised away
 
 // Reads every column of the rows that a query gives.
 int readRows(const char* path, std::initializer_list<const char*> queries) {
-  auto database = Database::open(path, Database::Access::ReadOnly);
+  auto database = Database::openAtPath(path, Database::Access::ReadOnly);
   if (!database) return 1;
   std::size_t bytes = 0;
   for (const char* query : queries) {
@@ -46,8 +46,8 @@ int passOverSamples(const char* root) {
   const PlatformScope scope(makeLinuxPlatform(std::string(root)));
   const KvRef<KvDictionary> options[] = {SampleDay::distributionOptions(0),
                                          SampleDay::distributionOptions(1)};
-  const auto history =
-      openSqliteHistory(metricsStorePath(std::string(root)), [](const std::string&) { std::exit(1); });
+  const auto history = openSqliteHistory(metricsStoreFile(std::string(root)),
+                                         [](const std::string&) { std::exit(1); });
   std::size_t number = 0;
   history->enumerateDistributions(
       "", std::numeric_limits<std::int32_t>::min(), std::numeric_limits<std::int32_t>::max(),
@@ -139,7 +139,7 @@ int measure(const std::string& self, const std::string& yardsticks) {
               day.samplesEach);
 
   const auto onFull = onDevice(full), onFew = onDevice(few);
-  const std::string store = metricsStorePath(full), job = programs / "tallyrun";
+  const std::string store = metricsStoreFile(full).text(), job = programs / "tallyrun";
   ProcessCost whole, small, pass, floor, values, query, script;
   // In turns, so that a machine whose speed drifts slows all alike.
   for (int round = 0; round < kRounds; ++round) {

@@ -55,7 +55,7 @@ bool writeWhitelist(const std::string& device, const SampleDay& day) {
   return document && folder && writeFileAtomically(*folder, kWhitelistName, *document);
 }
 
-bool importDay(const std::string& path, const SampleDay& day) {
+bool importDay(const StoreFile& path, const SampleDay& day) {
   StoreImporter importer(path);
   for (std::size_t i = 0; i < day.scalars; ++i) {
     if (!importer.addScalar(day.day, SampleDay::scalarKey(i), SampleDay::scalar(i))) return false;
@@ -114,11 +114,11 @@ std::string whitelistPath(const std::string& root) {
 }
 
 bool makeDevice(const std::string& root, const SampleDay& day) {
-  return writeWhitelist(root, day) && importDay(metricsStorePath(root), day);
+  return writeWhitelist(root, day) && importDay(metricsStoreFile(root), day);
 }
 
 bool makeRowDatabase(const std::string& path, const SampleDay& day) {
-  auto opened = Database::open(path, Database::Access::Create);
+  auto opened = Database::openAtPath(path, Database::Access::Create);
   if (!opened) return false;
   Database& database = *opened;
   if (!database.execute("CREATE TABLE scalars(day INTEGER, key TEXT, value INTEGER);"

@@ -31,7 +31,8 @@ function(tally_shared_library name)
   # Shared ones between what refers to them and the archives: so they count as needed, and what they
   # define is not taken from the archives again.
   target_link_libraries(${name} PRIVATE ${LIB_WHOLE} PUBLIC ${LIB_NEEDS} PRIVATE ${LIB_HIDDEN})
-  target_link_options(${name} PRIVATE -Wl,--version-script=${exports} -Wl,--no-undefined)
+  target_link_options(${name} PRIVATE -Wl,--version-script=${exports} -Wl,--no-undefined
+    -Wl,-z,nodelete)  # SQLite keeps pointers to what the storage library registers with it
 
   install(TARGETS ${name} EXPORT ${name}Targets
     LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT ${name} NAMELINK_COMPONENT ${name}-dev)

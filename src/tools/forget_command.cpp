@@ -37,11 +37,12 @@ bool isConfirmed(const ToolContext& context, const WaitingFiles& waiting) {
 
 // SQLite's files beside the store go first, so that none is left for another store.
 Status eraseStore(const DeviceRoot& root) {
-  const auto directory = storeDirectory(root).open();
+  const StoreFile file = metricsStoreFile(root);
+  const auto directory = file.directory.open();
   if (!directory && directory.error().systemError == ENOENT) return Done{};
   if (!directory) return directory.error();
   for (const char* const suffix : {"-journal", "-wal", "-shm", ""}) {
-    if (auto removed = directory->remove(kStoreFile + suffix); !removed) return removed;
+    if (auto removed = directory->remove(file.name + suffix); !removed) return removed;
   }
   return directory->sync();
 }

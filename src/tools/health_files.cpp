@@ -126,8 +126,8 @@ void examineWhitelist(Lines& lines) {
 
 void examineStore(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "metrics store";
-  const std::string path = metricsStorePath(root);
-  const auto identity = storeDirectory(root).identity(kStoreFile);
+  const StoreFile file = metricsStoreFile(root);
+  const auto identity = file.directory.identity(file.name);
   if (!identity) {
     lines.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
     return;
@@ -137,7 +137,7 @@ void examineStore(const DeviceRoot& root, Lines& lines) {
   std::int64_t lastDay = std::numeric_limits<std::int32_t>::min();
   std::string fault;
   listStoreKeys(
-      path,
+      file,
       [&](const StoreKey& key) {
         ++(key.kind == StoreKey::Kind::Scalar ? scalars : distributions);
         lastDay = std::max(lastDay, key.lastDay);

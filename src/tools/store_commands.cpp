@@ -32,11 +32,11 @@ struct StoreArguments {
   std::string prefix;
 };
 
-std::string storePath(const ToolContext& context) { return metricsStorePath(context.root); }
+StoreFile storeFile(const ToolContext& context) { return metricsStoreFile(context.root); }
 
 template <class Work>
 Status writeStore(const ToolContext& context, const Work& work) {
-  auto opened = StoreWriter::open(storePath(context), IfMissing::Create);
+  auto opened = StoreWriter::open(storeFile(context), IfMissing::Create);
   if (!opened) return opened.error();
   StoreWriter& writer = **opened;
   if (auto begun = writer.begin(); !begun) return begun;
@@ -127,7 +127,7 @@ int import(const ToolContext& context, const StoreArguments& arguments) {
     file = owned.get();
   }
   const std::uint64_t bytes = owned ? fileSize(arguments.file).value_or(0) : 0;
-  const ImportResult result = importStoreCsv(file, bytes, storePath(context), context);
+  const ImportResult result = importStoreCsv(file, bytes, storeFile(context), context);
   printImport(context, result);
   if (!result.failure.empty()) {
     return complain(context, "nothing was imported: " + result.failure, kWrong);
@@ -144,7 +144,7 @@ int dump(const ToolContext& context, const StoreArguments& arguments) {
     range.maximumDay = *arguments.day;
   }
   std::string fault;
-  const auto history = openSqliteHistory(storePath(context), [&](const std::string& message) {
+  const auto history = openSqliteHistory(storeFile(context), [&](const std::string& message) {
     if (fault.empty()) fault = message;
   });
   const bool written = context.json ? dumpAsJson(*history, range, context.out)
@@ -157,7 +157,7 @@ int listKeys(const ToolContext& context, const StoreArguments&) {
   Json document = Json::array();
   std::string fault;
   listStoreKeys(
-      storePath(context),
+      storeFile(context),
       [&](const StoreKey& key) {
         const bool scalar = key.kind == StoreKey::Kind::Scalar;
         const std::string_view kind = scalar ? "scalar" : "distribution";

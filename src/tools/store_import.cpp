@@ -68,10 +68,10 @@ Status store(StoreImporter& importer, const StoreRow& row, ImportResult& result)
 
 }  // namespace
 
-ImportResult importStoreCsv(std::FILE* file, std::uint64_t totalBytes, const std::string& storePath,
+ImportResult importStoreCsv(std::FILE* file, std::uint64_t totalBytes, const StoreFile& storeFile,
                             const ToolContext& context) {
   ImportResult result;
-  StoreImporter importer(storePath);
+  StoreImporter importer(storeFile);
   RecordReader reader(file);
   StoreCsvParser parser;
   ProgressBar progress(context, totalBytes);

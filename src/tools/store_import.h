@@ -7,6 +7,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/linux/store_schema.h"
 #include "tools/tool.h"
 
 namespace tally::tools {
@@ -24,7 +25,7 @@ struct ImportResult {
 
 // Reads rows from the file and keeps the good ones. All of them are one transaction. totalBytes is
 // the file's size for the progress bar; 0 when it is not known.
-ImportResult importStoreCsv(std::FILE* file, std::uint64_t totalBytes, const std::string& storePath,
+ImportResult importStoreCsv(std::FILE* file, std::uint64_t totalBytes, const StoreFile& storeFile,
                             const ToolContext& context);
 
 }  // namespace tally::tools

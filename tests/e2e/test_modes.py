@@ -69,7 +69,8 @@ class Modes(DeviceTest):
                 repairs = [line["repair"] for line in findings if "repair" in line]
                 self.assertEqual(len(repairs), ahead)
                 for repair in repairs:
-                    subprocess.run(["/bin/sh", "-c", repair], check=True, env=dict(os.environ, PATH=BIN))
+                    subprocess.run(["/bin/sh", "-c", repair], check=True,
+                                   stdout=subprocess.DEVNULL, env=dict(os.environ, PATH=BIN))
                     device.run("-d", day=TODAY + 2)
                 self.assertLessEqual({YESTERDAY, TODAY + 1}, set(self.logged_days(device)))
                 rows = device.tool("store", "dump").splitlines()

@@ -164,7 +164,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
       EXPECT_FALSE(scenario.hasStore || sweptOn);
       return;
     }
-    auto store = Database::open(copy, Database::Access::ReadWrite);
+    auto store = Database::openAtPath(copy, Database::Access::ReadWrite);
     ASSERT_TRUE(store);
     auto check = store->prepare("PRAGMA integrity_check");
     ASSERT_TRUE(check) << check.error().message;

@@ -157,7 +157,7 @@ SampleDevice::~SampleDevice() {
 }
 
 void SampleDevice::record(const std::vector<std::int32_t>& days) const {
-  auto writer = StoreWriter::open(metricsStorePath(at("")), IfMissing::Create);
+  auto writer = StoreWriter::open(metricsStoreFile(at("")), IfMissing::Create);
   require(writer && *writer, "the store");
   require(static_cast<bool>((*writer)->begin()), "a transaction");
   for (const std::int32_t day : days) {
@@ -244,7 +244,7 @@ std::vector<std::string> SampleDevice::files(std::string_view folder) const {
 }
 
 std::string SampleDevice::copyOfStore() const {
-  const std::string store = metricsStorePath(at("")), copy = folder_ / "copy";
+  const std::string store = metricsStoreFile(at("")).text(), copy = folder_ / "copy";
   // Without the map of the log, which its next reader makes anew.
   for (const char* suffix : {"", "-wal", "-journal"}) {
     fs::remove(copy + suffix);

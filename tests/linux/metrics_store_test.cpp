@@ -1,129 +1,15 @@
-// The metrics store on disk: what comes back, in which order, and what faults leave of it.
-#include <gmock/gmock.h>
-#include <sqlite3.h>
-
-#include <sys/stat.h>
-
+// The metrics store on disk: what comes back, in which order, and which days stay.
 #include <algorithm>
 #include <cmath>
 #include <cstring>
-#include <functional>
-#include <limits>
-#include <random>
 
-#include "linux/temporary_root.h"
-#include "platform/linux/metrics_store.h"
+#include "linux/store_fixture.h"
 #include "platform/linux/sample_chunk.h"
 #include "platform/linux/store_history.h"
 #include "platform/linux/store_importer.h"
-#include "platform/linux/store_writer.h"
 
 namespace tally {
 namespace {
-
-constexpr std::int32_t kToday = 20514;
-constexpr std::int32_t kFirst = std::numeric_limits<std::int32_t>::min();
-constexpr std::int32_t kLast = std::numeric_limits<std::int32_t>::max();
-
-std::vector<double> sequence(double first, std::size_t count) {
-  std::vector<double> values(count);
-  for (std::size_t i = 0; i < count; ++i) values[i] = first + static_cast<double>(i);
-  return values;
-}
-
-class StoreTest : public TemporaryRoot {
- protected:
-  StoreTest() { clock->setDay(kToday, 3600); }
-
-  std::shared_ptr<MetricsStore> store() const { return makeSqliteMetricsStore(path, log, clock); }
-
-  template <class Work>
-  bool write(const Work& work) const {
-    auto writer = StoreWriter::open(path, IfMissing::Create);
-    return writer && (*writer)->begin() && work(**writer) && (*writer)->commit();
-  }
-  // Each value one second after the one before.
-  bool push(std::int32_t day, std::string_view key, const std::vector<double>& values,
-            bool toChunks = false) const {
-    std::vector<std::uint32_t> offsets(values.size());
-    for (std::size_t i = 0; i < offsets.size(); ++i) offsets[i] = static_cast<std::uint32_t>(i);
-    return write([&](StoreWriter& writer) -> Status {
-      return toChunks ? writer.appendToChunks(day, key, values, offsets)
-                      : writer.pushSamples(day, key, values, offsets);
-    });
-  }
-
-  // "20513 key=7" for each row.
-  std::vector<std::string> scalars(std::string_view prefix = "", std::int32_t minimum = kFirst,
-                                   std::int32_t maximum = kLast) const {
-    std::vector<std::string> rows;
-    store()->openHistory()->enumerateScalars(
-        prefix, minimum, maximum,
-        [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
-          rows.push_back(std::to_string(day) + " " + std::string(key) + "=" +
-                         std::to_string(value));
-        });
-    return rows;
-  }
-
-  struct Distribution {
-    std::int32_t day;
-    std::string key;
-    std::vector<double> values;
-    std::vector<std::uint32_t> offsets;
-  };
-  std::vector<Distribution> distributions(std::string_view prefix = "",
-                                          std::int32_t minimum = kFirst,
-                                          std::int32_t maximum = kLast,
-                                          std::size_t batch = 1000) const {
-    std::vector<Distribution> rows;
-    store()->openHistory()->enumerateDistributions(
-        prefix, minimum, maximum,
-        [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
-          Distribution row{day, std::string(key), {}, {}};
-          std::vector<double> some(batch);
-          std::vector<std::uint32_t> seconds(batch);
-          while (const auto count = values.nextValues(some.data(), seconds.data(), batch)) {
-            row.values.insert(row.values.end(), some.begin(), some.begin() + std::ptrdiff_t(count));
-            row.offsets.insert(row.offsets.end(), seconds.begin(),
-                               seconds.begin() + std::ptrdiff_t(count));
-          }
-          rows.push_back(std::move(row));
-        });
-    return rows;
-  }
-  // As "20513 key x3" for each row.
-  std::vector<std::string> lengths() const {
-    std::vector<std::string> rows;
-    for (const auto& row : distributions()) {
-      rows.push_back(std::to_string(row.day) + " " + row.key + " x" +
-                     std::to_string(row.values.size()));
-    }
-    return rows;
-  }
-
-  // Runs SQL behind the program's back; the first column of the last row.
-  std::string sql(const char* text) const {
-    sqlite3* handle = nullptr;
-    EXPECT_EQ(::sqlite3_open(path.c_str(), &handle), SQLITE_OK);
-    std::string answer;
-    char* message = nullptr;
-    ::sqlite3_exec(
-        handle, text,
-        [](void* out, int, char** columns, char**) {
-          *static_cast<std::string*>(out) = columns[0] != nullptr ? columns[0] : "NULL";
-          return 0;
-        },
-        &answer, &message);
-    EXPECT_EQ(message, nullptr) << message;
-    ::sqlite3_free(message);
-    ::sqlite3_close(handle);
-    return answer;
-  }
-
-  std::string path = at("data/TBDataStore.sqlitedb");
-  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
-};
 
 using testing::ElementsAre;
 using testing::IsEmpty;
@@ -228,7 +114,7 @@ TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClock
   };
   const auto checkpointOn = [&](std::int32_t day, std::uint64_t most = kMostStoreBytes) {
     clock->setDay(day);
-    makeSqliteMetricsStore(path, log, clock, most)->TBClientCheckpoint();
+    makeSqliteMetricsStore(storeFile, log, clock, most)->TBClientCheckpoint();
   };
   const auto left = [&](std::int32_t first, std::int32_t last) {
     return scalars("s", first - 1, last).size() + distributions("d", first - 1, last).size();
@@ -320,110 +206,10 @@ TEST_F(StoreTest, AMissingStoreHasNoRowsAndIsNotMadeByReading) {
   EXPECT_EQ(scalars().size(), 1u);
 }
 
-TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
-  const struct {
-    const char* name;
-    std::function<void()> spoil;
-    const char* reason;
-  } cases[] = {
-      {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
-      {"zeros", [&] { put("data/TBDataStore.sqlitedb", std::string(9000, '\0')); },
-       "not a database"},
-      {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
-      {"newer", [&] { sql("PRAGMA user_version = 2"); }, "newer version"},
-      {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
-      {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE chunks"); }, "no such table"},
-      {"folder",
-       [&] {
-         std::filesystem::remove(path);
-         std::filesystem::create_directories(path);
-       },
-       "not a regular file"},
-      {"pipe",
-       [&] {
-         std::filesystem::remove(path);
-         ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
-       },
-       "not a regular file"},
-  };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(c.name);
-    std::filesystem::remove_all(at("data"));
-    store()->TBClientSetValueForScalarKey("a", 1);
-    c.spoil();
-    const std::string before = get("data/TBDataStore.sqlitedb");
-    useBoundedLog();
-    const auto spoiled = store();
-    spoiled->TBClientCheckpoint();
-    spoiled->openHistory()->enumerateScalars(
-        "", kFirst, kLast, [](std::string_view, std::int32_t, std::int64_t, bool&) { FAIL(); });
-    spoiled->TBClientSetValueForScalarKey("b", 2);
-    ASSERT_EQ(errors().size(), 1u) << testing::PrintToString(errors());
-    EXPECT_THAT(errors()[0], testing::HasSubstr(path));
-    EXPECT_THAT(errors()[0], testing::HasSubstr(c.reason));
-    EXPECT_EQ(get("data/TBDataStore.sqlitedb"), before);
-  }
-}
-
-TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
-  ASSERT_TRUE(push(1, "good", {1, 2, 3}, true) && push(1, "good", {4}));
-  store()->TBClientSetValueForScalarKey("good", 1);
-  const char* const damage[] = {
-      "INSERT INTO scalars VALUES (1, 'text', 'x')",
-      "INSERT INTO scalars VALUES (1, 'real', 1.5)",
-      "INSERT INTO scalars VALUES (1, '', 1)",
-      "INSERT INTO scalars VALUES (1, CAST(x'61ff' AS TEXT), 1)",
-      "INSERT INTO chunks VALUES (1, 'good', 5, 2, zeroblob(16), zeroblob(4))",
-      "INSERT INTO chunks VALUES (1, 'lie', 0, 3, zeroblob(16), zeroblob(8))",
-      "INSERT INTO chunks VALUES (1, 'negative', 0, -1, x'', x'')",
-      "INSERT INTO chunks VALUES (1, 'huge', 0, 1152921504606846976, zeroblob(8), zeroblob(4))",
-      "INSERT INTO chunks VALUES (1, 'numbers', 0, 'two', 3, 4.5)",
-      "INSERT INTO chunks VALUES (1, 'last', 2147483647, 1, zeroblob(8), zeroblob(4))",
-      "INSERT INTO recent VALUES (1, 'odd', 0, 1, zeroblob(7), zeroblob(4))",
-      "INSERT INTO recent VALUES (1, 'good', -7, 1, zeroblob(8), x'')",
-      "INSERT INTO recent VALUES (9223372036854775807, 'far', 0, 1, zeroblob(8), zeroblob(4))",
-  };
-  for (const char* text : damage) sql(text);
-  clock->setDay(1);
-  const auto check = [&] {
-    log->lines.clear();
-    EXPECT_THAT(scalars(), ElementsAre("20514 good=1"));
-    EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1"));
-    ASSERT_EQ(errors().size(), 2u) << "one line for each enumeration";
-    EXPECT_THAT(errors()[0], testing::HasSubstr("damaged rows are left out"));
-  };
-  check();
-  store()->TBClientCheckpoint();
-  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "3") << "the damaged ones and the far day stay";
-  check();
-}
-
-TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
-  ASSERT_TRUE(push(1, "d", sequence(0, 9000), true) && push(1, "e", sequence(0, 300)));
-  for (int i = 0; i < 41; ++i) {
-    ASSERT_TRUE(write([&](StoreWriter& w) { return w.setScalar(1, std::to_string(i), i); }));
-  }
-  const std::string whole = get("data/TBDataStore.sqlitedb");
-  std::minstd_rand random(11);
-  for (int round = 0; round < 120; ++round) {
-    std::string spoiled = whole;
-    for (int i = 0; i < 12; ++i) spoiled[random() % whole.size()] = static_cast<char>(random());
-    if (round % 3 == 0) spoiled.resize(random() % whole.size());
-    for (const auto& file : names("data")) std::filesystem::remove(at("data/" + file));
-    put("data/TBDataStore.sqlitedb", spoiled);
-    const auto rows = scalars();
-    EXPECT_LE(rows.size(), 41u);
-    (void)lengths();
-    store()->TBClientCheckpoint();
-    listStoreKeys(
-        path, [](const StoreKey&) {}, [](const std::string&) {});
-  }
-}
-
 TEST_F(StoreTest, AnImportAboveItsBuffersKeepsTheOrderOfEachKey) {
   constexpr int kSamples = 1'300'000, kKeys = 7;
   for (int key = 0; key < kKeys; ++key) ASSERT_TRUE(push(1, std::to_string(key), {-1}));
-  StoreImporter importer(path);
+  StoreImporter importer(storeFile);
   for (int i = 0; i < kSamples; ++i) {
     ASSERT_TRUE(importer.addSample(1, std::to_string(i % kKeys), 0, i));
   }
@@ -443,7 +229,7 @@ TEST_F(StoreTest, AnImportAboveItsBuffersKeepsTheOrderOfEachKey) {
 
 TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {
   runTogether(6, [&](int number) {
-    const auto mine = makeSqliteMetricsStore(path, log, clock);
+    const auto mine = makeSqliteMetricsStore(storeFile, log, clock);
     for (int i = 0; i < 20; ++i) {
       mine->TBClientSetValueForScalarKey(std::to_string(number) + "." + std::to_string(i), i);
       if (!push(kToday, "d", {1.0 * number})) return false;
@@ -486,58 +272,6 @@ TEST_F(StoreTest, AReaderSeesOneStateWhileOthersCommit) {
     }
     return true;
   });
-}
-
-TEST_F(StoreTest, AKillLeavesAllOfATransactionOrNothing) {
-  constexpr std::int64_t kEach = 20000;
-  ASSERT_TRUE(push(kToday, "first", {1}));
-  std::minstd_rand random(3);
-  std::int64_t before = 0;
-  for (int round = 0; round < 25; ++round) {
-    const bool import = round % 2 == 0;
-    ASSERT_TRUE(import || push(kToday, "second", sequence(0, 5000)));
-    before = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
-    runAndKill(random() % 30'000, [&] {
-      if (!import) return store()->TBClientCheckpoint();
-      StoreImporter importer(path);
-      for (std::int64_t i = 0; i < kEach; ++i) {
-        (void)importer.addSample(kToday, "k" + std::to_string(i % 50), 0, 1);
-        (void)importer.addScalar(kToday, "s" + std::to_string(i % 50), round);
-      }
-      (void)importer.finish();
-    });
-    ASSERT_EQ(sql("PRAGMA integrity_check"), "ok");
-    if (import) {
-      const auto recent = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM recent"));
-      const auto after = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
-      const bool nothing = after == before, all = recent == 0 && after >= before + kEach;
-      ASSERT_TRUE(nothing || all) << before << " became " << after;
-    } else {
-      std::int64_t samples = 0;
-      for (const auto& row : distributions("second")) samples += std::ssize(row.values);
-      ASSERT_EQ(samples, (round + 1) / 2 * 5000);
-    }
-  }
-}
-
-TEST_F(StoreTest, AFullVolumeUndoesTheTransactionAndAReadOnlyOneCanBeRead) {
-  const TinyVolume volume(at("data"), "size=1m");
-  if (!volume) GTEST_SKIP() << "needs the right to mount";
-  ASSERT_TRUE(push(kToday, "d", {1, 2, 3}));
-  {
-    StoreImporter importer(path);
-    Status imported = Done{};
-    for (int i = 0; imported && i < 2'000'000; ++i) {
-      imported = importer.addSample(kToday, "big" + std::to_string(i % 9), 0, 1);
-    }
-    EXPECT_FALSE(imported && importer.finish()) << "2 million samples in 1 MiB";
-  }
-  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
-  ASSERT_EQ(::mount("tally", at("data").c_str(), "tmpfs", MS_REMOUNT | MS_RDONLY, ""), 0);
-  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
-  EXPECT_THAT(errors(), IsEmpty());
-  store()->TBClientSetValueForScalarKey("a", 1);
-  EXPECT_EQ(errors().size(), 1u);
 }
 
 }  // namespace

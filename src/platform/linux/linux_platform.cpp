@@ -76,11 +76,11 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
   services.notifications = std::make_shared<BusNotifications>(bus, log);
   services.files = std::make_shared<RootedFiles>(root);
-  services.runLock = std::make_shared<FileRunLock>(storeDirectory(root), log);
+  services.runLock = std::make_shared<FileRunLock>(metricsStoreFile(root).directory, log);
   services.preferences = preferences;
   services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
-  services.metricsStore = makeSqliteMetricsStore(metricsStorePath(root), log, clock);
+  services.metricsStore = makeSqliteMetricsStore(metricsStoreFile(root), log, clock);
   services.logSubmission =
       std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences, consent);
   services.crashReporting =

@@ -23,9 +23,9 @@ constexpr std::chrono::milliseconds kPauseForOthers{150};
 
 class SqliteMetricsStore final : public MetricsStore {
  public:
-  SqliteMetricsStore(std::string path, std::shared_ptr<SystemLog> log,
+  SqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
                      std::shared_ptr<const Clock> clock, std::uint64_t maximumBytes)
-      : path_(std::move(path)),
+      : file_(std::move(file)),
         log_(std::move(log)),
         clock_(std::move(clock)),
         maximumBytes_(maximumBytes) {}
@@ -36,7 +36,7 @@ class SqliteMetricsStore final : public MetricsStore {
 
   void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     if (!isStoreKey(key)) {
-      report(Error{"metrics store " + path_ + ": " + std::string(kStoreKeyRule)});
+      report(Error{"metrics store " + file_.text() + ": " + std::string(kStoreKeyRule)});
       return;
     }
     // Kept in memory until the batch ends, so that others need not wait while its values are read.
@@ -49,7 +49,7 @@ class SqliteMetricsStore final : public MetricsStore {
   }
 
   std::unique_ptr<HistoryStore> openHistory() override {
-    return openSqliteHistory(path_, [this](const std::string& message) { report(Error{message}); });
+    return openSqliteHistory(file_, [this](const std::string& message) { report(Error{message}); });
   }
 
  private:
@@ -66,7 +66,7 @@ class SqliteMetricsStore final : public MetricsStore {
   // The connection stays open, since a run writes more than once. Null: there is no store.
   Result<StoreWriter*> writer(IfMissing ifMissing) {
     if (!writer_) {
-      auto opened = StoreWriter::open(path_, ifMissing);
+      auto opened = StoreWriter::open(file_, ifMissing);
       if (!opened) return opened.error();
       writer_ = std::move(*opened);
     }
@@ -101,8 +101,8 @@ class SqliteMetricsStore final : public MetricsStore {
       if (done && dropped > 0) {
         log_->write(
             LogLevel::Default,
-            fmt::format("metrics store {}: too large, {} days are removed before their time", path_,
-                        dropped));
+            fmt::format("metrics store {}: too large, {} days are removed before their time",
+                        file_.text(), dropped));
       }
       if (!done || complete) return done;
       std::this_thread::sleep_for(kPauseForOthers);
@@ -159,7 +159,7 @@ class SqliteMetricsStore final : public MetricsStore {
     }));
   }
 
-  std::string path_;
+  StoreFile file_;
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<const Clock> clock_;
   std::uint64_t maximumBytes_;
@@ -170,11 +170,10 @@ class SqliteMetricsStore final : public MetricsStore {
 
 }  // namespace
 
-std::shared_ptr<MetricsStore> makeSqliteMetricsStore(std::string path,
-                                                     std::shared_ptr<SystemLog> log,
+std::shared_ptr<MetricsStore> makeSqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
                                                      std::shared_ptr<const Clock> clock,
                                                      std::uint64_t maximumBytes) {
-  return std::make_shared<SqliteMetricsStore>(std::move(path), std::move(log), std::move(clock),
+  return std::make_shared<SqliteMetricsStore>(std::move(file), std::move(log), std::move(clock),
                                               maximumBytes);
 }
 

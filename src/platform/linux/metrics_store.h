@@ -6,15 +6,15 @@
 
 #include "platform/clock.h"
 #include "platform/linux/store_retention.h"
+#include "platform/linux/store_schema.h"
 #include "platform/metrics_store.h"
 #include "platform/system_log.h"
 
 namespace tally {
 
-// The store at the path. Nothing is opened before it is used. Failures are logged, the same one
+// Nothing is opened before it is used. Failures are logged, the same one
 // once. A checkpoint removes days while the store takes more than maximumBytes.
-std::shared_ptr<MetricsStore> makeSqliteMetricsStore(std::string path,
-                                                     std::shared_ptr<SystemLog> log,
+std::shared_ptr<MetricsStore> makeSqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
                                                      std::shared_ptr<const Clock> clock,
                                                      std::uint64_t maximumBytes = kMostStoreBytes);
 

@@ -1,13 +1,15 @@
 #include "platform/linux/sqlite_database.h"
 
+#include <fcntl.h>
 #include <sqlite3.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <chrono>
 #include <cstring>
 
-#include "base/directory.h"
+#include "platform/linux/store_files.h"
 
 namespace tally {
 namespace {
@@ -44,14 +46,45 @@ std::string immutableUri(std::string_view path) {
 // SQLite would make a new file with the modes of the umask and for whoever runs; what it lays
 // beside a file gets the modes and the owner of that file. Only a file that is not there yet is
 // opened here: closing any other would drop the locks that this process holds on it.
-Status makePrivateFile(const std::string& path) {
-  const auto slash = path.rfind('/');
-  const auto folder = Directory::open(path.substr(0, slash));
-  if (!folder) return Error{"metrics store " + path + ": " + folder.error().message};
-  const auto file = folder->create(path.substr(slash + 1), 0600);
-  if (!file && file.error().systemError == EEXIST) return Done{};
-  if (!file) return Error{"metrics store: " + file.error().message, file.error().systemError};
-  return folder->sync();
+Status makePrivateFile(const Directory& directory, const std::string& name) {
+  const auto file = directory.create(name, 0600);
+  if (file) return directory.sync();
+  if (file.error().systemError == EEXIST) return Done{};
+  return Error{"metrics store: " + file.error().message, file.error().systemError};
+}
+
+// A chunk of another writer has up to a million samples, of twelve bytes each.
+constexpr int kLargestRow = 16 << 20;
+
+// How often a step is looked at, so rarely that it costs nothing, and how many looks it may take:
+// of the instructions that reading a whole store takes, some three for each byte, and what a small
+// one cannot need. A loop in a damaged tree or a schema has no end.
+constexpr int kInstructionsBetweenLooks = 1'000'000;
+constexpr std::int64_t kInstructionsPerByte = 8, kLooksAtLeast = 50;
+constexpr std::uint64_t kMostBytesWatched = 1u << 30;  // a file may have holes
+
+int stepTakesTooLong(void* watch) {
+  auto& step = *static_cast<StepWatch*>(watch);
+  return ++step.looks > step.most ? 1 : 0;
+}
+
+// Nothing of this is needed by the tables that the program makes.
+bool distrust(sqlite3* handle, StepWatch& watch) {
+  const struct {
+    int option, value;
+  } kOptions[] = {
+      {SQLITE_DBCONFIG_DEFENSIVE, 1},      {SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0},
+      {SQLITE_DBCONFIG_ENABLE_TRIGGER, 0}, {SQLITE_DBCONFIG_ENABLE_VIEW, 0},
+      {SQLITE_DBCONFIG_ENABLE_FKEY, 0},    {SQLITE_DBCONFIG_DQS_DDL, 0},
+      {SQLITE_DBCONFIG_DQS_DML, 0},
+  };
+  for (const auto& [option, value] : kOptions) {
+    if (::sqlite3_db_config(handle, option, value, nullptr) != SQLITE_OK) return false;
+  }
+  ::sqlite3_limit(handle, SQLITE_LIMIT_LENGTH, kLargestRow);
+  ::sqlite3_limit(handle, SQLITE_LIMIT_ATTACHED, 0);
+  ::sqlite3_progress_handler(handle, kInstructionsBetweenLooks, stepTakesTooLong, &watch);
+  return true;
 }
 
 }  // namespace
@@ -77,6 +110,7 @@ Statement& Statement::bind(int parameter, std::span<const std::byte> blob) {
 }
 
 Step Statement::step() {
+  watch_->looks = 0;
   switch (::sqlite3_step(handle_.get())) {
     case SQLITE_ROW:
       return Step::Row;
@@ -128,7 +162,8 @@ std::span<const std::byte> Statement::blob(int column) const {
 
 void Database::Close::operator()(sqlite3* handle) const { ::sqlite3_close_v2(handle); }
 
-Result<Database> Database::open(const std::string& path, Access access) {
+Result<Database> Database::open(const Directory& directory, const std::string& name,
+                                Access access) {
   int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
   switch (access) {
     case Access::ReadOnly:
@@ -138,25 +173,47 @@ Result<Database> Database::open(const std::string& path, Access access) {
       flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
       break;
     case Access::Create:
-      if (auto made = makePrivateFile(path); !made) return made.error();
+      if (auto made = makePrivateFile(directory, name); !made) return made.error();
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::ReadWrite:
       flags |= SQLITE_OPEN_READWRITE;
       break;
   }
-  sqlite3* handle = nullptr;
-  const std::string name = access == Access::Immutable ? immutableUri(path) : path;
-  const int code = ::sqlite3_open_v2(name.c_str(), &handle, flags, nullptr);
   Database database;
-  database.path_ = path;
+  database.watch_ = std::make_unique<StepWatch>(StepWatch{0, kLooksAtLeast});
+  database.path_ = directory.pathOf(name);
+  const char* const fileSystem = storeFileSystem();
+  if (fileSystem == nullptr) return database.error("SQLite cannot open it through its directory");
+  (void)takeStoreFileRefusal();
+  sqlite3* handle = nullptr;
+  const std::string path = storeFileName(directory, name);
+  const std::string text = access == Access::Immutable ? immutableUri(path) : path;
+  const int code = ::sqlite3_open_v2(text.c_str(), &handle, flags, fileSystem);
   database.handle_.reset(handle);
   if (code != SQLITE_OK) return database.error();
   ::sqlite3_busy_handler(handle, waitForLock, nullptr);
+  for (const char* end : {"", "-wal"}) {
+    const auto file = directory.identity(name + end);
+    const auto bytes =
+        static_cast<std::int64_t>(std::min(file ? file->size : 0, kMostBytesWatched));
+    database.watch_->most += bytes / kInstructionsBetweenLooks * kInstructionsPerByte;
+  }
+  if (!distrust(handle, *database.watch_))
+    return database.error("SQLite cannot be kept from trusting it");
   return database;
 }
 
+Result<Database> Database::openAtPath(const std::string& path, Access access) {
+  const auto slash = path.rfind('/');
+  const auto directory =
+      Directory::open(slash == std::string::npos ? "." : path.substr(0, slash + 1));
+  if (!directory) return directory.error();
+  return open(*directory, path.substr(slash + 1), access);
+}
+
 Status Database::execute(const char* sql) {
+  watch_->looks = 0;
   if (::sqlite3_exec(handle_.get(), sql, nullptr, nullptr, nullptr) != SQLITE_OK) return error();
   return Done{};
 }
@@ -168,6 +225,7 @@ Result<Statement> Database::prepare(std::string_view sql) {
   if (code != SQLITE_OK) return error();
   Statement statement;
   statement.handle_.reset(handle);
+  statement.watch_ = watch_.get();
   return statement;
 }
 
@@ -179,6 +237,10 @@ Result<std::int64_t> Database::integer(std::string_view sql) {
 }
 
 Error Database::error() const {
+  if (auto refusal = takeStoreFileRefusal(); !refusal.empty()) return {"metrics store: " + refusal};
+  if (handle_ && ::sqlite3_errcode(handle_.get()) == SQLITE_INTERRUPT) {
+    return error("a step has no end; the file is damaged");
+  }
   return error(handle_ ? ::sqlite3_errmsg(handle_.get()) : "out of memory");
 }
 

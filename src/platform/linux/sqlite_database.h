@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 
+#include "base/directory.h"
 #include "base/result.h"
 
 struct sqlite3;
@@ -18,8 +19,14 @@ namespace tally {
 enum class Step { Row, Done, Failed };
 enum class ColumnType { Null, Integer, Real, Text, Blob };
 
-// A prepared statement. Parameters count from 1, columns from 0. Texts and blobs that are bound are
-// borrowed until the next reset(); those of a column live until the next step() or reset().
+// How long the step has taken that is being made, and how long it may.
+struct StepWatch {
+  std::int64_t looks = 0, most = 0;
+};
+
+// A prepared statement, of a connection that outlives it. Parameters count from 1, columns from 0.
+// Texts and blobs that are bound are borrowed until the next reset(); those of a column live until
+// the next step() or reset().
 class Statement {
  public:
   Statement& bind(int parameter, std::int64_t value);
@@ -42,9 +49,13 @@ class Statement {
     void operator()(sqlite3_stmt* statement) const;
   };
   std::unique_ptr<sqlite3_stmt, Finalise> handle_;
+  StepWatch* watch_ = nullptr;
 };
 
-// A connection. It waits a minute for the locks of others before an operation fails.
+// A connection. It waits a minute for the locks of others before an operation fails. The file may
+// have been made to harm whoever opens it: what its schema could do is switched off, a row larger
+// than a store can have is an error, and so is a step that finds no row in a time in which any
+// store would have been read twice.
 class Database {
  public:
   enum class Access {
@@ -53,7 +64,11 @@ class Database {
     ReadWrite,
     Create,  // read and write; makes the file when it is missing, readable by its owner alone
   };
-  static Result<Database> open(const std::string& path, Access access);
+  // The database of that name in the directory. A file that is refused there (store_files.h) is an
+  // error and is left as it is.
+  static Result<Database> open(const Directory& directory, const std::string& name, Access access);
+  // The same at a path that the caller chose, links in its directories included.
+  static Result<Database> openAtPath(const std::string& path, Access access);
 
   const std::string& path() const { return path_; }
   Status execute(const char* sql);
@@ -73,6 +88,7 @@ class Database {
     void operator()(sqlite3* handle) const;
   };
   std::string path_;
+  std::unique_ptr<StepWatch> watch_;
   std::unique_ptr<sqlite3, Close> handle_;
 };
 

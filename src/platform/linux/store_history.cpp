@@ -8,6 +8,7 @@
 
 #include "base/file.h"
 #include "platform/linux/sample_chunk.h"
+#include "platform/linux/store_rows.h"
 #include "platform/linux/store_schema.h"
 
 namespace tally {
@@ -79,10 +80,12 @@ class SampleTable {
     const std::string from = " FROM " + std::string(table);
     const std::string ofKey = from + " WHERE day = ?1 AND key = ?2";
     const bool prepared =
-        prepare(rows_, "SELECT day, key, samples, length(sample_values), length(sample_offsets)" +
-                           from + std::string(kRange) + " ORDER BY day, key, number") &&
-        prepare(values_, "SELECT number, samples, sample_values, length(sample_offsets)" + ofKey +
-                             " ORDER BY number") &&
+        prepare(rows_,
+                "SELECT day, key, samples, length(sample_values), length(sample_offsets), "
+                "number" +
+                    from + std::string(kRange) + " ORDER BY day, key, number") &&
+        prepare(values_, "SELECT number, samples, " + std::string(kBoundedValues) +
+                             ", length(sample_offsets)" + ofKey + " ORDER BY number") &&
         prepare(offsets_, "SELECT sample_offsets" + ofKey + " AND number = ?3");
     if (!prepared) return;
     range.bindTo(rows_);
@@ -103,6 +106,7 @@ class SampleTable {
     while ((step = rows_.step()) == Step::Row) {
       const std::int64_t day = rows_.integer(0);
       const std::string_view key = rows_.text(1);
+      if (!order_.follows(rows_, 5)) return fail(damagedTree(database_));
       if (isStoreKey(key) && chunkIsSound(rows_.integer(2), rows_.integer(3), rows_.integer(4))) {
         day_ = static_cast<std::int32_t>(day);
         if (key_ != key) key_ = key;
@@ -112,6 +116,10 @@ class SampleTable {
     }
     atEnd_ = true;
     if (step == Step::Failed) faults_.fail(database_.error());
+  }
+  void fail(const Error& error) {
+    atEnd_ = true;
+    faults_.fail(error);
   }
 
   // Begins to read the samples of a key on a day.
@@ -123,6 +131,7 @@ class SampleTable {
     offsetsOfChunk_ = false;
     chunk_ = {};
     taken_ = held_ = 0;
+    lastChunk_.reset();
   }
   // As DistributionValues::nextValues, for this table alone.
   std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) {
@@ -157,6 +166,12 @@ class SampleTable {
   bool nextChunk() {
     Step step = Step::Done;
     while ((step = values_.step()) == Step::Row) {
+      const std::int64_t number = values_.integer(0);
+      if (lastChunk_ && number <= *lastChunk_) {
+        faults_.fail(damagedTree(database_));
+        break;
+      }
+      lastChunk_ = number;
       chunk_ = values_.blob(2);
       // Damaged ones were counted by the walk over the rows.
       if (!chunkIsSound(values_.integer(1), std::ssize(chunk_), values_.integer(3))) continue;
@@ -180,6 +195,8 @@ class SampleTable {
   Database& database_;
   Faults& faults_;
   Statement rows_, values_, offsets_;
+  RowOrder order_;
+  std::optional<std::int64_t> lastChunk_;
   bool atEnd_ = false;
   std::int32_t day_ = 0;
   std::string key_;
@@ -226,7 +243,9 @@ class SqliteHistory final : public HistoryStore {
     range.bindTo(*rows);
     bool stop = false;
     Step step = Step::Done;
+    RowOrder order;
     while (!stop && (step = rows->step()) == Step::Row) {
+      if (!order.follows(*rows)) return faults.fail(damagedTree(database_));
       const std::string_view key = rows->text(1);
       if (!isStoreKey(key) || rows->type(2) != ColumnType::Integer) {
         faults.addDamaged(key, rows->integer(0));
@@ -278,17 +297,16 @@ class EmptyHistory final : public HistoryStore {
 
 }  // namespace
 
-std::unique_ptr<HistoryStore> openSqliteHistory(const std::string& path,
-                                                StoreFaultHandler onFault) {
-  auto store = openStoreForReading(path);
+std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault) {
+  auto store = openStoreForReading(file);
   if (!store) onFault(store.error().message);
   if (!store || !*store) return std::make_unique<EmptyHistory>();
   return std::make_unique<SqliteHistory>(std::move(**store), std::move(onFault));
 }
 
-void listStoreKeys(const std::string& path, const std::function<void(const StoreKey&)>& handler,
+void listStoreKeys(const StoreFile& file, const std::function<void(const StoreKey&)>& handler,
                    const StoreFaultHandler& onFault) {
-  auto store = openStoreForReading(path);
+  auto store = openStoreForReading(file);
   if (!store) return onFault(store.error().message);
   if (!*store) return;
   Database& database = **store;

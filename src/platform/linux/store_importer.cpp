@@ -17,7 +17,7 @@ constexpr std::size_t kBytesOfPlace = 160;
 
 Status StoreImporter::ensureBegun() {
   if (writer_) return Done{};
-  auto opened = StoreWriter::open(path_, IfMissing::Create);
+  auto opened = StoreWriter::open(file_, IfMissing::Create);
   if (!opened) return opened.error();
   writer_ = std::move(*opened);
   if (auto begun = writer_->begin(); !begun) return begun;

@@ -17,7 +17,7 @@ namespace tally {
 // gathered by key until there are many, so that they can be written as chunks.
 class StoreImporter {
  public:
-  explicit StoreImporter(std::string path) : path_(std::move(path)) {}
+  explicit StoreImporter(StoreFile file) : file_(std::move(file)) {}
 
   // REQUIRES: the key is one that the store can have. After a failure nothing more can be added.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t value);
@@ -34,7 +34,7 @@ class StoreImporter {
   std::uint32_t placeOf(std::int32_t day, std::string_view key);
   Status writeSamples();
 
-  std::string path_;
+  StoreFile file_;
   std::optional<StoreWriter> writer_;
   // The samples in hand in the order of their arrival, each with its place.
   std::vector<std::uint32_t> placeOfSample_, offsets_;

@@ -1,10 +1,14 @@
 #include "platform/linux/store_schema.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
-#include <filesystem>
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <iterator>
 
-#include "base/file.h"
 #include "base/utf8.h"
 
 namespace tally {
@@ -16,33 +20,64 @@ constexpr std::size_t kLongestKey = 512;
 
 // Days and keys are in the order of every pass, so a pass is one walk along the tree. New samples
 // go to a small table of their own, which is cheap to write; a checkpoint moves them to the chunks.
-constexpr const char* kCreate = R"sql(
-CREATE TABLE scalars(
+constexpr std::string_view kSampleColumns = R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL, samples INTEGER NOT NULL,
+  sample_values BLOB NOT NULL, sample_offsets BLOB NOT NULL,
+  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql";
+struct TableDefinition {
+  std::string_view name, columns;
+  std::string text() const { return "CREATE TABLE " + std::string(name) + std::string(columns); }
+};
+constexpr TableDefinition kTables[] = {
+    {"scalars", R"sql((
   day INTEGER NOT NULL, key TEXT NOT NULL, value INTEGER NOT NULL,
-  PRIMARY KEY(day, key)) WITHOUT ROWID;
-CREATE TABLE chunks(
-  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL, samples INTEGER NOT NULL,
-  sample_values BLOB NOT NULL, sample_offsets BLOB NOT NULL,
-  PRIMARY KEY(day, key, number)) WITHOUT ROWID;
-CREATE TABLE recent(
-  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL, samples INTEGER NOT NULL,
-  sample_values BLOB NOT NULL, sample_offsets BLOB NOT NULL,
-  PRIMARY KEY(day, key, number)) WITHOUT ROWID;
-PRAGMA application_id = 0x54424453;
-PRAGMA user_version = 1;
-)sql";
+  PRIMARY KEY(day, key)) WITHOUT ROWID)sql"},
+    {"chunks", kSampleColumns},
+    {"recent", kSampleColumns},
+};
+// What SQLite itself adds when somebody lets it look for better plans. It does no harm.
+constexpr TableDefinition kStatistics[] = {
+    {"sqlite_stat1", "(tbl,idx,stat)"},
+    {"sqlite_stat4", "(tbl,idx,neq,nlt,ndlt,sample)"},
+};
 
-enum class Presence { Missing, Present };
-
-Result<Presence> examine(const std::string& path) {
-  std::error_code code;
-  const auto status = std::filesystem::status(path, code);
-  if (status.type() == std::filesystem::file_type::not_found) return Presence::Missing;
-  if (code) return Error{"metrics store " + path + ": " + code.message(), code.value()};
-  if (status.type() != std::filesystem::file_type::regular) {
-    return Error{"metrics store " + path + ": not a regular file"};
+// Anything else could run when a table is read or written: a view in a table's place, a trigger, a
+// virtual table, a column that is computed. REQUIRES: a transaction.
+Status checkTables(Database& database) {
+  auto rows = database.prepare("SELECT type, name, tbl_name, sql FROM sqlite_schema");
+  if (!rows) return rows.error();
+  std::size_t ours = 0, others = 0;
+  Step step = Step::Done;
+  while ((step = rows->step()) == Step::Row) {
+    const auto isRow = [&](const TableDefinition& table) {
+      return rows->text(0) == "table" && rows->text(1) == table.name &&
+             rows->text(2) == table.name && rows->text(3) == table.text();
+    };
+    if (std::ranges::any_of(kTables, isRow)) {
+      ++ours;
+    } else if (!std::ranges::any_of(kStatistics, isRow)) {
+      ++others;
+    }
   }
-  return Presence::Present;
+  if (step == Step::Failed) return database.error();
+  if (ours == std::size(kTables) && others == 0) return Done{};
+  return database.error("its tables are not those of a metrics store");
+}
+
+// The directory that holds the store; empty when there is no store yet.
+Result<std::optional<Directory>> directoryOf(const StoreFile& file) {
+  auto directory = file.directory.open();
+  if (!directory && directory.error().systemError == ENOENT) return std::optional<Directory>();
+  if (!directory) {
+    return Error{"metrics store " + file.text() + ": " + directory.error().message,
+                 directory.error().systemError};
+  }
+  struct stat status {};
+  if (::fstatat(directory->descriptor(), file.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0) {
+    return std::optional(std::move(*directory));
+  }
+  if (errno == ENOENT) return std::optional<Directory>();
+  return Error{"metrics store " + file.text() + ": " + std::strerror(errno), errno};
 }
 
 // False for a database in which nothing was ever made. REQUIRES: a transaction, since another
@@ -63,6 +98,7 @@ Result<bool> isStore(Database& database) {
                           std::to_string(*version) + ", this one knows " +
                           std::to_string(kSchemaVersion) + ")");
   }
+  if (auto checked = checkTables(database); !checked) return checked.error();
   return true;
 }
 
@@ -87,12 +123,20 @@ Status useWriteAheadLog(Database& database) {
   }
 }
 
+Status defineTables(Database& database) {
+  std::string text;
+  for (const TableDefinition& table : kTables) text += table.text() + ";";
+  text += "PRAGMA application_id = " + std::to_string(kApplicationId) + ";";
+  text += "PRAGMA user_version = " + std::to_string(kSchemaVersion);
+  return database.execute(text.c_str());
+}
+
 Status makeTables(Database& database) {
   if (auto set = database.execute("PRAGMA page_size = 8192"); !set) return set;
   if (auto set = useWriteAheadLog(database); !set) return set;
   if (auto begun = database.execute("BEGIN IMMEDIATE"); !begun) return begun;
   const auto store = isStore(database);  // somebody else may have been first
-  Status made = !store ? Status(store.error()) : *store ? Done{} : database.execute(kCreate);
+  Status made = !store ? Status(store.error()) : *store ? Done{} : defineTables(database);
   if (made) made = database.execute("COMMIT");
   if (!made) (void)database.execute("ROLLBACK");
   return made;
@@ -100,14 +144,8 @@ Status makeTables(Database& database) {
 
 }  // namespace
 
-const std::string kStoreFile = "TBDataStore.sqlitedb";
-
-DeviceDirectory storeDirectory(const DeviceRoot& root) {
-  return {root, "/var/mobile/Library/Tallybook"};
-}
-
-std::string metricsStorePath(const DeviceRoot& root) {
-  return storeDirectory(root).text() + "/" + kStoreFile;
+StoreFile metricsStoreFile(const DeviceRoot& root) {
+  return {DeviceDirectory(root, "/var/mobile/Library/Tallybook"), "TBDataStore.sqlitedb"};
 }
 
 bool isStoreKey(std::string_view key) {
@@ -115,39 +153,38 @@ bool isStoreKey(std::string_view key) {
          isValidUtf8(key);
 }
 
-Result<std::optional<Database>> openStoreForReading(const std::string& path) {
-  const auto presence = examine(path);
-  if (!presence) return presence.error();
-  if (*presence == Presence::Missing) return std::optional<Database>();
+Result<std::optional<Database>> openStoreForReading(const StoreFile& file) {
+  const auto directory = directoryOf(file);
+  if (!directory) return directory.error();
+  if (!*directory) return std::optional<Database>();
+  const auto logBytes = [&] {
+    const auto log = (*directory)->identity(file.name + "-wal");
+    return log ? log->size : 0;
+  };
   // A reader that may not write leaves the empty files of a write-ahead log behind. One that may
   // removes them when it ends as the last; and with nothing in that log, it has nothing to fold.
-  const bool logIsEmpty = fileSize(path + "-wal").value_or(0) == 0;
   auto store = readFrom(
-      Database::open(path, logIsEmpty ? Database::Access::ReadWrite : Database::Access::ReadOnly));
+      Database::open(**directory, file.name,
+                     logBytes() == 0 ? Database::Access::ReadWrite : Database::Access::ReadOnly));
   if (store) return store;
   // Where no lock file can be made, nobody can be writing either; but what a writer has left in its
   // log could not be read this way, and without that the file may be half old, half new.
-  if (::access(std::filesystem::path(path).parent_path().c_str(), W_OK) == 0 ||
-      fileSize(path + "-wal").value_or(0) > 0) {
-    return store;
-  }
-  return readFrom(Database::open(path, Database::Access::Immutable));
+  if (::faccessat((*directory)->descriptor(), ".", W_OK, 0) == 0 || logBytes() > 0) return store;
+  return readFrom(Database::open(**directory, file.name, Database::Access::Immutable));
 }
 
-Result<std::optional<Database>> openStoreForWriting(const std::string& path, IfMissing ifMissing) {
-  const auto presence = examine(path);
-  if (!presence) return presence.error();
+Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing) {
   const bool create = ifMissing == IfMissing::Create;
-  if (*presence == Presence::Missing) {
+  auto directory = directoryOf(file);
+  if (!directory) return directory.error();
+  if (!*directory) {
     if (!create) return std::optional<Database>();
-    if (auto made = DeviceRoot(path.starts_with('/') ? "/" : ".")
-                        .make(std::filesystem::path(path).parent_path().native());
-        !made) {
-      return Error{"metrics store " + path + ": " + made.error().message};
-    }
+    auto made = file.directory.make();
+    if (!made) return Error{"metrics store " + file.text() + ": " + made.error().message};
+    *directory = std::move(*made);
   }
-  auto database =
-      Database::open(path, create ? Database::Access::Create : Database::Access::ReadWrite);
+  auto database = Database::open(**directory, file.name,
+                                 create ? Database::Access::Create : Database::Access::ReadWrite);
   if (!database) return database.error();
   database->foldLogOnClose(false);  // not a byte of a file that turns out to be another's changes
   if (auto begun = database->execute("BEGIN"); !begun) return begun.error();

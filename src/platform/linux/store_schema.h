@@ -10,10 +10,17 @@
 
 namespace tally {
 
-// Where the store lies on a device, its name there, and its path.
-extern const std::string kStoreFile;
-DeviceDirectory storeDirectory(const DeviceRoot& root);
-std::string metricsStorePath(const DeviceRoot& root);
+// Where a store lies.
+struct StoreFile {
+  DeviceDirectory directory;
+  std::string name;
+
+  // For messages.
+  std::string text() const { return directory.text() + "/" + name; }
+};
+
+// The store of a device.
+StoreFile metricsStoreFile(const DeviceRoot& root);
 
 // A key of the store is valid UTF-8 of 1 to 512 bytes without a zero byte.
 bool isStoreKey(std::string_view key);
@@ -23,11 +30,11 @@ constexpr std::string_view kStoreKeyRule =
 // Opens the store and takes hold of its present state: what others commit afterwards is not seen.
 // Nothing is created. Empty when there is no store yet; an error when there is something else in
 // its place, or a store of a newer version of the program.
-Result<std::optional<Database>> openStoreForReading(const std::string& path);
+Result<std::optional<Database>> openStoreForReading(const StoreFile& file);
 
 enum class IfMissing { Leave, Create };
 // Opens the store for writing. With Leave, empty when there is no store yet. Whatever is not a
 // store, or is a newer one, is left as it is.
-Result<std::optional<Database>> openStoreForWriting(const std::string& path, IfMissing ifMissing);
+Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing);
 
 }  // namespace tally

@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "platform/linux/sample_chunk.h"
+#include "platform/linux/store_rows.h"
 
 namespace tally {
 namespace {
@@ -93,12 +94,16 @@ class StoreWriter::ChunkTail {
   std::vector<std::uint32_t> offsets_;
 };
 
-Result<std::optional<StoreWriter>> StoreWriter::open(const std::string& path, IfMissing ifMissing) {
-  auto opened = openStoreForWriting(path, ifMissing);
+Result<std::optional<StoreWriter>> StoreWriter::open(const StoreFile& file, IfMissing ifMissing) {
+  auto opened = openStoreForWriting(file, ifMissing);
   if (!opened) return opened.error();
   if (!*opened) return std::optional<StoreWriter>();
   Database& database = **opened;
   Statements statements;
+  const std::string lastChunk = "SELECT number, samples, " + std::string(kBoundedValues) + ", " +
+                                std::string(kBoundedOffsets) +
+                                " FROM chunks WHERE day = ?1 AND key = ?2 "
+                                "ORDER BY number DESC LIMIT 1";
   const struct {
     Statement& statement;
     std::string_view text;
@@ -106,9 +111,7 @@ Result<std::optional<StoreWriter>> StoreWriter::open(const std::string& path, If
       {statements.setScalar, "INSERT OR REPLACE INTO scalars VALUES (?1, ?2, ?3)"},
       {statements.lastRecent, "SELECT max(number) FROM recent WHERE day = ?1 AND key = ?2"},
       {statements.addRecent, "INSERT INTO recent VALUES (?1, ?2, ?3, ?4, ?5, ?6)"},
-      {statements.lastChunk,
-       "SELECT number, samples, sample_values, sample_offsets FROM chunks "
-       "WHERE day = ?1 AND key = ?2 ORDER BY number DESC LIMIT 1"},
+      {statements.lastChunk, lastChunk},
       {statements.putChunk, "INSERT OR REPLACE INTO chunks VALUES (?1, ?2, ?3, ?4, ?5, ?6)"},
   };
   for (const auto& entry : kTexts) {
@@ -186,8 +189,9 @@ Status StoreWriter::foldRecent() {
 
 Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point end) {
   auto rows = database_.prepare(
-      "SELECT day, key, number, samples, sample_values, sample_offsets FROM recent "
-      "ORDER BY day, key, number");
+      "SELECT day, key, number, samples, " + std::string(kBoundedValues) + ", " +
+      std::string(kBoundedOffsets) +
+      " FROM recent WHERE day BETWEEN -2147483648 AND 2147483647 ORDER BY day, key, number");
   if (!rows) return rows.error();
   auto remove = database_.prepare("DELETE FROM recent WHERE day = ?1 AND key = ?2 AND number = ?3");
   if (!remove) return remove.error();
@@ -198,11 +202,12 @@ Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point 
   std::vector<double> values;
   std::vector<std::uint32_t> offsets;
   Step step = Step::Done;
+  RowOrder order;
   while ((step = rows->step()) == Step::Row) {
+    if (!order.follows(*rows, 2)) return damagedTree(database_);
     const std::int64_t number = rows->integer(2), samples = rows->integer(3);
     const auto valueColumn = rows->blob(4), offsetColumn = rows->blob(5);
-    const bool dayFits = rows->integer(0) == static_cast<std::int32_t>(rows->integer(0));
-    if (!dayFits || !isStoreKey(rows->text(1)) ||
+    if (!isStoreKey(rows->text(1)) ||
         !chunkIsSound(samples, std::ssize(valueColumn), std::ssize(offsetColumn))) {
       continue;
     }

@@ -20,7 +20,7 @@ namespace tally {
 class StoreWriter {
  public:
   // Empty when there is no store and none is to be made.
-  static Result<std::optional<StoreWriter>> open(const std::string& path, IfMissing ifMissing);
+  static Result<std::optional<StoreWriter>> open(const StoreFile& file, IfMissing ifMissing);
 
   Status begin();
   Status commit();
