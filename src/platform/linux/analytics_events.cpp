@@ -10,7 +10,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kEntry = "AnalyticsEvents";
 constexpr std::string_view kName = "events.jsonl";
 constexpr std::size_t kLargestFile = 1u << 20;
 
@@ -84,13 +83,13 @@ LinuxAnalyticsEvents::LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_p
       spool_(std::move(folder), *clock_, *log_) {}
 
 bool LinuxAnalyticsEvents::isAvailable() {
-  const auto* described = description_->getAs<KvDictionary>(kEntry);
+  const auto* described = description_->getAs<KvDictionary>(Described::AnalyticsEvents);
   if (described == nullptr) return description_->exists();
   return !described->getBool("Absent").value_or(false);
 }
 
 bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
-  const auto* described = description_->getAs<KvDictionary>(kEntry);
+  const auto* described = description_->getAs<KvDictionary>(Described::AnalyticsEvents);
   const KvObject* wanted = described != nullptr ? described->get("Wanted") : nullptr;
   if (wanted == nullptr) return true;
   const auto* names = kvCast<KvArray>(wanted);

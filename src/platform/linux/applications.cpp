@@ -70,12 +70,12 @@ std::vector<ApplicationFolder> applicationFolders(const DeviceRoot& root,
 void DesktopAppRegistry::enumerateBundles(int kind,
                                           const std::function<void(std::string_view)>& handler) {
   if (kind != kBundleKindApplication) return;
-  if (const auto* described = description_->getAs<KvArray>("Applications")) {
+  if (const auto* described = description_->getAs<KvArray>(Described::Applications)) {
     for (const auto& item : *described) {
       if (const auto* type = kvCast<KvString>(item.get())) {
         handler(type->view());
       } else {
-        description_->reportEntry("Applications", "holds what is not a bundle type");
+        description_->reportEntry(Described::Applications, "holds what is not a bundle type");
       }
     }
     return;

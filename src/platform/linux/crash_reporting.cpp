@@ -48,12 +48,12 @@ void LinuxCrashReporting::report(std::string_view what, const Error& error) cons
 }
 
 bool LinuxCrashSupportLibrary::open(std::string_view) {
-  const auto* described = description_->getAs<KvDictionary>("CrashSupport");
+  const auto* described = description_->getAs<KvDictionary>(Described::CrashSupport);
   return described == nullptr || !described->getBool("Absent").value_or(false);
 }
 
 bool LinuxCrashSupportLibrary::hasSymbol(std::string_view name) {
-  const auto* described = description_->getAs<KvDictionary>("CrashSupport");
+  const auto* described = description_->getAs<KvDictionary>(Described::CrashSupport);
   const auto* missing =
       described != nullptr ? described->getAs<KvArray>("MissingSymbols") : nullptr;
   return missing == nullptr ||

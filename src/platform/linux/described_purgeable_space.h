@@ -12,14 +12,17 @@ class DescribedPurgeableSpace final : public PurgeableSpace {
  public:
   explicit DescribedPurgeableSpace(std::shared_ptr<DeviceDescription> description)
       : description_(std::move(description)) {}
-  bool isAvailable() override { return description_->get(kEntry) != nullptr; }
+  bool isAvailable() override { return described() != nullptr; }
   KvRef<KvDictionary> copyItemizedPurgeableSpace(const KvDictionary&) override {
-    const auto* answer = description_->getAs<KvDictionary>(kEntry);
+    const auto* answer = described();
     return answer != nullptr ? answer->copy() : nullptr;
   }
 
  private:
-  static constexpr std::string_view kEntry = "PurgeableSpace";
+  const KvDictionary* described() {
+    return description_->getAs<KvDictionary>(Described::PurgeableSpace);
+  }
+
   std::shared_ptr<DeviceDescription> description_;
 };
 

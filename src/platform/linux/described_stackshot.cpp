@@ -7,7 +7,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kStackshot = "Stackshot";
 // Far above any snapshot of a small device's threads.
 constexpr std::size_t kLimit = 64u << 20;
 
@@ -61,7 +60,7 @@ class DescribedConfig final : public StackshotConfig {
 }  // namespace
 
 std::unique_ptr<StackshotConfig> DescribedStackshot::stackshotConfigCreate() {
-  const auto* stackshot = description_->getAs<KvDictionary>(kStackshot);
+  const auto* stackshot = description_->getAs<KvDictionary>(Described::Stackshot);
   if (stackshot == nullptr) return nullptr;
   return std::make_unique<DescribedConfig>(folder_, description_, stackshot->copy());
 }

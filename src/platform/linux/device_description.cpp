@@ -13,9 +13,13 @@ constexpr std::string_view kFileName = "device.plist";
 
 }  // namespace
 
-const KvObject* DeviceDescription::get(std::string_view key) {
+const KvObject* DeviceDescription::get(Described entry) {
   std::call_once(read_, [this] { read(); });
-  return entries_ ? entries_->get(key) : nullptr;
+  const DescribedEntry& wanted = describedEntry(entry);
+  const KvObject* const value = entries_ ? entries_->get(wanted.name) : nullptr;
+  if (value == nullptr || value->type() == wanted.type) return value;
+  reportEntry(entry, "is of the wrong type");
+  return nullptr;
 }
 
 bool DeviceDescription::exists() {

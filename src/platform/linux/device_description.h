@@ -6,9 +6,11 @@
 #include <mutex>
 #include <string>
 #include <string_view>
+#include <type_traits>
 
 #include "base/device_root.h"
 #include "kv/value.h"
+#include "platform/linux/described_entries.h"
 #include "platform/system_log.h"
 
 namespace tally {
@@ -23,22 +25,19 @@ class DeviceDescription {
 
   // Whether there is a description that can be read.
   bool exists();
-  // Borrowed; null when it is not described.
-  const KvObject* get(std::string_view key);
   // Borrowed; null when it is not described or of another type.
   template <class T>
-  const T* getAs(std::string_view key) {
-    const KvObject* value = get(key);
-    if (value != nullptr && value->type() != T::kType) {
-      reportEntry(key, "is of the wrong type");
-      return nullptr;
-    }
-    return static_cast<const T*>(value);
+  const T* getAs(std::type_identity_t<DescribedAs<T>> entry) {
+    return static_cast<const T*>(get(entry.entry));
   }
-  // Says once, as an error, that an entry cannot be used.
+  // Says once, as an error, that an entry, or the part of one that is named, cannot be used.
   void reportEntry(std::string_view entry, std::string_view fault);
+  void reportEntry(Described entry, std::string_view fault) {
+    reportEntry(describedEntry(entry).name, fault);
+  }
 
  private:
+  const KvObject* get(Described entry);
   void read();
 
   DeviceDirectory folder_;

@@ -41,7 +41,7 @@ Result<Directory> openDataVolume(const DeviceRoot& root) {
 }
 
 KvRef<KvObject> LinuxDeviceInformation::DeviceQuery(std::string_view question) {
-  if (const auto* answers = description_->getAs<KvDictionary>("DeviceAnswers")) {
+  if (const auto* answers = description_->getAs<KvDictionary>(Described::DeviceAnswers)) {
     if (auto* answer = answers->get(question)) return KvRef<KvObject>::share(answer);
   }
   if (question == "DiskUsage") return diskUsage();
@@ -71,20 +71,20 @@ KvRef<KvObject> LinuxDeviceInformation::inverseDeviceID() const {
 }
 
 bool LinuxDeviceInformation::HasInternalDiagnostics(std::string_view) {
-  const auto* described = description_->getAs<KvBoolean>("HasInternalDiagnostics");
+  const auto* described = description_->getAs<KvBoolean>(Described::HasInternalDiagnostics);
   return described != nullptr && described->value();
 }
 
 std::string LinuxDeviceInformation::SMAOSVersion() {
-  if (const auto* described = description_->getAs<KvString>("OSVersion")) {
+  if (const auto* described = description_->getAs<KvString>(Described::OSVersion)) {
     if (!described->view().empty()) return std::string(described->view());
-    description_->reportEntry("OSVersion", "is empty");
+    description_->reportEntry(Described::OSVersion, "is empty");
   }
   return osVersionText(*copySystemVersionDictionary());
 }
 
 KvRef<KvDictionary> LinuxDeviceInformation::copySystemVersionDictionary() {
-  if (const auto* described = description_->getAs<KvDictionary>("SystemVersion")) {
+  if (const auto* described = description_->getAs<KvDictionary>(Described::SystemVersion)) {
     return described->copy();
   }
   // A device root need not be a whole system: what it lacks is the host's.

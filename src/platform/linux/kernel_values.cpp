@@ -114,7 +114,7 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
 
 // The answer that the description gives; empty when it gives none.
 std::optional<LinuxKernelValues::Answer> LinuxKernelValues::described(std::string_view name) {
-  const auto* values = description_->getAs<KvDictionary>("KernelValues");
+  const auto* values = description_->getAs<KvDictionary>(Described::KernelValues);
   const KvObject* value = values != nullptr ? values->get(name) : nullptr;
   if (value == nullptr) return std::nullopt;
   const auto* successive = kvCast<KvArray>(value);
@@ -141,7 +141,8 @@ std::optional<LinuxKernelValues::Answer> LinuxKernelValues::convert(std::string_
 }
 
 std::uint64_t LinuxKernelValues::MonotonicTicks() {
-  if (const auto* ticks = description_->getAs<KvNumber>("MonotonicTicks")) return ticks->asUInt64();
+  if (const auto* ticks = description_->getAs<KvNumber>(Described::MonotonicTicks))
+    return ticks->asUInt64();
   timespec now{};
   ::clock_gettime(CLOCK_MONOTONIC, &now);
   return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000 +
@@ -149,7 +150,7 @@ std::uint64_t LinuxKernelValues::MonotonicTicks() {
 }
 
 std::optional<Timebase> LinuxKernelValues::TimebaseInfo() {
-  const auto* described = description_->getAs<KvDictionary>("Timebase");
+  const auto* described = description_->getAs<KvDictionary>(Described::Timebase);
   if (described == nullptr) return Timebase{1, 1};  // ticks are nanoseconds
   const auto* numerator = described->getAs<KvNumber>("Numerator");
   const auto* denominator = described->getAs<KvNumber>("Denominator");

@@ -90,12 +90,12 @@ std::optional<std::string> regionCode(const LocaleEnvironment& environment) {
 }
 
 std::vector<std::string> LinuxLocale::PreferredLanguages() {
-  if (auto tags = described("PreferredLanguages")) return *std::move(tags);
+  if (auto tags = described(Described::PreferredLanguages)) return *std::move(tags);
   return preferredLanguages(environment_);
 }
 
 std::vector<std::string> LinuxLocale::SystemLanguages() {
-  if (auto tags = described("SystemLanguages")) return *std::move(tags);
+  if (auto tags = described(Described::SystemLanguages)) return *std::move(tags);
   std::vector<std::string> tags{"en"};
   const DeviceDirectory folder(root_, "/usr/share/locale");
   if (const auto names = folder.list()) {
@@ -107,22 +107,22 @@ std::vector<std::string> LinuxLocale::SystemLanguages() {
 }
 
 std::optional<std::string> LinuxLocale::CurrentRegionCode() {
-  if (const auto* code = description_->getAs<KvString>("RegionCode")) {
+  if (const auto* code = description_->getAs<KvString>(Described::RegionCode)) {
     if (code->view().empty()) return std::nullopt;
     return std::string(code->view());
   }
   return regionCode(environment_);
 }
 
-std::optional<std::vector<std::string>> LinuxLocale::described(std::string_view key) {
-  const auto* array = description_->getAs<KvArray>(key);
+std::optional<std::vector<std::string>> LinuxLocale::described(DescribedAs<KvArray> entry) {
+  const auto* array = description_->getAs<KvArray>(entry);
   if (array == nullptr) return std::nullopt;
   std::vector<std::string> tags;
   for (const auto& item : *array) {
     if (const auto* tag = kvCast<KvString>(item.get())) {
       tags.emplace_back(tag->view());
     } else {
-      description_->reportEntry(key, "holds what is not a string");
+      description_->reportEntry(entry.entry, "holds what is not a string");
     }
   }
   return tags;

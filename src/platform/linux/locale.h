@@ -39,7 +39,7 @@ class LinuxLocale final : public Locale {
   std::optional<std::string> CurrentRegionCode() override;
 
  private:
-  std::optional<std::vector<std::string>> described(std::string_view key);
+  std::optional<std::vector<std::string>> described(DescribedAs<KvArray> entry);
 
   DeviceRoot root_;
   LocaleEnvironment environment_;

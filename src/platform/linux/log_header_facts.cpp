@@ -38,20 +38,20 @@ std::string hardwareModel() {
 
 }  // namespace
 
-std::string LinuxLogHeaderFacts::describedOr(std::string_view key, const std::string& text) {
-  if (const auto* described = description_->getAs<KvString>(key)) {
+std::string LinuxLogHeaderFacts::describedOr(DescribedAs<KvString> entry, const std::string& text) {
+  if (const auto* described = description_->getAs<KvString>(entry)) {
     if (!described->view().empty()) return printable(described->view());
-    description_->reportEntry(key, "is empty");
+    description_->reportEntry(entry.entry, "is empty");
   }
   return printable(text);
 }
 
 std::string LinuxLogHeaderFacts::SysIdDescription() {
-  return describedOr("SystemID", runningKernel());
+  return describedOr(Described::SystemID, runningKernel());
 }
 
 std::string LinuxLogHeaderFacts::HardwareModelString() {
-  return describedOr("HardwareModel", hardwareModel());
+  return describedOr(Described::HardwareModel, hardwareModel());
 }
 
 std::string LinuxLogHeaderFacts::SystemVersionString() {

@@ -24,7 +24,7 @@ class LinuxLogHeaderFacts final : public LogHeaderFacts {
 
  private:
   // The described text, else the other one; on one line.
-  std::string describedOr(std::string_view key, const std::string& text);
+  std::string describedOr(DescribedAs<KvString> entry, const std::string& text);
 
   std::shared_ptr<DeviceInformation> device_;
   std::shared_ptr<DeviceDescription> description_;

@@ -21,7 +21,10 @@ bool holds(Preferences& preferences) {
 }  // namespace
 
 bool SubmissionConsent::given() const {
-  if (const auto* described = description_->getAs<KvBoolean>(kSwitch)) return described->value();
+  if (const auto* described =
+          description_->getAs<KvBoolean>(Described::DiagnosticSubmissionEnabled)) {
+    return described->value();
+  }
   bool exists = false;
   const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &exists);
   return enabled || !exists;
