@@ -1,9 +1,12 @@
 // tallyrun: the daily job. The one place where the platform is built and installed.
 #include <malloc.h>
 
+#include <cstdio>
+#include <cstring>
 #include <span>
 
 #include "base/process.h"
+#include "base/version.h"
 #include "driver/app_info_listener.h"
 #include "driver/daily_job.h"
 #include "driver/tasking.h"
@@ -14,6 +17,12 @@
 
 int main(int count, char** arguments) {
   tally::surviveFailedWrites();
+  if (count > 1 && std::strcmp(arguments[1], "--version") == 0) {
+    // A question about the file, not a run: nothing is opened and nothing is logged.
+    std::printf("tallyrun %.*s\n", static_cast<int>(tally::kProgramVersion.size()),
+                tally::kProgramVersion.data());
+    return 0;
+  }
   // A run is short: memory that it gave back to the kernel it would soon ask for again, at the
   // price of a fault for each page.
   constexpr int kKeptBytes = 64 << 20;

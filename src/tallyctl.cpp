@@ -4,12 +4,14 @@
 #include "base/process.h"
 #include "host_platform.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/standard_streams.h"
 #include "tools/tool.h"
 #include "tools/tool_log.h"
 
 int main(int count, char** arguments) {
   using namespace tally;
   surviveFailedWrites();
+  prepareStandardStreams();
   tools::ToolContext context;
   context.root = deviceRootFromEnvironment();
   context.output = terminalOf(1);

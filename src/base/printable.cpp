@@ -50,6 +50,11 @@ void appendHexadecimal(std::string& out, std::uint32_t value, int digits) {
 
 }  // namespace
 
+bool isControl(std::uint32_t character) {
+  return character < 0x20 || (character >= 0x7F && character < 0xA0) ||
+         isIn(kLayoutControls, character);
+}
+
 std::string printable(std::string_view text) {
   const std::string valid = repairUtf8(text);
   std::string out;
@@ -61,12 +66,10 @@ std::string printable(std::string_view text) {
       out += "\\n";
     } else if (character == '\t') {
       out += "\\t";
-    } else if (character < 0x20 || (character >= 0x7F && character < 0xA0)) {
-      out += "\\x";
-      appendHexadecimal(out, character, 2);
-    } else if (isIn(kLayoutControls, character)) {
-      out += "\\u";
-      appendHexadecimal(out, character, 4);
+    } else if (isControl(character)) {
+      const bool isShort = character < 0x100;
+      out += isShort ? "\\x" : "\\u";
+      appendHexadecimal(out, character, isShort ? 2 : 4);
     } else {
       out.append(valid, begin, i - begin);
     }
@@ -91,6 +94,38 @@ std::string fitted(std::string_view text, std::size_t columns, std::string_view 
     if (width + markWidth > columns) break;
   }
   return std::string(text.substr(0, end)) + std::string(mark);
+}
+
+std::vector<std::string> wrapped(std::string_view text, std::size_t columns,
+                                 std::size_t alreadyTaken) {
+  constexpr std::string_view kSeparators = "/.,-_:;=";
+  std::vector<std::string> lines;
+  std::size_t begin = 0, width = std::min(alreadyTaken, columns), blank = 0, separator = 0;
+  const auto breakAt = [&](std::size_t end, std::size_t next) {
+    lines.emplace_back(text.substr(begin, end - begin));
+    begin = next;
+    blank = separator = width = 0;
+    return next;
+  };
+  for (std::size_t i = 0; i < text.size();) {
+    const std::size_t at = i;
+    width += widthOf(takeCharacter(text, i));
+    if (width > columns && at > begin) {
+      if (text[at] == ' ') {
+        i = breakAt(at, at + 1);
+      } else if (blank > begin) {
+        i = breakAt(blank, blank + 1);
+      } else {
+        const std::size_t cut = separator > begin ? separator : at;
+        i = breakAt(cut, cut);
+      }
+      continue;
+    }
+    if (text[at] == ' ' && at > begin && text[at - 1] != ' ') blank = at;
+    if (kSeparators.find(text[at]) != kSeparators.npos) separator = i;
+  }
+  if (begin < text.size() || lines.empty()) lines.emplace_back(text.substr(begin));
+  return lines;
 }
 
 }  // namespace tally

@@ -2,13 +2,13 @@
 
 #include <fmt/format.h>
 
-#include <cstdio>
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <vector>
 
 #include "base/file.h"
 #include "kv/plist_codec.h"
+#include "tools/standard_input.h"
 
 namespace tally::tools {
 namespace {
@@ -21,17 +21,6 @@ std::optional<unsigned> hexadecimalDigit(char digit) {
   const char lower = static_cast<char>(digit | 0x20);
   if (lower >= 'a' && lower <= 'f') return static_cast<unsigned>(lower - 'a' + 10);
   return std::nullopt;
-}
-
-Result<std::string> readStandardInput() {
-  std::string text;
-  char buffer[1 << 16];
-  while (const std::size_t count = std::fread(buffer, 1, sizeof buffer, stdin)) {
-    text.append(buffer, count);
-    if (text.size() > kLargestFile) return Error{"standard input: too large"};
-  }
-  if (std::ferror(stdin) != 0) return Error{"standard input cannot be read"};
-  return text;
 }
 
 // Null when the text is no UUID of 8-4-4-4-12 digits.
@@ -103,7 +92,8 @@ Result<KvRef<KvDictionary>> makeElement(const KvObject* value) {
 }  // namespace
 
 Result<KvRef<KvArray>> readApplicationList(const std::string& path) {
-  const auto document = path == "-" ? readStandardInput() : readFile(path, kLargestFile);
+  const auto document =
+      path == "-" ? readStandardInput(kLargestFile) : readFile(path, kLargestFile);
   if (!document) return document.error();
   const auto first = document->find_first_not_of(" \t\r\n");
   KvRef<KvArray> list;

@@ -161,7 +161,7 @@ void wait(const ToolContext& context, double seconds) {
       steady_clock::now() + std::chrono::duration_cast<steady_clock::duration>(Seconds(seconds));
   for (auto now = steady_clock::now(); now < end; now = steady_clock::now()) {
     const steady_clock::duration rest = end - now;
-    if (!context.errors.interactive) {
+    if (!context.errors.escapes) {
       std::this_thread::sleep_for(rest);
       continue;
     }
@@ -171,7 +171,7 @@ void wait(const ToolContext& context, double seconds) {
     std::this_thread::sleep_for(
         std::min<steady_clock::duration>(rest, std::chrono::milliseconds(200)));
   }
-  if (context.errors.interactive) print(context.err, "\r\x1b[K");
+  if (context.errors.escapes) print(context.err, "\r\x1b[K");
 }
 
 struct Sample {
@@ -278,7 +278,9 @@ void addFilters(CLI::App* command, ChannelArguments& wanted) {
   command->add_option("--category", wanted.categories, "Only these category bits (0x100)")
       ->type_name("BITS")
       ->check(CLI::Range(0x1, 0xFFFF));
-  command->add_option("--format", wanted.format, "Only this format")
+  command
+      ->add_option("--format", wanted.format, "Only this format: simple, state, histogram or array")
+      ->type_name("FORMAT")
       ->check(CLI::IsMember({"simple", "state", "histogram", "array"}));
   command->add_option("--unit", wanted.unit, "Only this unit: its label, or its word (0x...)")
       ->type_name("UNIT");

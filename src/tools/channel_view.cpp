@@ -129,7 +129,7 @@ void ChannelPrinter::printStates(KvDictionary& channel) {
   Table table({{""}, {""}, {"", Align::Right}, {"", Align::Right}, {"", Align::Right}, {""}});
   for (const StateReading& state : readStates(channel)) {
     const bool known = !std::isnan(state.share);
-    table.add({state.name, known ? bar(context_.output, state.share, kBarWidth) : "",
+    table.add({state.name, known ? Cell::bar(state.share, kBarWidth) : Cell(""),
                known ? fmt::format("{:.1f} %", state.share * 100) : "",
                residencyCell(state, channel), countCell(state.entries),
                std::string("entered") + (state.isCurrent ? ", now" : "")});
@@ -154,7 +154,7 @@ void ChannelPrinter::printBuckets(KvDictionary& channel) {
   for (auto it = first; it != end; ++it) {
     const double share = static_cast<double>(it->hits.value_or(0)) / static_cast<double>(most);
     table.add({rangeText(*it, static_cast<std::size_t>(it - buckets.begin())),
-               it->lower ? unit : "", countCell(it->hits), bar(context_.output, share, kBarWidth)});
+               it->lower ? unit : "", countCell(it->hits), Cell::bar(share, kBarWidth)});
   }
   printTable(table);
 }
@@ -168,7 +168,7 @@ void ChannelPrinter::printArray(KvDictionary& channel) {
   for (std::size_t i = 0; i < values.size(); ++i) {
     const double share = most > 0 ? static_cast<double>(values[i].value_or(0)) / most : 0;
     table.add({fmt::format("[{}]", i), valueCell(values[i]), unitOf(channel),
-               bar(context_.output, share, kBarWidth)});
+               Cell::bar(share, kBarWidth)});
   }
   if (table.empty()) {
     return printLine(context_, std::string(kElementIndent, ' ') + "no values", Ink::Faint);

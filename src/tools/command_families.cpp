@@ -1,5 +1,6 @@
 // The table of all commands, in the order of the help.
 #include "tools/channel_commands.h"
+#include "tools/complete_command.h"
 #include "tools/doctor_command.h"
 #include "tools/explain_command.h"
 #include "tools/forget_command.h"
@@ -18,7 +19,7 @@ std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
       addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
       addNandCommands,  addChannelCommands,   addPrefsCommands,  addDoctorCommand,
-      addSendCommands,  addTaskingCommands,   addForgetCommand,
+      addSendCommands,  addTaskingCommands,   addForgetCommand,  addCompleteCommand,
   };
   return kFamilies;
 }

@@ -56,6 +56,12 @@ bool isDailyLog(const SpooledLog& log) {
   return log.typeCode == kDailyLogTypeCode && log.name == kDailyLogName;
 }
 
+std::string_view faultOf(const SpooledLog& log, const Result<std::string>& body) {
+  if (!body || log.name.empty()) return "damaged";
+  if (!isDailyLog(log) || DailyLog::parse(*body)) return "";
+  return decodePlist(*body, kDailyLogMaximumBytes) ? "not a daily log" : "damaged";
+}
+
 SubmittedLogs::SubmittedLogs(const ToolContext& context) : reader_(spoolFolder(context.root)) {}
 
 Result<std::optional<SpooledLog>> SubmittedLogs::find(std::string_view name) const {

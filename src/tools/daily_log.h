@@ -46,6 +46,9 @@ struct Statistics {
 std::optional<Statistics> statisticsOf(const KvObject* value);
 
 bool isDailyLog(const SpooledLog& log);
+// What is wrong with a log of the spool: "damaged", or "not a daily log" where a property list of
+// another kind is in its place; empty when nothing is.
+std::string_view faultOf(const SpooledLog& log, const Result<std::string>& body);
 
 // The spool's logs, and reading one.
 class SubmittedLogs {

@@ -9,6 +9,7 @@
 #include "tools/day_argument.h"
 #include "tools/key_story.h"
 #include "tools/log_view.h"
+#include "tools/spelling.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -25,6 +26,10 @@ void printRows(const ToolContext& context, const KeyStory& story) {
     printLine(context, story.measured
                            ? "  no rows: the report measures this key itself when it is written"
                            : "  no rows of this key");
+    if (!story.similar.empty()) {
+      const std::vector<std::string_view> near(story.similar.begin(), story.similar.end());
+      printLine(context, "  did you mean " + alternatives(near) + "?", Ink::Doubtful);
+    }
     return;
   }
   const auto dayCell = [&](std::int32_t day) {
@@ -51,22 +56,27 @@ void printRows(const ToolContext& context, const KeyStory& story) {
   }
 }
 
-void printVerdict(const ToolContext& context, const KeyVerdict& verdict) {
-  const bool admitted = verdict.admitted();
-  print(context.out, "  " + inked(context.output, admitted ? Ink::Good : Ink::Doubtful,
-                                  admitted ? "admitted" : "refused "));
-  printLine(context, fmt::format("  as a {}: {}", kindName(verdict.kind), verdict.reason));
-  if (!admitted) return;
-  printLine(context, "            options: " + optionsText(*verdict.match.options));
-  for (const KeyCandidate& other : verdict.others) {
-    const std::string_view off = whyNotInForce(other.state);
-    printLine(context,
-              fmt::format("            passed over: {} {} ({} {})",
-                          isPrefixSection(other.section) ? "prefix" : "entry",
-                          other.entry.key->view(), other.entry.group->view(),
-                          !off.empty() ? off : "has it less specific or earlier"),
-              Ink::Faint);
+void printVerdicts(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, "In the whitelist");
+  if (!story.judge.file().root) return printLine(context, "  there is none", Ink::Doubtful);
+  Table table({{""}, {"", Align::Left, true}});
+  for (const KeyKind kind : story.kinds()) {
+    const KeyVerdict& verdict = kind == KeyKind::Scalar ? story.scalar : story.distribution;
+    const bool admitted = verdict.admitted();
+    table.add({admitted ? Cell("admitted", Ink::Good) : Cell("refused", Ink::Doubtful),
+               fmt::format("as a {}: {}", kindName(verdict.kind), verdict.reason)});
+    if (!admitted) continue;
+    table.add({"", "options: " + optionsText(*verdict.match.options)});
+    for (const KeyCandidate& other : verdict.others) {
+      const std::string_view off = whyNotInForce(other.state);
+      table.add({"", Cell(fmt::format("passed over: {} {} ({} {})",
+                                      isPrefixSection(other.section) ? "prefix" : "entry",
+                                      other.entry.key->view(), other.entry.group->view(),
+                                      !off.empty() ? off : "has it less specific or earlier"),
+                          Ink::Faint)});
+    }
   }
+  table.print(context);
 }
 
 void printRounding(const ToolContext& context, const KeyStory& story) {
@@ -108,20 +118,10 @@ void printValue(const ToolContext& context, const DailyLog& log, const std::stri
   }
 }
 
-// The kinds that a key is of: those it has rows of, is admitted as, or is measured as.
-std::vector<KeyKind> kindsOf(const KeyStory& story) {
-  const bool scalar = story.measured || !story.scalarRows.empty();
-  const bool distribution = !story.distributionRows.empty();
-  std::vector<KeyKind> kinds;
-  if (scalar || !distribution) kinds.push_back(KeyKind::Scalar);
-  if (distribution || !scalar) kinds.push_back(KeyKind::Distribution);
-  return kinds;
-}
-
 void printLogs(const ToolContext& context, const KeyStory& story) {
   printHeading(context, fmt::format("In a log of {}, made now", dayText(story.day)));
   const auto next = DailyLog::of(story.next);
-  for (const KeyKind kind : kindsOf(story)) {
+  for (const KeyKind kind : story.kinds()) {
     const std::string reason = story.whyAbsent(kind);
     if (reason.empty() && next) {
       printValue(context, *next, story.key, kind);
@@ -140,7 +140,7 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
     return;
   }
   printHeading(context, "In the submitted log " + story.submitted->log.fileName);
-  for (const KeyKind kind : kindsOf(story)) {
+  for (const KeyKind kind : story.kinds()) {
     const DailyLog& log = story.submitted->content;
     const KvObject* submitted = loggedValue(log, story.key, kind);
     const bool same = submitted != nullptr && next &&
@@ -176,6 +176,7 @@ Json storyJson(const KeyStory& story) {
                {"scalarRows", std::move(scalars)},
                {"distributionRows", std::move(distributions)},
                {"measuredByReport", story.measured},
+               {"similarKeys", story.similar},
                {"whitelist",
                 {{"scalar", jsonOf(story.scalar)}, {"distribution", jsonOf(story.distribution)}}}};
   if (story.trace.scalarBefore) {
@@ -195,7 +196,7 @@ Json storyJson(const KeyStory& story) {
   };
   const auto next = DailyLog::of(story.next);
   json["nextLog"] = next ? logged(*next) : Json(nullptr);
-  for (const KeyKind kind : kindsOf(story)) {
+  for (const KeyKind kind : story.kinds()) {
     const std::string reason = story.whyAbsent(kind);
     if (!reason.empty()) json["whyAbsent"][std::string(kindName(kind))] = reason;
   }
@@ -212,17 +213,19 @@ int explain(const ToolContext& context, const ExplainArguments& arguments) {
   if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
   const KeyStory story = tellStory(context, arguments.key, *day);
   bool present = false;
-  for (const KeyKind kind : kindsOf(story)) present = present || story.whyAbsent(kind).empty();
+  for (const KeyKind kind : story.kinds()) present = present || story.whyAbsent(kind).empty();
   if (context.json) {
     printJson(context, storyJson(story));
     return present ? kSuccess : kWrong;
   }
+  if (!story.judge.file().root) {
+    printLine(context,
+              "No whitelist can be used, so nothing is reported: " + story.judge.file().fault,
+              Ink::Bad);
+  }
   printLine(context, fmt::format("{} on {}", story.key, dayName(story.day)), Ink::Strong);
   printRows(context, story);
-  printHeading(context, "In the whitelist");
-  for (const KeyKind kind : kindsOf(story)) {
-    printVerdict(context, kind == KeyKind::Scalar ? story.scalar : story.distribution);
-  }
+  printVerdicts(context, story);
   printRounding(context, story);
   printLogs(context, story);
   return present ? kSuccess : kWrong;

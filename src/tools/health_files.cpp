@@ -4,6 +4,7 @@
 
 #include "base/device_root.h"
 #include "kv/plist_codec.h"
+#include "platform/linux/described_entries.h"
 #include "platform/linux/device_information.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/log_spool.h"
@@ -45,26 +46,39 @@ void examineRoot(const DeviceRoot& root, Lines& lines) {
        fmt::format("{}; logs leave {} free", byteText(*space), byteText(kReservedBytes))});
 }
 
-// The entries of the description and what each must be.
-struct DescribedEntry {
-  std::string_view key;
-  KvType type;
-};
-constexpr DescribedEntry kDescribed[] = {
-    {"DeviceAnswers", KvType::Dictionary},
-    {"HasInternalDiagnostics", KvType::Boolean},
-    {"OSVersion", KvType::String},
-    {"SystemVersion", KvType::Dictionary},
-    {"Applications", KvType::Array},
-    {"PreferredLanguages", KvType::Array},
-    {"SystemLanguages", KvType::Array},
-    {"RegionCode", KvType::String},
-    {"DiagnosticSubmissionEnabled", KvType::Boolean},
-    {"CrashSupport", KvType::Dictionary},
-    {"KernelValues", KvType::Dictionary},
-    {"MonotonicTicks", KvType::Number},
-    {"Timebase", KvType::Dictionary},
-};
+std::string withArticle(std::string_view noun) {
+  if (noun == "data") return std::string(noun);
+  return fmt::format("{} {}", noun.starts_with('a') ? "an" : "a", noun);
+}
+
+// Names what is not of its type, and what is near to a name that is known.
+template <class Entries>
+void examineEntries(const KvDictionary& found, const Entries& known, const std::string& place,
+                    Lines& lines) {
+  constexpr const char* kSubject = "device description";
+  std::vector<std::string_view> names;
+  for (const auto& entry : known) names.push_back(entry.name);
+  for (const auto& [key, value] : found) {
+    const auto entry =
+        std::ranges::find(known, key->view(), &std::ranges::range_value_t<Entries>::name);
+    const std::string name = place + std::string(key->view());
+    if (entry == std::ranges::end(known)) {
+      if (const auto meant = nearestWord(key->view(), names)) {
+        lines.push_back({Health::Wrong, kSubject,
+                         fmt::format("{} is not known; {}{} may be meant", name, place, *meant)});
+      }
+    } else if (value->type() != entry->type) {
+      lines.push_back(
+          {Health::Wrong, kSubject,
+           fmt::format("{} is {}, not {}, and is ignored", name,
+                       withArticle(typeName(value->type())), withArticle(typeName(entry->type)))});
+    } else if constexpr (requires { entry->members; }) {
+      if (!entry->members.empty()) {
+        examineEntries(static_cast<const KvDictionary&>(*value), entry->members, name + ".", lines);
+      }
+    }
+  }
+}
 
 void examineDescription(const DeviceRoot& root, Lines& lines) {
   constexpr const char* kSubject = "device description";
@@ -83,21 +97,8 @@ void examineDescription(const DeviceRoot& root, Lines& lines) {
          decoded ? "device/device.plist is not a dictionary" : decoded.error().message});
     return;
   }
-  std::vector<std::string_view> names;
-  for (const DescribedEntry& known : kDescribed) names.push_back(known.key);
-  lines.push_back({Health::Ok, kSubject,
-                   entries->size() == 1 ? "1 entry" : fmt::format("{} entries", entries->size())});
-  for (const auto& entry : *entries) {
-    const std::string_view key = entry.key->view();
-    const auto* known = std::ranges::find(kDescribed, key, &DescribedEntry::key);
-    if (known != std::end(kDescribed) && entry.value->type() != known->type) {
-      lines.push_back(
-          {Health::Wrong, kSubject, fmt::format("{} is of the wrong type and is ignored", key)});
-    } else if (const auto meant = nearestWord(key, names); meant && known == std::end(kDescribed)) {
-      lines.push_back(
-          {Health::Wrong, kSubject, fmt::format("{} is not known; {} may be meant", key, *meant)});
-    }
-  }
+  lines.push_back({Health::Ok, kSubject, counted(entries->size(), "entry")});
+  examineEntries(*entries, kDescribedEntries, "", lines);
 }
 
 void examineWhitelist(Lines& lines) {
@@ -208,9 +209,9 @@ void examineSpool(const ToolContext& context, Lines& lines) {
                                                counted(logs->size(), "log"), byteText(bytes),
                                                bounds.maximumLogs, byteText(bounds.maximumBytes))});
   for (const SpooledLog& log : *logs) {
-    const auto body = spool.read(log);
-    const bool sound = body && (!isDailyLog(log) || DailyLog::parse(*body)) && !log.name.empty();
-    if (!sound) lines.push_back({Health::Wrong, kSubject, log.fileName + " is damaged"});
+    const std::string_view fault = faultOf(log, spool.read(log));
+    if (fault.empty()) continue;
+    lines.push_back({Health::Wrong, kSubject, fmt::format("{} is {}", log.fileName, fault)});
   }
 }
 

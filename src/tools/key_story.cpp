@@ -1,10 +1,16 @@
 #include "tools/key_story.h"
 
 #include <algorithm>
+#include <iterator>
 #include <limits>
+#include <set>
 
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store_history.h"
+#include "platform/linux/store_schema.h"
 #include "platform/platform.h"
 #include "tools/preview.h"
+#include "tools/spelling.h"
 
 namespace tally::tools {
 namespace {
@@ -28,12 +34,54 @@ void readRows(KeyStory& story) {
       });
 }
 
+class KeyCollector final : public WhitelistVisitor {
+ public:
+  explicit KeyCollector(std::set<std::string, std::less<>>& keys) : keys_(keys) {}
+  bool beginGroup(std::string_view) override { return true; }
+  void entry(WhitelistSection section, WhitelistEntry found) override {
+    if (!isPrefixSection(section)) keys_.emplace(found.key->view());
+  }
+  void malformed(const WhitelistPlace&) override {}
+
+ private:
+  std::set<std::string, std::less<>>& keys_;
+};
+
+std::vector<std::string> similarKeys(const ToolContext& context, const KeyStory& story) {
+  constexpr std::size_t kSuggested = 3;
+  std::set<std::string, std::less<>> keys;
+  listStoreKeys(
+      metricsStorePath(context.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
+      [](const std::string&) {});
+  KeyCollector collector(keys);
+  if (const auto& whitelist = story.judge.file().root) visitWhitelist(*whitelist, collector);
+  const std::vector<std::string_view> known(keys.begin(), keys.end());
+  auto near = nearestWords(story.key, known, kSuggested);
+  if (near.empty() && !story.key.empty()) {
+    // Not a slip: perhaps a part of the name.
+    std::ranges::copy_if(known, std::back_inserter(near), [&story](std::string_view key) {
+      return key.find(story.key) != std::string_view::npos;
+    });
+    if (near.size() > kSuggested) near.resize(kSuggested);
+  }
+  return {near.begin(), near.end()};
+}
+
 template <class Rows>
 bool hasDay(const Rows& rows, std::int32_t day) {
   return std::ranges::any_of(rows, [day](const auto& row) { return row.day == day; });
 }
 
 }  // namespace
+
+std::vector<KeyKind> KeyStory::kinds() const {
+  const bool isScalar = measured || !scalarRows.empty();
+  const bool isDistribution = !distributionRows.empty();
+  std::vector<KeyKind> kinds;
+  if (isScalar || !isDistribution) kinds.push_back(KeyKind::Scalar);
+  if (isDistribution || !isScalar) kinds.push_back(KeyKind::Distribution);
+  return kinds;
+}
 
 std::string KeyStory::whyAbsent(KeyKind kind) const {
   const bool isScalar = kind == KeyKind::Scalar;
@@ -60,6 +108,9 @@ KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_
   story.scalar = story.judge.judge(key, KeyKind::Scalar);
   story.distribution = story.judge.judge(key, KeyKind::Distribution);
   readRows(story);
+  if (!story.measured && story.scalarRows.empty() && story.distributionRows.empty()) {
+    story.similar = similarKeys(context, story);
+  }
   story.trace.key = key;
   story.next = previewLog(day, &story.trace).document;
   story.submitted = SubmittedLogs(context).newest(day);

@@ -31,6 +31,9 @@ struct KeyStory {
   std::vector<ScalarRow> scalarRows;
   std::vector<DistributionRow> distributionRows;
   bool measured = false;  // by the report itself, when it is written
+  // Of a key that has no rows and is not measured: keys of the store or the whitelist that may have
+  // been meant.
+  std::vector<std::string> similar;
   WhitelistJudge judge;
   KeyVerdict scalar, distribution;
   // The day's log as it would be made now; null when there would be none.
@@ -39,6 +42,9 @@ struct KeyStory {
   std::optional<SubmittedLogs::Found> submitted;  // the newest log of the day
   bool submissionAllowed = true;
 
+  // The kinds that the key is of: those that it has rows of or is measured as, both when there are
+  // none.
+  std::vector<KeyKind> kinds() const;
   // Why the key does not stand in a log of the day as that kind; empty when it would.
   std::string whyAbsent(KeyKind kind) const;
 };

@@ -5,6 +5,7 @@
 #include <optional>
 
 #include "tools/log_view.h"
+#include "tools/natural_order.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -130,9 +131,9 @@ void printHistogramDiff(const ToolContext& context, const DailyLog& before, cons
     return dictionary != nullptr ? *dictionary : *kEmpty;
   };
   for (const Difference& difference : found) {
-    print(context.out,
-          "  " + inked(context.output, signOf(difference).ink, signOf(difference).text) + " ");
-    printLine(context, difference.key);
+    Table title({{""}, {"", Align::Left, true}});
+    title.add({signOf(difference), difference.key});
+    title.print(context);
     Table table({{"", Align::Right},
                  {"before", Align::Right},
                  {"after", Align::Right},
@@ -150,7 +151,10 @@ void printHistogramDiff(const ToolContext& context, const DailyLog& before, cons
 void printTextDiff(const ToolContext& context, std::string_view title,
                    const std::vector<Difference>& found) {
   if (!printPart(context, title, found)) return;
-  Table table({{""}, {"key"}, {"before", Align::Left, true}, {"after", Align::Left, true}});
+  Table table({{""},
+               {"key", Align::Left, true},
+               {"before", Align::Left, true},
+               {"after", Align::Left, true}});
   for (const Difference& difference : found) {
     const auto text = [](const KvObject* value) {
       return value != nullptr ? valueText(value) : std::string();
@@ -195,7 +199,7 @@ std::vector<Difference> differences(const KvDictionary& before, const KvDictiona
       found.push_back({std::string(entry.key->view()), nullptr, entry.value.get()});
     }
   }
-  std::ranges::stable_sort(found, {}, &Difference::key);
+  std::ranges::sort(found, naturalLess, &Difference::key);
   return found;
 }
 

@@ -5,6 +5,7 @@
 
 #include "base/printable.h"
 #include "base/time_text.h"
+#include "tools/natural_order.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -14,7 +15,7 @@ namespace {
 std::vector<const KvDictionary::Entry*> sorted(const KvDictionary& dictionary) {
   std::vector<const KvDictionary::Entry*> entries;
   for (const auto& entry : dictionary) entries.push_back(&entry);
-  std::ranges::stable_sort(entries, {}, [](const auto* entry) { return entry->key->view(); });
+  std::ranges::sort(entries, naturalLess, [](const auto* entry) { return entry->key->view(); });
   return entries;
 }
 
@@ -141,7 +142,7 @@ void printHistogram(const ToolContext& context, const KvDictionary& histogram, s
     const double samples = count != nullptr ? count->asDouble() : 0;
     table.add({std::string(bucket.key->view()), numberText(bucket.value.get()),
                total > 0 ? fmt::format("{:.1f} %", samples / total * 100) : "",
-               bar(context.output, most > 0 ? samples / most : 0, kBarWidth)});
+               Cell::bar(most > 0 ? samples / most : 0, kBarWidth)});
   }
   print(context.out, table.render(context.output, indent));
 }

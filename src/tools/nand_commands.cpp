@@ -6,9 +6,9 @@
 #include <nlohmann/json.hpp>
 
 #include "storage/auxiliary_metrics.h"
-#include "storage/exporter.h"
 #include "storage/health.h"
 #include "storage/nand_info.h"
+#include "tools/nand_command.h"
 #include "tools/nand_event_commands.h"
 #include "tools/nand_groups.h"
 #include "tools/nand_list_commands.h"
@@ -142,10 +142,8 @@ void printHealth(const ToolContext& context, const KvDictionary& info, const KvD
 
 int runHealth(const ToolContext& context) {
   const auto info = CopyNANDInfo();
-  if (const std::string failure = failureOf(*info); !failure.empty()) {
-    if (context.json) printJson(context, {{"error", failure}});
-    return complainOf(context, failure);
-  }
+  const std::string failure = failureOf(*info);
+  if (!failure.empty()) return complainOf(context, failure);
   const auto health = healthOfNandInfo(*info);
   const auto lab = internalLabExtract(*health);
   const bool retirable =
@@ -169,15 +167,13 @@ void addNandCommands(CLI::App& app, ToolContext& context) {
   CLI::App* nand = app.add_subcommand("nand", "Figures and health of the flash storage");
   nand->require_subcommand(1);
 
-  CLI::App* info = nand->add_subcommand("info", "What the storage driver exports, in groups");
   const auto text = std::make_shared<std::string>();
-  info->add_option("text", *text, "Only keys that contain it")->type_name("TEXT");
-  info->callback(
-      [&context, text] { context.command = [&context, text] { return runInfo(context, *text); }; });
-
-  CLI::App* health = nand->add_subcommand(
-      "health", "Wear, errors and spare blocks; exit status 1 when the storage should be retired");
-  health->callback([&context] { context.command = [&context] { return runHealth(context); }; });
+  addNandCommand(*nand, context, "info", "What the storage driver exports, in groups",
+                 [&context, text] { return runInfo(context, *text); })
+      ->add_option("TEXT", *text, "Only keys that contain it");
+  addNandCommand(*nand, context, "health",
+                 "Wear, errors and spare blocks; exit status 1 when the storage should be retired",
+                 [&context] { return runHealth(context); });
 
   addNandListCommands(*nand, context);
   addNandEventCommands(*nand, context);

@@ -9,6 +9,7 @@
 #include "storage/analytics_day.h"
 #include "storage/analytics_events.h"
 #include "storage/nand_info.h"
+#include "tools/nand_command.h"
 #include "tools/output.h"
 #include "tools/table.h"
 
@@ -110,13 +111,11 @@ int runEvents(const ToolContext& context, const std::string& text) {
 }  // namespace
 
 void addNandEventCommands(CLI::App& nand, ToolContext& context) {
-  CLI::App* events =
-      nand.add_subcommand("events", "The analytics events that would be sent now; sends nothing");
   const auto text = std::make_shared<std::string>();
-  events->add_option("text", *text, "Only events whose name contains it")->type_name("TEXT");
-  events->callback([&context, text] {
-    context.command = [&context, text] { return runEvents(context, *text); };
-  });
+  addNandCommand(nand, context, "events",
+                 "The analytics events that would be sent now; sends nothing",
+                 [&context, text] { return runEvents(context, *text); })
+      ->add_option("TEXT", *text, "Only events whose name contains it");
 }
 
 }  // namespace tally::tools

@@ -13,6 +13,7 @@
 #include "storage/storage_log.h"
 #include "storage/write_amplification.h"
 #include "tools/dry_run.h"
+#include "tools/nand_command.h"
 #include "tools/output.h"
 #include "tools/table.h"
 
@@ -222,33 +223,22 @@ int runStorageLog(const ToolContext& context) {
 }  // namespace
 
 void addNandListCommands(CLI::App& nand, ToolContext& context) {
-  CLI::App* telemetry =
-      nand.add_subcommand("telemetry", "The read-algorithm counters of each flash bus");
   const auto mode = std::make_shared<std::optional<std::uint32_t>>();
-  telemetry->add_option("--mode", *mode, "Only this mode, 0 to 2")
+  addNandCommand(nand, context, "telemetry", "The read-algorithm counters of each flash bus",
+                 [&context, mode] { return runTelemetry(context, *mode); })
+      ->add_option("--mode", *mode, "Only this mode, 0 to 2")
+      ->type_name("MODE")
       ->check(CLI::Range(std::uint32_t{0}, kTelemetryModes - 1));
-  telemetry->callback([&context, mode] {
-    context.command = [&context, mode] { return runTelemetry(context, *mode); };
-  });
-
-  const struct {
-    const char *name, *help;
-    int (*run)(const ToolContext&);
-  } plain[] = {
-      {"validity", "The validity lists", runValidity},
-      {"defects", "Defects of the flash, the factory's and those found since", runDefects},
-  };
-  for (const auto& command : plain) {
-    nand.add_subcommand(command.name, command.help)->callback([&context, run = command.run] {
-      context.command = [&context, run] { return run(context); };
-    });
-  }
-
-  CLI::App* log = nand.add_subcommand("storage-log", "The weekly log of the storage's state");
-  log->add_flag_callback(
-         "--preview", [] {}, "Show it as it would be now, and write nothing")
+  addNandCommand(nand, context, "validity", "The validity lists",
+                 [&context] { return runValidity(context); });
+  addNandCommand(nand, context, "defects",
+                 "Defects of the flash, the factory's and those found since",
+                 [&context] { return runDefects(context); });
+  addNandCommand(nand, context, "storage-log", "The weekly log of the storage's state",
+                 [&context] { return runStorageLog(context); })
+      ->add_flag_callback(
+          "--preview", [] {}, "Show it as it would be now, and write nothing")
       ->required();
-  log->callback([&context] { context.command = [&context] { return runStorageLog(context); }; });
 }
 
 }  // namespace tally::tools

@@ -106,7 +106,7 @@ void addNandSnapshotCommands(CLI::App& nand, ToolContext& context) {
     std::string records, description;
   };
   const auto paths = std::make_shared<Paths>();
-  snapshot->add_option("file", paths->records, "The records")->type_name("FILE")->required();
+  snapshot->add_option("FILE", paths->records, "The records")->required();
   snapshot
       ->add_option("--header", paths->description,
                    "The description block of the records; without it they have the fixed layout")

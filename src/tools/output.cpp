@@ -8,6 +8,7 @@
 #include "base/number_text.h"
 #include "base/printable.h"
 #include "base/time_text.h"
+#include "base/utf8.h"
 #include "kv/base64.h"
 
 namespace tally::tools {
@@ -41,16 +42,30 @@ std::string grouped(std::string digits) {
 
 std::string inked(const Terminal& terminal, Ink ink, std::string_view text) {
   const std::string_view begin = sequenceOf(ink);
-  if (!terminal.colour || begin.empty() || text.empty()) return std::string(text);
+  if (!terminal.escapes || begin.empty() || text.empty()) return std::string(text);
   return fmt::format("{}{}\x1b[0m", begin, text);
 }
 
 void printHeading(const ToolContext& context, std::string_view title) {
-  print(context.out, "\n" + inked(context.output, Ink::Strong, printable(title)) + "\n");
+  print(context.out, "\n");
+  printLine(context, title, Ink::Strong);
 }
 
 void printLine(const ToolContext& context, std::string_view text, Ink ink) {
-  print(context.out, inked(context.output, ink, printable(text)) + "\n");
+  const std::string shown = printable(text);
+  if (!context.output.interactive || displayWidth(shown) <= context.output.columns) {
+    return print(context.out, inked(context.output, ink, shown) + "\n");
+  }
+  // What continues a line is indented further than it.
+  constexpr std::size_t kContinued = 2;
+  const std::size_t first = std::min(shown.find_first_not_of(' '), context.output.columns / 2);
+  const std::size_t hang = first + kContinued;
+  std::size_t indent = first;
+  for (const std::string& line :
+       wrapped(std::string_view(shown).substr(first), context.output.columns - hang)) {
+    print(context.out, std::string(indent, ' ') + inked(context.output, ink, line) + "\n");
+    indent = hang;
+  }
 }
 
 std::string bar(const Terminal& terminal, double share, std::size_t width) {
@@ -96,7 +111,30 @@ std::string byteText(std::uint64_t bytes) {
 }
 
 std::string counted(std::uint64_t count, std::string_view noun) {
-  return fmt::format("{} {}{}", grouped(std::to_string(count)), noun, count == 1 ? "" : "s");
+  const bool endsInY = noun.ends_with("ry");  // entry, registry; not day, key
+  const std::string_view stem = endsInY ? noun.substr(0, noun.size() - 1) : noun;
+  const std::string_view ending = endsInY ? "ies" : "s";
+  return fmt::format("{} {}{}", grouped(std::to_string(count)), count == 1 ? noun : stem,
+                     count == 1 ? "" : ending);
+}
+
+std::string_view typeName(KvType type) {
+  switch (type) {
+    case KvType::String:
+      return "string";
+    case KvType::Number:
+      return "number";
+    case KvType::Boolean:
+      return "boolean";
+    case KvType::Date:
+      return "date";
+    case KvType::Data:
+      return "data";
+    case KvType::Array:
+      return "array";
+    default:
+      return "dictionary";
+  }
 }
 
 std::string dayName(std::int32_t day) { return fmt::format("day {} ({})", day, dayText(day)); }
@@ -143,11 +181,31 @@ void addMember(Json& object, std::string name, Json value) {
 }
 
 void printJson(const ToolContext& context, const Json& document) {
-  print(context.out, document.dump(2, ' ', false, Json::error_handler_t::replace) + "\n");
+  print(context.out,
+        printableJson(document.dump(2, ' ', false, Json::error_handler_t::replace)) + "\n");
+}
+
+std::string printableJson(std::string text) {
+  std::string out;
+  std::size_t copied = 0;
+  for (std::size_t i = 0; i < text.size();) {
+    const std::size_t begin = i;
+    const std::uint32_t character = takeCharacter(text, i);
+    // Only texts hold what is not ASCII, so that an escape is right wherever such a character is.
+    if (character != 0x7F && (character < 0x80 || !isControl(character))) continue;
+    out.append(text, copied, begin - copied).append(fmt::format("\\u{:04x}", character));
+    copied = i;
+  }
+  if (copied == 0) return text;
+  return out.append(text, copied);
 }
 
 int complain(const ToolContext& context, std::string_view message, ExitStatus status) {
-  print(context.err, fmt::format("tallyctl: {}\n", printable(message)));
+  if (context.json && context.complaints != nullptr) {
+    context.complaints->emplace_back(message);
+  } else {
+    print(context.err, fmt::format("tallyctl: {}\n", printable(message)));
+  }
   return status;
 }
 

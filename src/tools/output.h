@@ -18,7 +18,8 @@ enum class Ink { Plain, Strong, Faint, Good, Doubtful, Bad };
 std::string inked(const Terminal& terminal, Ink ink, std::string_view text);
 // A title line, with an empty line above it.
 void printHeading(const ToolContext& context, std::string_view title);
-// A line of text that may come from outside.
+// A line of text that may come from outside. A terminal gets it wrapped, with what continues it
+// indented further.
 void printLine(const ToolContext& context, std::string_view text, Ink ink = Ink::Plain);
 
 // A bar of share (0 to 1) times width columns; a share above 0 is never invisible.
@@ -31,8 +32,10 @@ std::string integerText(std::int64_t value);
 std::string realText(double value);
 // "512 bytes", "1.4 MiB".
 std::string byteText(std::uint64_t bytes);
-// "1 key", "2 keys".
+// "1 key", "2 keys", "2 entries".
 std::string counted(std::uint64_t count, std::string_view noun);
+// "string", "number", "dictionary".
+std::string_view typeName(KvType type);
 // "day 20513 (2026-03-01)".
 std::string dayName(std::int32_t day);
 
@@ -45,7 +48,12 @@ Json jsonOfReal(double value);
 void addMember(Json& object, std::string name, Json value);
 void printJson(const ToolContext& context, const Json& document);
 
-// Says on standard error why the command ends, and passes the status on.
+// JSON whose texts hold no character that a terminal would obey: control characters beyond those
+// that JSON escapes anyway, and those that reorder a line, are written as escapes.
+std::string printableJson(std::string text);
+
+// Says why the command ends, and passes the status on: a line on standard error, or with --json a
+// part of the error object that runTool() prints.
 int complain(const ToolContext& context, std::string_view message, ExitStatus status);
 
 }  // namespace tally::tools

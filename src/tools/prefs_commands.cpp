@@ -7,6 +7,7 @@
 
 #include "base/file.h"
 #include "base/number_text.h"
+#include "base/utf8.h"
 #include "kv/plist_codec.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/property_list_preferences.h"
@@ -40,22 +41,8 @@ int refuseDomain(const ToolContext& context, const std::string& name) {
 }
 
 std::string_view typeName(const KvObject& value) {
-  switch (value.type()) {
-    case KvType::String:
-      return "string";
-    case KvType::Number:
-      return static_cast<const KvNumber&>(value).isReal() ? "real" : "integer";
-    case KvType::Boolean:
-      return "boolean";
-    case KvType::Date:
-      return "date";
-    case KvType::Data:
-      return "data";
-    case KvType::Array:
-      return "array";
-    default:
-      return "dictionary";
-  }
+  if (const auto* number = kvCast<KvNumber>(&value)) return number->isReal() ? "real" : "integer";
+  return tools::typeName(value.type());
 }
 
 KvRef<KvObject> booleanOf(std::string_view text) {
@@ -92,7 +79,8 @@ Result<KvRef<KvObject>> valueOf(const PrefsArguments& arguments) {
     if (arguments.type != "auto" && arguments.type != type.name) continue;
     if (auto value = type.parse(arguments.value)) return value;
   }
-  return Error{fmt::format("\"{}\" is no {}", arguments.value, arguments.type)};
+  return Error{
+      fmt::format("\"{}\" is not a value of the type {}", arguments.value, arguments.type)};
 }
 
 int get(const ToolContext& context, const PrefsArguments& arguments) {
@@ -119,6 +107,16 @@ int get(const ToolContext& context, const PrefsArguments& arguments) {
   return kSuccess;
 }
 
+// Whether a domain's file gives the key and the value back as they are: XML carries neither control
+// characters nor bytes that are not UTF-8.
+bool canBeStored(const std::string& key, const std::string& text, const KvRef<KvObject>& value) {
+  if (!isValidUtf8(key) || !isValidUtf8(text)) return false;
+  const auto entry = KvDictionary::create({{key, value}});
+  const auto document = encodeXmlPlist(*entry);
+  const auto stored = document ? decodePlist(*document) : Result<KvRef<KvObject>>(document.error());
+  return stored && kvEqual(stored->get(), entry.get());
+}
+
 int write(const ToolContext& context, const PrefsArguments& arguments, KvRef<KvObject> value) {
   auto preferences = openPreferences(context, Access::ReadWrite);
   preferences.SMAPreferencesSetValue(arguments.key, value, arguments.domain);
@@ -143,6 +141,13 @@ int set(const ToolContext& context, const PrefsArguments& arguments) {
   if (!isDomainName(arguments.domain)) return refuseDomain(context, arguments.domain);
   const auto value = valueOf(arguments);
   if (!value) return complain(context, value.error().message, kBadUsage);
+  if (!canBeStored(arguments.key, arguments.value, *value)) {
+    return complain(context,
+                    fmt::format("{} cannot be stored as given: a property list has no control "
+                                "characters, only valid UTF-8",
+                                arguments.key),
+                    kBadUsage);
+  }
   return write(context, arguments, *value);
 }
 
@@ -206,7 +211,7 @@ void addPrefsCommands(CLI::App& app, ToolContext& context) {
                       [&context, arguments, run] { return run(context, *arguments); });
   };
   const auto addKey = [&](CLI::App* command) {
-    command->add_option("KEY", arguments->key)->required();
+    command->add_option("PREFERENCE", arguments->key, "Its key")->required();
     command->add_option("--domain", arguments->domain, "The domain")
         ->type_name("DOMAIN")
         ->capture_default_str();

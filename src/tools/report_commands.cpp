@@ -6,6 +6,8 @@
 
 #include "base/file.h"
 #include "base/time_text.h"
+#include "base/utf8.h"
+#include "kv/plist_codec.h"
 #include "platform/platform.h"
 #include "report/report.h"
 #include "tools/daily_log.h"
@@ -13,6 +15,7 @@
 #include "tools/log_diff.h"
 #include "tools/log_view.h"
 #include "tools/preview.h"
+#include "tools/standard_input.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -121,9 +124,10 @@ int list(const ToolContext& context, const ReportArguments&) {
       document.push_back(std::move(item));
       continue;
     }
-    const bool damaged = !content && (isDailyLog(log) || !body);
+    const std::string_view fault = content ? "" : faultOf(log, body);
     table.add({log.fileName, log.typeCode,
-               damaged ? Cell("damaged", Ink::Bad) : Cell(content ? dayDate(*content) : "-"),
+               !fault.empty() ? Cell(std::string(fault), Ink::Bad)
+                              : Cell(content ? dayDate(*content) : "-"),
                timeText(log.creationTime), byteText(log.bytes),
                content ? integerText(static_cast<std::int64_t>(content->keyCount())) : "-"});
   }
@@ -152,42 +156,72 @@ int showText(const ToolContext& context, const std::string& title, std::string_v
   return kSuccess;
 }
 
-int showBody(const ToolContext& context, const std::string& title, std::string_view body,
-             const SpooledLog* spooled) {
-  const auto content = DailyLog::parse(body);
-  if (!content) {
-    if (spooled != nullptr && !isDailyLog(*spooled) && !spooled->typeCode.empty()) {
-      return showText(context, title, body);
-    }
-    return complain(context, fmt::format("{} is damaged: {}", title, content.error().message),
-                    kWrong);
+bool isText(std::string_view body) {
+  return isValidUtf8(body) && body.find('\0') == std::string_view::npos;
+}
+
+// Structured-data logs are property lists too; they are shown as what they hold.
+int showPropertyList(const ToolContext& context, const std::string& title, const KvObject& root) {
+  const auto* const fields = kvCast<KvDictionary>(&root);
+  if (fields == nullptr || !fields->contains("RecordType")) {
+    return complain(context, title + " is a property list, but not a daily log", kWrong);
   }
-  const KvDictionary* options = spooled != nullptr ? spooled->options.get() : nullptr;
-  if (context.json) {
-    Json json = {{"file", title}, {"bytes", body.size()}};
-    json.update(jsonOf(*content, options));
-    printJson(context, json);
-    return kSuccess;
-  }
-  printDailyLog(context, *content, options);
-  print(context.out, "\n");
-  printLine(context, fmt::format("{}, {}", title, byteText(body.size())), Ink::Faint);
+  if (!context.json) printLine(context, title, Ink::Strong);
+  printJson(context,
+            context.json ? Json{{"file", title}, {"records", jsonOf(&root)}} : jsonOf(&root));
   return kSuccess;
 }
 
-int show(const ToolContext& context, const ReportArguments& arguments) {
-  if (arguments.name.find('/') != std::string::npos) {
-    const auto body = readFile(arguments.name, kDailyLogMaximumBytes);
-    if (!body) return complain(context, body.error().message, kWrong);
-    return showBody(context, arguments.name, *body, nullptr);
+int showDailyLog(const ToolContext& context, const std::string& title, std::size_t bytes,
+                 const DailyLog& content, const KvDictionary* options) {
+  if (context.json) {
+    Json json = {{"file", title}, {"bytes", bytes}};
+    json.update(jsonOf(content, options));
+    printJson(context, json);
+    return kSuccess;
   }
+  printDailyLog(context, content, options);
+  print(context.out, "\n");
+  printLine(context, fmt::format("{}, {}", title, byteText(bytes)), Ink::Faint);
+  return kSuccess;
+}
+
+// Any log, from the spool or from elsewhere (spooled is null then): by what it holds, so that a
+// copy is shown like the log itself.
+int showBody(const ToolContext& context, const std::string& title, std::string_view body,
+             const SpooledLog* spooled) {
+  const bool mustBeDaily = spooled != nullptr && isDailyLog(*spooled);
+  const auto root = decodePlist(body, kDailyLogMaximumBytes);
+  if (!root) {
+    if (!mustBeDaily && isText(body)) return showText(context, title, body);
+    return complain(context, fmt::format("{} is damaged: {}", title, root.error().message), kWrong);
+  }
+  const auto content = DailyLog::of(KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get())));
+  if (!content) return showPropertyList(context, title, **root);
+  return showDailyLog(context, title, body.size(), *content,
+                      spooled != nullptr ? spooled->options.get() : nullptr);
+}
+
+int showFile(const ToolContext& context, const std::string& path) {
+  const bool isStandardInput = path == "-";
+  const auto body = isStandardInput ? readStandardInput(kDailyLogMaximumBytes)
+                                    : readFile(path, kDailyLogMaximumBytes);
+  if (!body) return complain(context, body.error().message, kWrong);
+  return showBody(context, isStandardInput ? "standard input" : path, *body, nullptr);
+}
+
+int show(const ToolContext& context, const ReportArguments& arguments) {
+  const std::string& name = arguments.name;
+  if (name == "-" || name.find('/') != std::string::npos) return showFile(context, name);
   const SubmittedLogs logs(context);
-  const auto found = logs.find(arguments.name);
+  const auto found = logs.find(name);
+  const bool isLog = found && *found;
+  // The spool's names come first; a file of such a name can be given with its folder.
+  if (!isLog && !name.empty() && fileSize(name)) return showFile(context, name);
   if (!found) return complain(context, found.error().message, kWrong);
-  if (!*found) {
+  if (!isLog) {
     return complain(context,
-                    arguments.name.empty() ? "no daily log was submitted yet"
-                                           : "there is no log " + arguments.name,
+                    name.empty() ? "no daily log was submitted yet" : "there is no log " + name,
                     kWrong);
   }
   const SpooledLog& log = **found;
@@ -216,8 +250,10 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
   add("list", "The logs that were submitted", list);
 
   command = add("show", "A submitted log: statistics, histograms, scalars", show);
-  command->add_option("NAME", arguments->name,
-                      "Its number or name, or a path with a /; the last daily log when left out");
+  command->add_option(
+      "LOG", arguments->name,
+      "Its number or name, a file, or - for standard input; the last daily log when "
+      "left out");
 }
 
 }  // namespace tally::tools

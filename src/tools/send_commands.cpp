@@ -22,7 +22,7 @@ KvRef<KvDictionary> messageOf(Operation operation) {
 }
 
 int send(const ToolContext& context, const KvDictionary& message, const std::string& what) {
-  if (const Status sent = sendToEndpoint(kServiceName, message); !sent) {
+  if (const Status sent = sendToEndpoint(kServiceName, context.root, message); !sent) {
     return complain(context, fmt::format("not sent: {}", sent.error().message), kWrong);
   }
   if (context.json) {
@@ -57,8 +57,8 @@ int sendApplications(const ToolContext& context, const SendArguments& arguments)
 
 void addSendCommands(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<SendArguments>();
-  CLI::App* const family =
-      app.add_subcommand("send", "Send a message to the program, which starts it if need be");
+  CLI::App* const family = app.add_subcommand(
+      "send", "Send a message to the program of this device root, which the bus starts if need be");
   family->require_subcommand(1);
   const auto add = [&](const char* name, const char* description, auto run) {
     return addCommand(family, context, name, description,

@@ -3,13 +3,24 @@
 
 #include <optional>
 #include <span>
+#include <string>
 #include <string_view>
+#include <vector>
 
 namespace tally::tools {
 
-// The known word that is so near to the text, letter case and punctuation aside, that it may be
-// meant; empty when none is.
+// The known words that are so near to the text, letter case and punctuation aside, that they may be
+// meant: at most so many, the nearest first, and none that is much further than it.
+std::vector<std::string_view> nearestWords(std::string_view text,
+                                           std::span<const std::string_view> words,
+                                           std::size_t most);
+// The nearest one; empty when none is.
 std::optional<std::string_view> nearestWord(std::string_view text,
                                             std::span<const std::string_view> words);
+
+// "; did you mean a, b or c?", or nothing for no words.
+std::string suggestion(std::span<const std::string_view> words);
+// "a, b or c".
+std::string alternatives(std::span<const std::string_view> words);
 
 }  // namespace tally::tools

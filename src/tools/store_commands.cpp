@@ -1,6 +1,7 @@
 #include "tools/store_commands.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <limits>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -14,10 +15,12 @@
 #include "platform/linux/store_history.h"
 #include "platform/linux/store_writer.h"
 #include "tools/day_argument.h"
+#include "tools/natural_order.h"
 #include "tools/output.h"
 #include "tools/store_csv.h"
 #include "tools/store_dump.h"
 #include "tools/store_import.h"
+#include "tools/table.h"
 
 namespace tally::tools {
 namespace {
@@ -55,8 +58,7 @@ int setScalar(const ToolContext& context, const StoreArguments& arguments) {
   if (context.json) {
     printJson(context, {{"key", arguments.key}, {"day", day}, {"value", *value}});
   } else {
-    print(context.out,
-          fmt::format("{} = {} on day {} ({})\n", arguments.key, *value, day, dayText(day)));
+    printLine(context, fmt::format("{} = {} on {}", arguments.key, *value, dayName(day)));
   }
   return kSuccess;
 }
@@ -84,19 +86,18 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
         context,
         {{"key", arguments.key}, {"day", day}, {"offset", offset}, {"samples", values.size()}});
   } else {
-    print(context.out,
-          fmt::format("{} has {} more {} on day {} ({})\n", arguments.key, values.size(),
-                      values.size() == 1 ? "sample" : "samples", day, dayText(day)));
+    printLine(context, fmt::format("{} has {} more {} on {}", arguments.key, values.size(),
+                                   values.size() == 1 ? "sample" : "samples", dayName(day)));
   }
   return kSuccess;
 }
 
 void printImport(const ToolContext& context, const ImportResult& result) {
   for (const BadLine& bad : result.firstRejected) {
-    print(context.err, fmt::format("line {}: {}\n", bad.line, bad.reason));
+    complain(context, fmt::format("line {}: {}", bad.line, bad.reason), kWrong);
   }
   if (const auto more = result.rejected - result.firstRejected.size(); more > 0) {
-    print(context.err, fmt::format("and {} more bad lines\n", more));
+    complain(context, fmt::format("and {} more bad lines", more), kWrong);
   }
   if (!context.json) {
     if (result.failure.empty()) {
@@ -110,12 +111,10 @@ void printImport(const ToolContext& context, const ImportResult& result) {
     bad.push_back({{"line", line}, {"reason", reason}});
   }
   const bool stored = result.failure.empty();
-  Json document = {{"scalars", stored ? result.scalars : 0},
-                   {"samples", stored ? result.samples : 0},
-                   {"rejected", result.rejected},
-                   {"firstRejected", bad}};
-  if (!stored) document["failure"] = result.failure;
-  printJson(context, document);
+  printJson(context, {{"scalars", stored ? result.scalars : 0},
+                      {"samples", stored ? result.samples : 0},
+                      {"rejected", result.rejected},
+                      {"firstRejected", bad}});
 }
 
 int import(const ToolContext& context, const StoreArguments& arguments) {
@@ -147,38 +146,63 @@ int dump(const ToolContext& context, const StoreArguments& arguments) {
   const auto history = openSqliteHistory(storeFile(context), [&](const std::string& message) {
     if (fault.empty()) fault = message;
   });
-  const bool written = context.json ? dumpAsJson(*history, range, context.out)
-                                    : dumpAsCsv(*history, range, context.out);
-  if (!written) return complain(context, "cannot write the rows", kWrong);
+  if (context.json) {
+    dumpAsJson(*history, range, context.out);
+  } else {
+    // A person gets keys that are safe to look at; a file those that can be imported again.
+    dumpAsCsv(*history, range, context.out, context.output.interactive);
+  }
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
+struct ListedKey {
+  StoreKey key;
+  std::string name;  // what the key's view would refer to
+};
+
 int listKeys(const ToolContext& context, const StoreArguments&) {
-  Json document = Json::array();
+  std::vector<ListedKey> keys;
   std::string fault;
   listStoreKeys(
       storeFile(context),
-      [&](const StoreKey& key) {
-        const bool scalar = key.kind == StoreKey::Kind::Scalar;
-        const std::string_view kind = scalar ? "scalar" : "distribution";
-        if (context.json) {
-          Json entry = {{"kind", kind},
-                        {"key", key.key},
-                        {"firstDay", key.firstDay},
-                        {"lastDay", key.lastDay},
-                        {"days", key.days}};
-          if (!scalar) entry["samples"] = key.samples;
-          document.push_back(std::move(entry));
-          return;
-        }
-        // The key last: it has any length and may hold anything.
-        print(context.out,
-              fmt::format("{:<12} {:>6} - {:<6} {:>3} {:<4} {:>11} {}\n", kind, key.firstDay,
-                          key.lastDay, key.days, key.days == 1 ? "day" : "days",
-                          scalar ? "" : fmt::format("{} x", key.samples), csvField(key.key)));
+      [&keys](const StoreKey& key) {
+        keys.push_back({key, std::string(key.key)});
       },
       [&](const std::string& message) { fault = message; });
-  if (context.json) printJson(context, document);
+  std::ranges::stable_sort(keys, [](const ListedKey& a, const ListedKey& b) {
+    return a.key.kind != b.key.kind ? a.key.kind < b.key.kind : naturalLess(a.name, b.name);
+  });
+  Json document = Json::array();
+  Table table({{"kind"},
+               {"days", Align::Right},
+               {"first"},
+               {"last"},
+               {"samples", Align::Right},
+               {"key", Align::Left, true}});
+  for (const auto& [key, name] : keys) {
+    const bool isScalar = key.kind == StoreKey::Kind::Scalar;
+    const char* const kind = isScalar ? "scalar" : "distribution";
+    if (context.json) {
+      Json entry = {{"kind", kind},
+                    {"key", name},
+                    {"firstDay", key.firstDay},
+                    {"lastDay", key.lastDay},
+                    {"days", key.days}};
+      if (!isScalar) entry["samples"] = key.samples;
+      document.push_back(std::move(entry));
+      continue;
+    }
+    table.add({kind, integerText(key.days), dayText(static_cast<std::int32_t>(key.firstDay)),
+               dayText(static_cast<std::int32_t>(key.lastDay)),
+               isScalar ? "" : integerText(key.samples), name});
+  }
+  if (context.json) {
+    printJson(context, document);
+  } else if (table.empty()) {
+    printLine(context, "the store has no keys");
+  } else {
+    table.print(context);
+  }
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
@@ -213,14 +237,18 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   };
   constexpr const char* kDay = "; today when left out";
 
+  constexpr const char* kStoreKeyHelp = "Valid UTF-8 of 1 to 512 bytes without a zero byte";
   CLI::App* command = add("set", "Set a scalar", setScalar);
-  command->add_option("KEY", arguments->key)->required();
+  command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
   command->add_option("VALUE", arguments->value, "A whole number of 64 bits")->required();
   addDay(command, kDay);
 
   command = add("push", "Add samples to a distribution", pushSamples);
-  command->add_option("KEY", arguments->key)->required();
-  command->add_option("VALUE", arguments->values, "Numbers; inf and nan count")->required();
+  command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
+  command
+      ->add_option("VALUE", arguments->values,
+                   "Numbers, inf and nan too; -inf only after --, which ends the options")
+      ->required();
   addDay(command, kDay);
   command->add_option("--offset", arguments->offset, "Seconds into the day; now when left out")
       ->check(CLI::Range(0, 86399))
@@ -231,7 +259,7 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
 
   command = add("dump", "Print all rows as CSV, in the form that import reads", dump);
   addDay(command, "; all days when left out");
-  command->add_option("--prefix", arguments->prefix, "Only keys that begin so");
+  command->add_option("--prefix", arguments->prefix, "Only keys that begin so")->type_name("TEXT");
 
   add("keys", "List the keys, with their days and numbers of samples", listKeys);
 }

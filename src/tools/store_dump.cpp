@@ -5,8 +5,9 @@
 #include <string_view>
 
 #include "base/number_text.h"
+#include "base/printable.h"
+#include "tools/output.h"
 #include "tools/store_csv.h"
-#include "tools/tool.h"
 
 namespace tally::tools {
 namespace {
@@ -20,10 +21,10 @@ class Output {
     if (text_.size() >= kPiece) flush();
     return text_;
   }
-  bool finish() {
-    flush();
-    return std::fflush(file_) == 0 && std::ferror(file_) == 0;
-  }
+  ~Output() { flush(); }
+  Output(const Output&) = delete;
+  Output& operator=(const Output&) = delete;
+  bool failed() const { return std::ferror(file_) != 0; }
 
  private:
   void flush() {
@@ -45,30 +46,36 @@ void eachSample(DistributionValues& values, const Handler& handler) {
 }
 
 std::string jsonText(std::string_view text) {
-  return nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
+  return printableJson(
+      nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace));
 }
 
 }  // namespace
 
-bool dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out) {
+void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson) {
   Output output(out);
+  const auto fieldOf = [forPerson](std::string_view key) {
+    return csvField(forPerson ? printable(key) : std::string(key));
+  };
   output.text().append(kStoreCsvHeader) += '\n';
-  history.enumerateScalars(range.keyPrefix, range.minimumDay, range.maximumDay,
-                           [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
-                             appendScalarRow(output.text(), csvField(key), day, value);
-                           });
+  history.enumerateScalars(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
+        appendScalarRow(output.text(), fieldOf(key), day, value);
+        stop = output.failed();
+      });
   history.enumerateDistributions(
       range.keyPrefix, range.minimumDay, range.maximumDay,
-      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
-        const std::string field = csvField(key);
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool& stop) {
+        const std::string field = fieldOf(key);
+        stop = output.failed();
         eachSample(values, [&](std::uint32_t offset, double value) {
           appendSampleRow(output.text(), field, day, offset, value);
         });
       });
-  return output.finish();
 }
 
-bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
+void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
   Output output(out);
   const auto beginRow = [&](const char* separator, std::string_view key, std::int32_t day) {
     std::string& text = output.text();
@@ -77,19 +84,22 @@ bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
   };
   output.text() += "{\"scalars\": [";
   const char* separator = "\n  ";
-  history.enumerateScalars(range.keyPrefix, range.minimumDay, range.maximumDay,
-                           [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
-                             beginRow(separator, key, day);
-                             separator = ",\n  ";
-                             output.text() += ", \"value\": ";
-                             appendInt64(output.text(), value);
-                             output.text() += '}';
-                           });
+  history.enumerateScalars(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
+        stop = output.failed();
+        beginRow(separator, key, day);
+        separator = ",\n  ";
+        output.text() += ", \"value\": ";
+        appendInt64(output.text(), value);
+        output.text() += '}';
+      });
   output.text() += "],\n \"distributions\": [";
   separator = "\n  ";
   history.enumerateDistributions(
       range.keyPrefix, range.minimumDay, range.maximumDay,
-      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool& stop) {
+        stop = output.failed();
         beginRow(separator, key, day);
         separator = ",\n  ";
         output.text() += ", \"samples\": [";
@@ -108,7 +118,6 @@ bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
         output.text() += "]}";
       });
   output.text() += "]}\n";
-  return output.finish();
 }
 
 }  // namespace tally::tools

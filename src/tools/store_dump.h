@@ -17,11 +17,12 @@ struct DumpRange {
   std::int32_t maximumDay = std::numeric_limits<std::int32_t>::max();
 };
 
-// Scalars, then samples, by day and key. Memory does not grow with the rows. False when the file
-// cannot take them.
-bool dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out);
+// Scalars, then samples, by day and key, until the file cannot take them; it keeps the error.
+// Memory does not grow with the rows. For a person, keys have their control characters escaped, so
+// that what is printed cannot be imported where there are any.
+void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson);
 // {"scalars": [{"key", "day", "value"}], "distributions": [{"key", "day", "samples": [[offset,
 // value]]}]}; a value that JSON cannot carry is the string "inf", "-inf" or "nan".
-bool dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out);
+void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out);
 
 }  // namespace tally::tools

@@ -28,7 +28,7 @@ class ProgressBar {
   void update(std::uint64_t bytes, std::uint64_t rows) {
     using std::chrono::steady_clock;
     constexpr std::uint64_t kRowsBetweenLooks = 4096;
-    if (!context_.errors.interactive || rows % kRowsBetweenLooks != 0) return;
+    if (!context_.errors.escapes || rows % kRowsBetweenLooks != 0) return;
     const auto now = steady_clock::now();
     if (now < next_) return;
     next_ = now + std::chrono::milliseconds(100);

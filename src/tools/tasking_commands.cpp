@@ -94,9 +94,9 @@ Json taskingJson(const KvObject* id, const KvObject* digest, const KvObject* pay
 
 std::string taskingLine(const KvObject* id, const KvObject* digest, const KvObject* payload) {
   if (id == nullptr) return "none";
-  return fmt::format("{}, digest {}, {} entr{}", valueText(id),
-                     digest != nullptr ? valueText(digest) : "none", entriesOf(payload),
-                     entriesOf(payload) == 1 ? "y" : "ies");
+  return fmt::format("{}, digest {}, {}", valueText(id),
+                     digest != nullptr ? valueText(digest) : "none",
+                     counted(entriesOf(payload), "entry"));
 }
 
 int show(const ToolContext& context, const TaskingArguments&) {

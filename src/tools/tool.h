@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "platform/linux/terminal.h"
 #include "platform/platform.h"
@@ -29,6 +30,8 @@ struct ToolContext {
   Terminal errors;    // what standard error can show
   std::FILE* out = stdout;
   std::FILE* err = stderr;
+  // What went wrong, for the error object of --json; borrowed.
+  std::vector<std::string>* complaints = nullptr;
   // The command that the arguments chose, set by the callback of its CLI::App. It runs once the
   // platform of the root is installed, and returns the exit status.
   std::function<int()> command;
@@ -47,8 +50,13 @@ CLI::App* addCommand(CLI::App* family, ToolContext& context, const char* name,
 // Makes the platform of a device root.
 using PlatformFactory = std::function<Platform(const std::string& root)>;
 
+// Adds the commands, and the options that all of them take, to an app.
+void addAllCommands(CLI::App& app, ToolContext& context);
+
 // Runs the command that the arguments name (the first is the program's own name) and returns the
-// exit status. Help goes to context.out, usage errors to context.err.
+// exit status, which is kWrong where context.out could not be written. Help goes to context.out,
+// usage errors to context.err. A command that fails under --json leaves one line there, the object
+// {"error": {"status": ..., "message": ...}}; its result, where it has one, is on context.out.
 int runTool(ToolContext context, std::span<const char* const> arguments,
             const PlatformFactory& makePlatform);
 

@@ -115,6 +115,26 @@ class Documents(unittest.TestCase):
         self.assertEqual(device.info(device.log_files()[0])["Options"]["previous_os_version"], "<unknown>")
         self.assertEqual(device.preferences()["LastOSVersion"], "Trailhead 4.2 (R1180)")
 
+    def test_the_device_description_is_documented_as_it_is_read(self):
+        header = (TOP / "src/platform/linux/described_entries.h").read_text()
+        entry = re.compile(r'\{"(\w+)",\s*KvType::(\w+),\s*((?:"[^"]*"\s*)+)')
+        read = [(name, kind.lower().replace("number", "integer"), "".join(re.findall('"([^"]*)"', answers)))
+                for name, kind, answers in entry.findall(header.split("kDescribedEntries[]")[1])]
+        text = (TOP / "docs/device-root.md").read_text().split("## The device description")[1]
+        shown = re.findall(r"^\| `(\w+)` \| (\w+)[^|]*\| ([^|]+?) \|", text.split("Device queries:")[0], re.M)
+        self.assertEqual(read, shown)
+
+    @unittest.skipUnless(shutil.which("man"), "man is missing")
+    def test_manual_pages_are_sound(self):
+        pages = [path for path in (TOP / "packaging/man").iterdir() if path.suffix != ".in"]
+        pages += [path for path in (BIN.parent / "packaging/man").glob("*.[1-8]")]
+        self.assertGreaterEqual(len(pages), 5)
+        for page in pages:
+            result = subprocess.run(["man", "--warnings", "-l", "-E", "UTF-8", page], capture_output=True,
+                                    env={**os.environ, "MANWIDTH": "80", "PAGER": "cat"}, check=True)
+            self.assertEqual(result.stderr, b"", page)
+            self.assertNotIn(b"@", result.stdout)
+
     def test_links_and_named_files_are_there(self):
         for document in DOCUMENTS:
             text = FENCE.sub("", document.read_text())

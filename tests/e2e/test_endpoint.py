@@ -88,6 +88,10 @@ def unsolicited_list(test, device):
 def day_request(test, device):
     device.set_preferences(**{LAST_DAY: 5})
     device.tool("send", "day", str(TODAY - 3))
+    other = subprocess.run([BIN / "tallyctl", "send", "--root", "/", "day", "1"], capture_output=True,
+                           env=device.environment(), check=False)
+    test.assertEqual(other.returncode, 1)
+    test.assertIn(b"serves the device root", other.stderr)
     device.tool("send", "logging")
     found = device.wait_for_end()
     test.assertEqual(device.log()["TBScalars"]["a"], TODAY - 3)

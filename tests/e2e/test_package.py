@@ -81,7 +81,9 @@ class Package(unittest.TestCase):
                   f"usr/share/dbus-1/system-services/{NAME}.service",
                   f"usr/share/dbus-1/services/{NAME}.service",
                   f"usr/share/dbus-1/system.d/{NAME}.conf",
-                  "usr/share/bash-completion/completions/tallyctl", "Library/Preferences", "var/mobile",
+                  "usr/share/bash-completion/completions/tallyctl",
+                  "usr/share/man/man5/tallyrun-root.5.gz", "usr/share/man/man7/tallyrun.7.gz",
+                  "Library/Preferences", "var/mobile",
                   "usr/share/doc/tallyrun/docs/security.md", "usr/share/doc/tallyrun/SECURITY.md", TIMER_LINK]
         self.assertLessEqual(set(wanted), self.files(root))
         self.assertEqual(os.readlink(root / TIMER_LINK), f"/{wanted[5]}")

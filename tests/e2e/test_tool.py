@@ -75,9 +75,31 @@ class ToolTest(DeviceTest):
                 status, out, err = self.tool(*arguments)
                 self.assertEqual(status, wanted)
                 self.assertTrue(out or err)
-        families = re.findall(r"^  (\w+) ", self.tool("--help")[1].split("Subcommands:")[1], re.M)
+        families = re.findall(r"^  (\w+) ", self.tool("--help")[1].split("Commands:")[1], re.M)
         ours = ["store", "whitelist", "report", "explain", "prefs", "doctor"]
         self.assertEqual([name for name in families if name in ours], ours)
+
+    def test_streams_that_are_closed_or_full(self):
+        log = self.device.log_files()[0]
+        for command, out, wanted in (("report show - <" + str(log), "Daily log", 0),
+                                     ("report show >/dev/full", "", 1), ("report show >&-", "", 1),
+                                     ("report show >&9", "", 1)):
+            with self.subTest(command):
+                # 9 is a pipe that nobody reads.
+                result = subprocess.run(["bash", "-c", "exec 9> >(exec true); wait $!; "
+                                         f"'{BIN}/tallyctl' {command}"],
+                                        capture_output=True, timeout=60, stdin=subprocess.DEVNULL,
+                                        env=self.device.environment(TODAY))
+                self.assertEqual(result.returncode, wanted)
+                self.assertIn(out, result.stdout.decode())
+                self.assertEqual(b"cannot write to standard output" in result.stderr, wanted == 1)
+
+    def test_versions_agree(self):
+        tool, job = (subprocess.run([BIN / name, "--version"], capture_output=True, check=True,
+                                    env=self.device.environment(TODAY))
+                     for name in ("tallyctl", "tallyrun"))
+        self.assertEqual(tool.stdout.split()[1:], job.stdout.split()[1:])
+        self.assertEqual(job.stderr, b"")
 
     def test_a_spool_that_is_gone(self):
         shutil.rmtree(self.device.root / SPOOL)

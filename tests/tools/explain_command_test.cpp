@@ -52,7 +52,7 @@ TEST_F(ExplainCommand, TellsWhereAKeyStandsOrWhyNot) {
        {"admitted  as a distribution: the group G lists it", "options: intervals of 1 number",
         "distribution of 2 samples: min 1, mean 2, std dev 1, max 3", "(-inf, 2]", "(2, inf)",
         "not there as a scalar: the store has no such row"}},
-      {"ab", kWrong, {"refused   as a scalar: it is not listed", "whitelist refuses it"}},
+      {"ab", kWrong, {"refused  as a scalar: it is not listed", "whitelist refuses it"}},
       {"off.x", kWrong, {"which is disabled by tasking", "the whitelist refuses it"}},
       {"secret", kWrong, {"InternalTesting, which is for internal devices only"}},
       {"empty", kWrong, {"no rows of this key", "the store has no such row on that day"}},

@@ -5,7 +5,9 @@
 
 #include <limits>
 
+#include "base/printable.h"
 #include "tools/day_argument.h"
+#include "tools/natural_order.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -34,6 +36,8 @@ TEST(Output, NumbersForPeople) {
       {-1234567, "-1,234,567"},
       {std::numeric_limits<std::int64_t>::min(), "-9,223,372,036,854,775,808"}};
   for (const auto& [value, text] : integers) EXPECT_EQ(integerText(value), text);
+  EXPECT_EQ(counted(2, "entry") + ", " + counted(1, "entry") + ", " + counted(2, "key"),
+            "2 entries, 1 entry, 2 keys");
   EXPECT_EQ(byteText(1023), "1,023 bytes");
   EXPECT_EQ(byteText(1536), "1.5 KiB");
   EXPECT_EQ(byteText(UINT64_MAX), "16777216.0 TiB");
@@ -64,8 +68,43 @@ TEST(Output, TablesAlignByDisplayWidthAndGiveWayOnTerminals) {
   EXPECT_EQ(table.render({26, true, true, false}, 0),
             "\x1b[2mkey\x1b[0m                 \x1b[2mn\x1b[0m  \x1b[2mx\x1b[0m\n"
             "日本                1\n"
-            "a very long key ~  12  \x1b[32mend\x1b[0m\n"
+            "a very long key    12  \x1b[32mend\x1b[0m\n"
+            "indeed\n"
             "e\xcc\x81\\x1b                  z\n");
+  EXPECT_EQ(table.render({18, true, false, true}, 0),
+            "日本\n  n  1\n"
+            "a very long key\nindeed\n  n  12\n  x  end\n"
+            "e\xcc\x81\\x1b\n  x  z\n")
+      << "too narrow for a table";
+  Table bars({{""}, {""}});
+  bars.add({"half", Cell::bar(0.5, 36)});
+  EXPECT_EQ(bars.render({80, true, false, false}), "  half  " + std::string(18, '#') + "\n");
+  EXPECT_EQ(bars.render({16, true, false, false}), "  half  ####\n");
+}
+
+TEST(Output, TextIsWrappedWhereItMayBe) {
+  const std::pair<const char*, std::vector<std::string>> cases[] = {
+      {"", {""}},
+      {"one two three", {"one two", "three"}},
+      {"vellum.power.wakeups", {"vellum.", "power.", "wakeups"}},
+      {"abcdefghijklm", {"abcdefgh", "ijklm"}},
+      {"12345678 x", {"12345678", "x"}},
+      {"日本日本日", {"日本日本", "日"}}};
+  for (const auto& [text, lines] : cases) EXPECT_EQ(wrapped(text, 8), lines) << text;
+}
+
+TEST(Output, NamesAreInTheOrderOfTheirNumbers) {
+  const std::vector<std::string> ordered = {"",      "a",    "a2", "a02b", "a10",
+                                            "a010b", "a10b", "b1", "é"};
+  for (std::size_t i = 0; i < ordered.size(); ++i) {
+    for (std::size_t j = 0; j < ordered.size(); ++j) {
+      EXPECT_EQ(naturalLess(ordered[i], ordered[j]), i < j) << ordered[i] << " " << ordered[j];
+    }
+  }
+}
+
+TEST(Output, JsonIsSafeToShow) {
+  EXPECT_EQ(printableJson("\"a\x7f\xc2\x9b\xe2\x80\xae é\""), "\"a\\u007f\\u009b\\u202e é\"");
 }
 
 TEST(Output, DaysAsArguments) {

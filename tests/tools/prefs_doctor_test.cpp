@@ -155,10 +155,15 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
        [&] {
          putPlist("device/device/device.plist",
                   "<dict><key>RegionCode</key><true/><key>Kernelvalues</key><dict/>"
-                  "<key>Notes</key><string>x</string></dict>");
+                  "<key>Notes</key><string>x</string><key>SystemID</key><integer>1</integer>"
+                  "<key>AnalyticsEvents</key><dict><key>Wanted</key><string>x</string>"
+                  "<key>Absnt</key><true/></dict></dict>");
        },
-       {"ok: 3 entries", "wrong: RegionCode is of the wrong type",
-        "wrong: Kernelvalues is not known; KernelValues may be meant"}},
+       {"ok: 5 entries", "wrong: RegionCode is a boolean, not a string, and is ignored",
+        "wrong: Kernelvalues is not known; KernelValues may be meant",
+        "wrong: SystemID is a number, not a string",
+        "wrong: AnalyticsEvents.Wanted is a string, not an array",
+        "wrong: AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"}},
       {"device description", [&] { put("device/device/device.plist", "x"); }, {"wrong: "}},
       {"kernel values", [] {}, {"missing: "}},
       {"submitted logs", [] {}, {"missing: none yet"}},

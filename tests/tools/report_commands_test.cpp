@@ -90,7 +90,7 @@ TEST_F(ReportCommands, TheDayIsDrawnForPeople) {
   }
   EXPECT_THAT(shown, Not(HasSubstr("secret")));
   EXPECT_EQ(shown.find('\x1b'), std::string::npos);
-  terminal.colour = true;
+  terminal.escapes = true;
   EXPECT_THAT(run({"report", "show"}).out, HasSubstr("\x1b[1mDaily log"));
 }
 
@@ -134,7 +134,7 @@ TEST_F(ReportCommands, WhatIsMissingOrDamagedIsSaid) {
       {{"report", "preview", "--day", "20007"}, kWrong, "no log would be submitted"},
       {{"report", "preview", "--day", "2024-13-01"}, kBadUsage, "not a day"},
       {{"report", "preview", "--day", "99999999999"}, kBadUsage, "not a day"},
-      {{"report"}, kBadUsage, "subcommand"},
+      {{"report"}, kBadUsage, "needs a command"},
   };
   for (const auto& c : before) {
     const Outcome outcome = run(c.arguments);
@@ -161,8 +161,9 @@ TEST_F(ReportCommands, WhatIsMissingOrDamagedIsSaid) {
       EXPECT_EQ(outcome.status, kWrong);
       EXPECT_THAT(outcome.err, HasSubstr(c.message));
     }
-    EXPECT_THAT(run({"report", "list"}).out, HasSubstr("damaged"));
-    EXPECT_THAT(run({"doctor"}).out, HasSubstr("0000000001-log-tallyd.log is damaged"));
+    const std::string fault = std::string(c.message).ends_with("log") ? c.message : "damaged";
+    EXPECT_THAT(run({"report", "list"}).out, HasSubstr(fault));
+    EXPECT_THAT(run({"doctor"}).out, HasSubstr("0000000001-log-tallyd.log is " + fault));
   }
   // Parts of the wrong type are shown as what they are.
   put(kSpool + std::string("0000000001-log-tallyd.log"),
@@ -209,6 +210,24 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   const std::string path = at(kSpool + std::string("0000000001-log-tallyd.log"));
   EXPECT_EQ(run({"report", "show", path, "--json"}).json()["document"]["TBScalars"]["a"], 20);
   EXPECT_THAT(run({"report", "show", "3"}).out, HasSubstr("worn: no\nname: \\x1b[31m\n"));
+  // A file is shown by what it holds.
+  putPlist("records", "<dict><key>RecordType</key><integer>172</integer></dict>");
+  putPlist("other", "<dict/>");
+  put("text", "worn: no\n");
+  put("bytes", "\xff\x01");
+  const struct {
+    const char* file;
+    int status;
+    const char* says;
+  } files[] = {{"records", kSuccess, "172"},
+               {"other", kWrong, "is a property list, but not a daily log"},
+               {"text", kSuccess, "worn: no\n"},
+               {"bytes", kWrong, "is damaged"}};
+  for (const auto& c : files) {
+    const Outcome outcome = run({"report", "show", at(c.file)});
+    EXPECT_EQ(outcome.status, c.status) << c.file;
+    EXPECT_THAT(outcome.out + outcome.err, HasSubstr(c.says));
+  }
 }
 
 }  // namespace

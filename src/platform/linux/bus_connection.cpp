@@ -9,6 +9,7 @@
 #include <cstring>
 
 #include "platform/linux/bus_message.h"
+#include "platform/linux/bus_root.h"
 
 namespace tally {
 namespace {
@@ -59,14 +60,15 @@ std::pair<std::string, std::string> splitNotification(std::string_view name) {
   return {std::move(interface), std::move(member)};
 }
 
-Status sendToEndpoint(std::string_view name, const KvDictionary& message) {
+Status sendToEndpoint(std::string_view name, const std::string& root, const KvDictionary& message) {
   const auto bus = openBus();
   if (!bus) return bus.error();
-  const std::string destination(name);
+  const auto destination = findEndpoint(bus->get(), name, root);
+  if (!destination) return destination.error();
   sd_bus_message* made = nullptr;
-  int result = ::sd_bus_message_new_method_call(bus->get(), &made, destination.c_str(),
-                                                busObjectPath(name).c_str(), destination.c_str(),
-                                                kBusMethod);
+  int result = ::sd_bus_message_new_method_call(bus->get(), &made, destination->c_str(),
+                                                busObjectPath(name).c_str(),
+                                                std::string(name).c_str(), kBusMethod);
   const MessageHandle call(made);
   if (result < 0) return Error{std::strerror(-result), -result};
   if (Status content = appendBusDictionary(call.get(), message); !content) return content;

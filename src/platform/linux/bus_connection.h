@@ -55,7 +55,8 @@ constexpr const char* kBusDriverQuestion = "GetId";
 constexpr const char* kNotificationObject = "/vellum";
 
 // Sends one message to the endpoint of a name, which starts the program when it is not running, and
-// waits until it was taken. The error says why it was not.
-Status sendToEndpoint(std::string_view name, const KvDictionary& message);
+// waits until it was taken. The error says why it was not: also when the program serves another
+// device root than this one.
+Status sendToEndpoint(std::string_view name, const std::string& root, const KvDictionary& message);
 
 }  // namespace tally

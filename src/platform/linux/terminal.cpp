@@ -35,7 +35,7 @@ Terminal makeTerminal(bool interactive, std::size_t columns,
   if (width <= 0) width = kUsual;
   terminal.columns = static_cast<std::size_t>(std::clamp(width, kNarrowest, kWidest));
   terminal.interactive = interactive;
-  terminal.colour = interactive && environment.noColor.empty() && environment.term != "dumb";
+  terminal.escapes = interactive && environment.noColor.empty() && environment.term != "dumb";
   const std::string& locale = !environment.all.empty()     ? environment.all
                               : !environment.ctype.empty() ? environment.ctype
                                                            : environment.lang;

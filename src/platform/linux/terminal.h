@@ -10,8 +10,8 @@ namespace tally {
 struct Terminal {
   std::size_t columns = 80;
   bool interactive = false;  // a person is watching
-  bool colour = false;
-  bool unicode = false;  // block characters and lines may be used
+  bool escapes = false;      // it obeys escape sequences, and the user wants them: colour, progress
+  bool unicode = false;      // block characters and lines may be used
 };
 
 // The variables that say how to write to a terminal; empty when unset.

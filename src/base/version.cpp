@@ -1,0 +1,7 @@
+#include "base/version.h"
+
+namespace tally {
+
+const std::string_view kProgramVersion = TALLYRUN_VERSION;
+
+}  // namespace tally

@@ -1,0 +1,113 @@
+// Writes a manual page from a template: the lines @OPTIONS@ and @COMMANDS@ become what the commands
+// of tallyctl say of themselves, @ENTRIES@ the entries of the device description. Runs when the
+// project is built, and is not installed.
+#include <CLI/CLI.hpp>
+#include <cstdio>
+#include <fstream>
+#include <iostream>
+#include <string>
+
+#include "platform/linux/described_entries.h"
+#include "tools/command_help.h"
+#include "tools/output.h"
+#include "tools/tool.h"
+
+namespace {
+
+using tally::tools::CommandHelp;
+using tally::tools::OptionHelp;
+
+// Text as roff has it: no minus that could become a hyphen, no escape, no request.
+std::string roff(const std::string& text) {
+  std::string out;
+  for (const char c : text) {
+    if (c == '-') {
+      out += "\\-";
+    } else if (c == '\\') {
+      out += "\\e";
+    } else if (out.empty() && (c == '.' || c == '\'')) {
+      out += std::string("\\&") + c;
+    } else {
+      out += c;
+    }
+  }
+  return out;
+}
+
+std::string sentence(std::string text) {
+  return text.empty() || text.ends_with('.') ? text : text + ".";
+}
+
+void writeOption(std::ostream& out, const OptionHelp& option) {
+  std::string names;
+  for (const std::string& name : option.names) {
+    names += (names.empty() ? "\\fB" : ", \\fB") + roff(name) + "\\fR";
+  }
+  if (!option.value.empty()) {
+    names += (names.empty() ? "\\fI" : " \\fI") + roff(option.value) + "\\fR";
+    if (option.repeats) names += " ...";
+  }
+  out << ".TP\n" << names << '\n' << roff(sentence(option.description)) << '\n';
+}
+
+void writeCommand(std::ostream& out, const CLI::App& app) {
+  const CommandHelp help = tally::tools::describe(app);
+  if (!help.commands.empty()) {
+    out << ".SS " << roff(app.get_name()) << '\n' << roff(sentence(help.description)) << '\n';
+    for (const CLI::App* command : help.commands) writeCommand(out, *command);
+    return;
+  }
+  if (app.get_parent()->get_parent() == nullptr) out << ".SS " << roff(app.get_name()) << '\n';
+  out << ".TP\n\\fB" << roff(help.path) << "\\fR";
+  for (const OptionHelp& argument : help.arguments) {
+    const std::string form =
+        "\\fI" + roff(argument.value) + "\\fR" + (argument.repeats ? " ..." : "");
+    out << (argument.required ? " " + form : " [" + form + "]");
+  }
+  for (const OptionHelp& option : help.options) {
+    if (option.common) continue;
+    const std::string value = option.value.empty() ? "" : " \\fI" + roff(option.value) + "\\fR";
+    const std::string form = "\\fB" + roff(option.names.back()) + "\\fR" + value;
+    out << (option.required ? " " + form : " [" + form + "]");
+  }
+  out << '\n' << roff(sentence(help.description)) << "\n.RS\n";
+  for (const OptionHelp& argument : help.arguments) writeOption(out, argument);
+  for (const OptionHelp& option : help.options) {
+    if (!option.common) writeOption(out, option);
+  }
+  out << ".RE\n";
+}
+
+}  // namespace
+
+int main(int count, char** arguments) {
+  if (count != 3) {
+    std::cerr << "usage: manual TEMPLATE PAGE\n";
+    return 2;
+  }
+  tally::tools::ToolContext context;
+  CLI::App app;
+  addAllCommands(app, context);
+  std::ifstream in(arguments[1]);
+  std::ofstream out(arguments[2]);
+  for (std::string line; std::getline(in, line);) {
+    const CommandHelp help = tally::tools::describe(app);
+    if (line == "@OPTIONS@") {
+      for (const OptionHelp& option : help.options) writeOption(out, option);
+    } else if (line == "@COMMANDS@") {
+      for (const CLI::App* command : help.commands) writeCommand(out, *command);
+    } else if (line == "@ENTRIES@") {
+      for (const tally::DescribedEntry& entry : tally::kDescribedEntries) {
+        std::string text(entry.answers);
+        std::erase(text, '`');
+        out << ".TP\n\\fB" << roff(std::string(entry.name)) << "\\fR ("
+            << tally::tools::typeName(entry.type) << ")\n"
+            << roff(sentence(text)) << '\n';
+      }
+    } else {
+      out << line << '\n';
+    }
+  }
+  out.close();
+  return in.eof() && out ? 0 : 1;
+}

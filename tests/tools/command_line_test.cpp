@@ -1,0 +1,160 @@
+// The command line as a whole: what is refused and how, the form of failures, completion.
+#include <sstream>
+
+#include "tools/tool_fixture.h"
+
+namespace tally::tools {
+namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsSupersetOf;
+using testing::Not;
+
+class CommandLine : public ToolTest {
+ protected:
+  // The first words of the lines that complete what the last word begins.
+  std::vector<std::string> completed(std::vector<std::string> words) {
+    words.insert(words.begin(), {"complete", "--"});
+    std::vector<std::string> found;
+    std::istringstream lines(run(words).out);
+    for (std::string line; std::getline(lines, line);) {
+      found.push_back(line.substr(0, line.find('\t')));
+    }
+    return found;
+  }
+};
+
+TEST_F(CommandLine, WhatIsRefusedIsNamedWithWhatMayBeMeant) {
+  const struct {
+    std::vector<std::string> arguments;
+    const char* says;
+  } cases[] = {
+      {{}, "tallyctl needs a command: store, whitelist"},
+      {{"stroe", "keys"}, "has no command \"stroe\"; did you mean store?"},
+      {{"store"}, "tallyctl store needs a command: set, push, import, dump or keys"},
+      {{"store", "kyes"}, "tallyctl store has no command \"kyes\"; did you mean keys?"},
+      {{"store", "\x1b[31m"}, "has no command \"\\x1b[31m\", only set, push"},
+      {{"store", "keys", "--jsn"}, "tallyctl store keys has no option --jsn; did you mean --json?"},
+      {{"store", "dump", "--prefx=a"}, "did you mean --prefix?"},
+      {{"store", "keys", "more"}, "\"more\" is one argument too many"},
+      {{"store", "set", "k\x1b[31m", "x\x07"}, "the value is not"},
+      {{"store", "push", "k", "x\x07"}, "x\\x07 is not a number"},
+      {{"store", "dump", "--day", "\x1b"}, "not a day: \\x1b"},
+      {{"prefs", "set", "k\x01", "1"}, "k\\x01 cannot be stored as given"},
+      {{"prefs", "set", "k", "a\x1b"}, "cannot be stored as given"},
+      {{"prefs", "set", "k", "\xff"}, "cannot be stored as given"},
+  };
+  for (const auto& c : cases) {
+    const Outcome outcome = run(c.arguments);
+    EXPECT_EQ(outcome.status, kBadUsage) << c.says;
+    EXPECT_THAT(outcome.err, HasSubstr(c.says));
+    EXPECT_THAT(outcome.err, Not(HasSubstr("\x1b")));
+    EXPECT_EQ(outcome.out, "") << c.says;
+    std::vector<std::string> asJson = c.arguments;
+    asJson.emplace_back("--json");
+    const auto error = nlohmann::json::parse(run(asJson).err)["error"];
+    EXPECT_EQ(error["status"], kBadUsage) << c.says;
+  }
+}
+
+TEST_F(CommandLine, EveryFailureUnderJsonIsOneObject) {
+  put("rows.csv", "bad\n");
+  for (const std::vector<std::string>& arguments :
+       std::vector<std::vector<std::string>>{{"store", "import", at("rows.csv")},
+                                             {"report", "show", "9"},
+                                             {"report", "preview"},
+                                             {"explain", "no.such"},
+                                             {"nand", "info"},
+                                             {"nand", "defects"},
+                                             {"channels", "list"},
+                                             {"prefs", "get", "x"},
+                                             {"whitelist", "check"},
+                                             {"whitelist", "test", "a"},
+                                             {"doctor"},
+                                             {"tasking", "apply", at("none")}}) {
+    SCOPED_TRACE(testing::PrintToString(arguments));
+    std::vector<std::string> asJson = arguments;
+    asJson.insert(asJson.begin() + 1, "--json");
+    const Outcome outcome = run(asJson);
+    EXPECT_EQ(outcome.status, kWrong);
+    const std::size_t last = outcome.err.rfind('\n', outcome.err.size() - 2) + 1;
+    const auto error = nlohmann::json::parse(outcome.err.substr(last))["error"];
+    EXPECT_EQ(error["status"], kWrong);
+    EXPECT_NE(error["message"], "");
+    EXPECT_TRUE(outcome.out.empty() || !outcome.json().contains("error"));
+    EXPECT_EQ(run(arguments).status, kWrong);
+  }
+}
+
+TEST_F(CommandLine, TheDeviceAndTheFormMayBeGivenAnywhere) {
+  putRows("scalar,a,20000,,1\n");
+  const std::string device = at("device");
+  for (const std::vector<const char*>& arguments : std::vector<std::vector<const char*>>{
+           {"tallyctl", "--root", device.c_str(), "--json", "store", "keys"},
+           {"tallyctl", "store", "--json", "--root", device.c_str(), "keys"},
+           {"tallyctl", "store", "keys", "--json", "--root", device.c_str()}}) {
+    ToolContext context;
+    context.out = std::fopen(at("out").c_str(), "w");
+    const int status = runTool(context, arguments, [this](const std::string& folder) {
+      return makePlatform(folder, stderr);
+    });
+    std::fclose(context.out);
+    EXPECT_EQ(status, kSuccess);
+    EXPECT_EQ(nlohmann::json::parse(get("out"))[0]["key"], "a");
+  }
+  for (const std::vector<std::string>& command :
+       std::vector<std::vector<std::string>>{{}, {"store"}, {"store", "set"}, {"doctor"}}) {
+    std::vector<std::string> arguments = command;
+    arguments.emplace_back("--help");
+    const Outcome help = run(arguments);
+    EXPECT_EQ(help.status, kSuccess);
+    EXPECT_THAT(help.out, HasSubstr("--root DIR"));
+    EXPECT_THAT(help.out, HasSubstr("--json"));
+  }
+}
+
+TEST_F(CommandLine, OutputThatCannotBeWrittenIsAFailure) {
+  putRows("scalar,a,20000,,1\n");
+  const std::string device = at("device");
+  for (const std::vector<const char*>& arguments : std::vector<std::vector<const char*>>{
+           {"tallyctl", "--root", device.c_str(), "store", "dump"},
+           {"tallyctl", "--root", device.c_str(), "store", "keys"},
+           {"tallyctl", "--help"}}) {
+    ToolContext context;
+    context.out = std::fopen("/dev/full", "w");
+    context.err = std::fopen(at("err").c_str(), "w");
+    const int status = runTool(context, arguments, [this](const std::string& folder) {
+      return makePlatform(folder, stderr);
+    });
+    std::fclose(context.out);
+    std::fclose(context.err);
+    EXPECT_EQ(status, kWrong);
+    EXPECT_EQ(get("err"), "tallyctl: cannot write to standard output: No space left on device\n");
+  }
+}
+
+TEST_F(CommandLine, CompletionKnowsWhatTheDeviceHolds) {
+  putRows(
+      "scalar,bus10,20000,,1\nscalar,bus2,19999,,1\ndistribution,d,20000,1,1\n"
+      "scalar,odd\x1bkey,20000,,1\n");
+  putPlist("device/var/mobile/Library/Preferences/vellum.da.plist",
+           "<dict><key>G</key><true/></dict>");
+  EXPECT_THAT(completed({"sto"}), ElementsAre("store"));
+  EXPECT_THAT(completed({"store", ""}), ElementsAre("set", "push", "import", "dump", "keys"));
+  EXPECT_THAT(completed({"explain", "b"}), ElementsAre("bus2", "bus10"));
+  EXPECT_THAT(completed({"whitelist", "test", "x", "d"}), ElementsAre("d"));
+  EXPECT_THAT(completed({"store", "dump", "--day", "20"}), ElementsAre("2024-10-04", "2024-10-03"));
+  EXPECT_THAT(completed({"store", "dump", "--day=y"}), ElementsAre("--day=yesterday"));
+  EXPECT_THAT(completed({"store", "keys", "--j"}), ElementsAre("--json"));
+  EXPECT_THAT(completed({"prefs", "list", "--domain", ""}), ElementsAre("vellum.da"));
+  EXPECT_THAT(completed({"prefs", "get", "--domain", "vellum.da", ""}), ElementsAre("G"));
+  EXPECT_THAT(completed({"prefs", "set", "--type", ""}),
+              IsSupersetOf({std::string("auto"), std::string("boolean")}));
+  EXPECT_THAT(completed({"report", "show", ""}), ElementsAre(":file"));
+  EXPECT_THAT(completed({"store", "set", "bus2", "1", ""}), ElementsAre());
+  EXPECT_THAT(completed({"complete"}), ElementsAre());
+}
+
+}  // namespace
+}  // namespace tally::tools
