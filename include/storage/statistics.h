@@ -11,8 +11,8 @@
 namespace tally {
 
 // Counters of a context, in the order of the buffer: `count` values, and for each the number of its
-// name. capacity values and as many numbers lie behind the block's head, in one piece of memory.
-struct SPXCounterBlock {
+// name. capacity values and as many numbers follow the block's head, in one piece of memory.
+struct alignas(std::uint64_t) SPXCounterBlock {
   SPXCounterBlock* next;  // null at the end
   std::uint32_t count;
   std::uint32_t capacity;

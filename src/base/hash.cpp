@@ -13,10 +13,32 @@ std::uint64_t processSeed() {
   return (std::uint64_t{random()} << 32) | random();
 }
 
-std::uint64_t mix(std::uint64_t state, std::uint64_t word) {
+// Both halves of the 128-bit product, combined by exclusive or, from products of 32-bit parts.
+constexpr std::uint64_t foldedProductOfParts(std::uint64_t a, std::uint64_t b) {
+  constexpr std::uint64_t kLow = 0xFFFFFFFF;
+  const std::uint64_t low = (a & kLow) * (b & kLow), high = (a >> 32) * (b >> 32);
+  const std::uint64_t cross = (a >> 32) * (b & kLow), otherCross = (a & kLow) * (b >> 32);
+  const std::uint64_t carried = (low >> 32) + (cross & kLow) + (otherCross & kLow);
+  return (a * b) ^ (high + (cross >> 32) + (otherCross >> 32) + (carried >> 32));
+}
+
+#ifdef __SIZEOF_INT128__
+constexpr std::uint64_t foldedProduct(std::uint64_t a, std::uint64_t b) {
   __extension__ using Wide = unsigned __int128;
-  const Wide product = static_cast<Wide>(state ^ word) * kMultiplier;
+  const Wide product = static_cast<Wide>(a) * b;
   return static_cast<std::uint64_t>(product) ^ static_cast<std::uint64_t>(product >> 64);
+}
+// 32-bit processors have no such type, and must find the same.
+static_assert(foldedProduct(UINT64_MAX, UINT64_MAX) ==
+              foldedProductOfParts(UINT64_MAX, UINT64_MAX));
+static_assert(foldedProduct(0x8000'0001'FFFF'FFFF, kMultiplier) ==
+              foldedProductOfParts(0x8000'0001'FFFF'FFFF, kMultiplier));
+#else
+constexpr auto foldedProduct = foldedProductOfParts;
+#endif
+
+std::uint64_t mix(std::uint64_t state, std::uint64_t word) {
+  return foldedProduct(state ^ word, kMultiplier);
 }
 
 std::uint64_t hashSeed() {

@@ -103,6 +103,7 @@ KvRef<KvObject> dictionaryOf(plist_t node) {
 // Null for a node without a value. At most kPlistMaximumDepth calls deep, since it was checked.
 KvRef<KvObject> valueOf(plist_t node) {
   std::uint64_t length = 0;
+  const auto size = [&length] { return static_cast<std::size_t>(length); };
   switch (plist_get_node_type(node)) {
     case PLIST_BOOLEAN: {
       std::uint8_t value = 0;
@@ -118,13 +119,14 @@ KvRef<KvObject> valueOf(plist_t node) {
     }
     case PLIST_STRING: {
       const char* text = plist_get_string_ptr(node, &length);
-      return KvString::create({text != nullptr ? text : "", text != nullptr ? length : 0});
+      const std::string_view content(text != nullptr ? text : "", text != nullptr ? size() : 0);
+      return KvString::create(content);
     }
     case PLIST_DATE:
       return dateOf(node);
     case PLIST_DATA: {
       const char* bytes = plist_get_data_ptr(node, &length);
-      return KvData::create(std::as_bytes(std::span(bytes, bytes != nullptr ? length : 0)));
+      return KvData::create(std::as_bytes(std::span(bytes, bytes != nullptr ? size() : 0)));
     }
     case PLIST_ARRAY:
       return arrayOf(node);

@@ -28,7 +28,8 @@ constexpr FetchRequest fetchRequest(std::uint32_t selector, std::uint32_t flags)
 class PageBuffer {
  public:
   explicit PageBuffer(std::size_t size) noexcept
-      : size_(size), memory_(::operator new(size, kPage, std::nothrow)) {}
+      : size_(size),
+        memory_(size <= kLargest ? ::operator new(size, kPage, std::nothrow) : nullptr) {}
   ~PageBuffer() { ::operator delete(memory_, kPage); }
   PageBuffer(const PageBuffer&) = delete;
   PageBuffer& operator=(const PageBuffer&) = delete;
@@ -38,6 +39,9 @@ class PageBuffer {
  private:
   // The largest page of the machines this runs on, and so aligned to the pages of all of them.
   static constexpr std::align_val_t kPage{65536};
+  // A driver may announce all that 32 bits can say; where addresses have no more, rounding up to
+  // whole pages would end in a small buffer.
+  static constexpr std::size_t kLargest = PTRDIFF_MAX - std::size_t(kPage);
   std::size_t size_;
   void* memory_;
 };

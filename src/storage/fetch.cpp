@@ -31,7 +31,7 @@ bool fetchAndParse(ConnectionHandle connection, const NandExporter& exporter,
   const std::size_t size = ByteReader(sizeReply).read<std::uint32_t>(0).value_or(0);
   const PageBuffer buffer(size);
   if (!buffer.allocated()) {
-    std::fprintf(stderr, "Could not valloc %zd bytes", static_cast<std::ptrdiff_t>(size));
+    std::fprintf(stderr, "Could not valloc %lld bytes", static_cast<long long>(size));
     return false;
   }
   if (selectors != nullptr) request = fetchRequest(selectors[1], 0);

@@ -48,7 +48,7 @@ bool fetchList(ConnectionHandle connection, const NandExporter& exporter,
   if (size == 0) return true;
   const PageBuffer buffer(size);
   if (!buffer.allocated()) {
-    std::fprintf(stderr, "Could not malloc %zd bytes", static_cast<std::ptrdiff_t>(size));
+    std::fprintf(stderr, "Could not malloc %lld bytes", static_cast<long long>(size));
     return false;
   }
   request = fetchRequest(selectors[1], flags);

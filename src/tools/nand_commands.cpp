@@ -48,7 +48,7 @@ void printInfo(const ToolContext& context, const KvDictionary& info, const std::
     Table table({{""}, {"", Align::Left, true}});
     for (const NandFigure& figure : group.figures) {
       if (figure.first) {
-        const std::size_t last = static_cast<std::size_t>(*figure.first) + figure.values.size() - 1;
+        const std::int64_t last = *figure.first + std::ssize(figure.values) - 1;
         table.add({fmt::format("{}{}-{}", figure.name, *figure.first, last), familyText(figure)});
       } else {
         table.add({figure.name, integerText(figure.values.front())});

@@ -26,11 +26,11 @@ std::optional<std::string_view> recordAt(std::string_view bytes, std::size_t off
   const std::string_view rest = bytes.substr(offset);
   if (rest.size() < kFrameBytes || rest[kLengthDigits] != '\n') return std::nullopt;
   const auto length = parseInt64(rest.substr(0, kLengthDigits));
-  if (!length || *length < 0) return std::nullopt;
-  const auto size = static_cast<std::size_t>(*length);
-  if (size > rest.size() - kFrameBytes || rest[kLengthDigits + 1 + size] != '\n') {
+  if (!length || *length < 0 || *length > std::ssize(rest) - std::ptrdiff_t{kFrameBytes}) {
     return std::nullopt;
   }
+  const auto size = static_cast<std::size_t>(*length);
+  if (rest[kLengthDigits + 1 + size] != '\n') return std::nullopt;
   return rest.substr(kLengthDigits + 1, size);
 }
 
