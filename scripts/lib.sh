@@ -18,12 +18,18 @@ fail() {
   exit 1
 }
 
+# What build_with configures with besides the preset. Whoever works on the project sets
+# warnings_are_errors; one who only builds it may have another compiler, with warnings of its own.
+configure_options=()
+warnings_are_errors=-DCMAKE_COMPILE_WARNING_AS_ERROR=ON
+
 # build_with PRESET [TARGET ...]: configures the first time, then builds.
 build_with() {
   local preset=$1
   shift
   cd "$root_dir"
-  cmake --preset "$preset" -DCMAKE_COLOR_DIAGNOSTICS=OFF >"/tmp/tallyrun-configure.$$" 2>&1 ||
+  cmake --preset "$preset" -DCMAKE_COLOR_DIAGNOSTICS=OFF "${configure_options[@]}" \
+    >"/tmp/tallyrun-configure.$$" 2>&1 ||
     { cat "/tmp/tallyrun-configure.$$" >&2; rm -f "/tmp/tallyrun-configure.$$"; fail "cannot configure"; }
   rm -f "/tmp/tallyrun-configure.$$"
   cmake --build "$(build_folder "$preset")" --parallel "$jobs" ${1:+--target "$@"}
