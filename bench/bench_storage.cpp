@@ -76,7 +76,7 @@ class NoPreferences final : public Preferences {
  public:
   KvRef<KvObject> SMAPreferencesGetValue(std::string_view, std::string_view) override { return {}; }
   void SMAPreferencesSetValue(std::string_view, KvRef<KvObject>, std::string_view) override {}
-  bool SMAPreferencesSynchronize(std::string_view) override { return true; }
+  WriteResult SMAPreferencesSynchronize(std::string_view) override { return WriteResult::Written; }
 };
 
 class NoPurgeableSpace final : public PurgeableSpace {

@@ -35,7 +35,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const bool isRaw = input.takeFlag();
   const auto hub = isRaw ? fuzz::ValueReader(input).takeDictionary() : nullptr;
   const auto list = input.takeRest();
-  const auto files = std::make_shared<DescribedFiles>(DeviceDirectory("/nonexistent", ""),
+  const auto files = std::make_shared<DescribedFiles>(DeviceDirectory(DeviceRoot("/nonexistent"), ""),
                                                       std::make_shared<NoLog>());
 
   const auto interests = parseInterestList(list);

@@ -76,7 +76,7 @@ void takeWord(Line& line, const std::string& word) {
 Candidates storeKeys(const Line& line) {
   std::set<std::string, decltype(&naturalLess)> keys(&naturalLess);
   listStoreKeys(
-      metricsStorePath(line.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
+      metricsStoreFile(line.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
       [](const std::string&) {});
   Candidates found;
   for (const std::string& key : keys) found.push_back({key, ""});
@@ -89,7 +89,7 @@ Candidates days(const Line& line) {
   std::int64_t first = std::numeric_limits<std::int32_t>::max();
   std::int64_t last = std::numeric_limits<std::int32_t>::min();
   listStoreKeys(
-      metricsStorePath(line.root),
+      metricsStoreFile(line.root),
       [&](const StoreKey& key) {
         first = std::min(first, key.firstDay);
         last = std::max(last, key.lastDay);

@@ -51,7 +51,7 @@ std::vector<std::string> similarKeys(const ToolContext& context, const KeyStory&
   constexpr std::size_t kSuggested = 3;
   std::set<std::string, std::less<>> keys;
   listStoreKeys(
-      metricsStorePath(context.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
+      metricsStoreFile(context.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
       [](const std::string&) {});
   KeyCollector collector(keys);
   if (const auto& whitelist = story.judge.file().root) visitWhitelist(*whitelist, collector);

@@ -6,6 +6,7 @@
 #include <nlohmann/json.hpp>
 
 #include "storage/auxiliary_metrics.h"
+#include "storage/exporter.h"
 #include "storage/health.h"
 #include "storage/nand_info.h"
 #include "tools/nand_command.h"

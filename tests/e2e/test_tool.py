@@ -89,7 +89,7 @@ class ToolTest(DeviceTest):
                 result = subprocess.run(["bash", "-c", "exec 9> >(exec true); wait $!; "
                                          f"'{BIN}/tallyctl' {command}"],
                                         capture_output=True, timeout=60, stdin=subprocess.DEVNULL,
-                                        env=self.device.environment(TODAY))
+                                        env=self.device.environment())
                 self.assertEqual(result.returncode, wanted)
                 self.assertIn(out, result.stdout.decode())
                 self.assertEqual(b"cannot write to standard output" in result.stderr, wanted == 1)

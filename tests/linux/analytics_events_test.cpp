@@ -83,7 +83,7 @@ TEST_F(EventSpoolTest, TheDescriptionSaysWhatIsWanted) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.entry);
-    log->lines.clear();
+    useBoundedLog();
     built = 0;
     putPlist("device.plist", std::string("<dict>") + c.entry + "</dict>");
     LinuxAnalyticsEvents events = service();

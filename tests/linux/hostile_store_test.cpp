@@ -60,7 +60,7 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
     store()->TBClientSetValueForScalarKey("a", 1);
     c.spoil();
     const std::string before = get("data/TBDataStore.sqlitedb");
-    log->lines.clear();
+    useBoundedLog();
     const auto spoiled = store();
     spoiled->TBClientCheckpoint();
     spoiled->openHistory()->enumerateScalars(
@@ -129,7 +129,7 @@ TEST_F(StoreTest, NoForeignFileIsOpenedGivenAwayOrRemoved) {
     put("precious", "root's");
     if (*c.end == '\0') std::filesystem::remove(path);
     c.make(c.end);
-    log->lines.clear();
+    useBoundedLog();
     const auto spoiled = store();
     spoiled->TBClientCheckpoint();
     spoiled->TBClientSetValueForScalarKey("b", 2);
@@ -176,7 +176,7 @@ TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
   for (const char* text : damage) sql(text);
   clock->setDay(1);
   const auto check = [&] {
-    log->lines.clear();
+    useBoundedLog();
     EXPECT_THAT(scalars(), ElementsAre("20514 good=1"));
     EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1"));
     ASSERT_EQ(errors().size(), 2u) << "one line for each enumeration";

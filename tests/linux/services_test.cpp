@@ -70,20 +70,20 @@ TEST(SystemLogSettings, ComeFromTheEnvironment) {
 }
 
 TEST_F(ServicesTest, DescriptionFaultsAreOneLineEach) {
-  EXPECT_FALSE(describe("")->get("OSVersion")) << "no description at all";
+  EXPECT_FALSE(describe("")->getAs<KvString>(Described::OSVersion)) << "no description at all";
   EXPECT_TRUE(errors().empty());
   useBoundedLog();
   const auto wrong = describe("<key>OSVersion</key><integer>1</integer>");
-  EXPECT_FALSE(wrong->getAs<KvString>("OSVersion"));
-  EXPECT_FALSE(wrong->getAs<KvString>("OSVersion"));
+  EXPECT_FALSE(wrong->getAs<KvString>(Described::OSVersion));
+  EXPECT_FALSE(wrong->getAs<KvString>(Described::OSVersion));
   ASSERT_EQ(errors().size(), 1u);
   EXPECT_NE(errors()[0].find("\"OSVersion\""), std::string::npos);
   for (const char* damaged : {"<plist><dict>", "<plist version=\"1.0\"><array/></plist>"}) {
     useBoundedLog();
     put("device.plist", damaged);
     const auto description = describe("");
-    EXPECT_FALSE(description->get("OSVersion"));
-    EXPECT_FALSE(description->get("Timebase"));
+    EXPECT_FALSE(description->getAs<KvString>(Described::OSVersion));
+    EXPECT_FALSE(description->getAs<KvDictionary>(Described::Timebase));
     ASSERT_EQ(errors().size(), 1u);
     EXPECT_NE(errors()[0].find(at("device.plist")), std::string::npos);
   }
