@@ -68,11 +68,11 @@ TEST_F(PreferencesTest, OnlyWhatChangesIsWritten) {
     auto preferences = open();
     preferences.SMAPreferencesSetValue(c.key, c.former, kDomain);
     EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
-    const auto before = DeviceRoot(root).identity(kFile);
+    const auto before = DeviceRoot(root).identity("/" + std::string(kFile));
     EXPECT_EQ(before.has_value(), static_cast<bool>(c.former)) << "a file without a value";
     preferences.SMAPreferencesSetValue(c.key, c.next, kDomain);
     EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
-    EXPECT_EQ(DeviceRoot(root).identity(kFile) != before, c.writes);
+    EXPECT_EQ(DeviceRoot(root).identity("/" + std::string(kFile)) != before, c.writes);
     EXPECT_TRUE(kvIdentical(open().SMAPreferencesGetValue(c.key, kDomain).get(), c.next.get()));
   }
   EXPECT_TRUE(errors().empty());
