@@ -35,8 +35,8 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const bool isRaw = input.takeFlag();
   const auto hub = isRaw ? fuzz::ValueReader(input).takeDictionary() : nullptr;
   const auto list = input.takeRest();
-  const auto files = std::make_shared<DescribedFiles>(DeviceDirectory(DeviceRoot("/nonexistent"), ""),
-                                                      std::make_shared<NoLog>());
+  const auto files = std::make_shared<DescribedFiles>(
+      DeviceDirectory(DeviceRoot("/nonexistent"), ""), std::make_shared<NoLog>());
 
   const auto interests = parseInterestList(list);
   if (interests) {

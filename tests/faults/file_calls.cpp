@@ -131,6 +131,11 @@ int __wrap_openat(int directory, const char* name, int flags, ...) {
   return file;
 }
 
+// What the hardened headers make of it where it creates nothing.
+int __wrap___openat_2(int directory, const char* name, int flags) {
+  return __wrap_openat(directory, name, flags);
+}
+
 // The one call that the system library has no name for.
 long __wrap_syscall(long number, int directory, const char* name, const void* how, size_t size) {
   const std::string path = pathAt(directory, name);

@@ -101,7 +101,8 @@ TEST_F(StoreTest, DistributionsOfBothTablesAreOneSeriesInOrder) {
 TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClockGoes) {
   const auto record = [&](std::int32_t first, std::int32_t last) {
     ASSERT_TRUE(write([&](StoreWriter& writer) -> Status {
-      for (std::int32_t day = first; day <= last; ++day) {
+      for (std::int64_t each = first; each <= last; ++each) {
+        const auto day = static_cast<std::int32_t>(each);
         const double value = 1;
         const std::uint32_t offset = 0;
         if (auto set = writer.setScalar(day, "s", day); !set) return set;

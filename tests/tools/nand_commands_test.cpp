@@ -52,7 +52,7 @@ TEST_F(NandCommands, InfoForPrograms) {
   EXPECT_EQ(json["vellum.NANDInfo.Reclaim.TotalPurgeableBytes"], 5);
   const Outcome none = runOn({"info", "--json"}, {});
   EXPECT_EQ(none.status, kWrong);
-  EXPECT_EQ(none.json()["vellum.NANDInfo.Error"], "1");
+  EXPECT_NE(none.err.find("{\"error\""), std::string::npos) << none.err;
 }
 
 TEST_F(NandCommands, HealthDecidesTheStatus) {
