@@ -1,4 +1,5 @@
-// What a library may ask of its own process, how a program stays alive, and the one write that is not to a file.
+// What a library may ask of its own process, how a program stays alive, and the one write that is
+// not to a file.
 #pragma once
 
 #include <cstddef>
