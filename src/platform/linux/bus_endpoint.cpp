@@ -20,13 +20,6 @@ int onSend(sd_bus_message* message, void* endpoint, sd_bus_error*) {
   return static_cast<BusEndpoint*>(endpoint)->take(message);
 }
 
-int onFirstAnswer(sd_bus_message* answer, void* endpoint, sd_bus_error*) {
-  if (!::sd_bus_message_is_method_error(answer, nullptr)) {
-    static_cast<BusEndpoint*>(endpoint)->noteStarted();
-  }
-  return 1;
-}
-
 int onAnyMessage(sd_bus_message* message, void* endpoint, sd_bus_error*) {
   return static_cast<BusEndpoint*>(endpoint)->look(message);
 }
@@ -87,16 +80,14 @@ Status BusEndpoint::start() {
   // Last, for from here on messages come.
   if (status) status = statusOf("name", ::sd_bus_request_name(*bus, name_.c_str(), 0));
   if (!status) return status;
-  ::sd_bus_call_method_async(*bus, nullptr, kBusDriver, kBusDriverObject, kBusDriver,
-                             kBusDriverQuestion, onFirstAnswer, this, "");
   const auto asker = questions_.get();
   busRefusesOthers_ = asker && busRefusesOthers(*asker, name_);
   return status;
 }
 
-// The answer to a question that was asked right after the name was requested: messages that had
-// waited for the name came before it.
-void BusEndpoint::noteStarted() {
+// Whoever started the program by asking the bus for it sends the message later, so only the end of
+// the listening tells.
+void BusEndpoint::noteLostMessage() {
   if (arrived_ || !isStartedForAMessage()) return;
   // The bus drops the message that starts a program if its sender is gone by the time the program
   // has the name.
@@ -118,6 +109,7 @@ bool BusEndpoint::stopListening() {
   ::sd_bus_get_n_queued_read(bus, &waiting);
   while (!listening_ && waiting > 0 && ::sd_bus_process(bus, nullptr) > 0)
     ::sd_bus_get_n_queued_read(bus, &waiting);
+  if (!listening_) noteLostMessage();
   return listening_;
 }
 

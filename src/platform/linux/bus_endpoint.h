@@ -39,10 +39,10 @@ class BusEndpoint final : public IpcEndpoint {
   // negative one an errno.
   int take(sd_bus_message* message);
   int look(sd_bus_message* message);
-  void noteStarted();
 
  private:
   Status start();
+  void noteLostMessage();
   void listenAgain();
   bool isFromAcceptedSender(sd_bus_message* message);
   Status checkSender(sd_bus_message* message);
