@@ -54,6 +54,7 @@ class DescribedDevice {
 
  private:
   struct CountingLog final : SystemLog {
+    CountingLog() : SystemLog(Repeats::All) {}
     bool enabled(LogLevel) const override { return true; }
     void write(LogLevel level, std::string_view) override { errors += level == LogLevel::Error; }
     std::size_t errors = 0;
