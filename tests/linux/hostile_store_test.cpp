@@ -153,6 +153,29 @@ TEST_F(StoreTest, WhatHasNoEndIsEnded) {
       "WITH RECURSIVE n(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM n) SELECT count(*) FROM n");
   ASSERT_FALSE(counted);
   EXPECT_THAT(counted.error().message, testing::HasSubstr("no end"));
+
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    for (int i = 0; i < 4000; ++i) {
+      if (auto set = writer.setScalar(1, std::to_string(i), i); !set) return set;
+    }
+    return Done{};
+  }));
+  const auto page =
+      std::stoul(sql("SELECT rootpage - 1 FROM sqlite_schema WHERE name = 'scalars'")) * 8192;
+  std::string spoiled = get("data/TBDataStore.sqlitedb");
+  const std::string child = spoiled.substr(page + 8, 4);  // the last one, now in place of each
+  const auto word = [&](std::size_t at) {
+    return static_cast<unsigned char>(spoiled[at]) * 256u +
+           static_cast<unsigned char>(spoiled[at + 1]);
+  };
+  for (std::size_t cell = 0; cell < word(page + 3); ++cell) {
+    spoiled.replace(page + word(page + 12 + 2 * cell), 4, child);
+  }
+  put("data/TBDataStore.sqlitedb", spoiled);
+  useBoundedLog();
+  EXPECT_LT(scalars().size(), 4000u);
+  ASSERT_EQ(errors().size(), 1u);
+  EXPECT_THAT(errors()[0], testing::HasSubstr("out of order"));
 }
 
 TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {

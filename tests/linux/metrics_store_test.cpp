@@ -126,11 +126,10 @@ TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClock
     std::vector<std::int32_t> wrong;  // the days of runs under the wrong clock
     std::size_t wrongLeft;            // of them, after the clock is right again
   } cases[] = {
-      {"none", {}, 0},
       {"one run ten days ahead", {kToday + 10}, 1},
       {"a week ten years ahead", {24000, 24001, 24002, 24003, 24004, 24005, 24006}, 7},
-      {"a week of boots in 1970", {0, 0, 0, 1, 0, 2}, 0},
-      {"a week a year ago", {20100, 20101, 20102, 20103, 20104, 20105, 20106}, 0},
+      {"a week of boots in 1970", {0, 0, 1, 0}, 0},
+      {"days of a year ago", {20100, 20101, 20102}, 0},
       {"the ends of time", {kFirst, kLast - 1, kToday + 4000, kLast, 0}, 3},
   };
   for (const auto& c : cases) {

@@ -60,7 +60,7 @@ constexpr int kLargestRow = 16 << 20;
 // of the instructions that reading a whole store takes, some three for each byte, and what a small
 // one cannot need. A loop in a damaged tree or a schema has no end.
 constexpr int kInstructionsBetweenLooks = 1'000'000;
-constexpr std::int64_t kInstructionsPerByte = 8, kLooksAtLeast = 50;
+constexpr std::int64_t kInstructionsPerByte = 8, kLooksAtLeast = 20;
 constexpr std::uint64_t kMostBytesWatched = 1u << 30;  // a file may have holes
 
 int stepTakesTooLong(void* watch) {

@@ -106,7 +106,9 @@ class SampleTable {
     while ((step = rows_.step()) == Step::Row) {
       const std::int64_t day = rows_.integer(0);
       const std::string_view key = rows_.text(1);
-      if (!order_.follows(rows_, 5)) return fail(damagedTree(database_));
+      if (!order_.follows(rows_, day, key, rows_.integer(5))) {
+        return fail(damagedTree(database_));
+      }
       if (isStoreKey(key) && chunkIsSound(rows_.integer(2), rows_.integer(3), rows_.integer(4))) {
         day_ = static_cast<std::int32_t>(day);
         if (key_ != key) key_ = key;
@@ -245,13 +247,14 @@ class SqliteHistory final : public HistoryStore {
     Step step = Step::Done;
     RowOrder order;
     while (!stop && (step = rows->step()) == Step::Row) {
-      if (!order.follows(*rows)) return faults.fail(damagedTree(database_));
+      const std::int64_t day = rows->integer(0);
       const std::string_view key = rows->text(1);
+      if (!order.follows(*rows, day, key)) return faults.fail(damagedTree(database_));
       if (!isStoreKey(key) || rows->type(2) != ColumnType::Integer) {
-        faults.addDamaged(key, rows->integer(0));
+        faults.addDamaged(key, day);
         continue;
       }
-      handler(key, static_cast<std::int32_t>(rows->integer(0)), rows->integer(2), stop);
+      handler(key, static_cast<std::int32_t>(day), rows->integer(2), stop);
     }
     if (step == Step::Failed) faults.fail(database_.error());
   }

@@ -204,17 +204,19 @@ Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point 
   Step step = Step::Done;
   RowOrder order;
   while ((step = rows->step()) == Step::Row) {
-    if (!order.follows(*rows, 2)) return damagedTree(database_);
     const std::int64_t number = rows->integer(2), samples = rows->integer(3);
     const auto valueColumn = rows->blob(4), offsetColumn = rows->blob(5);
-    if (!isStoreKey(rows->text(1)) ||
+    const std::int64_t rowDay = rows->integer(0);
+    const std::string_view rowKey = rows->text(1);
+    if (!order.follows(*rows, rowDay, rowKey, number)) return damagedTree(database_);
+    if (!isStoreKey(rowKey) ||
         !chunkIsSound(samples, std::ssize(valueColumn), std::ssize(offsetColumn))) {
       continue;
     }
-    if (!started || day != rows->integer(0) || key != rows->text(1)) {
+    if (!started || day != rowDay || key != rowKey) {
       if (auto finished = tail.finish(); !finished) return finished.error();
-      day = rows->integer(0);
-      key = rows->text(1);
+      day = rowDay;
+      key = rowKey;
       if (auto moved = tail.moveTo(static_cast<std::int32_t>(day), key); !moved) {
         return moved.error();
       }
