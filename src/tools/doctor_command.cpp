@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <nlohmann/json.hpp>
 
+#include "base/printable.h"
 #include "tools/health_checks.h"
 #include "tools/table.h"
 
@@ -38,7 +39,7 @@ int examine(const ToolContext& context) {
       print(context.out, "\n");
       printLine(context,
                 fmt::format("If the clock is right now, this repairs the {}:", line.subject));
-      printLine(context, "  " + line.repair);
+      print(context.out, "  " + printable(line.repair) + "\n");
     }
     print(context.out, "\n");
     printLine(context, wrong == 0 ? "nothing is wrong" : fmt::format("{} wrong", wrong),
