@@ -4,6 +4,13 @@ set -euo pipefail
 root_dir=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 jobs=$(nproc)
 
+# What the project is built with, for the processor that it is built for.
+library_packages=(
+  libplist-dev libsqlite3-dev libsystemd-dev libmd-dev libfmt-dev
+  nlohmann-json3-dev libcli11-dev
+  libgtest-dev libgmock-dev
+)
+
 # The compiler cache needs a folder that can be written, also where there is no home.
 if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
   export CCACHE_DIR="$root_dir/build/ccache"
@@ -22,6 +29,16 @@ fail() {
 # warnings_are_errors; one who only builds it may have another compiler, with warnings of its own.
 configure_options=()
 warnings_are_errors=-DCMAKE_COMPILE_WARNING_AS_ERROR=ON
+
+# as_root COMMAND...
+as_root() {
+  if [ "$(id -u)" -eq 0 ]; then
+    "$@"
+  else
+    command -v sudo >/dev/null || fail "neither root nor sudo; run by hand: $*"
+    sudo "$@"
+  fi
+}
 
 # build_with PRESET [TARGET ...]: configures the first time, then builds.
 build_with() {

@@ -1,0 +1,5 @@
+set(tally_architecture arm64)
+set(tally_triplet aarch64-linux-gnu)
+set(tally_emulator qemu-aarch64)
+set(CMAKE_SYSTEM_PROCESSOR aarch64)
+include(${CMAKE_CURRENT_LIST_DIR}/debian-cross.cmake)

@@ -1,0 +1,5 @@
+set(tally_architecture armhf)
+set(tally_triplet arm-linux-gnueabihf)
+set(tally_emulator qemu-arm)
+set(CMAKE_SYSTEM_PROCESSOR armv7l)
+include(${CMAKE_CURRENT_LIST_DIR}/debian-cross.cmake)
