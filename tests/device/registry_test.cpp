@@ -184,7 +184,7 @@ TEST(Registry, MalformedDescriptionsCostTheirEntryOnly) {
           <dict><key>Class</key><string>Good</string><key>ID</key><integer>9</integer></dict>
           <dict><key>Class</key><string>Twin</string><key>ID</key><integer>9</integer></dict>
         </array></dict>)",
-       "Good ", 1},
+       "Good ", 8},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
