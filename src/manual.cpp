@@ -35,6 +35,7 @@ std::string roff(const std::string& text) {
 }
 
 std::string sentence(std::string text) {
+  if (!text.empty() && text[0] >= 'a' && text[0] <= 'z') text[0] = static_cast<char>(text[0] - 32);
   return text.empty() || text.ends_with('.') ? text : text + ".";
 }
 
@@ -70,7 +71,10 @@ void writeCommand(std::ostream& out, const CLI::App& app) {
     const std::string form = "\\fB" + roff(option.names.back()) + "\\fR" + value;
     out << (option.required ? " " + form : " [" + form + "]");
   }
-  out << '\n' << roff(sentence(help.description)) << "\n.RS\n";
+  out << '\n' << roff(sentence(help.description)) << '\n';
+  const bool hasOwn = !help.arguments.empty() || !help.options.front().common;
+  if (!hasOwn) return;  // an empty block is a fault to who checks pages
+  out << ".RS\n";
   for (const OptionHelp& argument : help.arguments) writeOption(out, argument);
   for (const OptionHelp& option : help.options) {
     if (!option.common) writeOption(out, option);

@@ -95,8 +95,8 @@ void Table::renderRow(std::string& out, const Terminal& terminal, const std::vec
   }
 }
 
-void Table::renderBlock(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
-                        std::size_t indent) const {
+void Table::renderTitled(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
+                         std::size_t indent) const {
   std::size_t titles = 0;
   for (std::size_t i = 1; i < columns_.size(); ++i) {
     titles = std::max(titles, displayWidth(columns_[i].title));
@@ -106,7 +106,7 @@ void Table::renderBlock(std::string& out, const Terminal& terminal, const std::v
     if (cell.text.empty() && !(cell.share.value_or(0) > 0)) continue;
     std::size_t left = i == 0 ? indent : indent + kGap;
     out.append(left, ' ');
-    if (i > 0 && titles > 0) {
+    if (i > 0) {
       std::string label = columns_[i].title;
       label.append(titles + kGap - displayWidth(label), ' ');
       left += titles + kGap;
@@ -120,6 +120,38 @@ void Table::renderBlock(std::string& out, const Terminal& terminal, const std::v
   }
 }
 
+void Table::renderRunning(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
+                          std::size_t indent) const {
+  const std::size_t next = indent + kGap;  // where what does not fit goes on
+  const auto begin = [&out](std::size_t blanks) {
+    out.append(blanks, ' ');
+    return blanks;
+  };
+  std::size_t taken = 0;  // of the line that is being written
+  for (const Cell& cell : row) {
+    const std::size_t width = widthOf(cell);
+    if (width == 0) continue;
+    if (taken == 0) {
+      taken = begin(indent);
+    } else if (taken + kGap + width <= terminal.columns) {
+      taken += begin(kGap);
+    } else {
+      out += '\n';
+      taken = begin(next);
+    }
+    const auto lines = linesOf(cell, terminal, terminal.columns - std::max(taken, next));
+    for (std::size_t line = 0; line < lines.size(); ++line) {
+      if (line > 0) {
+        out += '\n';
+        taken = begin(next);
+      }
+      out += inked(terminal, cell.ink, lines[line]);
+    }
+    taken += displayWidth(lines.back());
+  }
+  out += '\n';
+}
+
 std::string Table::render(const Terminal& terminal, std::size_t indent) const {
   const Layout layout = this->layout(terminal, indent);
   std::string out;
@@ -131,8 +163,10 @@ std::string Table::render(const Terminal& terminal, std::size_t indent) const {
   for (const auto& row : rows_) {
     if (layout.fits) {
       renderRow(out, terminal, row, layout, indent);
+    } else if (hasTitles()) {
+      renderTitled(out, terminal, row, indent);
     } else {
-      renderBlock(out, terminal, row, indent);
+      renderRunning(out, terminal, row, indent);
     }
   }
   return out;

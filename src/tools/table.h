@@ -50,8 +50,12 @@ class Table {
   bool hasTitles() const;
   void renderRow(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
                  const Layout& layout, std::size_t indent) const;
-  void renderBlock(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
-                   std::size_t indent) const;
+  // A row that does not fit: a cell a line after its title, or cells without titles one after the
+  // other.
+  void renderTitled(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
+                    std::size_t indent) const;
+  void renderRunning(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
+                     std::size_t indent) const;
   std::vector<Column> columns_;
   std::vector<std::vector<Cell>> rows_;
 };

@@ -76,6 +76,10 @@ TEST(Output, TablesAlignByDisplayWidthAndGiveWayOnTerminals) {
             "a very long key\nindeed\n  n  12\n  x  end\n"
             "e\xcc\x81\\x1b\n  x  z\n")
       << "too narrow for a table";
+  Table plain({{""}, {""}, {"", Align::Left, true}});
+  plain.add({"[ok]", "device description", "9 entries of it"});
+  EXPECT_EQ(plain.render({34, true, false, true}, 0),
+            "[ok]  device description\n  9 entries of it\n");
   Table bars({{""}, {""}});
   bars.add({"half", Cell::bar(0.5, 36)});
   EXPECT_EQ(bars.render({80, true, false, false}), "  half  " + std::string(18, '#') + "\n");
