@@ -74,7 +74,8 @@ std::vector<PreferenceWrite> failuresOf(const Attempts& attempts, std::string_vi
   std::vector<PreferenceWrite> failures;
   for (const auto& [write, result] : attempts) {
     if (result) continue;
-    logMessage(LogLevel::Error, "tasking: {} {} of {} {}", write.domain, write.key, write.user,
+    logBounded(LogLevel::Error, "tasking: entries not done", "tasking: {} {} of {} {}",
+               write.domain, write.key, write.user,
                result.isRefused() ? fmt::format("is refused and not {}", what)
                                   : fmt::format("could not be {}; the next run tries again", what));
     if (!result.isRefused()) failures.push_back(write);
@@ -165,7 +166,9 @@ TaskingInputs readTaskingInputs() {
 
 bool carryOut(const TaskingPlan& plan) {
   for (const TaskingMessage& message : plan.messages) {
-    logMessage(message.isFault ? LogLevel::Error : LogLevel::Default, "{}", message.text);
+    logBounded(message.isFault ? LogLevel::Error : LogLevel::Default,
+               message.isFault ? "tasking: entries skipped" : "tasking: messages", "{}",
+               message.text);
   }
   if (plan.lastUpdate) record("LastOSUpdate", plan.lastUpdate);
   if (!plan.isDue) return true;
