@@ -109,8 +109,9 @@ Statement& Statement::bind(int parameter, std::span<const std::byte> blob) {
   return *this;
 }
 
+// One that could not be prepared fails, as every call on it does.
 Step Statement::step() {
-  watch_->looks = 0;
+  if (watch_ != nullptr) watch_->looks = 0;
   switch (::sqlite3_step(handle_.get())) {
     case SQLITE_ROW:
       return Step::Row;
