@@ -6,7 +6,6 @@ set(CMAKE_SYSROOT ${CMAKE_CURRENT_LIST_DIR}/../build-${tally_architecture}/sysro
 file(REAL_PATH ${CMAKE_SYSROOT} CMAKE_SYSROOT)
 set(CMAKE_LIBRARY_ARCHITECTURE ${tally_triplet})
 set(CMAKE_CXX_COMPILER ${tally_triplet}-g++)
-set(CMAKE_CROSSCOMPILING_EMULATOR ${tally_emulator};-L;${CMAKE_SYSROOT})
 
 # Programs are the host's; headers, libraries and packages are the sysroot's alone.
 set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)
@@ -16,3 +15,7 @@ set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY)
 set(ENV{PKG_CONFIG_SYSROOT_DIR} ${CMAKE_SYSROOT})
 set(ENV{PKG_CONFIG_LIBDIR}
     ${CMAKE_SYSROOT}/usr/lib/${tally_triplet}/pkgconfig:${CMAKE_SYSROOT}/usr/share/pkgconfig)
+
+# With its path, since tests run programs with a search path of their own.
+find_program(TALLYRUN_EMULATOR ${tally_emulator} REQUIRED)
+set(CMAKE_CROSSCOMPILING_EMULATOR ${TALLYRUN_EMULATOR};-L;${CMAKE_SYSROOT})

@@ -33,6 +33,8 @@ def life(root, programs):
                    env={**os.environ, "TALLYRUN_BIN": str(programs)})
     description = root / "device/device.plist"
     description.write_bytes(plistlib.dumps({**plistlib.loads(description.read_bytes()), **PINNED}))
+    (root / "etc").mkdir(exist_ok=True)
+    (root / "etc/machine-id").write_text("0123456789abcdef" * 2 + "\n")
     found = {}
     for day in DAYS:
         environment = Device(root).environment(day)

@@ -87,7 +87,7 @@ TEST_F(StoreTest, NoForeignFileIsOpenedGivenAwayOrRemoved) {
   };
   // When it has been rolled back, SQLite removes the file that it names.
   const auto journal = [&](const std::string& end) {
-    const auto word = [](std::size_t number) {
+    const auto word = [](std::uint64_t number) {
       std::string bytes;
       for (int shift = 24; shift >= 0; shift -= 8) bytes += static_cast<char>(number >> shift);
       return bytes;

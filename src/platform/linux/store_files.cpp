@@ -15,6 +15,7 @@
 #include <utility>
 
 #include "base/number_text.h"
+#include "base/retried.h"
 
 namespace tally {
 namespace {
@@ -95,12 +96,14 @@ std::optional<Place> placeOf(const char* path) {
 // and all others as before.
 
 using OpenCall = int (*)(const char*, int, int);
-using StatCall = int (*)(const char*, struct stat*);
-using AccessCall = int (*)(const char*, int);
+// A struct stat has two sizes on 32-bit systems, by the time that a library was built with: only
+// SQLite's own calls may fill SQLite's.
+using StatCall = int (*)(const char*, void*);
+using FstatCall = int (*)(int, void*);
 using UnlinkCall = int (*)(const char*);
 OpenCall formerOpen;
 StatCall formerStat;
-AccessCall formerAccess;
+FstatCall sqliteFstat;
 UnlinkCall formerUnlink;
 
 int refuse(int file, int code) {
@@ -137,16 +140,13 @@ int openFile(const char* path, int flags, int mode) {
   }
 }
 
-int statFile(const char* path, struct stat* status) {
+int statFile(const char* path, void* status) {
   const auto place = placeOf(path);
   if (!place) return formerStat(path, status);
-  return ::fstatat(place->descriptor(), place->file, status, AT_SYMLINK_NOFOLLOW);
-}
-
-int accessFile(const char* path, int mode) {
-  const auto place = placeOf(path);
-  if (!place) return formerAccess(path, mode);
-  return ::faccessat(place->descriptor(), place->file, mode, 0);
+  // Without opening the file itself: closing it would drop the locks that this process holds on it.
+  const Descriptor named(retried(
+      [&] { return ::openat(place->descriptor(), place->file, O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
+  return named ? sqliteFstat(named.get(), status) : -1;
 }
 
 int unlinkFile(const char* path) {
@@ -183,10 +183,21 @@ int remove(sqlite3_vfs*, const char* path, int syncDirectory) {
   return base()->xDelete(base(), path, syncDirectory);
 }
 
+// SQLite's own takes a journal that it cannot examine for none, and would use a store half written.
 int access(sqlite3_vfs*, const char* path, int flags, int* result) {
   *result = 0;
-  if (!placeOf(path)) return SQLITE_OK;
-  return base()->xAccess(base(), path, flags, result);
+  const auto place = placeOf(path);
+  if (!place) return SQLITE_OK;
+  if (flags != SQLITE_ACCESS_EXISTS) {
+    *result = ::faccessat(place->descriptor(), place->file, R_OK | W_OK, 0) == 0;
+    return SQLITE_OK;
+  }
+  struct stat status {};
+  if (::fstatat(place->descriptor(), place->file, &status, AT_SYMLINK_NOFOLLOW) != 0) {
+    return errno == ENOENT ? SQLITE_OK : SQLITE_IOERR_ACCESS;
+  }
+  *result = !S_ISREG(status.st_mode) || status.st_size > 0;
+  return SQLITE_OK;
 }
 
 // SQLite's own would look up what the directory's descriptor stands for.
@@ -200,9 +211,10 @@ int fullPath(sqlite3_vfs*, const char* path, int capacity, char* full) {
 const char* registerFileSystem() {
   sqlite3_vfs* const system = ::sqlite3_vfs_find("unix");
   if (system == nullptr || base() == nullptr || system->iVersion < 3) return nullptr;
-  const bool replaced = replaceCall(*system, "open", formerOpen, OpenCall(openFile)) &&
+  sqliteFstat = reinterpret_cast<FstatCall>(system->xGetSystemCall(system, "fstat"));
+  const bool replaced = sqliteFstat != nullptr &&
+                        replaceCall(*system, "open", formerOpen, OpenCall(openFile)) &&
                         replaceCall(*system, "stat", formerStat, StatCall(statFile)) &&
-                        replaceCall(*system, "access", formerAccess, AccessCall(accessFile)) &&
                         replaceCall(*system, "unlink", formerUnlink, UnlinkCall(unlinkFile));
   if (!replaced) return nullptr;
   static sqlite3_vfs ours = *base();

@@ -32,17 +32,14 @@ Status handleFolder(const Directory& directory, std::string_view lockName, Waiti
                     std::uint64_t& count) {
   const auto names = directory.list();
   if (!names) return names.error();
-  std::optional<FileLock> lock;
+  std::optional<Result<FileLock>> lock;
   Status status = Done{};
   for (const std::string& name : *names) {
     if (!isWaiting(name) || (action == WaitingAction::Release && !name.ends_with(kHeldSuffix))) {
       continue;
     }
-    if (!lock) {
-      auto acquired = FileLock::acquire(directory, lockName);
-      if (!acquired) return acquired.error();
-      lock.emplace(*std::move(acquired));
-    }
+    if (!lock) lock = FileLock::acquire(directory, lockName);
+    if (!*lock) return lock->error();
     const auto handled = handle(directory, name, action);
     if (!handled) continue;
     if (*handled) {
