@@ -11,14 +11,6 @@
 namespace tally::tools {
 namespace {
 
-// Keys by name, so that what belongs together stands together.
-std::vector<const KvDictionary::Entry*> sorted(const KvDictionary& dictionary) {
-  std::vector<const KvDictionary::Entry*> entries;
-  for (const auto& entry : dictionary) entries.push_back(&entry);
-  std::ranges::sort(entries, naturalLess, [](const auto* entry) { return entry->key->view(); });
-  return entries;
-}
-
 std::string numberText(const KvObject* value) {
   const auto* number = kvCast<KvNumber>(value);
   if (number == nullptr) return valueText(value);
@@ -55,7 +47,7 @@ void printHeader(const ToolContext& context, const DailyLog& log, const KvDictio
 void printScalars(const ToolContext& context, const DailyLog& log) {
   printHeading(context, "Scalars, " + counted(log.scalars().size(), "key"));
   Table table({{"key", Align::Left, true}, {"value", Align::Right}});
-  for (const auto* entry : sorted(log.scalars())) {
+  for (const auto* entry : entriesByName(log.scalars())) {
     table.add({std::string(entry->key->view()), numberText(entry->value.get())});
   }
   if (!table.empty()) table.print(context);
@@ -69,7 +61,7 @@ void printDistributions(const ToolContext& context, const DailyLog& log) {
                {"mean", Align::Right},
                {"std dev", Align::Right},
                {"max", Align::Right}});
-  for (const auto* entry : sorted(log.distributions())) {
+  for (const auto* entry : entriesByName(log.distributions())) {
     const std::string key(entry->key->view());
     if (const auto statistics = statisticsOf(entry->value.get())) {
       table.add({key, integerText(statistics->count), realText(statistics->minimum),
@@ -155,7 +147,7 @@ void printDailyLog(const ToolContext& context, const DailyLog& log, const KvDict
   printScalars(context, log);
   printDistributions(context, log);
   printHeading(context, "Histograms, " + counted(log.histograms().size(), "key"));
-  for (const auto* entry : sorted(log.histograms())) {
+  for (const auto* entry : entriesByName(log.histograms())) {
     const auto* histogram = kvCast<KvDictionary>(entry->value.get());
     printLine(context, "  " + std::string(entry->key->view()));
     if (histogram != nullptr) {

@@ -10,6 +10,7 @@
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "kv/base64.h"
+#include "tools/natural_order.h"
 
 namespace tally::tools {
 namespace {
@@ -116,6 +117,13 @@ std::string counted(std::uint64_t count, std::string_view noun) {
   const std::string_view ending = endsInY ? "ies" : "s";
   return fmt::format("{} {}{}", grouped(std::to_string(count)), count == 1 ? noun : stem,
                      count == 1 ? "" : ending);
+}
+
+std::vector<const KvDictionary::Entry*> entriesByName(const KvDictionary& dictionary) {
+  std::vector<const KvDictionary::Entry*> entries;
+  for (const auto& entry : dictionary) entries.push_back(&entry);
+  std::ranges::sort(entries, naturalLess, [](const auto* entry) { return entry->key->view(); });
+  return entries;
 }
 
 std::string_view typeName(KvType type) {

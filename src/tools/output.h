@@ -5,6 +5,7 @@
 #include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "kv/value.h"
 #include "tools/tool.h"
@@ -34,6 +35,8 @@ std::string realText(double value);
 std::string byteText(std::uint64_t bytes);
 // "1 key", "2 keys", "2 entries".
 std::string counted(std::uint64_t count, std::string_view noun);
+// The entries by name, so that what belongs together stands together; as long as the dictionary.
+std::vector<const KvDictionary::Entry*> entriesByName(const KvDictionary& dictionary);
 // "string", "number", "dictionary".
 std::string_view typeName(KvType type);
 // "day 20513 (2026-03-01)".

@@ -1,6 +1,7 @@
 #include "tools/prefs_commands.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cmath>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -14,6 +15,7 @@
 #include "platform/platform.h"
 #include "report/report.h"
 #include "tools/log_view.h"
+#include "tools/natural_order.h"
 #include "tools/table.h"
 
 namespace tally::tools {
@@ -35,6 +37,9 @@ PropertyListPreferences openPreferences(const ToolContext& context, Access acces
 bool isDomainName(const std::string& name) {
   return isSafeFileName(name) && !isTemporaryName(name);
 }
+
+// A name for a line of text: the empty key is a key, too.
+std::string keyText(const std::string& key) { return key.empty() ? "\"\"" : key; }
 
 int refuseDomain(const ToolContext& context, const std::string& name) {
   return complain(context, "not a name that a domain can have: " + name, kBadUsage);
@@ -95,7 +100,8 @@ int get(const ToolContext& context, const PrefsArguments& arguments) {
     return value ? kSuccess : kWrong;
   }
   if (!value) {
-    return complain(context, fmt::format("{} has no {}", arguments.domain, arguments.key), kWrong);
+    return complain(context, fmt::format("{} has no {}", arguments.domain, keyText(arguments.key)),
+                    kWrong);
   }
   const bool isContainer = value->type() == KvType::Array || value->type() == KvType::Dictionary;
   if (isContainer) {
@@ -129,10 +135,10 @@ int write(const ToolContext& context, const PrefsArguments& arguments, KvRef<KvO
         context,
         {{"domain", arguments.domain}, {"key", arguments.key}, {"value", jsonOf(value.get())}});
   } else if (value) {
-    printLine(context, fmt::format("{} {} = {} ({})", arguments.domain, arguments.key,
+    printLine(context, fmt::format("{} {} = {} ({})", arguments.domain, keyText(arguments.key),
                                    valueText(value.get()), typeName(*value)));
   } else {
-    printLine(context, fmt::format("{} {} deleted", arguments.domain, arguments.key));
+    printLine(context, fmt::format("{} {} deleted", arguments.domain, keyText(arguments.key)));
   }
   return kSuccess;
 }
@@ -145,7 +151,7 @@ int set(const ToolContext& context, const PrefsArguments& arguments) {
     return complain(context,
                     fmt::format("{} cannot be stored as given: a property list has no control "
                                 "characters, only valid UTF-8",
-                                arguments.key),
+                                keyText(arguments.key)),
                     kBadUsage);
   }
   return write(context, arguments, *value);
@@ -155,16 +161,18 @@ int remove(const ToolContext& context, const PrefsArguments& arguments) {
   if (!isDomainName(arguments.domain)) return refuseDomain(context, arguments.domain);
   auto preferences = openPreferences(context, Access::ReadOnly);
   if (!preferences.SMAPreferencesGetValue(arguments.key, arguments.domain)) {
-    return complain(context, fmt::format("{} has no {}", arguments.domain, arguments.key), kWrong);
+    return complain(context, fmt::format("{} has no {}", arguments.domain, keyText(arguments.key)),
+                    kWrong);
   }
   return write(context, arguments, nullptr);
 }
 
 int listDomains(const ToolContext& context, PropertyListPreferences& preferences) {
-  const auto domains = preferences.listDomains();
+  auto domains = preferences.listDomains();
   if (!domains) return complain(context, domains.error().message, kWrong);
   Table table({{"domain", Align::Left, true}, {"keys", Align::Right}});
   Json document = Json::array();
+  std::ranges::sort(*domains, naturalLess);
   for (const std::string& domain : *domains) {
     const auto keys = preferences.copyDomain(domain)->size();
     table.add({domain, integerText(static_cast<std::int64_t>(keys))});
@@ -186,14 +194,18 @@ int list(const ToolContext& context, const PrefsArguments& arguments) {
   if (!isDomainName(arguments.listedDomain)) return refuseDomain(context, arguments.listedDomain);
   const auto all = preferences.copyDomain(arguments.listedDomain);
   if (context.json) {
-    printJson(context, jsonOf(all.get()));
+    Json document = Json::object();
+    for (const auto* entry : entriesByName(*all)) {
+      addMember(document, std::string(entry->key->view()), jsonOf(entry->value.get()));
+    }
+    printJson(context, document);
   } else if (all->empty()) {
     return complain(context, "no preferences are set in " + arguments.listedDomain, kWrong);
   } else {
     Table table({{"key", Align::Left, true}, {"type"}, {"value", Align::Left, true}});
-    for (const auto& entry : *all) {
-      table.add({std::string(entry.key->view()), std::string(typeName(*entry.value)),
-                 valueText(entry.value.get())});
+    for (const auto* entry : entriesByName(*all)) {
+      table.add({keyText(std::string(entry->key->view())), std::string(typeName(*entry->value)),
+                 valueText(entry->value.get())});
     }
     table.print(context);
   }

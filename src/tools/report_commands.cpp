@@ -156,8 +156,13 @@ int showText(const ToolContext& context, const std::string& title, std::string_v
   return kSuccess;
 }
 
+// What begins like a property list is one that is damaged, however well it reads.
 bool isText(std::string_view body) {
-  return isValidUtf8(body) && body.find('\0') == std::string_view::npos;
+  constexpr std::size_t kHead = 1024;
+  const bool beginsList =
+      body.starts_with("bplist") ||
+      (body.starts_with('<') && body.substr(0, kHead).find("<plist") != body.npos);
+  return !beginsList && isValidUtf8(body) && body.find('\0') == body.npos;
 }
 
 // Structured-data logs are property lists too; they are shown as what they hold.

@@ -122,7 +122,10 @@ int import(const ToolContext& context, const StoreArguments& arguments) {
   std::FILE* file = stdin;
   if (arguments.file != "-") {
     owned.reset(std::fopen(arguments.file.c_str(), "rbe"));
-    if (!owned) return complain(context, "cannot open " + arguments.file, kWrong);
+    if (!owned) {
+      const char* const reason = std::strerror(errno);
+      return complain(context, fmt::format("cannot open {}: {}", arguments.file, reason), kWrong);
+    }
     file = owned.get();
   }
   const std::uint64_t bytes = owned ? fileSize(arguments.file).value_or(0) : 0;

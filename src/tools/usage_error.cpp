@@ -31,7 +31,7 @@ Path follow(const CLI::App& app, std::span<const char* const> arguments) {
   for (std::size_t i = 1; i < arguments.size(); ++i) {
     const std::string_view word = arguments[i];
     if (word == "--") break;
-    if (word == "--root") ++i;
+    if (word == "--root" || word == "--root=") ++i;
     if (word.starts_with('-')) continue;
     const CLI::App* const next = findCommand(*path.command, word);
     if (next == nullptr) {
@@ -66,7 +66,15 @@ std::string usageFault(const CLI::App& app, std::span<const char* const> argumen
   const CommandHelp help = describe(*path.command);
   std::string fault = error.what();
   const auto names = namesOf(help);
-  if (!names.empty() && dynamic_cast<const CLI::RequiredError*>(&error) != nullptr) {
+  const auto rest = app.remaining(true);
+  const bool unknownOption = !rest.empty() && rest.front().starts_with('-');
+  if (dynamic_cast<const CLI::ArgumentMismatch*>(&error) != nullptr) {
+    const std::string name = fault.substr(0, fault.find(':'));
+    const bool isMissing = fault.ends_with("missing");
+    fault = name + (isMissing ? " needs a value" : " is given more than once");
+  } else if (path.stop.empty() && unknownOption) {
+    fault = unexpected(help, rest.front());
+  } else if (!names.empty() && dynamic_cast<const CLI::RequiredError*>(&error) != nullptr) {
     const auto near = nearestWords(path.stop, names, kSuggested);
     fault = path.stop.empty() ? fmt::format("{} needs a command: ", help.path)
                               : fmt::format("{} has no command \"{}\"", help.path, path.stop);
@@ -78,7 +86,6 @@ std::string usageFault(const CLI::App& app, std::span<const char* const> argumen
       fault += suggestion(near);
     }
   } else if (dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr) {
-    const auto rest = app.remaining(true);
     if (!rest.empty()) fault = unexpected(help, rest.front());
   }
   return fmt::format("{} (see {} --help)", fault, help.path);

@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <utility>
 
 #include "base/file.h"
 #include "kv/plist_codec.h"
@@ -83,17 +84,16 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
   }
   if (!file.digest.empty()) printLine(context, "  digest " + file.digest);
   if (!findings.empty()) print(context.out, "\n");
+  Table table({{""}, {"", Align::Left, true}});
   for (const Finding& finding : findings) {
-    const bool fault = finding.severity == Severity::Fault;
-    print(context.out, inked(context.output, fault ? Ink::Bad : Ink::Doubtful,
-                             fault ? "fault     " : "surprise  "));
-    const std::string place = placeText(finding);
-    if (!place.empty()) {
-      printLine(context, place);
-      print(context.out, "          ");
+    Cell severity = finding.severity == Severity::Fault ? Cell("fault", Ink::Bad)
+                                                        : Cell("surprise", Ink::Doubtful);
+    if (const std::string place = placeText(finding); !place.empty()) {
+      table.add({std::exchange(severity, ""), place});
     }
-    printLine(context, finding.message);
+    table.add({severity, finding.message});
   }
+  print(context.out, table.render(context.output, 0));
   const auto faults = countOf(findings, Severity::Fault);
   const auto surprises = countOf(findings, Severity::Surprise);
   print(context.out, "\n");

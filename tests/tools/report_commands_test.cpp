@@ -215,6 +215,7 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   putPlist("other", "<dict/>");
   put("text", "worn: no\n");
   put("bytes", "\xff\x01");
+  put("half", body(1).substr(0, 500));
   const struct {
     const char* file;
     int status;
@@ -222,7 +223,8 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   } files[] = {{"records", kSuccess, "172"},
                {"other", kWrong, "is a property list, but not a daily log"},
                {"text", kSuccess, "worn: no\n"},
-               {"bytes", kWrong, "is damaged"}};
+               {"bytes", kWrong, "is damaged"},
+               {"half", kWrong, "is damaged"}};
   for (const auto& c : files) {
     const Outcome outcome = run({"report", "show", at(c.file)});
     EXPECT_EQ(outcome.status, c.status) << c.file;
