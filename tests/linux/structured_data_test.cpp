@@ -6,6 +6,7 @@
 #include "kv/plist_codec.h"
 #include "linux/temporary_root.h"
 #include "platform/linux/crash_reporting.h"
+#include "platform/linux/linux_platform.h"
 
 namespace tally {
 namespace {
@@ -136,18 +137,30 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
 }
 
 TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
-  const auto preferences = std::make_shared<fakes::FakePreferences>();
-  const auto service = [&] {
-    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
-    return LinuxCrashReporting(
-        root, log, std::make_shared<fakes::FakeClock>(), preferences,
-        std::make_shared<SubmissionConsent>(root, log, preferences, description));
+  const char* const kFile = "var/mobile/Library/Preferences/vellum.tallyd.plist";
+  const std::string waiting = "var/mobile/Library/Logs/Submission/0000000001-a.log";
+  const auto enabled = [&] {
+    const Platform device = makeLinuxPlatform(root, {log, false});
+    device.crashReporting->FDDumpAllOldStructuredDataLogs();
+    return device.crashReporting->isDiagnosticSubmissionEnabled();
   };
-  const auto enabled = [&] { return service().isDiagnosticSubmissionEnabled(); };
+  const auto putSwitch = [&](const std::string& file, const std::string& value) {
+    putPlist(file, "<dict><key>DiagnosticSubmissionEnabled</key>" + value + "</dict>");
+  };
+  put(waiting, "x");
   EXPECT_TRUE(enabled());
-  preferences->put("DiagnosticSubmissionEnabled", KvBoolean::of(false), "vellum.tallyd");
+  // What may be a refusal lets nothing out, and deletes nothing.
+  putSwitch(kFile, "<string>no</string>");
   EXPECT_FALSE(enabled());
-  putPlist("device/device.plist", "<dict><key>DiagnosticSubmissionEnabled</key><true/></dict>");
+  std::filesystem::remove(at(kFile));
+  std::filesystem::create_symlink("vellum.tallyd.plist", at(kFile));  // to itself
+  EXPECT_FALSE(enabled());
+  EXPECT_TRUE(exists(waiting));
+  std::filesystem::remove(at(kFile));
+  putSwitch(kFile, "<false/>");
+  EXPECT_FALSE(enabled());
+  EXPECT_FALSE(exists(waiting));
+  putSwitch("device/device.plist", "<true/>");
   EXPECT_TRUE(enabled());
 }
 

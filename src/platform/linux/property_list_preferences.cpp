@@ -64,6 +64,14 @@ KvRef<KvDictionary> PropertyListPreferences::copyDomain(std::string_view domain)
   return all;
 }
 
+bool PropertyListPreferences::isReadable(std::string_view domain) {
+  const std::lock_guard lock(mutex_);
+  Domain* const state = find(domain);
+  if (state == nullptr) return false;
+  refresh(*state, domain);
+  return state->read;
+}
+
 Result<std::vector<std::string>> PropertyListPreferences::listDomains() const {
   auto names = folder_.list();
   if (!names) return names;

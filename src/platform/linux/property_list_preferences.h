@@ -40,6 +40,8 @@ class PropertyListPreferences final : public Preferences {
 
   // All keys of a domain as they read now; empty when there are none.
   KvRef<KvDictionary> copyDomain(std::string_view domain);
+  // False while a domain's file is there and was never read, so that an absent key says nothing.
+  bool isReadable(std::string_view domain);
   // The domains that have a file, sorted.
   Result<std::vector<std::string>> listDomains() const;
 

@@ -20,28 +20,37 @@ bool holds(Preferences& preferences) {
 
 }  // namespace
 
-bool SubmissionConsent::given() const {
+SubmissionConsent::Wish SubmissionConsent::wish() const {
   if (const auto* described =
           description_->getAs<KvBoolean>(Described::DiagnosticSubmissionEnabled)) {
-    return described->value();
+    return described->value() ? Wish::Allowed : Wish::Forbidden;
   }
-  bool exists = false;
-  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &exists);
-  return enabled || !exists;
+  bool isSwitch = false;
+  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &isSwitch);
+  if (isSwitch) return enabled ? Wish::Allowed : Wish::Forbidden;
+  const bool isAbsent = !preferences_->SMAPreferencesGetValue(kSwitch, kSwitchDomain) &&
+                        (!isReadable_ || isReadable_(kSwitchDomain));
+  return isAbsent ? Wish::Allowed : Wish::Unknown;
 }
 
 bool SubmissionConsent::permits(std::string_view what) {
-  if (given()) return true;
+  const Wish wish = this->wish();
+  if (wish == Wish::Allowed) return true;
   const std::lock_guard lock(mutex_);
   if (refused_.emplace(what).second) {
     log_->write(LogLevel::Info,
-                fmt::format("{}: not kept, the user does not allow submission", what));
+                fmt::format("{}: not kept, {}", what,
+                            wish == Wish::Forbidden
+                                ? "the user does not allow submission"
+                                : "it is not known whether the user allows submission"));
   }
   return false;
 }
 
 void SubmissionConsent::enforce() {
-  const bool allowed = given();
+  const Wish wish = this->wish();
+  if (wish == Wish::Unknown) return;
+  const bool allowed = wish == Wish::Allowed;
   const WaitingAction action = allowed                ? WaitingAction::Release
                                : holds(*preferences_) ? WaitingAction::Hold
                                                       : WaitingAction::Erase;
