@@ -1,9 +1,11 @@
 #include "tools/log_diff.h"
 
 #include <algorithm>
+#include <cmath>
 #include <nlohmann/json.hpp>
 #include <optional>
 
+#include "base/number_text.h"
 #include "tools/log_view.h"
 #include "tools/natural_order.h"
 #include "tools/table.h"
@@ -34,6 +36,14 @@ std::optional<std::int64_t> deltaOf(const Difference& difference) {
     return std::nullopt;
   }
   return delta;
+}
+
+// Of a bucket, from its label: "(-90, -80]".
+double lowerBoundOf(const Difference& bucket) {
+  const std::string_view label = bucket.key;
+  const std::size_t begin = std::min<std::size_t>(1, label.size());
+  const double bound = parseDouble(label.substr(begin, label.find(',') - begin)).value_or(0);
+  return std::isnan(bound) ? 0 : bound;
 }
 
 Cell signOf(const Difference& difference) {
@@ -138,8 +148,9 @@ void printHistogramDiff(const ToolContext& context, const DailyLog& before, cons
                  {"before", Align::Right},
                  {"after", Align::Right},
                  {"delta", Align::Right}});
-    for (const Difference& bucket :
-         differences(histogram(difference.before), histogram(difference.after))) {
+    auto buckets = differences(histogram(difference.before), histogram(difference.after));
+    std::ranges::stable_sort(buckets, {}, lowerBoundOf);
+    for (const Difference& bucket : buckets) {
       const auto delta = deltaOf(bucket);
       table.add({bucket.key, scalarText(bucket.before), scalarText(bucket.after),
                  delta ? signedText(*delta) : ""});
