@@ -80,6 +80,11 @@ TEST_F(SpoolTest, TheOldestGoWhenABoundIsReached) {
   std::uint64_t bytes = 0;
   for (const std::string& name : names("spool")) bytes += *fileSize(at("spool/" + name));
   EXPECT_LE(bytes, 3500u);
+
+  std::filesystem::create_directories(at("spool/0000000000-in-the-way.log"));
+  bound("SpoolMaximumLogs", 1);
+  ASSERT_TRUE(submit("g"));
+  EXPECT_EQ(names("spool").size(), 3u) << "what cannot be removed keeps older logs";
 }
 
 TEST_F(SpoolTest, RefusalsLeaveNothingBehindAndCostNoLog) {

@@ -87,16 +87,21 @@ Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uin
   if (!logs) return logs.error();
   std::uint64_t count = logs->size(), bytes = 0;
   for (const SequencedLog& log : *logs) bytes += log.bytes;
+  Status status = Done{};
   for (const SequencedLog& log : *logs) {
     if (count <= bounds.maximumLogs && bytes <= bounds.maximumBytes) break;
     if (log.sequence >= kept) break;  // a newer one makes its own room when it is done
     for (auto name = log.names.rbegin(); name != log.names.rend(); ++name) {
-      if (auto removed = folder.remove(*name); !removed) return removed;
+      if (auto removed = folder.remove(*name); !removed) {
+        status = removed;
+        break;
+      }
     }
+    // What cannot be removed, a folder in its place, must not keep the others.
     --count;
     bytes -= log.bytes;
   }
-  return Done{};
+  return status;
 }
 
 Status checkReserve(const Directory& folder, std::uint64_t bytes) {

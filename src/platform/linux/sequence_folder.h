@@ -42,7 +42,8 @@ Result<std::vector<SequencedLog>> listForWriting(const Directory& folder, System
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
 
 // Removes the oldest logs until the folder is within its bounds, but neither the log `kept` nor a
-// newer one. A log's files go last name first.
+// newer one. A log's files go last name first. One that cannot be removed is passed over, with an
+// error in the end.
 Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uint64_t kept);
 
 // An error when writing this many more bytes would use what is reserved of the volume.
