@@ -59,6 +59,10 @@ TEST_F(EventSpoolTest, OneObjectALineAndTornLinesAreCut) {
   EXPECT_EQ(get(folder + "/0000000007-other.txt"), "not ours");
   EXPECT_EQ(get(folder + "/0000000008-events.jsonl"), line);
   EXPECT_TRUE(errors().empty());
+  std::filesystem::create_directories(at(folder + "/0000000009-events.jsonl"));
+  EXPECT_TRUE(send("a", "1"));
+  EXPECT_EQ(get(folder + "/0000000010-events.jsonl"), line);
+  EXPECT_EQ(errors().size(), 1u);
 }
 
 TEST_F(EventSpoolTest, TheDescriptionSaysWhatIsWanted) {

@@ -85,6 +85,10 @@ TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {
   ASSERT_EQ(failures.size(), 1u);
   EXPECT_NE(failures[0].find("1 damaged"), std::string::npos) << failures[0];
   EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 1}));
+  std::filesystem::create_directories(at("data/0000000007-172.pending"));
+  ASSERT_TRUE(append(172, 3));
+  EXPECT_EQ(finish().size(), 1u);
+  EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 1, 3}));
 }
 
 TEST_F(StructuredDataTest, ALogThatWasWrittenOutBeforeAKillIsNotWrittenOutAgain) {

@@ -21,6 +21,10 @@ std::size_t wholeLines(std::string_view bytes) {
   return last == std::string_view::npos ? 0 : last + 1;
 }
 
+void report(SystemLog& log, std::string_view event, const Error& error) {
+  log.fault(faultKind("analytics events", error), "analytics event {}: {}", event, error.message);
+}
+
 }  // namespace
 
 std::string eventLine(std::string_view event, double secondsSince1970,
@@ -55,13 +59,18 @@ Status EventSpool::append(std::string_view event, const KvDictionary& payload,
   };
   std::uint64_t sequence = files->empty() ? 0 : files->back().sequence;
   std::size_t end = 0;
-  const bool takesMore = !files->empty() && files->back().bytes + line.size() <= largest &&
-                         files->back().names == std::vector{fileName(sequence)};
+  bool takesMore = !files->empty() && files->back().bytes + line.size() <= largest &&
+                   files->back().names == std::vector{fileName(sequence)};
   if (takesMore) {
     const auto present = folder->readFile(fileName(sequence), kLargestFile);
-    if (!present) return present.error();
-    end = wholeLines(*present);
-  } else {
+    takesMore = static_cast<bool>(present);
+    if (present) {
+      end = wholeLines(*present);
+    } else {
+      report(log_, event, present.error());  // the event goes to a file after it
+    }
+  }
+  if (!takesMore) {
     const auto next = nextSequence(*files);
     if (!next) return next.error();
     sequence = *next;
@@ -115,10 +124,7 @@ bool LinuxAnalyticsEvents::PulseSendEventLazy(std::string_view eventName,
   const auto payload = builder();
   if (!payload) return false;
   const auto appended = spool_.append(eventName, *payload, folderBounds(*preferences_));
-  if (!appended) {
-    log_->fault(faultKind("analytics events", appended.error()), "analytics event {}: {}",
-                eventName, appended.error().message);
-  }
+  if (!appended) report(*log_, eventName, appended.error());
   return static_cast<bool>(appended);
 }
 

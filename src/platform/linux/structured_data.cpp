@@ -117,8 +117,10 @@ Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(const Dir
     const bool finished = log.names.size() > 1;
     if (!finished && log.bytes + bytes <= kLargestPending) {
       const auto records = folder.readFile(name, kLargestPending);
-      if (!records) return records.error();
-      return Pending{name, wholeRecords(*records)};
+      if (records) return Pending{name, wholeRecords(*records)};
+      log_.fault(faultKind("structured data", records.error()), "structured data of type {}: {}",
+                 recordType, records.error().message);
+      continue;  // the record goes to another log
     }
     if (auto done = finish(folder, name, bounds); !done) return done.error();
   }
