@@ -4,6 +4,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <new>
 #include <utility>
 
 #include "kv/export.h"
@@ -71,6 +72,7 @@ class KvItems {
 
  private:
   void grow(std::size_t capacity) {
+    if (capacity > kMostItems || capacity > SIZE_MAX / sizeof(T)) throw std::bad_alloc();
     auto* const moved = static_cast<T*>(kvAllocateItems(capacity * sizeof(T)));
     std::uninitialized_move(begin(), end(), moved);
     std::destroy(begin(), end());

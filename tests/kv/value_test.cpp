@@ -165,6 +165,8 @@ TEST(KvRef, CountsEveryOwner) {
   EXPECT_EQ(array->getAs<KvString>(0)->view(), "shared");
   array->append(nullptr);
   EXPECT_EQ(array->size(), 1u);
+  // Where sizes have 32 bits, room for so many pointers would wrap around to none.
+  EXPECT_THROW(KvArray::create(SIZE_MAX / 4 + 1), std::bad_alloc);
 }
 
 TEST(KvArray, ChangesLikeAPlainListAtEverySize) {
