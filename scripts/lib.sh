@@ -16,19 +16,11 @@ if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
   export CCACHE_DIR="$root_dir/build/ccache"
 fi
 
-# Objects are the same wherever the clone lies, so that every clone is built from the same cache.
-export CCACHE_BASEDIR="$root_dir" CCACHE_NOHASHDIR=1
-
 say() { printf '\n== %s\n' "$*"; }
 fail() {
   printf '%s: %s\n' "$(basename "$0")" "$*" >&2
   exit 1
 }
-
-# What build_with configures with besides the preset. Whoever works on the project sets
-# warnings_are_errors; one who only builds it may have another compiler, with warnings of its own.
-configure_options=()
-warnings_are_errors=-DCMAKE_COMPILE_WARNING_AS_ERROR=ON
 
 # as_root COMMAND...
 as_root() {
@@ -40,12 +32,13 @@ as_root() {
   fi
 }
 
-# build_with PRESET [TARGET ...]: configures the first time, then builds.
+# build_with PRESET [TARGET ...]: configures, then builds. Whoever has a compiler of its own must not
+# fail on its warnings; .ci/run sets TALLYRUN_WARNINGS_ARE_ERRORS.
 build_with() {
   local preset=$1
   shift
   cd "$root_dir"
-  cmake --preset "$preset" -DCMAKE_COLOR_DIAGNOSTICS=OFF "${configure_options[@]}" \
+  cmake --preset "$preset" "-DCMAKE_COMPILE_WARNING_AS_ERROR=${TALLYRUN_WARNINGS_ARE_ERRORS:-OFF}" \
     >"/tmp/tallyrun-configure.$$" 2>&1 ||
     { cat "/tmp/tallyrun-configure.$$" >&2; rm -f "/tmp/tallyrun-configure.$$"; fail "cannot configure"; }
   rm -f "/tmp/tallyrun-configure.$$"
