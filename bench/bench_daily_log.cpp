@@ -10,9 +10,9 @@
 #include <limits>
 #include <string_view>
 
-#include "platform/linux/linux_platform.h"
-#include "platform/linux/store_history.h"
-#include "platform/linux/store_schema.h"
+#include "host/linux_platform.h"
+#include "host/store/store_history.h"
+#include "host/store/store_schema.h"
 #include "process_cost.h"
 #include "report/distribution_summary.h"
 #include "sample_device.h"

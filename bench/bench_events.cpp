@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "storage/analytics_events.h"
-#include "storage/event_payload.h"
+#include "storage/events/event_payload.h"
 #include "storage/nand_info.h"
 #include "storage/statistics.h"
 

@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <filesystem>
 
-#include "platform/linux/store_schema.h"
+#include "host/store/store_schema.h"
 #include "process_cost.h"
 #include "sample_device.h"
 

@@ -13,7 +13,7 @@
 #include <vector>
 
 #include "storage/snapshot.h"
-#include "storage/snapshot_text.h"
+#include "storage/snapshot/snapshot_text.h"
 
 namespace {
 

@@ -15,7 +15,7 @@
 #include "platform/platform.h"
 #include "storage/exporter.h"
 #include "storage/nand_info.h"
-#include "storage/statistic_key_table.h"
+#include "storage/statistics/statistic_key_table.h"
 
 namespace {
 

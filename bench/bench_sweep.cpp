@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "driver/telemetry_sweep.h"
-#include "host_platform.h"
+#include "host/host_platform.h"
 #include "process_cost.h"
 
 namespace {

@@ -9,8 +9,8 @@
 
 #include "base/device_root.h"
 #include "kv/plist_codec.h"
-#include "platform/linux/store_importer.h"
-#include "tools/store_csv.h"
+#include "host/store/store_importer.h"
+#include "tools/store/store_csv.h"
 
 namespace tally::bench {
 namespace {

@@ -10,7 +10,7 @@
 #include "driver/app_info_listener.h"
 #include "fakes/fake_platform.h"
 #include "fuzz_values.h"
-#include "platform/linux/bus_message.h"
+#include "host/bus/bus_message.h"
 
 using namespace tally;
 using fuzz::require;

@@ -5,8 +5,8 @@
 #include <string>
 
 #include "fuzz.h"
-#include "tools/record_reader.h"
-#include "tools/store_csv.h"
+#include "tools/frame/record_reader.h"
+#include "tools/store/store_csv.h"
 
 using namespace tally::tools;
 using tally::fuzz::require;

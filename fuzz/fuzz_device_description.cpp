@@ -2,13 +2,13 @@
 #include <array>
 
 #include "described_folder.h"
-#include "platform/linux/analytics_events.h"
-#include "platform/linux/described_purgeable_space.h"
-#include "platform/linux/described_stackshot.h"
-#include "platform/linux/device_information.h"
-#include "platform/linux/kernel_values.h"
-#include "platform/linux/locale.h"
-#include "platform/linux/log_header_facts.h"
+#include "host/spool/analytics_events.h"
+#include "host/described/described_purgeable_space.h"
+#include "host/described/described_stackshot.h"
+#include "host/system/device_information.h"
+#include "host/system/kernel_values.h"
+#include "host/system/locale.h"
+#include "host/system/log_header_facts.h"
 
 using namespace tally;
 using fuzz::require;

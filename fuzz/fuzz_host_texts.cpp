@@ -7,11 +7,11 @@
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "fuzz.h"
-#include "platform/linux/applications.h"
-#include "platform/linux/device_information.h"
-#include "platform/linux/kernel_values.h"
-#include "platform/linux/locale.h"
-#include "platform/linux/os_release.h"
+#include "host/system/applications.h"
+#include "host/system/device_information.h"
+#include "host/system/kernel_values.h"
+#include "host/system/locale.h"
+#include "host/system/os_release.h"
 
 using namespace tally;
 using fuzz::require;

@@ -1,7 +1,7 @@
 // Interest lists at the statistics hub: parsed, served from drivers of any values, and mapped.
 #include "fuzz_values.h"
-#include "platform/device/hub_region.h"
-#include "platform/device/statistics_hub.h"
+#include "host/described/hub_region.h"
+#include "host/described/statistics_hub.h"
 
 using namespace tally;
 using fuzz::require;

@@ -1,5 +1,5 @@
 // Label formats: what is accepted prints as printf would, and never longer than is promised.
-#include "storage/label_format.h"
+#include "storage/snapshot/label_format.h"
 
 #include <array>
 #include <cstdio>

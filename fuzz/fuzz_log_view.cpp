@@ -5,8 +5,8 @@
 
 #include "base/utf8.h"
 #include "fuzz_values.h"
-#include "tools/log_diff.h"
-#include "tools/log_view.h"
+#include "tools/report/log_diff.h"
+#include "tools/report/log_view.h"
 
 // The tool's own is in the file of its command line, which takes longer to build than all the rest.
 void tally::tools::print(std::FILE* file, std::string_view text) {

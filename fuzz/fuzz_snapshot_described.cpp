@@ -1,7 +1,7 @@
 // Snapshots whose layout a description block gives: any block, at any capacity, from any record on.
 #include "fuzz.h"
 #include "storage/snapshot.h"
-#include "storage/snapshot_description.h"
+#include "storage/snapshot/snapshot_description.h"
 
 using namespace tally;
 using fuzz::require;

@@ -1,5 +1,5 @@
 // The validity list and the defects list: the same bytes as either.
-#include "storage/storage_lists.h"
+#include "storage/lists/storage_lists.h"
 
 #include "fuzz.h"
 

@@ -1,7 +1,7 @@
 // The telemetry list, with the characteristics that say how it is laid out.
 #include "fakes/fake_storage.h"
 #include "fuzz_values.h"
-#include "storage/telemetry_list.h"
+#include "storage/lists/telemetry_list.h"
 #include "storage/vendor_counters.h"
 
 using namespace tally;

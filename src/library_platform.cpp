@@ -8,7 +8,7 @@
 
 #include <fmt/format.h>
 
-#include "platform/device/device_platform.h"
+#include "host/described/device_platform.h"
 #include "platform/platform.h"
 
 namespace tally {

@@ -7,10 +7,10 @@
 #include <iostream>
 #include <string>
 
-#include "platform/linux/described_entries.h"
-#include "tools/command_help.h"
-#include "tools/output.h"
-#include "tools/tool.h"
+#include "host/described/described_entries.h"
+#include "tools/frame/command_help.h"
+#include "tools/frame/output.h"
+#include "tools/frame/tool.h"
 
 namespace {
 

@@ -2,7 +2,7 @@
 // It is made when it is first asked for.
 #include <string>
 
-#include "host_platform.h"
+#include "host/host_platform.h"
 #include "storage/device_root.h"
 
 namespace tally {

@@ -2,11 +2,11 @@
 #include <span>
 
 #include "base/process.h"
-#include "host_platform.h"
-#include "platform/linux/linux_platform.h"
-#include "platform/linux/standard_streams.h"
-#include "tools/tool.h"
-#include "tools/tool_log.h"
+#include "host/host_platform.h"
+#include "host/linux_platform.h"
+#include "host/system/standard_streams.h"
+#include "tools/frame/tool.h"
+#include "tools/frame/tool_log.h"
 
 int main(int count, char** arguments) {
   using namespace tally;

@@ -4,7 +4,7 @@
 #include <cstring>
 #include <random>
 
-#include "hwreport/raw_element.h"
+#include "hwreport/channels/raw_element.h"
 
 namespace tally::bench {
 namespace {

@@ -14,7 +14,7 @@ import re
 import struct
 import sys
 
-TABLE = pathlib.Path(__file__).resolve().parents[2] / "src/storage/statistic_key_table.h"
+TABLE = pathlib.Path(__file__).resolve().parents[2] / "src/storage/statistics/statistic_key_table.h"
 SECONDS_PER_DAY = 86400
 
 # What a storage of 32 GB shows after a year or so of use. What is not here is made up by its kind.

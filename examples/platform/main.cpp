@@ -6,8 +6,8 @@
 #include "driver/daily_job.h"
 #include "driver/tasking.h"
 #include "driver/telemetry_sweep.h"
-#include "host_platform.h"
-#include "platform/linux/linux_platform.h"
+#include "host/host_platform.h"
+#include "host/linux_platform.h"
 #include "platform/platform.h"
 
 namespace {

@@ -117,7 +117,7 @@ class Documents(unittest.TestCase):
         self.assertEqual(device.preferences()["LastOSVersion"], "Trailhead 4.2 (R1180)")
 
     def test_the_device_description_is_documented_as_it_is_read(self):
-        header = (TOP / "src/platform/linux/described_entries.h").read_text()
+        header = (TOP / "src/host/described/described_entries.h").read_text()
         entry = re.compile(r'\{"(\w+)",\s*KvType::(\w+),\s*((?:"[^"]*"\s*)+)')
         read = [(name, kind.lower().replace("number", "integer"), "".join(re.findall('"([^"]*)"', answers)))
                 for name, kind, answers in entry.findall(header.split("kDescribedEntries[]")[1])]

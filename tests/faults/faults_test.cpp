@@ -21,9 +21,9 @@
 #include "base/directory.h"
 #include "base/file.h"
 #include "faults/sample_device.h"
-#include "platform/linux/sequence_folder.h"
-#include "platform/linux/sqlite_database.h"
-#include "platform/linux/structured_data.h"
+#include "host/spool/sequence_folder.h"
+#include "host/store/sqlite_database.h"
+#include "host/spool/structured_data.h"
 
 namespace tally::faults {
 

@@ -20,10 +20,10 @@
 #include "driver/tasking.h"
 #include "driver/telemetry_sweep.h"
 #include "fakes/fake_platform.h"
-#include "host_platform.h"
+#include "host/host_platform.h"
 #include "kv/plist_codec.h"
-#include "platform/linux/store_schema.h"
-#include "platform/linux/store_writer.h"
+#include "host/store/store_schema.h"
+#include "host/store/store_writer.h"
 
 namespace tally::faults {
 namespace {

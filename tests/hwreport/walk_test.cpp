@@ -1,7 +1,7 @@
 // The walk over collections: order, results, what malformed ones come to.
 #include <gmock/gmock.h>
 
-#include "hwreport/channel_walk.h"
+#include "hwreport/channels/channel_walk.h"
 #include "hwreport/channel_world.h"
 
 namespace tally {

@@ -7,7 +7,7 @@
 
 #include "fakes/fake_storage.h"
 #include "storage/auxiliary_metrics.h"
-#include "storage/event_payload.h"
+#include "storage/events/event_payload.h"
 #include "storage/nand_info.h"
 
 namespace tally {

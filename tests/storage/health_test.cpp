@@ -1,7 +1,7 @@
 // The health summary and its extracts, of every kind of NAND info dictionary.
 #include <gtest/gtest.h>
 
-#include "storage/health.h"
+#include "storage/auxiliary/health.h"
 
 namespace tally {
 namespace {

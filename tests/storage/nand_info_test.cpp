@@ -6,7 +6,7 @@
 #include "fakes/kcdata.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
-#include "storage/statistic_key_table.h"
+#include "storage/statistics/statistic_key_table.h"
 
 namespace tally {
 namespace {

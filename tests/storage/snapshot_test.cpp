@@ -10,8 +10,8 @@
 #include <string>
 
 #include "fakes/statistics_buffer.h"
-#include "storage/label_format.h"
-#include "storage/snapshot_text.h"
+#include "storage/snapshot/label_format.h"
+#include "storage/snapshot/snapshot_text.h"
 
 namespace tally {
 namespace {

@@ -8,8 +8,8 @@
 #include <limits>
 
 #include "fakes/fake_storage.h"
-#include "storage/storage_lists.h"
-#include "storage/write_amplification.h"
+#include "storage/lists/storage_lists.h"
+#include "storage/lists/write_amplification.h"
 
 namespace tally {
 namespace {

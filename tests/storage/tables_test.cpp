@@ -7,10 +7,10 @@
 #include <set>
 #include <string>
 
-#include "storage/counter_names.h"
-#include "storage/key_map.h"
-#include "storage/statistic_key_table.h"
-#include "storage/statistic_keys.h"
+#include "storage/statistics/counter_names.h"
+#include "storage/statistics/key_map.h"
+#include "storage/statistics/statistic_key_table.h"
+#include "storage/statistics/statistic_keys.h"
 #include "storage/statistics.h"
 
 namespace tally {

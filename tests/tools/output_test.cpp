@@ -1,14 +1,14 @@
 // Tables, bars and numbers for people.
-#include "tools/output.h"
+#include "tools/frame/output.h"
 
 #include <gtest/gtest.h>
 
 #include <limits>
 
 #include "base/printable.h"
-#include "tools/day_argument.h"
-#include "tools/natural_order.h"
-#include "tools/table.h"
+#include "tools/frame/day_argument.h"
+#include "tools/frame/natural_order.h"
+#include "tools/frame/table.h"
 
 namespace tally::tools {
 namespace {

@@ -9,10 +9,10 @@
 #include <string>
 #include <vector>
 
-#include "host_platform.h"
-#include "linux/temporary_root.h"
-#include "tools/tool.h"
-#include "tools/tool_log.h"
+#include "host/host_platform.h"
+#include "host/temporary_root.h"
+#include "tools/frame/tool.h"
+#include "tools/frame/tool_log.h"
 
 namespace tally::tools {
 

@@ -1,0 +1,16 @@
+// A driver's user client whose answers come from its description.
+#pragma once
+
+#include <memory>
+
+#include "host/described/described_files.h"
+#include "host/described/registry_source.h"
+
+namespace tally {
+
+// description is the entry's "UserClient"; it and the files outlive nothing: both are shared.
+std::unique_ptr<UserClient> openDescribedDriver(KvRef<KvDictionary> description,
+                                                std::shared_ptr<DescribedFiles> files,
+                                                RegistryResult* result);
+
+}  // namespace tally

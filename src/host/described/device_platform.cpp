@@ -1,0 +1,15 @@
+#include "host/described/device_platform.h"
+
+#include "host/described/registry_description.h"
+#include "host/described/source_registry.h"
+
+namespace tally {
+
+void addDeviceRegistry(Platform& services, const DeviceRoot& root) {
+  std::vector<std::unique_ptr<RegistrySource>> sources;
+  sources.push_back(
+      std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log));
+  services.deviceRegistry = std::make_shared<SourceRegistry>(std::move(sources));
+}
+
+}  // namespace tally

@@ -1,0 +1,190 @@
+#include "host/described/hub_region.h"
+
+#include <algorithm>
+#include <cstring>
+#include <unordered_map>
+
+#include "base/byte_reader.h"
+#include "host/described/described_frames.h"
+
+namespace tally {
+namespace {
+
+// An interest list: a count, a reserved word, then an entry a channel.
+constexpr std::size_t kInterestHeaderSize = 8;
+constexpr std::size_t kInterestSize = 24;
+constexpr std::uint32_t kMostInterests = 0x555554D;
+
+// Whoever asks for the same large channel again and again gets no more memory than this.
+constexpr std::size_t kMostRegionElements = (256u << 20) / kElementSize;
+
+constexpr ElementValues kMissingElement;
+constexpr std::uint64_t kElementCountMask = std::uint64_t{0xFFFF} << 32;
+
+template <class T>
+void put(std::span<std::byte> memory, std::size_t offset, T value) {
+  std::memcpy(memory.data() + offset, &value, sizeof value);
+}
+
+struct Channel {
+  Interest interest;
+  std::shared_ptr<const ChannelFrames> described;
+};
+
+class ChannelRegion final : public HubRegion {
+ public:
+  explicit ChannelRegion(std::vector<Channel> channels) : channels_(std::move(channels)) {
+    for (const Channel& channel : channels_) elements_ += channel.described->elementCount;
+  }
+  std::size_t size() const override { return elements_ * kElementSize; }
+
+  void writeFrame(std::size_t refresh, std::span<std::byte> memory) override {
+    for (const Channel& channel : channels_) {
+      const auto& frames = channel.described->frames;
+      const auto& frame = frames[std::min(refresh, frames.size() - 1)];
+      for (std::size_t i = 0; i < channel.described->elementCount; ++i) {
+        const ElementValues& element = i < frame.size() ? frame[i] : kMissingElement;
+        writeElement(channel, element, memory.first(kElementSize));
+        memory = memory.subspan(kElementSize);
+      }
+    }
+  }
+
+ private:
+  static void writeElement(const Channel& channel, const ElementValues& element,
+                           std::span<std::byte> memory) {
+    const std::uint64_t type =
+        channel.interest.type != 0 ? channel.interest.type : channel.described->type;
+    const std::uint64_t count = channel.described->elementCount;
+    put(memory, ElementLayout::driver, channel.interest.driver);
+    put(memory, ElementLayout::channel, channel.interest.channel);
+    put(memory, ElementLayout::type, (type & ~kElementCountMask) | count << 32);
+    put(memory, ElementLayout::time, element.time);
+    std::memcpy(memory.data() + ElementLayout::values, element.slots, sizeof element.slots);
+  }
+
+  std::vector<Channel> channels_;
+  std::size_t elements_ = 0;
+};
+
+class RawRegion final : public HubRegion {
+ public:
+  explicit RawRegion(std::vector<std::vector<std::byte>> frames) : frames_(std::move(frames)) {
+    for (const auto& frame : frames_) size_ = std::max(size_, frame.size());
+  }
+  std::size_t size() const override { return size_; }
+  void writeFrame(std::size_t refresh, std::span<std::byte> memory) override {
+    const auto& frame = frames_[std::min(refresh, frames_.size() - 1)];
+    std::fill(std::copy(frame.begin(), frame.end(), memory.begin()), memory.end(), std::byte{0});
+  }
+
+ private:
+  std::vector<std::vector<std::byte>> frames_;
+  std::size_t size_ = 0;
+};
+
+using ChannelsByID = std::unordered_map<std::uint64_t, std::shared_ptr<const ChannelFrames>>;
+
+// The type word that a driver's legend gives a channel, by channel id.
+std::unordered_map<std::uint64_t, std::uint64_t> legendTypes(const RegistryEntry& driver) {
+  std::unordered_map<std::uint64_t, std::uint64_t> types;
+  const auto* groups = driver.properties->getAs<KvArray>("HwReportLegend");
+  if (groups == nullptr) return types;
+  for (const auto& group : *groups) {
+    const auto* dictionary = kvCast<KvDictionary>(group.get());
+    const auto* channels =
+        dictionary != nullptr ? dictionary->getAs<KvArray>("HwReportChannels") : nullptr;
+    if (channels == nullptr) continue;
+    for (const auto& item : *channels) {
+      const auto* line = kvCast<KvArray>(item.get());
+      const auto* id = line != nullptr ? line->getAs<KvNumber>(0) : nullptr;
+      const auto* type = line != nullptr ? line->getAs<KvNumber>(1) : nullptr;
+      if (id != nullptr && type != nullptr) types.try_emplace(id->asUInt64(), type->asUInt64());
+    }
+  }
+  return types;
+}
+
+// Stands for no channel: a region cannot be empty, and a run of no elements in it would fail the
+// samples of those who only wanted a channel that is not served.
+Channel nobodysChannel() {
+  ChannelFrames frames{0, {{kMissingElement}}, 1};
+  return {{kMissingValue, kMissingValue, 0}, std::make_shared<ChannelFrames>(std::move(frames))};
+}
+
+ChannelsByID describedChannels(const RegistryEntry& driver, DescribedFiles& files) {
+  ChannelsByID channels;
+  const auto* values = driver.properties->getAs<KvArray>("HwReportValues");
+  if (values == nullptr) return channels;
+  const auto types = legendTypes(driver);
+  for (const auto& item : *values) {
+    const auto* description = kvCast<KvDictionary>(item.get());
+    const auto id = description != nullptr ? description->getInt64("Channel") : std::nullopt;
+    auto frames = id ? parseChannelFrames(*description) : std::nullopt;
+    if (!frames) {
+      files.report("values of channels skipped",
+                   "driver " + driver.name + ": malformed values of a channel, skipped: " +
+                       (id ? std::to_string(*id) : std::string("no channel")));
+      continue;
+    }
+    const auto key = static_cast<std::uint64_t>(*id);
+    const auto type = types.find(key);
+    if (frames->type == 0 && type != types.end()) frames->type = type->second;
+    channels.try_emplace(key, std::make_shared<const ChannelFrames>(std::move(*frames)));
+  }
+  return channels;
+}
+
+}  // namespace
+
+std::optional<std::vector<Interest>> parseInterestList(std::span<const std::byte> list) {
+  const ByteReader reader(list);
+  const auto count = reader.read<std::uint32_t>(0);
+  const auto reserved = reader.read<std::uint32_t>(4);
+  if (!count || reserved != 0u || *count == 0 || *count > kMostInterests) return std::nullopt;
+  if (list.size() != kInterestHeaderSize + kInterestSize * *count) return std::nullopt;
+  std::vector<Interest> interests(*count);
+  for (std::size_t i = 0; i < interests.size(); ++i) {
+    const std::size_t offset = kInterestHeaderSize + kInterestSize * i;
+    interests[i] = {*reader.read<std::uint64_t>(offset), *reader.read<std::uint64_t>(offset + 8),
+                    *reader.read<std::uint64_t>(offset + 16)};
+  }
+  return interests;
+}
+
+std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& interests,
+                                             const RegistrySource::Entries& drivers,
+                                             DescribedFiles& files) {
+  std::unordered_map<std::uint64_t, const RegistryEntry*> entries;
+  for (const auto& driver : drivers) entries.try_emplace(driver->id, driver.get());
+  std::unordered_map<std::uint64_t, ChannelsByID> described;
+  std::vector<Channel> channels;
+  std::size_t elements = 0;
+  for (const Interest& interest : interests) {
+    const auto entry = entries.find(interest.driver);
+    if (entry == entries.end()) continue;
+    const auto [known, isNew] = described.try_emplace(interest.driver);
+    if (isNew) known->second = describedChannels(*entry->second, files);
+    const auto frames = known->second.find(interest.channel);
+    if (frames == known->second.end()) continue;
+    elements += frames->second->elementCount;
+    if (elements > kMostRegionElements) return nullptr;
+    channels.push_back({interest, frames->second});
+  }
+  if (channels.empty()) channels.push_back(nobodysChannel());
+  return std::make_unique<ChannelRegion>(std::move(channels));
+}
+
+std::unique_ptr<HubRegion> makeRawRegion(const KvArray& frames, DescribedFiles& files) {
+  std::vector<std::vector<std::byte>> regions;
+  for (const auto& frame : frames) {
+    auto bytes = files.bytes(*frame);
+    if (bytes) regions.push_back(std::move(*bytes));
+  }
+  if (std::all_of(regions.begin(), regions.end(), [](const auto& r) { return r.empty(); })) {
+    return nullptr;
+  }
+  return std::make_unique<RawRegion>(std::move(regions));
+}
+
+}  // namespace tally

@@ -1,0 +1,10 @@
+// Which registry entries a matching dictionary means.
+#pragma once
+
+#include "host/described/registry_source.h"
+
+namespace tally {
+
+bool entryMatches(const RegistryEntry& entry, const KvDictionary& matching);
+
+}  // namespace tally

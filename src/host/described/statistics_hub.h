@@ -1,0 +1,20 @@
+// The statistics hub: serves the raw elements of the channels that a client is interested in.
+#pragma once
+
+#include <memory>
+
+#include "host/described/described_files.h"
+#include "host/described/registry_source.h"
+
+namespace tally {
+
+constexpr std::string_view kStatisticsHubClass = "HwReportHub";
+
+// description is the hub entry's "Hub", null when it has none: failures to inject ("OpenStatus",
+// "StartStatus", "ConfigureStatus", "MapStatus", "UpdateStatus") and "RawFrames", regions served
+// verbatim. Otherwise the drivers among the entries give the values, in "HwReportValues".
+std::unique_ptr<UserClient> openStatisticsHub(
+    KvRef<KvDictionary> description, std::shared_ptr<const RegistrySource::Entries> drivers,
+    std::shared_ptr<DescribedFiles> files, RegistryResult* result);
+
+}  // namespace tally

@@ -1,0 +1,13 @@
+#include "host/host_platform.h"
+
+#include "host/described/device_platform.h"
+
+namespace tally {
+
+Platform makeHostPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
+  Platform services = makeLinuxPlatform(root, options);
+  addDeviceRegistry(services, root);
+  return services;
+}
+
+}  // namespace tally

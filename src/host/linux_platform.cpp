@@ -1,0 +1,114 @@
+#include "host/linux_platform.h"
+
+#include <cstdlib>
+
+#include "host/spool/analytics_events.h"
+#include "host/system/applications.h"
+#include "host/bus/bus_endpoint.h"
+#include "host/bus/bus_notifications.h"
+#include "host/system/clock.h"
+#include "host/spool/crash_reporting.h"
+#include "host/described/described_purgeable_space.h"
+#include "host/described/described_stackshot.h"
+#include "host/system/device_information.h"
+#include "host/system/event_loop.h"
+#include "host/system/files.h"
+#include "host/system/kernel_values.h"
+#include "host/system/locale.h"
+#include "host/system/log_header_facts.h"
+#include "host/spool/log_spool.h"
+#include "host/store/metrics_store.h"
+#include "host/preferences/preference_services.h"
+#include "host/preferences/property_list_preferences.h"
+#include "host/system/run_lock.h"
+#include "host/store/store_schema.h"
+#include "host/spool/submission_consent.h"
+#include "host/system/system_log.h"
+
+namespace tally {
+namespace {
+
+std::string variable(const char* name) {
+  const char* const value = std::getenv(name);
+  return value != nullptr ? value : "";
+}
+
+// The data folder of whoever runs the program, who is part of the device only when the device is
+// this machine.
+std::string userDataFolder(const DeviceRoot& root) {
+  if (!root.prefix().empty()) return "";
+  const std::string data = variable("XDG_DATA_HOME");
+  if (data.starts_with('/')) return data;
+  const std::string home = variable("HOME");
+  return home.starts_with('/') ? home + "/.local/share" : "";
+}
+
+std::shared_ptr<SystemLog> systemLogOfEnvironment() {
+  const SystemLogEnvironment environment = systemLogEnvironment();
+  auto log = makeLinuxSystemLog(environment.settings);
+  if (!environment.fault.empty()) {
+    log->fault("environment", "{}; the messages are those of level {}", environment.fault,
+               levelText(environment.settings.lowest));
+  }
+  return log;
+}
+
+}  // namespace
+
+Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
+  const DeviceDirectory described(root, "/device");
+  const auto log = options.log ? options.log : systemLogOfEnvironment();
+  const auto clock = std::make_shared<LinuxClock>();
+  const auto description = std::make_shared<DeviceDescription>(described, log);
+  const auto access = options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
+                                                  : PropertyListPreferences::Access::ReadWrite;
+  const auto preferences = std::make_shared<PropertyListPreferences>(
+      userPreferencesFolder(root, kProgramUser).value(), log, 0600, access);
+  const auto eventLoop = std::make_shared<SdEventLoop>(log);
+  const auto bus = std::make_shared<BusConnection>();
+
+  const auto consent = std::make_shared<SubmissionConsent>(
+      root, log, preferences, description,
+      [preferences](std::string_view domain) { return preferences->isReadable(domain); });
+
+  Platform services;
+  services.log = log;
+  services.clock = clock;
+  services.eventLoop = eventLoop;
+  services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
+  services.notifications = std::make_shared<BusNotifications>(bus, log);
+  services.files = std::make_shared<RootedFiles>(root);
+  services.runLock = std::make_shared<FileRunLock>(metricsStoreFile(root).directory, log);
+  services.preferences = preferences;
+  services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
+  services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
+  services.metricsStore = makeSqliteMetricsStore(metricsStoreFile(root), log, clock);
+  services.logSubmission =
+      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences, consent);
+  services.crashReporting =
+      std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, consent);
+  services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);
+  services.deviceInformation = std::make_shared<LinuxDeviceInformation>(root, description);
+  services.appRegistry = std::make_shared<DesktopAppRegistry>(
+      applicationFolders(root, userDataFolder(root)), description);
+  services.locale =
+      std::make_shared<LinuxLocale>(root,
+                                    LocaleEnvironment{variable("LANGUAGE"), variable("LC_ALL"),
+                                                      variable("LC_MESSAGES"), variable("LANG")},
+                                    description);
+  services.kernelValues = std::make_shared<LinuxKernelValues>(description);
+  services.stackshot = std::make_shared<DescribedStackshot>(described, description);
+  services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
+  services.logHeaderFacts =
+      std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
+  services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
+      analyticsEventsFolder(root), log, clock, preferences, description, consent);
+  return services;
+}
+
+std::string deviceRootFromEnvironment() {
+  const std::string root = variable("TALLYRUN_ROOT");
+  return root.empty() ? "/" : root;
+}
+
+}  // namespace tally

@@ -1,0 +1,25 @@
+// The Linux platform: every service below a device root.
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "host/described/device_description.h"
+#include "platform/platform.h"
+
+namespace tally {
+
+// How a platform differs from that of the daily job.
+struct LinuxPlatformOptions {
+  std::shared_ptr<SystemLog> log;  // null: the journal or standard error
+  bool readOnlyPreferences = false;
+};
+
+// All services of the device whose root is the folder. Cheap: nothing is opened or read before a
+// service is used.
+Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options = {});
+
+// TALLYRUN_ROOT; "/" when it is unset or empty.
+std::string deviceRootFromEnvironment();
+
+}  // namespace tally

@@ -1,0 +1,193 @@
+#include "host/spool/log_spool.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cerrno>
+
+#include "base/file.h"
+#include "kv/plist_codec.h"
+#include "host/spool/waiting_logs.h"
+
+namespace tally {
+namespace {
+
+constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
+constexpr std::string_view kBodySuffix = ".log";
+constexpr std::string_view kInfoSuffix = ".info.plist";
+constexpr std::size_t kLargestInfo = 1u << 20;
+// Space for the number, the longer suffix and a temporary file's mark in a file's name.
+constexpr std::size_t kLongestLogName = 180;
+
+std::uint64_t boundOr(std::uint64_t fallback, Preferences& preferences, std::string_view key) {
+  const auto value = preferences.SMAPreferencesGetValue(key, kProgramDomain);
+  const auto* number = kvCast<KvNumber>(value.get());
+  return number != nullptr && number->asInt64() > 0 ? number->asUInt64() : fallback;
+}
+
+// Counts what the writer writes against the bounds, before it reaches the disk.
+class SpoolFile final : public LogFile {
+ public:
+  SpoolFile(TemporaryFile& file, const Directory& folder, std::uint64_t maximumBytes)
+      : file_(file), folder_(folder), left_(maximumBytes) {}
+
+  bool write(std::string_view bytes) override {
+    if (!status_) return false;
+    if (bytes.size() > left_) {
+      status_ = Error{"the log is larger than the whole spool may be"};
+    } else if (status_ = checkReserve(folder_, bytes.size()); status_) {
+      status_ = file_.write(bytes);
+      left_ -= bytes.size();
+    }
+    return static_cast<bool>(status_);
+  }
+  const Status& status() const { return status_; }
+
+ private:
+  TemporaryFile& file_;
+  const Directory& folder_;
+  std::uint64_t left_;
+  Status status_ = Done{};
+};
+
+Result<std::string> makeInfo(std::string_view typeCode, std::string_view name,
+                             const KvDictionary* options, double now) {
+  const auto info = KvDictionary::create({{"TypeCode", KvString::create(typeCode)},
+                                          {"Name", KvString::create(name)},
+                                          {"CreationTime", KvDate::create(now)}});
+  if (options != nullptr) info->set("Options", options->copy());
+  return encodeXmlPlist(*info);
+}
+
+// Removes what runs that were killed have left: temporary files, and information whose body never
+// got its name or has been removed.
+void sweepLeftOvers(const Directory& folder) {
+  const auto names = folder.list();
+  if (!names) return;
+  for (const std::string& name : *names) {
+    bool stale = isTemporaryName(name);
+    if (sequenceOf(name) && name.ends_with(kInfoSuffix)) {
+      const auto body = name.substr(0, name.size() - kInfoSuffix.size()) + std::string(kBodySuffix);
+      stale = stale || !std::binary_search(names->begin(), names->end(), body);
+    }
+    if (stale) (void)folder.remove(name);
+  }
+}
+
+}  // namespace
+
+FolderBounds folderBounds(Preferences& preferences) {
+  FolderBounds bounds;
+  bounds.maximumLogs = boundOr(bounds.maximumLogs, preferences, "SpoolMaximumLogs");
+  bounds.maximumBytes = boundOr(bounds.maximumBytes, preferences, "SpoolMaximumBytes");
+  return bounds;
+}
+
+bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
+                                               const KvDictionary* options,
+                                               const KvObject* reserved, const Writer& writer) {
+  Status submitted = Done{};
+  if (!consent_->permits("submitted logs")) return false;
+  if (reserved != nullptr) {
+    submitted = Error{"the reserved argument is in use"};
+  } else if (!isSafeFileName(name) || isTemporaryName(name) || name.size() > kLongestLogName) {
+    submitted = Error{"not a name that a log can have"};
+  } else if (submitting_) {
+    submitted = Error{"submitted while another log is being written"};
+  } else {
+    submitting_ = true;
+    submitted = submit(typeCode, name, options, writer);
+    submitting_ = false;
+  }
+  if (!submitted) {
+    log_->fault(faultKind("log submission", submitted.error()), "log submission of {}: {}", name,
+                submitted.error().message);
+  }
+  return static_cast<bool>(submitted);
+}
+
+Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
+                               const KvDictionary* options, const Writer& writer) {
+  const auto folder = makePrivateFolder(folder_);
+  if (!folder) return folder.error();
+  const auto lock = FileLock::acquire(*folder, kSubmittedLogs.lock);
+  if (!lock) return lock.error();
+  sweepLeftOvers(*folder);
+  const auto logs = listForWriting(*folder, *log_);
+  if (!logs) return logs.error();
+  const auto sequence = nextSequence(*logs);
+  if (!sequence) return sequence.error();
+  const auto info = makeInfo(typeCode, name, options, clock_->secondsSince1970());
+  if (!info) return info.error();
+
+  const FolderBounds bounds = folderBounds(*preferences_);
+  const std::string stem = fmt::format("{}{}", sequencePrefix(*sequence), name);
+  if (auto written = writeBody(*folder, stem, *info, writer, bounds.maximumBytes); !written) {
+    (void)folder->remove(stem + std::string(kBodySuffix));
+    (void)folder->remove(stem + std::string(kInfoSuffix));
+    return written;
+  }
+  // The log is safe; that older ones cannot be removed is not its failure.
+  if (const auto evicted = evictOldest(*folder, bounds, *sequence); !evicted) {
+    log_->fault("log submission: older logs stay", "log submission: {}", evicted.error().message);
+  }
+  return Done{};
+}
+
+// The information gets its name before the body does, so that no body is ever without.
+Status SpoolSubmission::writeBody(const Directory& folder, const std::string& stem,
+                                  const std::string& info, const Writer& writer,
+                                  std::uint64_t maximumBytes) {
+  auto body = TemporaryFile::create(folder, stem + std::string(kBodySuffix));
+  if (!body) return body.error();
+  SpoolFile file(*body, folder, maximumBytes - std::min<std::uint64_t>(maximumBytes, info.size()));
+  writer(file);
+  if (!file.status()) return file.status();
+  if (auto reserve = checkReserve(folder, info.size()); !reserve) return reserve;
+  const std::string infoName = stem + std::string(kInfoSuffix);
+  if (auto written = writeFileAtomically(folder, infoName, info); !written) return written;
+  return body->commit();
+}
+
+Result<std::vector<SpooledLog>> SpoolReader::list() const {
+  const auto folder = folder_.open();
+  if (!folder && folder.error().systemError == ENOENT) return std::vector<SpooledLog>();
+  if (!folder) return folder.error();
+  const auto logs = listSequenced(*folder);
+  if (!logs) return logs.error();
+  std::vector<SpooledLog> spooled;
+  for (const SequencedLog& log : *logs) {
+    const auto body = std::find_if(log.names.begin(), log.names.end(), [](const std::string& name) {
+      return name.ends_with(kBodySuffix);
+    });
+    if (body == log.names.end()) continue;
+    SpooledLog& entry = spooled.emplace_back();
+    entry.sequence = log.sequence;
+    entry.fileName = *body;
+    const auto identity = folder->identity(*body);
+    entry.bytes = identity ? identity->size : 0;
+    const auto stem = body->substr(0, body->size() - kBodySuffix.size());
+    const auto document = folder->readFile(stem + std::string(kInfoSuffix), kLargestInfo);
+    const auto root = document ? decodePlist(*document) : Result<KvRef<KvObject>>(document.error());
+    const auto* info = root ? kvCast<KvDictionary>(root->get()) : nullptr;
+    if (info == nullptr) continue;
+    entry.typeCode = info->getString("TypeCode").value_or("");
+    entry.name = info->getString("Name").value_or("");
+    entry.options = KvRef<KvDictionary>::share(info->getAs<KvDictionary>("Options"));
+    if (const auto* date = info->getAs<KvDate>("CreationTime")) {
+      entry.creationTime = date->secondsSince1970();
+    }
+  }
+  return spooled;
+}
+
+Result<std::string> SpoolReader::readBody(const SpooledLog& log, std::size_t limit) const {
+  if (!isSafeFileName(log.fileName)) return Error{"not a name that a log can have"};
+  const auto folder = folder_.open();
+  if (!folder) return folder.error();
+  return folder->readFile(log.fileName, limit);
+}
+
+DeviceDirectory spoolFolder(const DeviceRoot& root) { return kSubmittedLogs.on(root); }
+
+}  // namespace tally

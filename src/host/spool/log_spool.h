@@ -1,0 +1,81 @@
+// The spool of submitted logs: NUMBER-NAME.log holds a log's body, NUMBER-NAME.info.plist what is
+// known of it.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/device_root.h"
+#include "platform/clock.h"
+#include "host/spool/sequence_folder.h"
+#include "host/spool/submission_consent.h"
+#include "platform/log_submission.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// The bounds of the folders of logs: the integer preferences "SpoolMaximumLogs" and
+// "SpoolMaximumBytes" where they are above 0, else the defaults.
+FolderBounds folderBounds(Preferences& preferences);
+
+// Submits logs into a spool folder. A log is in the spool once its body has its final name, which
+// is the last step; a killed run leaves nothing that counts, and its left-overs are swept at the
+// next submission. Submitters of several processes are
+// serialised. What the user has forbidden is refused with one info line.
+class SpoolSubmission final : public LogSubmission {
+ public:
+  SpoolSubmission(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
+                  std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
+                  std::shared_ptr<SubmissionConsent> consent)
+      : folder_(std::move(folder)),
+        log_(std::move(log)),
+        clock_(std::move(clock)),
+        preferences_(std::move(preferences)),
+        consent_(std::move(consent)) {}
+  bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
+                                const KvDictionary* options, const KvObject* reserved,
+                                const Writer& writer) override;
+
+ private:
+  Status submit(std::string_view typeCode, std::string_view name, const KvDictionary* options,
+                const Writer& writer);
+  static Status writeBody(const Directory& folder, const std::string& stem, const std::string& info,
+                          const Writer& writer, std::uint64_t maximumBytes);
+
+  DeviceDirectory folder_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<Clock> clock_;
+  std::shared_ptr<Preferences> preferences_;
+  std::shared_ptr<SubmissionConsent> consent_;
+  bool submitting_ = false;
+};
+
+// A log in the spool. What its information does not tell, or tells wrongly, is empty.
+struct SpooledLog {
+  std::uint64_t sequence = 0;
+  std::uint64_t bytes = 0;  // of the body
+  std::string fileName;     // of the body, in the spool's folder
+  std::string typeCode, name;
+  KvRef<KvDictionary> options;  // null when it was submitted without
+  std::optional<double> creationTime;
+};
+
+class SpoolReader {
+ public:
+  explicit SpoolReader(DeviceDirectory folder) : folder_(std::move(folder)) {}
+  // Oldest first; a spool that is not there yet is empty.
+  Result<std::vector<SpooledLog>> list() const;
+  Result<std::string> readBody(const SpooledLog& log, std::size_t limit) const;
+
+ private:
+  DeviceDirectory folder_;
+};
+
+// Where the logs lie on a device.
+DeviceDirectory spoolFolder(const DeviceRoot& root);
+
+}  // namespace tally

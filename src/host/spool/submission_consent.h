@@ -1,0 +1,54 @@
+// Whether the user allows logs to leave the device, and what follows when not.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+
+#include "base/device_root.h"
+#include "host/described/device_description.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tally {
+
+// Every service that puts files where they wait to be taken away asks here first. Any thread may.
+class SubmissionConsent {
+ public:
+  using IsReadable = std::function<bool(std::string_view domain)>;
+  // The function tells whether a domain of the preferences can be read; null: each can.
+  SubmissionConsent(DeviceRoot root, std::shared_ptr<SystemLog> log,
+                    std::shared_ptr<Preferences> preferences,
+                    std::shared_ptr<DeviceDescription> description, IsReadable isReadable = {})
+      : root_(std::move(root)),
+        log_(std::move(log)),
+        preferences_(std::move(preferences)),
+        description_(std::move(description)),
+        isReadable_(std::move(isReadable)) {}
+
+  // The description's word, else the user's preference; allowed when neither says anything. A
+  // preference that cannot be read, or is neither a boolean nor a number, may be a refusal.
+  bool given() const { return wish() == Wish::Allowed; }
+  // The same, with one info line for each kind of thing that is therefore not recorded.
+  bool permits(std::string_view what);
+  // When the user no longer allows submission, deletes what still waits from before, or holds it
+  // back where the preference "WithdrawnLogs" of the program is "hold"; when the user allows it
+  // again, what was held waits again. One line says how many files were concerned. While the wish
+  // is unknown, everything stays as it is.
+  void enforce();
+
+ private:
+  enum class Wish { Allowed, Forbidden, Unknown };
+  Wish wish() const;
+  DeviceRoot root_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<Preferences> preferences_;
+  std::shared_ptr<DeviceDescription> description_;
+  IsReadable isReadable_;
+  std::mutex mutex_;
+  std::set<std::string, std::less<>> refused_;
+};
+
+}  // namespace tally

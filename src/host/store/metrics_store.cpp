@@ -1,0 +1,180 @@
+#include "host/store/metrics_store.h"
+
+#include <chrono>
+#include <optional>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include <fmt/format.h>
+
+#include "base/time_text.h"
+#include "host/store/store_history.h"
+#include "host/store/store_retention.h"
+#include "host/store/store_writer.h"
+
+namespace tally {
+namespace {
+
+// A checkpoint of millions of new samples takes minutes, for which nobody who records would wait.
+// It lets the others in between, long enough for those who look only ten times a second.
+constexpr std::chrono::seconds kLongestTurn{2};
+constexpr std::chrono::milliseconds kPauseForOthers{150};
+
+class SqliteMetricsStore final : public MetricsStore {
+ public:
+  SqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
+                     std::shared_ptr<const Clock> clock, std::uint64_t maximumBytes)
+      : file_(std::move(file)),
+        log_(std::move(log)),
+        clock_(std::move(clock)),
+        maximumBytes_(maximumBytes) {}
+
+  std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock_->secondsSince1970()); }
+
+  void TBClientCheckpoint() override { report(checkpoint()); }
+
+  void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
+    if (!isStoreKey(key)) {
+      report(Error{"metrics store " + file_.text() + ": " + std::string(kStoreKeyRule)});
+      return;
+    }
+    // Kept in memory until the batch ends, so that others need not wait while its values are read.
+    batch_.push_back({TBDaysSince1970(), std::string(key), value});
+    if (batchDepth_ == 0) writeBatch();
+  }
+  void beginBatch() override { ++batchDepth_; }
+  void endBatch() override {
+    if (batchDepth_ > 0 && --batchDepth_ == 0) writeBatch();
+  }
+
+  std::unique_ptr<HistoryStore> openHistory() override {
+    return openSqliteHistory(file_, [this](const std::string& message) { report(Error{message}); });
+  }
+
+ private:
+  struct Scalar {
+    std::int32_t day;
+    std::string key;
+    std::int64_t value;
+  };
+
+  void report(const Status& status) {
+    if (!status) log_->fault(status.error().message, "{}", status.error().message);
+  }
+
+  // The connection stays open, since a run writes more than once. Null: there is no store.
+  Result<StoreWriter*> writer(IfMissing ifMissing) {
+    if (!writer_) {
+      auto opened = StoreWriter::open(file_, ifMissing);
+      if (!opened) return opened.error();
+      writer_ = std::move(*opened);
+    }
+    return writer_ ? &*writer_ : nullptr;
+  }
+
+  template <class Work>
+  static Status transaction(StoreWriter& writer, const Work& work) {
+    if (auto begun = writer.begin(); !begun) return begun;
+    Status done = work();
+    if (done) return writer.commit();
+    writer.rollBack();
+    return done;
+  }
+
+  Status checkpoint() {
+    const auto opened = writer(IfMissing::Leave);
+    if (!opened) return opened.error();
+    if (*opened == nullptr) return Done{};
+    StoreWriter& store = **opened;
+    const auto needed = needsCheckpoint(store);
+    if (!needed) return needed.error();
+    if (!*needed) return Done{};
+    for (bool complete = false;;) {
+      std::size_t dropped = 0;
+      auto done = transaction(store, [&]() -> Status {
+        const auto folded = store.foldRecentUntil(std::chrono::steady_clock::now() + kLongestTurn);
+        if (!folded) return folded.error();
+        complete = *folded;
+        return complete ? forgetDays(store, dropped) : Status(Done{});
+      });
+      if (done && dropped > 0) {
+        log_->write(
+            LogLevel::Default,
+            fmt::format("metrics store {}: too large, {} days are removed before their time",
+                        file_.text(), dropped));
+      }
+      if (!done || complete) return done;
+      std::this_thread::sleep_for(kPauseForOthers);
+    }
+  }
+
+  Result<bool> isTooLarge(StoreWriter& store, std::size_t days) const {
+    const auto used = store.usedBytes();
+    if (!used) return used.error();
+    return days > kMostDaysKept || *used > maximumBytes_;
+  }
+
+  // Looks without the lock whether a checkpoint has anything to do.
+  Result<bool> needsCheckpoint(StoreWriter& store) {
+    const auto recent = store.hasRecent();
+    if (!recent || *recent) return recent;
+    const auto days = store.days();
+    if (!days) return days.error();
+    if (firstDayKept(*days, TBDaysSince1970())) return true;
+    const auto tooLarge = isTooLarge(store, days->size());
+    if (!tooLarge) return tooLarge;
+    return *tooLarge && !leastCredibleDays(*days, TBDaysSince1970()).empty();
+  }
+
+  Status forgetDays(StoreWriter& store, std::size_t& dropped) {
+    auto days = store.days();
+    if (!days) return days.error();
+    const std::int32_t today = TBDaysSince1970();
+    if (const auto first = firstDayKept(*days, today)) {
+      if (auto done = store.forgetBefore(*first); !done) return done;
+      while (days->back() < *first) days->pop_back();
+    }
+    for (const std::int32_t day : leastCredibleDays(*days, today)) {
+      const auto tooLarge = isTooLarge(store, days->size() - dropped);
+      if (!tooLarge) return tooLarge.error();
+      if (!*tooLarge) break;
+      if (auto done = store.forgetDay(day); !done) return done;
+      ++dropped;
+    }
+    return Done{};
+  }
+
+  void writeBatch() {
+    const auto scalars = std::exchange(batch_, {});
+    if (scalars.empty()) return;
+    const auto opened = writer(IfMissing::Create);
+    if (!opened) return report(opened.error());
+    report(transaction(**opened, [&]() -> Status {
+      for (const Scalar& scalar : scalars) {
+        auto set = (*opened)->setScalar(scalar.day, scalar.key, scalar.value);
+        if (!set) return set;
+      }
+      return Done{};
+    }));
+  }
+
+  StoreFile file_;
+  std::shared_ptr<SystemLog> log_;
+  std::shared_ptr<const Clock> clock_;
+  std::uint64_t maximumBytes_;
+  std::optional<StoreWriter> writer_;
+  std::vector<Scalar> batch_;
+  int batchDepth_ = 0;
+};
+
+}  // namespace
+
+std::shared_ptr<MetricsStore> makeSqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
+                                                     std::shared_ptr<const Clock> clock,
+                                                     std::uint64_t maximumBytes) {
+  return std::make_shared<SqliteMetricsStore>(std::move(file), std::move(log), std::move(clock),
+                                              maximumBytes);
+}
+
+}  // namespace tally

@@ -1,0 +1,204 @@
+#include "host/store/store_schema.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <iterator>
+
+#include "base/utf8.h"
+
+namespace tally {
+namespace {
+
+constexpr std::int64_t kApplicationId = 0x54424453;  // "TBDS"
+constexpr std::int64_t kSchemaVersion = 1;
+constexpr std::size_t kLongestKey = 512;
+
+// Days and keys are in the order of every pass, so a pass is one walk along the tree. New samples
+// go to a small table of their own, which is cheap to write; a checkpoint moves them to the chunks.
+constexpr std::string_view kSampleColumns = R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL, samples INTEGER NOT NULL,
+  sample_values BLOB NOT NULL, sample_offsets BLOB NOT NULL,
+  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql";
+struct TableDefinition {
+  std::string_view name, columns;
+  std::string text() const { return "CREATE TABLE " + std::string(name) + std::string(columns); }
+};
+constexpr TableDefinition kTables[] = {
+    {"scalars", R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, value INTEGER NOT NULL,
+  PRIMARY KEY(day, key)) WITHOUT ROWID)sql"},
+    {"chunks", kSampleColumns},
+    {"recent", kSampleColumns},
+};
+// What SQLite itself adds when somebody lets it look for better plans. It does no harm.
+constexpr TableDefinition kStatistics[] = {
+    {"sqlite_stat1", "(tbl,idx,stat)"},
+    {"sqlite_stat4", "(tbl,idx,neq,nlt,ndlt,sample)"},
+};
+
+// Anything else could run when a table is read or written: a view in a table's place, a trigger, a
+// virtual table, a column that is computed. REQUIRES: a transaction.
+Status checkTables(Database& database) {
+  auto rows = database.prepare("SELECT type, name, tbl_name, sql FROM sqlite_schema");
+  if (!rows) return rows.error();
+  std::size_t ours = 0, others = 0;
+  Step step = Step::Done;
+  while ((step = rows->step()) == Step::Row) {
+    const auto isRow = [&](const TableDefinition& table) {
+      return rows->text(0) == "table" && rows->text(1) == table.name &&
+             rows->text(2) == table.name && rows->text(3) == table.text();
+    };
+    if (std::ranges::any_of(kTables, isRow)) {
+      ++ours;
+    } else if (!std::ranges::any_of(kStatistics, isRow)) {
+      ++others;
+    }
+  }
+  if (step == Step::Failed) return database.error();
+  if (ours == std::size(kTables) && others == 0) return Done{};
+  return database.error("its tables are not those of a metrics store");
+}
+
+// The directory that holds the store; empty when there is no store yet.
+Result<std::optional<Directory>> directoryOf(const StoreFile& file) {
+  auto directory = file.directory.open();
+  if (!directory && directory.error().systemError == ENOENT) return std::optional<Directory>();
+  if (!directory) {
+    return Error{"metrics store " + file.text() + ": " + directory.error().message,
+                 directory.error().systemError};
+  }
+  struct stat status {};
+  if (::fstatat(directory->descriptor(), file.name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0) {
+    return std::optional(std::move(*directory));
+  }
+  if (errno == ENOENT) return std::optional<Directory>();
+  return Error{"metrics store " + file.text() + ": " + std::strerror(errno), errno};
+}
+
+// False for a database in which nothing was ever made. REQUIRES: a transaction, since another
+// process may be making the store right now.
+Result<bool> isStore(Database& database) {
+  const auto application = database.integer("PRAGMA application_id");
+  if (!application) return application.error();
+  const auto version = database.integer("PRAGMA user_version");
+  if (!version) return version.error();
+  const auto objects = database.integer("SELECT count(*) FROM sqlite_schema");
+  if (!objects) return objects.error();
+  if (*application == 0 && *version == 0 && *objects == 0) return false;
+  if (*application != kApplicationId || *version < 1) {
+    return database.error("a database, but not a metrics store");
+  }
+  if (*version > kSchemaVersion) {
+    return database.error("written by a newer version of the program (schema " +
+                          std::to_string(*version) + ", this one knows " +
+                          std::to_string(kSchemaVersion) + ")");
+  }
+  if (auto checked = checkTables(database); !checked) return checked.error();
+  return true;
+}
+
+Result<std::optional<Database>> readFrom(Result<Database> database) {
+  if (!database) return database.error();
+  if (auto begun = database->execute("BEGIN"); !begun) return begun.error();
+  const auto store = isStore(*database);
+  if (!store) return store.error();
+  if (!*store) return std::optional<Database>();
+  return std::optional<Database>(std::move(*database));
+}
+
+// Two processes that make the store at once: SQLite refuses the change of mode to one of them at
+// once instead of letting it wait.
+Status useWriteAheadLog(Database& database) {
+  constexpr int kAttempts = 2000;
+  constexpr useconds_t kPause = 5000;
+  for (int attempt = 1;; ++attempt) {
+    auto done = database.execute("PRAGMA journal_mode = WAL");
+    if (done || !database.busy() || attempt == kAttempts) return done;
+    ::usleep(kPause);
+  }
+}
+
+Status defineTables(Database& database) {
+  std::string text;
+  for (const TableDefinition& table : kTables) text += table.text() + ";";
+  text += "PRAGMA application_id = " + std::to_string(kApplicationId) + ";";
+  text += "PRAGMA user_version = " + std::to_string(kSchemaVersion);
+  return database.execute(text.c_str());
+}
+
+Status makeTables(Database& database) {
+  if (auto set = database.execute("PRAGMA page_size = 8192"); !set) return set;
+  if (auto set = useWriteAheadLog(database); !set) return set;
+  if (auto begun = database.execute("BEGIN IMMEDIATE"); !begun) return begun;
+  const auto store = isStore(database);  // somebody else may have been first
+  Status made = !store ? Status(store.error()) : *store ? Done{} : defineTables(database);
+  if (made) made = database.execute("COMMIT");
+  if (!made) (void)database.execute("ROLLBACK");
+  return made;
+}
+
+}  // namespace
+
+StoreFile metricsStoreFile(const DeviceRoot& root) {
+  return {DeviceDirectory(root, "/var/mobile/Library/Tallybook"), "TBDataStore.sqlitedb"};
+}
+
+bool isStoreKey(std::string_view key) {
+  return !key.empty() && key.size() <= kLongestKey && key.find('\0') == std::string_view::npos &&
+         isValidUtf8(key);
+}
+
+Result<std::optional<Database>> openStoreForReading(const StoreFile& file) {
+  const auto directory = directoryOf(file);
+  if (!directory) return directory.error();
+  if (!*directory) return std::optional<Database>();
+  const auto logBytes = [&] {
+    const auto log = (*directory)->identity(file.name + "-wal");
+    return log ? log->size : 0;
+  };
+  // A reader that may not write leaves the empty files of a write-ahead log behind. One that may
+  // removes them when it ends as the last; and with nothing in that log, it has nothing to fold.
+  auto store = readFrom(
+      Database::open(**directory, file.name,
+                     logBytes() == 0 ? Database::Access::ReadWrite : Database::Access::ReadOnly));
+  if (store) return store;
+  // Where no lock file can be made, nobody can be writing either; but what a writer has left in its
+  // log could not be read this way, and without that the file may be half old, half new.
+  if (::faccessat((*directory)->descriptor(), ".", W_OK, 0) == 0 || logBytes() > 0) return store;
+  return readFrom(Database::open(**directory, file.name, Database::Access::Immutable));
+}
+
+Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing) {
+  const bool create = ifMissing == IfMissing::Create;
+  auto directory = directoryOf(file);
+  if (!directory) return directory.error();
+  if (!*directory) {
+    if (!create) return std::optional<Database>();
+    auto made = file.directory.make();
+    if (!made) return Error{"metrics store " + file.text() + ": " + made.error().message};
+    *directory = std::move(*made);
+  }
+  auto database = Database::open(**directory, file.name,
+                                 create ? Database::Access::Create : Database::Access::ReadWrite);
+  if (!database) return database.error();
+  database->foldLogOnClose(false);  // not a byte of a file that turns out to be another's changes
+  if (auto begun = database->execute("BEGIN"); !begun) return begun.error();
+  const auto store = isStore(*database);
+  if (!store) return store.error();
+  if (auto ended = database->execute("COMMIT"); !ended) return ended.error();
+  if (!*store) {
+    if (!create) return std::optional<Database>();
+    if (auto made = makeTables(*database); !made) return made.error();
+  }
+  database->foldLogOnClose(true);
+  // The log of a large import is not kept at its full length.
+  if (auto set = database->execute("PRAGMA journal_size_limit = 4194304"); !set) return set.error();
+  return std::optional<Database>(std::move(*database));
+}
+
+}  // namespace tally

@@ -1,0 +1,40 @@
+// The metrics store as a file: where it lies, what makes it one, and how it is opened.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "base/device_root.h"
+#include "host/store/sqlite_database.h"
+
+namespace tally {
+
+// Where a store lies.
+struct StoreFile {
+  DeviceDirectory directory;
+  std::string name;
+
+  // For messages.
+  std::string text() const { return directory.text() + "/" + name; }
+};
+
+// The store of a device.
+StoreFile metricsStoreFile(const DeviceRoot& root);
+
+// A key of the store is valid UTF-8 of 1 to 512 bytes without a zero byte.
+bool isStoreKey(std::string_view key);
+constexpr std::string_view kStoreKeyRule =
+    "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
+
+// Opens the store and takes hold of its present state: what others commit afterwards is not seen.
+// Nothing is created. Empty when there is no store yet; an error when there is something else in
+// its place, or a store of a newer version of the program.
+Result<std::optional<Database>> openStoreForReading(const StoreFile& file);
+
+enum class IfMissing { Leave, Create };
+// Opens the store for writing. With Leave, empty when there is no store yet. Whatever is not a
+// store, or is a newer one, is left as it is.
+Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing);
+
+}  // namespace tally

@@ -1,0 +1,66 @@
+// Writes to the metrics store.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "host/store/store_schema.h"
+
+namespace tally {
+
+// One connection that writes. Everything between begin() and commit() is one transaction, which
+// others see as a whole and which a kill or a full disk undoes as a whole; so does the destructor.
+// Keys are checked here; the other arguments are taken as they are.
+class StoreWriter {
+ public:
+  // Empty when there is no store and none is to be made.
+  static Result<std::optional<StoreWriter>> open(const StoreFile& file, IfMissing ifMissing);
+
+  Status begin();
+  Status commit();
+  void rollBack();
+
+  // REQUIRES for these: a transaction has begun. After a failure it can only be rolled back.
+  Status setScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  // Records further samples of the key, after all that it has. Both spans have the same length.
+  Status pushSamples(std::int32_t day, std::string_view key, std::span<const double> values,
+                     std::span<const std::uint32_t> offsets);
+  // The same for many samples, straight into chunks. REQUIRES: foldRecent() in this transaction.
+  Status appendToChunks(std::int32_t day, std::string_view key, std::span<const double> values,
+                        std::span<const std::uint32_t> offsets);
+  // Moves pushed samples to the chunks of their day. Damaged rows stay where they are.
+  Status foldRecent();
+  // The same until the time is up, but for one row at least. False when there may be more.
+  Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
+  Status forgetBefore(std::int32_t day);
+  Status forgetDay(std::int32_t day);
+
+  // Whether foldRecent() would find something to do.
+  Result<bool> hasRecent();
+  // The days that hold data, from the newest on; of more than 4096 the newest. Costs one look into
+  // the tables for each day, however many rows it has.
+  Result<std::vector<std::int32_t>> days();
+  // What the pages that hold something take.
+  Result<std::uint64_t> usedBytes();
+
+ private:
+  struct Statements {
+    Statement setScalar, lastRecent, addRecent, lastChunk, putChunk;
+  };
+  class ChunkTail;
+  StoreWriter(Database database, Statements statements)
+      : database_(std::move(database)), statements_(std::move(statements)) {}
+  Status checkKey(std::string_view key) const;
+  Status forget(std::string_view which, std::int32_t day);
+
+  Database database_;
+  Statements statements_;
+};
+
+}  // namespace tally

@@ -1,0 +1,161 @@
+#include "host/system/kernel_values.h"
+
+#include <time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include "base/file.h"
+#include "base/number_text.h"
+#include "host/system/text_lines.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kLargestProcFile = 1u << 20;
+
+// Values whose width is not that of a 64-bit counter.
+struct Width {
+  std::string_view name;
+  std::size_t bytes;
+};
+constexpr Width kWidths[] = {
+    {"kern.memorystatus_freeze_count", 4},
+    {"kern.memorystatus_thaw_count", 4},
+    {"vm.swapusage", sizeof(SwapUsage)},
+};
+constexpr std::size_t kCounterWidth = 8;
+
+std::size_t widthOf(std::string_view name) {
+  const auto* found = std::find_if(std::begin(kWidths), std::end(kWidths),
+                                   [name](const Width& width) { return width.name == name; });
+  return found == std::end(kWidths) ? kCounterWidth : found->bytes;
+}
+
+template <class T>
+std::vector<std::byte> bytesOf(const T& value) {
+  std::vector<std::byte> bytes(sizeof value);
+  std::memcpy(bytes.data(), &value, sizeof value);
+  return bytes;
+}
+
+// The number in the value's width (a record's first field is its number); empty when a 4-byte value
+// cannot hold it or it is no whole number.
+std::optional<std::vector<std::byte>> numberBytes(const KvNumber& number, std::size_t width) {
+  if (number.isReal()) return std::nullopt;
+  auto bytes = bytesOf(number.asUInt64());
+  if (width == 4) {
+    const std::int64_t value = number.asInt64();
+    const bool huge = number.isUnsigned() && value < 0;
+    if (huge || value < INT32_MIN || value > std::int64_t{UINT32_MAX}) return std::nullopt;
+  }
+  bytes.resize(width);
+  return bytes;
+}
+
+std::optional<std::uint64_t> meminfoBytes(std::string_view meminfo, std::string_view label) {
+  constexpr std::string_view kUnit = " kB";
+  std::optional<std::uint64_t> bytes;
+  eachLine(meminfo, [&](std::string_view line) {
+    if (!line.starts_with(label) || !line.ends_with(kUnit)) return;
+    line.remove_suffix(kUnit.size());
+    const auto kibibytes = parseInt64(trimmed(line.substr(label.size())));
+    if (!kibibytes || *kibibytes < 0 || *kibibytes > INT64_MAX / 1024) return;
+    bytes = static_cast<std::uint64_t>(*kibibytes) * 1024;
+  });
+  return bytes;
+}
+
+}  // namespace
+
+std::optional<SwapUsage> parseSwapUsage(std::string_view meminfo, std::uint32_t pageSize) {
+  const auto total = meminfoBytes(meminfo, "SwapTotal:");
+  const auto available = meminfoBytes(meminfo, "SwapFree:");
+  if (!total || !available || *available > *total) return std::nullopt;
+  return SwapUsage{*total, *available, *total - *available, pageSize, 0};
+}
+
+std::optional<std::string> parseBootSession(std::string_view bootId) {
+  std::string session(trimmed(bootId.substr(0, bootId.find('\n'))));
+  if (session.empty()) return std::nullopt;
+  for (char& letter : session) {
+    if (letter >= 'a' && letter <= 'z') letter = static_cast<char>(letter - 'a' + 'A');
+  }
+  return session;
+}
+
+int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byte> buffer,
+                                       std::size_t* length) {
+  const std::size_t room = std::min(buffer.size(), *length);
+  auto answer = described(name);
+  if (!answer && name == "vm.swapusage") {
+    const auto meminfo = readFile("/proc/meminfo", kLargestProcFile);
+    const auto pageSize = static_cast<std::uint32_t>(::sysconf(_SC_PAGESIZE));
+    if (const auto usage = meminfo ? parseSwapUsage(*meminfo, pageSize) : std::nullopt) {
+      answer = Answer{0, bytesOf(*usage)};
+    }
+  }
+  if (!answer && name == "kern.bootsessionuuid") {
+    const auto text = readFile("/proc/sys/kernel/random/boot_id", kLargestProcFile);
+    if (const auto session = text ? parseBootSession(*text) : std::nullopt) {
+      const auto bytes = std::as_bytes(std::span(*session));
+      answer = Answer{0, {bytes.begin(), bytes.end()}};
+    }
+  }
+  if (!answer) return ENOENT;
+  if (answer->error != 0) return answer->error;
+  if (answer->bytes.size() > room) return ENOMEM;
+  std::copy(answer->bytes.begin(), answer->bytes.end(), buffer.begin());
+  *length = answer->bytes.size();
+  return 0;
+}
+
+// The answer that the description gives; empty when it gives none.
+std::optional<LinuxKernelValues::Answer> LinuxKernelValues::described(std::string_view name) {
+  const auto* values = description_->getAs<KvDictionary>(Described::KernelValues);
+  const KvObject* value = values != nullptr ? values->get(name) : nullptr;
+  if (value == nullptr) return std::nullopt;
+  const auto* successive = kvCast<KvArray>(value);
+  if (successive == nullptr) return convert(name, *value);
+  const std::lock_guard lock(taking_);
+  std::size_t& taken = taken_[std::string(name)];
+  if (taken >= successive->size()) return Answer{ENOENT, {}};
+  return convert(name, *successive->get(taken++));
+}
+
+std::optional<LinuxKernelValues::Answer> LinuxKernelValues::convert(std::string_view name,
+                                                                    const KvObject& value) {
+  if (const auto* number = kvCast<KvNumber>(&value)) {
+    if (auto bytes = numberBytes(*number, widthOf(name))) return Answer{0, *std::move(bytes)};
+  } else if (const auto* data = kvCast<KvData>(&value)) {
+    return Answer{0, {data->bytes().begin(), data->bytes().end()}};
+  } else if (const auto* failure = kvCast<KvDictionary>(&value)) {
+    const auto code = failure->getInt64("Error");
+    if (code && *code > 0 && *code < INT32_MAX) return Answer{static_cast<int>(*code), {}};
+  }
+  description_->reportEntry("KernelValues " + std::string(name),
+                            "is no number of the value's width, no data and no error");
+  return std::nullopt;
+}
+
+std::uint64_t LinuxKernelValues::MonotonicTicks() {
+  if (const auto* ticks = description_->getAs<KvNumber>(Described::MonotonicTicks))
+    return ticks->asUInt64();
+  timespec now{};
+  ::clock_gettime(CLOCK_MONOTONIC, &now);
+  return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000 +
+         static_cast<std::uint64_t>(now.tv_nsec);
+}
+
+std::optional<Timebase> LinuxKernelValues::TimebaseInfo() {
+  const auto* described = description_->getAs<KvDictionary>(Described::Timebase);
+  if (described == nullptr) return Timebase{1, 1};  // ticks are nanoseconds
+  const auto* numerator = described->getAs<KvNumber>("Numerator");
+  const auto* denominator = described->getAs<KvNumber>("Denominator");
+  if (numerator == nullptr || denominator == nullptr) return std::nullopt;
+  return Timebase{numerator->asUInt32(), denominator->asUInt32()};
+}
+
+}  // namespace tally

@@ -1,0 +1,139 @@
+#include "host/system/system_log.h"
+
+#include <fmt/format.h>
+#include <sys/uio.h>
+#define SD_JOURNAL_SUPPRESS_LOCATION  // every message would name this file
+#include <systemd/sd-journal.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <mutex>
+
+#include "base/printable.h"
+#include "base/utf8.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kLongestMessage = 16384;
+constexpr char kJournalSocket[] = "/run/systemd/journal/socket";
+
+struct LevelName {
+  LogLevel level;
+  std::string_view name;
+  std::string_view priority;  // the journal's
+};
+constexpr std::array kLevels{
+    LevelName{LogLevel::Debug, "debug", "PRIORITY=7"},
+    LevelName{LogLevel::Info, "info", "PRIORITY=6"},
+    LevelName{LogLevel::Default, "default", "PRIORITY=5"},
+    LevelName{LogLevel::Error, "error", "PRIORITY=3"},
+};
+
+const LevelName& levelName(LogLevel level) { return kLevels[static_cast<std::size_t>(level)]; }
+
+iovec field(std::string_view text) { return {const_cast<char*>(text.data()), text.size()}; }
+
+// What may stand in a line of an environment variable.
+std::string shortText(std::string_view value) {
+  constexpr std::size_t kShown = 40;
+  return printable(repairUtf8(value.substr(0, kShown))) + (value.size() > kShown ? "..." : "");
+}
+
+// The message as valid UTF-8 of bounded length.
+std::string readable(std::string_view message) {
+  std::string text = repairUtf8(message.substr(0, kLongestMessage));
+  if (message.size() > kLongestMessage) text += " [cut short]";
+  return text;
+}
+
+void writeToStandardError(std::string_view line) {
+  while (!line.empty()) {
+    const auto count = ::write(STDERR_FILENO, line.data(), line.size());
+    if (count < 0 && errno == EINTR) continue;
+    if (count < 0) return;  // there is nowhere left to report it
+    line.remove_prefix(static_cast<std::size_t>(count));
+  }
+}
+
+class LinuxSystemLog final : public SystemLog {
+ public:
+  explicit LinuxSystemLog(SystemLogSettings settings) : settings_(settings) {}
+
+  bool enabled(LogLevel level) const override { return level >= settings_.lowest; }
+
+  void write(LogLevel level, std::string_view message) override {
+    if (!enabled(level)) return;
+    if (!useJournal() || !sendToJournal(level, message)) {
+      writeToStandardError(standardErrorLine(level, message));
+    }
+  }
+
+ private:
+  bool useJournal() {
+    std::call_once(looked_,
+                   [this] { useJournal_ = !settings_.forceStandardError && journalIsThere(); });
+    return useJournal_;
+  }
+
+  static bool sendToJournal(LogLevel level, std::string_view message) {
+    const std::string text = "MESSAGE=" + readable(message);
+    const std::array fields{field(text), field(levelName(level).priority),
+                            field("SYSLOG_IDENTIFIER=tallyrun"),
+                            field("SUBSYSTEM=vellum.tallyd.tallyrun")};
+    return ::sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) == 0;
+  }
+
+  SystemLogSettings settings_;
+  std::once_flag looked_;
+  bool useJournal_ = false;
+};
+
+}  // namespace
+
+SystemLogSettings systemLogSettings(const char* destination, const char* level) {
+  SystemLogSettings settings;
+  settings.forceStandardError = destination != nullptr && std::strcmp(destination, "stderr") == 0;
+  if (settings.forceStandardError) settings.lowest = LogLevel::Debug;
+  for (const LevelName& known : kLevels) {
+    if (level != nullptr && known.name == level) settings.lowest = known.level;
+  }
+  return settings;
+}
+
+SystemLogEnvironment systemLogEnvironment() {
+  const char* const destination = std::getenv("TALLYRUN_LOG");
+  const char* const level = std::getenv("TALLYRUN_LOG_LEVEL");
+  SystemLogEnvironment found{systemLogSettings(destination, level), ""};
+  const auto isSet = [](const char* value) { return value != nullptr && *value != '\0'; };
+  if (isSet(destination) && !found.settings.forceStandardError) {
+    found.fault =
+        fmt::format("TALLYRUN_LOG is neither empty nor stderr but {}", shortText(destination));
+  } else if (isSet(level) && levelText(found.settings.lowest) != level) {
+    found.fault = fmt::format("TALLYRUN_LOG_LEVEL is not debug, info, default or error but {}",
+                              shortText(level));
+  }
+  return found;
+}
+
+std::string_view levelText(LogLevel level) { return levelName(level).name; }
+
+bool journalIsThere() { return ::access(kJournalSocket, W_OK) == 0; }
+
+std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings) {
+  return std::make_shared<LinuxSystemLog>(settings);
+}
+
+std::string standardErrorLine(LogLevel level, std::string_view message) {
+  std::string line = "tallyrun[";
+  line += levelName(level).name;
+  line += "]: ";
+  line += printable(readable(message));
+  line += '\n';
+  return line;
+}
+
+}  // namespace tally

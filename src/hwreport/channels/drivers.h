@@ -1,0 +1,19 @@
+// Reading drivers: which match, and what channels their legends describe.
+#pragma once
+
+#include <functional>
+
+#include "hwreport/channels/channel_builder.h"
+#include "hwreport/channels.h"
+
+namespace tally {
+
+// Calls step with each matching driver; a result that is not 0 stops the walk and is its result.
+// HwErrRegistryChanged when the registry changed meanwhile.
+HwResult walkDrivers(KvDictionary& matching,
+                     const std::function<HwResult(HwRegistryEntry driver)>& step);
+
+// Asks the registry for what the driver's channels share. Returns the registry's code on failure.
+HwResult readOwner(HwRegistryEntry driver, ChannelOwner* owner, KvRef<HwReportError>* error);
+
+}  // namespace tally

@@ -1,0 +1,59 @@
+#include "storage/lists/write_amplification.h"
+
+#include <cstdint>
+
+#include "platform/platform.h"
+#include "storage/exporter.h"
+
+namespace tally {
+namespace {
+
+constexpr unsigned kHostUnitShift = 12;  // the host's writes are counted in units of 4 KiB
+constexpr double kUsualThreshold = 2.0, kThresholdLimit = 10.0;
+
+float ratio(std::uint64_t written, std::uint64_t hostWrites) {
+  if (hostWrites == 0) return 0;
+  return static_cast<float>(static_cast<double>(written) / static_cast<double>(hostWrites));
+}
+
+// Where a name occurs twice the last one holds.
+struct IntermediateBand {
+  std::uint64_t pagesPerVirtualBlock = 0, erases = 0;
+};
+IntermediateBand intermediateBandOf(const SPXParseContext& context) {
+  IntermediateBand band;
+  SPXForEachCounter(context, [&band](std::string_view name, std::uint64_t value) {
+    if (name == "pagesPerVirtualBlockSlc") band.pagesPerVirtualBlock = value;
+    if (name == "intermediateBandErases") band.erases = value;
+  });
+  return band;
+}
+
+}  // namespace
+
+WriteAmplification writeAmplificationOf(const SPXParseContext& context) {
+  const std::uint32_t bandBytes = context.pagesPerVirtualBlock * context.bytesPerPage;
+  const IntermediateBand band = intermediateBandOf(context);
+  const std::uint64_t intermediateBytes = band.pagesPerVirtualBlock * context.bytesPerPage;
+  return {ratio(context.bandErases * (bandBytes >> kHostUnitShift), context.hostWrites),
+          ratio(band.erases * (intermediateBytes >> kHostUnitShift), context.hostWrites)};
+}
+
+WriteAmplification measureWriteAmplification() {
+  SPXParseContext context;
+  const NandExporter* exporter = nullptr;
+  if (!loadNandStatistics(&exporter, &context)->value()) return {};
+  const WriteAmplification measured = writeAmplificationOf(context);
+  if (exporter->releaseContext != nullptr) exporter->releaseContext(&context);
+  return measured;
+}
+
+double writeAmplificationThreshold() {
+  const auto preference =
+      platform().preferences->SMAPreferencesGetValue("userWAmp", "vellum.NANDInfo");
+  const auto* const number = kvCast<KvNumber>(preference.get());
+  const double threshold = number != nullptr && number->isReal() ? number->asDouble() : 0;
+  return threshold > 0 && threshold < kThresholdLimit ? threshold : kUsualThreshold;
+}
+
+}  // namespace tally

@@ -1,0 +1,239 @@
+// From a parsed context to the NAND info dictionary.
+#include <array>
+#include <optional>
+#include <string_view>
+
+#include "platform/platform.h"
+#include "storage/statistics/counter_names.h"
+#include "storage/statistics/key_map.h"
+#include "storage/nand_info.h"
+#include "storage/nand_info/nand_info_failure.h"
+
+namespace tally {
+
+double gCurrentUserWamp = 0;
+double gCurrentSysWamp = 0;
+
+namespace {
+
+constexpr std::uint32_t kFirstFullExportVersion = 0x20002;
+constexpr std::size_t kUsualEntries = 760;
+
+struct NarrowKey {
+  std::string_view key;
+  std::uint32_t SPXParseContext::*field;
+};
+struct WideKey {
+  std::string_view key;
+  std::uint64_t SPXParseContext::*field;
+};
+constexpr NarrowKey kVersionKeys[] = {
+    {kNANDInfoExportVersionKey, &SPXParseContext::exportVersion},
+    {kNANDInfoDriverVersionKey, &SPXParseContext::driverVersion},
+};
+constexpr NarrowKey kGeometryKeys[] = {
+    {kNANDInfoNumVirtualBlocksKey, &SPXParseContext::numVirtualBlocks},
+    {kNANDInfoPagesPerVirtualBlockKey, &SPXParseContext::pagesPerVirtualBlock},
+    {kNANDInfoBytesPerPageKey, &SPXParseContext::bytesPerPage},
+};
+constexpr WideKey kOperationKeys[] = {
+    {kNANDInfoNumLogicalReadsKey, &SPXParseContext::hostReads},
+    {kNANDInfoNumLogicalWritesKey, &SPXParseContext::hostWrites},
+    {kNANDInfoNumFreeVirtualBlocksKey, &SPXParseContext::numFreeVirtualBlocks},
+    {kNANDInfoNumWearLevelOpsKey, &SPXParseContext::wearLevMoves},
+    {kNANDInfoNumPhysicalReadsKey, &SPXParseContext::nandReads},
+    {kNANDInfoNumPhysicalWritesKey, &SPXParseContext::nandWrites},
+    {kNANDInfoNumPhysicalErasesKey, &SPXParseContext::bandErases},
+    {kNANDInfoNumNodesFreeKey, &SPXParseContext::indPoolFree},
+    {kNANDInfoNumNodesTotalKey, &SPXParseContext::indPoolCount},
+};
+
+KvRef<KvNumber> narrowNumber(std::uint32_t value) {
+  return KvNumber::int32(static_cast<std::int32_t>(value));
+}
+KvRef<KvNumber> wideNumber(std::uint64_t value) {
+  return KvNumber::int64(static_cast<std::int64_t>(value));
+}
+
+template <class Keys>
+void addFields(KvDictionary& info, const SPXParseContext& context, const Keys& keys) {
+  for (const auto& [key, field] : keys) {
+    if constexpr (sizeof(context.*field) == sizeof(std::uint32_t)) {
+      info.set(key, narrowNumber(context.*field));
+    } else {
+      info.set(key, wideNumber(context.*field));
+    }
+  }
+}
+
+bool isDemoMode() {
+  bool exists = false;
+  const bool demo = platform().preferences->SMAPreferencesGetBoolValue(
+      "StoreDemoMode", "vellum.demo-settings", &exists);
+  return exists && demo;
+}
+
+std::uint64_t weeksSince2000(std::uint64_t secondsSince1970) {
+  constexpr std::uint64_t k2000 = 946'684'800, kWeek = 604'800;
+  return secondsSince1970 <= k2000 ? 0 : (secondsSince1970 - k2000) / kWeek;
+}
+
+// Durations that would tell devices apart are reported to three digits.
+std::uint32_t threeSignificantDigits(std::uint32_t value) {
+  std::uint32_t step = 1;
+  while (value / step >= 1000) step *= 10;
+  const std::uint32_t kept = value / step;
+  const std::uint32_t rest = value % step;
+  return (kept + (step > 1 && rest >= step / 2 ? 1 : 0)) * step;
+}
+
+// Counters that are not reported themselves but go into a derived figure.
+enum class Role : std::uint8_t {
+  None,
+  UserPartitionStart,
+  IntermediatePartitionStart,
+  MaintenanceRequest,
+  FailedRead,
+  FailedProg,
+  FailedErase,
+};
+struct RoleOfName {
+  std::string_view name;
+  Role role;
+};
+constexpr RoleOfName kRoles[] = {
+    {"userPartitionStart", Role::UserPartitionStart},
+    {"intermediatePartitionStart", Role::IntermediatePartitionStart},
+    {"numBootBlockRefreshSuccess0", Role::MaintenanceRequest},
+    {"numBootBlockRefreshFail0", Role::MaintenanceRequest},
+    {"mspBootBlockReadFail0", Role::FailedRead},
+    {"mspBootBlockReadFail1", Role::FailedRead},
+    {"mspBootBlockReadFail2", Role::FailedRead},
+    {"mspBootBlockProgFail0", Role::FailedProg},
+    {"mspBootBlockProgFail1", Role::FailedProg},
+    {"mspBootBlockProgFail2", Role::FailedProg},
+    {"mspBootBlockEraseFail0", Role::FailedErase},
+    {"mspBootBlockEraseFail1", Role::FailedErase},
+    {"mspBootBlockEraseFail2", Role::FailedErase},
+};
+
+constexpr std::string_view kRoundedDurations[] = {"maxMemLowDuration", "maxMemChokeDuration"};
+
+// What is done with the counter of each name number.
+struct Treatment {
+  Role role = Role::None;
+  bool isRounded = false;
+};
+using Treatments = std::array<Treatment, kCounterNames>;
+
+constexpr Treatments makeTreatments() {
+  Treatments treatments{};
+  for (std::size_t number = 0; number < kCounterNames; ++number) {
+    const std::string_view name = kNames.name(number);
+    for (const RoleOfName& row : kRoles) {
+      if (row.name == name) treatments[number].role = row.role;
+    }
+    for (const std::string_view rounded : kRoundedDurations) {
+      if (rounded == name) treatments[number].isRounded = true;
+    }
+  }
+  return treatments;
+}
+
+constexpr Treatments kTreatments = makeTreatments();
+
+// The figures that are derived from several counters.
+struct DerivedFigures {
+  std::optional<std::uint64_t> userPartitionStart, intermediatePartitionStart;
+  std::uint64_t maintenanceRequests = 0, failedReads = 0, failedProgs = 0, failedErases = 0;
+
+  void take(Role role, std::uint64_t value) {
+    const std::uint64_t failed = value != 0 ? 1 : 0;
+    switch (role) {
+      case Role::None:
+        break;
+      case Role::UserPartitionStart:
+        userPartitionStart = value;
+        break;
+      case Role::IntermediatePartitionStart:
+        intermediatePartitionStart = value;
+        break;
+      case Role::MaintenanceRequest:
+        maintenanceRequests += value;
+        break;
+      case Role::FailedRead:
+        failedReads += failed;
+        break;
+      case Role::FailedProg:
+        failedProgs += failed;
+        break;
+      case Role::FailedErase:
+        failedErases += failed;
+        break;
+    }
+  }
+};
+
+void addCounter(KvDictionary& info, DerivedFigures& derived, std::uint16_t name,
+                std::uint64_t value) {
+  const Treatment treatment = kTreatments[name];
+  if (treatment.role != Role::None) {
+    derived.take(treatment.role, value);
+    return;
+  }
+  const std::uint16_t row = keyMapRowOfName(name);
+  if (row == kNoRow) return;
+  if (treatment.isRounded) value = threeSignificantDigits(static_cast<std::uint32_t>(value));
+  info.set(keyMapKey(row), wideNumber(value));
+}
+
+DerivedFigures addCounters(KvDictionary& info, const SPXParseContext& context) {
+  DerivedFigures derived;
+  for (const SPXCounterBlock* block = context.firstBlock; block != nullptr; block = block->next) {
+    for (std::uint32_t i = 0; i < block->count; ++i) {
+      const std::uint16_t name = block->names()[i];
+      if (name < kCounterNames) addCounter(info, derived, name, block->values()[i]);
+    }
+  }
+  return derived;
+}
+
+void addDerivedFigures(KvDictionary& info, const DerivedFigures& derived) {
+  if (derived.userPartitionStart && derived.intermediatePartitionStart) {
+    info.set(kNANDInfoIntermediatePartitionSizeKey,
+             wideNumber(*derived.userPartitionStart - *derived.intermediatePartitionStart));
+  }
+  info.set(kNANDInfoNumMaintenanceRequestsKey, wideNumber(derived.maintenanceRequests));
+  info.set(kNANDInfoMaintenanceFailedReadKey, wideNumber(derived.failedReads));
+  info.set(kNANDInfoMaintenanceFailedProgKey, wideNumber(derived.failedProgs));
+  info.set(kNANDInfoMaintenanceFailedEraseKey, wideNumber(derived.failedErases));
+}
+
+}  // namespace
+
+KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump) {
+  if (context.exportVersion == 0) {
+    return forDump ? nullptr : nandInfoFailure("Unsupported export version");
+  }
+  auto info = KvDictionary::create(kUsualEntries);
+  if (!forDump) {
+    addFields(*info, context, kVersionKeys);
+    info->set(kNANDInfoDemoModeKey, wideNumber(isDemoMode() ? 1 : 0));
+  }
+  addFields(*info, context, kGeometryKeys);
+  addFields(*info, context, kOperationKeys);
+  if (context.exportVersion < kFirstFullExportVersion) return info;
+
+  info->set(kNANDInfoFormatWeeksSince2000Key, wideNumber(weeksSince2000(context.utilFormatTime)));
+  info->set(kNANDInfoNumSleepOpsKey, wideNumber(context.numSleepOps));
+  info->set(kNANDInfoHighEnduranceBlockEraseCountKey,
+            wideNumber(context.maxHighEnduranceBlockErases));
+  info->set(kNANDInfoBlocksPerVirtualBlock, narrowNumber(context.blocksPerVirtualBlock));
+  for (std::size_t i = 0; i < context.readCountHisto.size(); ++i) {
+    info->set(kNANDInfoReadsBeforeErasureKeys[i], wideNumber(context.readCountHisto[i]));
+  }
+  addDerivedFigures(*info, addCounters(*info, context));
+  return info;
+}
+
+}  // namespace tally

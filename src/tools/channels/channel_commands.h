@@ -1,0 +1,10 @@
+// tallyctl channels: the statistics channels that drivers publish, and what they hold.
+#pragma once
+
+#include "tools/frame/tool.h"
+
+namespace tally::tools {
+
+void addChannelCommands(CLI::App& app, ToolContext& context);
+
+}  // namespace tally::tools

@@ -1,0 +1,230 @@
+// Checks of what lies below the device root.
+#include <algorithm>
+#include <limits>
+
+#include "base/device_root.h"
+#include "kv/plist_codec.h"
+#include "host/described/described_entries.h"
+#include "host/system/device_information.h"
+#include "host/linux_platform.h"
+#include "host/spool/log_spool.h"
+#include "host/preferences/property_list_preferences.h"
+#include "host/store/store_history.h"
+#include "host/store/store_schema.h"
+#include "tools/report/daily_log.h"
+#include "tools/doctor/health_checks.h"
+#include "tools/frame/output.h"
+#include "tools/frame/spelling.h"
+#include "tools/whitelist/whitelist_check.h"
+
+namespace tally::tools {
+namespace {
+
+using Lines = std::vector<HealthLine>;
+
+// Keeps the errors that a check provokes, so that they stand in its own lines.
+class ErrorCollector final : public SystemLog {
+ public:
+  ErrorCollector() : SystemLog(Repeats::All) {}
+  std::vector<std::string> errors;
+  bool enabled(LogLevel level) const override { return level == LogLevel::Error; }
+  void write(LogLevel level, std::string_view message) override {
+    if (enabled(level)) errors.emplace_back(message);
+  }
+};
+
+void examineRoot(const DeviceRoot& root, Lines& lines) {
+  const auto directory = root.open("/");
+  lines.push_back({directory ? Health::Ok : Health::Wrong, "device root",
+                   directory ? directory->path() : directory.error().message});
+  const auto volume = openDataVolume(root);
+  const auto space = volume ? volume->freeSpace() : std::nullopt;
+  if (!space) return;
+  const bool enough = *space > kReservedBytes;
+  lines.push_back(
+      {enough ? Health::Ok : Health::Wrong, "free space",
+       fmt::format("{}; logs leave {} free", byteText(*space), byteText(kReservedBytes))});
+}
+
+std::string withArticle(std::string_view noun) {
+  if (noun == "data") return std::string(noun);
+  return fmt::format("{} {}", noun.starts_with('a') ? "an" : "a", noun);
+}
+
+// Names what is not of its type, and what is near to a name that is known.
+template <class Entries>
+void examineEntries(const KvDictionary& found, const Entries& known, const std::string& place,
+                    Lines& lines) {
+  constexpr const char* kSubject = "device description";
+  std::vector<std::string_view> names;
+  for (const auto& entry : known) names.push_back(entry.name);
+  for (const auto& [key, value] : found) {
+    const auto entry =
+        std::ranges::find(known, key->view(), &std::ranges::range_value_t<Entries>::name);
+    const std::string name = place + std::string(key->view());
+    if (entry == std::ranges::end(known)) {
+      if (const auto meant = nearestWord(key->view(), names)) {
+        lines.push_back({Health::Wrong, kSubject,
+                         fmt::format("{} is not known; {}{} may be meant", name, place, *meant)});
+      }
+    } else if (value->type() != entry->type) {
+      lines.push_back(
+          {Health::Wrong, kSubject,
+           fmt::format("{} is {}, not {}, and is ignored", name,
+                       withArticle(typeName(value->type())), withArticle(typeName(entry->type)))});
+    } else if constexpr (requires { entry->members; }) {
+      if (!entry->members.empty()) {
+        examineEntries(static_cast<const KvDictionary&>(*value), entry->members, name + ".", lines);
+      }
+    }
+  }
+}
+
+void examineDescription(const DeviceRoot& root, Lines& lines) {
+  constexpr const char* kSubject = "device description";
+  const auto document = root.readFile("/device/device.plist", kPlistMaximumBytes);
+  if (!document) {
+    const bool absent = !root.identity("/device/device.plist");
+    lines.push_back({absent ? Health::Missing : Health::Wrong, kSubject,
+                     absent ? "none; Linux answers for the device" : document.error().message});
+    return;
+  }
+  const auto decoded = decodePlist(*document);
+  const auto* entries = decoded ? kvCast<KvDictionary>(decoded->get()) : nullptr;
+  if (entries == nullptr) {
+    lines.push_back(
+        {Health::Wrong, kSubject,
+         decoded ? "device/device.plist is not a dictionary" : decoded.error().message});
+    return;
+  }
+  lines.push_back({Health::Ok, kSubject, counted(entries->size(), "entry")});
+  examineEntries(*entries, kDescribedEntries, "", lines);
+}
+
+void examineWhitelist(Lines& lines) {
+  constexpr const char* kSubject = "whitelist";
+  const WhitelistFile file = loadWhitelistFile();
+  if (!file.root) {
+    const bool there = platform().files->fileSize(kWhitelistPath).has_value();
+    lines.push_back({there ? Health::Wrong : Health::Missing, kSubject,
+                     (there ? file.fault : std::string("none")) + "; nothing is reported"});
+    return;
+  }
+  const auto findings = checkWhitelist(*file.root);
+  const auto faults =
+      static_cast<std::size_t>(std::ranges::count(findings, Severity::Fault, &Finding::severity));
+  lines.push_back({faults > 0 ? Health::Wrong : Health::Ok, kSubject,
+                   fmt::format("{}, {}{}", counted(faults, "fault"),
+                               counted(findings.size() - faults, "surprise"),
+                               findings.empty() ? "" : "; see tallyctl whitelist check")});
+  for (const auto& group : *file.root) {
+    if (groupState(group.key->view()) == GroupState::DisabledByTasking) {
+      lines.push_back({Health::Missing, kSubject,
+                       fmt::format("the group {} is disabled by tasking", group.key->view())});
+    }
+  }
+}
+
+void examineStore(const DeviceRoot& root, Lines& lines) {
+  constexpr const char* kSubject = "metrics store";
+  const StoreFile file = metricsStoreFile(root);
+  const auto identity = file.directory.identity(file.name);
+  if (!identity) {
+    lines.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
+    return;
+  }
+  std::uint64_t scalars = 0;
+  std::uint64_t distributions = 0;
+  std::int64_t lastDay = std::numeric_limits<std::int32_t>::min();
+  std::string fault;
+  listStoreKeys(
+      file,
+      [&](const StoreKey& key) {
+        ++(key.kind == StoreKey::Kind::Scalar ? scalars : distributions);
+        lastDay = std::max(lastDay, key.lastDay);
+      },
+      [&](const std::string& message) { fault = message; });
+  if (!fault.empty()) {
+    lines.push_back({Health::Wrong, kSubject, fault});
+    return;
+  }
+  std::string text = counted(scalars, "scalar") + ", " + counted(distributions, "distribution");
+  if (scalars + distributions > 0) {
+    text += ", up to " + dayName(static_cast<std::int32_t>(lastDay));
+  }
+  lines.push_back({Health::Ok, kSubject, text + ", " + byteText(identity->size)});
+  if (scalars + distributions > 0 && lastDay > platform().metricsStore->TBDaysSince1970()) {
+    lines.push_back({Health::Wrong, kSubject, "it has days that have not come yet"});
+  }
+}
+
+void examinePreferences(const DeviceRoot& root, Lines& lines) {
+  constexpr const char* kSubject = "preferences";
+  const DeviceDirectory folder = *userPreferencesFolder(root, kProgramUser);
+  const auto collector = std::make_shared<ErrorCollector>();
+  PropertyListPreferences preferences(folder, collector, 0600,
+                                      PropertyListPreferences::Access::ReadOnly);
+  const auto domains = preferences.listDomains();
+  if (!domains) {
+    lines.push_back({Health::Wrong, kSubject, domains.error().message});
+    return;
+  }
+  for (const std::string& domain : *domains) (void)preferences.copyDomain(domain);
+  for (const std::string& error : collector->errors) {
+    lines.push_back({Health::Wrong, kSubject, error});
+  }
+  if (collector->errors.empty()) {
+    lines.push_back({domains->empty() ? Health::Missing : Health::Ok, kSubject,
+                     domains->empty() ? "none are set" : counted(domains->size(), "domain")});
+  }
+  const auto names = folder.list();
+  const auto aside =
+      names ? std::ranges::count_if(*names,
+                                    [](const std::string& name) {
+                                      return name.find(".plist.damaged-") != std::string::npos;
+                                    })
+            : 0;
+  if (aside > 0) {
+    lines.push_back(
+        {Health::Wrong, kSubject,
+         fmt::format("{} set aside in {}",
+                     counted(static_cast<std::uint64_t>(aside), "damaged file"), folder.text())});
+  }
+}
+
+void examineSpool(const ToolContext& context, Lines& lines) {
+  constexpr const char* kSubject = "submitted logs";
+  const SubmittedLogs spool(context);
+  const auto logs = spool.list();
+  if (!logs) {
+    lines.push_back({Health::Wrong, kSubject, logs.error().message});
+    return;
+  }
+  std::uint64_t bytes = 0;
+  for (const SpooledLog& log : *logs) bytes += log.bytes;
+  const FolderBounds bounds = folderBounds(*platform().preferences);
+  lines.push_back({logs->empty() ? Health::Missing : Health::Ok, kSubject,
+                   logs->empty() ? "none yet"
+                                 : fmt::format("{} with {}; at most {} and {} are kept",
+                                               counted(logs->size(), "log"), byteText(bytes),
+                                               bounds.maximumLogs, byteText(bounds.maximumBytes))});
+  for (const SpooledLog& log : *logs) {
+    const std::string_view fault = faultOf(log, spool.read(log));
+    if (fault.empty()) continue;
+    lines.push_back({Health::Wrong, kSubject, fmt::format("{} is {}", log.fileName, fault)});
+  }
+}
+
+}  // namespace
+
+void examineFiles(const ToolContext& context, Lines& lines) {
+  const DeviceRoot root(context.root);
+  examineRoot(root, lines);
+  examineDescription(root, lines);
+  examinePreferences(root, lines);
+  examineWhitelist(lines);
+  examineStore(root, lines);
+  examineSpool(context, lines);
+}
+
+}  // namespace tally::tools

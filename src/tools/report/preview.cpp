@@ -1,0 +1,28 @@
+#include "tools/report/preview.h"
+
+#include <utility>
+
+#include "kv/plist_codec.h"
+#include "tools/frame/dry_run.h"
+
+namespace tally::tools {
+
+Preview previewLog(std::int32_t day, KeyTrace* trace) {
+  DryRun run;
+  {
+    const PlatformScope scope(run.platform());
+    TBReport report;
+    if (trace != nullptr) report.follow(*trace);
+    report.writeLogForYesterdayWithAppInfo(day, nullptr);
+  }
+  Preview preview;
+  if (run.logs.empty()) return preview;
+  preview.options = std::move(run.logs.front().options);
+  preview.body = std::move(run.logs.front().body);
+  if (const auto root = decodePlist(preview.body, kDailyLogMaximumBytes)) {
+    preview.document = KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get()));
+  }
+  return preview;
+}
+
+}  // namespace tally::tools

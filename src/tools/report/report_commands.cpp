@@ -1,0 +1,264 @@
+#include "tools/report/report_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "base/file.h"
+#include "base/time_text.h"
+#include "base/utf8.h"
+#include "kv/plist_codec.h"
+#include "platform/platform.h"
+#include "report/report.h"
+#include "tools/report/daily_log.h"
+#include "tools/frame/day_argument.h"
+#include "tools/report/log_diff.h"
+#include "tools/report/log_view.h"
+#include "tools/report/preview.h"
+#include "tools/frame/standard_input.h"
+#include "tools/frame/table.h"
+
+namespace tally::tools {
+namespace {
+
+struct ReportArguments {
+  std::string day = "yesterday";
+  bool diff = false;
+  bool xml = false;
+  std::string name;
+};
+
+std::string timeText(std::optional<double> seconds) {
+  std::string text;
+  if (seconds) appendTimestamp(text, *seconds);
+  return text;
+}
+
+Json dayJson(const DailyLog& log) {
+  const auto day = log.day();
+  return day ? Json(*day) : Json(nullptr);
+}
+
+std::string dayDate(const DailyLog& log) {
+  const auto day = log.day();
+  return day ? dayText(*day) : "-";
+}
+
+int previewDiff(const ToolContext& context, const DailyLog& next) {
+  const auto last = SubmittedLogs(context).newest();
+  const DailyLog empty =
+      *DailyLog::of(KvDictionary::create({{"TBCrashLogVersion", KvNumber::int32(1)}}));
+  const DailyLog& before = last ? last->content : empty;
+  if (context.json) {
+    Json json = jsonOfLogDiff(before, next);
+    json["before"] = last ? Json({{"file", last->log.fileName}, {"day", dayJson(last->content)}})
+                          : Json(nullptr);
+    json["after"] = {{"day", dayJson(next)}};
+    printJson(context, json);
+    return kSuccess;
+  }
+  printLine(context,
+            "Before: " + (last ? fmt::format("{}, {}", last->log.fileName, dayDate(last->content))
+                               : std::string("no log was submitted yet")));
+  printLine(context, "After:  the next log, " + dayDate(next));
+  printLogDiff(context, before, next);
+  return kSuccess;
+}
+
+int preview(const ToolContext& context, const ReportArguments& arguments) {
+  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
+  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const Preview made = previewLog(*day);
+  const auto log = DailyLog::of(made.document);
+  if (!log) {
+    return complain(context,
+                    fmt::format("no log would be submitted for {}: the store has no value of that "
+                                "day that the whitelist admits",
+                                dayName(*day)),
+                    kWrong);
+  }
+  const bool allowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
+  if (!allowed) {
+    print(context.err,
+          "tallyctl: submission is not allowed on this device, so the daily job "
+          "would not make this log\n");
+  }
+  if (arguments.diff) return previewDiff(context, *log);
+  if (arguments.xml) {
+    print(context.out, made.body);  // to be read by a program: not a byte may differ
+    return kSuccess;
+  }
+  if (context.json) {
+    Json json = jsonOf(*log, made.options.get());
+    json["submissionAllowed"] = allowed;
+    printJson(context, json);
+  } else {
+    printDailyLog(context, *log, made.options.get());
+  }
+  return kSuccess;
+}
+
+int list(const ToolContext& context, const ReportArguments&) {
+  const SubmittedLogs logs(context);
+  const auto all = logs.list();
+  if (!all) return complain(context, all.error().message, kWrong);
+  Json document = Json::array();
+  Table table({{"log", Align::Left, true},
+               {"type", Align::Right},
+               {"day"},
+               {"created"},
+               {"size", Align::Right},
+               {"keys", Align::Right}});
+  for (const SpooledLog& log : *all) {
+    const auto body = logs.read(log);
+    const auto content = body ? DailyLog::parse(*body) : Result<DailyLog>(body.error());
+    if (context.json) {
+      Json item = {{"file", log.fileName},
+                   {"sequence", log.sequence},
+                   {"name", log.name},
+                   {"typeCode", log.typeCode},
+                   {"bytes", log.bytes}};
+      item["created"] = log.creationTime ? Json(timeText(log.creationTime)) : Json(nullptr);
+      item["day"] = content ? dayJson(*content) : Json(nullptr);
+      item["keys"] = content ? Json(content->keyCount()) : Json(nullptr);
+      document.push_back(std::move(item));
+      continue;
+    }
+    const std::string_view fault = content ? "" : faultOf(log, body);
+    table.add({log.fileName, log.typeCode,
+               !fault.empty() ? Cell(std::string(fault), Ink::Bad)
+                              : Cell(content ? dayDate(*content) : "-"),
+               timeText(log.creationTime), byteText(log.bytes),
+               content ? integerText(static_cast<std::int64_t>(content->keyCount())) : "-"});
+  }
+  if (context.json) {
+    printJson(context, document);
+  } else if (table.empty()) {
+    printLine(context, "no log was submitted yet");
+  } else {
+    table.print(context);
+  }
+  return kSuccess;
+}
+
+// A log of another kind: its lines as they are, made safe to show.
+int showText(const ToolContext& context, const std::string& title, std::string_view body) {
+  if (context.json) {
+    printJson(context, {{"file", title}, {"text", std::string(body)}});
+    return kSuccess;
+  }
+  printLine(context, title, Ink::Strong);
+  for (std::size_t begin = 0; begin < body.size();) {
+    const std::size_t end = std::min(body.find('\n', begin), body.size());
+    printLine(context, body.substr(begin, end - begin));
+    begin = end + 1;
+  }
+  return kSuccess;
+}
+
+// What begins like a property list is one that is damaged, however well it reads.
+bool isText(std::string_view body) {
+  constexpr std::size_t kHead = 1024;
+  const bool beginsList =
+      body.starts_with("bplist") ||
+      (body.starts_with('<') && body.substr(0, kHead).find("<plist") != body.npos);
+  return !beginsList && isValidUtf8(body) && body.find('\0') == body.npos;
+}
+
+// Structured-data logs are property lists too; they are shown as what they hold.
+int showPropertyList(const ToolContext& context, const std::string& title, const KvObject& root) {
+  const auto* const fields = kvCast<KvDictionary>(&root);
+  if (fields == nullptr || !fields->contains("RecordType")) {
+    return complain(context, title + " is a property list, but not a daily log", kWrong);
+  }
+  if (!context.json) printLine(context, title, Ink::Strong);
+  printJson(context,
+            context.json ? Json{{"file", title}, {"records", jsonOf(&root)}} : jsonOf(&root));
+  return kSuccess;
+}
+
+int showDailyLog(const ToolContext& context, const std::string& title, std::size_t bytes,
+                 const DailyLog& content, const KvDictionary* options) {
+  if (context.json) {
+    Json json = {{"file", title}, {"bytes", bytes}};
+    json.update(jsonOf(content, options));
+    printJson(context, json);
+    return kSuccess;
+  }
+  printDailyLog(context, content, options);
+  print(context.out, "\n");
+  printLine(context, fmt::format("{}, {}", title, byteText(bytes)), Ink::Faint);
+  return kSuccess;
+}
+
+// Any log, from the spool or from elsewhere (spooled is null then): by what it holds, so that a
+// copy is shown like the log itself.
+int showBody(const ToolContext& context, const std::string& title, std::string_view body,
+             const SpooledLog* spooled) {
+  const bool mustBeDaily = spooled != nullptr && isDailyLog(*spooled);
+  const auto root = decodePlist(body, kDailyLogMaximumBytes);
+  if (!root) {
+    if (!mustBeDaily && isText(body)) return showText(context, title, body);
+    return complain(context, fmt::format("{} is damaged: {}", title, root.error().message), kWrong);
+  }
+  const auto content = DailyLog::of(KvRef<KvDictionary>::share(kvCast<KvDictionary>(root->get())));
+  if (!content) return showPropertyList(context, title, **root);
+  return showDailyLog(context, title, body.size(), *content,
+                      spooled != nullptr ? spooled->options.get() : nullptr);
+}
+
+int showFile(const ToolContext& context, const std::string& path) {
+  const bool isStandardInput = path == "-";
+  const auto body = isStandardInput ? readStandardInput(kDailyLogMaximumBytes)
+                                    : readFile(path, kDailyLogMaximumBytes);
+  if (!body) return complain(context, body.error().message, kWrong);
+  return showBody(context, isStandardInput ? "standard input" : path, *body, nullptr);
+}
+
+int show(const ToolContext& context, const ReportArguments& arguments) {
+  const std::string& name = arguments.name;
+  if (name == "-" || name.find('/') != std::string::npos) return showFile(context, name);
+  const SubmittedLogs logs(context);
+  const auto found = logs.find(name);
+  const bool isLog = found && *found;
+  // The spool's names come first; a file of such a name can be given with its folder.
+  if (!isLog && !name.empty() && fileSize(name)) return showFile(context, name);
+  if (!found) return complain(context, found.error().message, kWrong);
+  if (!isLog) {
+    return complain(context,
+                    name.empty() ? "no daily log was submitted yet" : "there is no log " + name,
+                    kWrong);
+  }
+  const SpooledLog& log = **found;
+  const auto body = logs.read(log);
+  if (!body) return complain(context, body.error().message, kWrong);
+  return showBody(context, log.fileName, *body, &log);
+}
+
+}  // namespace
+
+void addReportCommands(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<ReportArguments>();
+  CLI::App* const report = app.add_subcommand("report", "Look at the next log and at earlier ones");
+  report->require_subcommand(1);
+  const auto add = [&](const char* name, const char* description, auto run) {
+    return addCommand(report, context, name, description,
+                      [&context, arguments, run] { return run(context, *arguments); });
+  };
+  CLI::App* command =
+      add("preview", "The log that would be submitted; changes nothing on the device", preview);
+  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
+  CLI::Option* const diff =
+      command->add_flag("--diff", arguments->diff, "Only what differs from the last submitted log");
+  command->add_flag("--xml", arguments->xml, "The document itself, byte for byte")->excludes(diff);
+
+  add("list", "The logs that were submitted", list);
+
+  command = add("show", "A submitted log: statistics, histograms, scalars", show);
+  command->add_option(
+      "LOG", arguments->name,
+      "Its number or name, a file, or - for standard input; the last daily log when "
+      "left out");
+}
+
+}  // namespace tally::tools

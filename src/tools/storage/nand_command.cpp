@@ -1,0 +1,27 @@
+#include "tools/storage/nand_command.h"
+
+#include "storage/exporter.h"
+#include "tools/frame/output.h"
+
+namespace tally::tools {
+namespace {
+
+bool hasDriver() {
+  const NandExporter* exporter = nullptr;
+  const RegistryHandle service = findNandExporter(&exporter);
+  if (service != 0) platform().deviceRegistry->HandleRelease(service);
+  return service != 0;
+}
+
+}  // namespace
+
+CLI::App* addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
+                         const char* description, std::function<int()> run) {
+  return addCommand(&nand, context, name, description, [&context, run = std::move(run)] {
+    if (hasDriver()) return run();
+    return complain(context, "this device has no driver that exports figures of its flash storage",
+                    kWrong);
+  });
+}
+
+}  // namespace tally::tools

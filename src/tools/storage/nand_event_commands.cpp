@@ -1,0 +1,121 @@
+#include "tools/storage/nand_event_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <utility>
+#include <vector>
+
+#include "storage/nand_info/analytics_day.h"
+#include "storage/analytics_events.h"
+#include "storage/nand_info.h"
+#include "tools/storage/nand_command.h"
+#include "tools/frame/output.h"
+#include "tools/frame/table.h"
+
+namespace tally::tools {
+namespace {
+
+struct ShownEvent {
+  std::string name;
+  bool wanted = false;
+  KvRef<KvDictionary> payload;
+};
+
+// Takes the place of the device's service: keeps every event, sends none.
+class EventPreview final : public AnalyticsEvents {
+ public:
+  explicit EventPreview(std::shared_ptr<AnalyticsEvents> service) : service_(std::move(service)) {}
+  bool isAvailable() override { return true; }
+  bool isEventWanted(std::string_view eventName) override {
+    return service_->isAvailable() && service_->isEventWanted(eventName);
+  }
+  bool PulseSendEventLazy(std::string_view eventName, const PayloadBuilder& builder) override {
+    events_.push_back({std::string(eventName), isEventWanted(eventName), builder()});
+    return true;
+  }
+  const std::vector<ShownEvent>& events() const { return events_; }
+
+ private:
+  std::shared_ptr<AnalyticsEvents> service_;
+  std::vector<ShownEvent> events_;
+};
+
+std::vector<ShownEvent> previewEvents() {
+  Platform services = platform();
+  const auto preview = std::make_shared<EventPreview>(services.analyticsEvents);
+  services.analyticsEvents = preview;
+  const PlatformScope scope(std::move(services));
+  LogtoEPNANDInfoWithOptions(kNANDInfoAnalyticsOption);
+  return preview->events();
+}
+
+std::string valueText(const KvObject* value) {
+  const auto* number = kvCast<KvNumber>(value);
+  if (number == nullptr || number->isReal()) return kvText(value);
+  const bool fits = !number->isUnsigned() || number->asInt64() >= 0;
+  return fits ? integerText(number->asInt64()) : kvText(value);
+}
+
+void printEvent(const ToolContext& context, const ShownEvent& event) {
+  printHeading(context, event.name + (event.wanted ? "" : "  (not wanted)"));
+  Table table({{""}, {"", Align::Right}});
+  std::size_t zeros = 0;
+  for (const auto& [field, value] : *event.payload) {
+    const auto* number = kvCast<KvNumber>(value.get());
+    if (number != nullptr && number->asUInt64() == 0) {
+      ++zeros;
+    } else {
+      table.add({std::string(field->view()), valueText(value.get())});
+    }
+  }
+  table.print(context);
+  if (zeros > 0) {
+    printLine(context, "  " + counted(zeros, "field") + " of value 0 not shown", Ink::Faint);
+  }
+}
+
+int runEvents(const ToolContext& context, const std::string& text) {
+  const bool available = platform().analyticsEvents->isAvailable();
+  const auto events = previewEvents();
+  std::size_t wanted = 0, shown = 0;
+  Json listed = Json::array();
+  for (const ShownEvent& event : events) {
+    wanted += event.wanted;
+    if (event.name.find(text) == std::string::npos) continue;
+    ++shown;
+    if (context.json) {
+      listed.push_back({{"event", event.name},
+                        {"wanted", event.wanted},
+                        {"payload", jsonOf(event.payload.get())}});
+    } else {
+      printEvent(context, event);
+    }
+  }
+  if (context.json) {
+    printJson(context, {{"serviceAvailable", available},
+                        {"analyticsDay", isAnalyticsDay()},
+                        {"events", std::move(listed)}});
+  } else if (shown > 0) {
+    printLine(context, "");
+    printLine(context, counted(events.size(), "event") + ", " + std::to_string(wanted) +
+                           " of them wanted; nothing was sent.");
+    printLine(context, isAnalyticsDay() ? "Today the figures go to the analytics service."
+                                        : "Today the figures go to the metrics store.");
+  }
+  if (shown == 0) return complain(context, "no event of that name: " + text, kWrong);
+  return available ? kSuccess
+                   : complain(context, "this device has no analytics-event service", kWrong);
+}
+
+}  // namespace
+
+void addNandEventCommands(CLI::App& nand, ToolContext& context) {
+  const auto text = std::make_shared<std::string>();
+  addNandCommand(nand, context, "events",
+                 "The analytics events that would be sent now; sends nothing",
+                 [&context, text] { return runEvents(context, *text); })
+      ->add_option("TEXT", *text, "Only events whose name contains it");
+}
+
+}  // namespace tally::tools

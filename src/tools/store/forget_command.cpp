@@ -1,0 +1,96 @@
+#include "tools/store/forget_command.h"
+
+#include <CLI/CLI.hpp>
+#include <iostream>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "host/linux_platform.h"
+#include "host/store/store_schema.h"
+#include "host/spool/waiting_logs.h"
+#include "report/report.h"
+#include "tools/frame/output.h"
+
+namespace tally::tools {
+namespace {
+
+// What the program remembers of days and systems that it has seen. The record of the tasking in
+// force is not among it: without it, its preferences could never be taken back.
+constexpr std::string_view kHistoryKeys[] = {kLastProcessedDay, "LastOSVersion", "LastOSUpdate",
+                                             "SSLastLoggedAt"};
+
+struct ForgetArguments {
+  bool yes = false;
+};
+
+bool isConfirmed(const ToolContext& context, const WaitingFiles& waiting) {
+  print(
+      context.out,
+      fmt::format("This erases the metrics store, {} ({}) that have not been taken away, and what "
+                  "is remembered\nof processed days, on the device {}. It cannot be undone. Type "
+                  "\"yes\" to go on: ",
+                  counted(waiting.files, "file"), byteText(waiting.bytes), context.root));
+  std::fflush(context.out);
+  std::string answer;
+  return std::getline(std::cin, answer) && answer == "yes";
+}
+
+// SQLite's files beside the store go first, so that none is left for another store.
+Status eraseStore(const DeviceRoot& root) {
+  const StoreFile file = metricsStoreFile(root);
+  const auto directory = file.directory.open();
+  if (!directory && directory.error().systemError == ENOENT) return Done{};
+  if (!directory) return directory.error();
+  for (const char* const suffix : {"-journal", "-wal", "-shm", ""}) {
+    if (auto removed = directory->remove(file.name + suffix); !removed) return removed;
+  }
+  return directory->sync();
+}
+
+Status eraseHistory(Preferences& preferences) {
+  for (const std::string_view key : kHistoryKeys) {
+    preferences.SMAPreferencesSetValue(key, nullptr, kProgramDomain);
+  }
+  if (preferences.SMAPreferencesSynchronize(kProgramDomain)) return Done{};
+  return Error{"the preferences could not be written"};
+}
+
+int forget(const ToolContext& context, const ForgetArguments& arguments) {
+  const DeviceRoot root(context.root);
+  const WaitingFiles waiting = countWaiting(root);
+  if (!arguments.yes) {
+    if (context.json || !terminalOf(0).interactive) {
+      return complain(context, "--yes is needed where nobody can be asked", kBadUsage);
+    }
+    if (!isConfirmed(context, waiting)) return complain(context, "nothing was erased", kWrong);
+  }
+  // The platform of the tool only reads preferences.
+  const Platform writing = makeLinuxPlatform(root, {platform().log, false});
+  const RunTurn turn(*writing.runLock);
+  if (!turn) return kWrong;  // the lock has said why
+  const Status store = eraseStore(root);
+  const auto logs = handleWaiting(root, WaitingAction::Erase);
+  const Status history = eraseHistory(*writing.preferences);
+  for (const Status& status : {store, logs ? Status(Done{}) : Status(logs.error()), history}) {
+    if (!status) return complain(context, "not all was erased: " + status.error().message, kWrong);
+  }
+  if (context.json) {
+    printJson(context, {{"erased", {{"store", true}, {"files", *logs}, {"history", true}}}});
+  } else {
+    printLine(context, fmt::format("erased: the metrics store, {}, the history of processed days",
+                                   counted(*logs, "waiting file")));
+  }
+  return kSuccess;
+}
+
+}  // namespace
+
+void addForgetCommand(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<ForgetArguments>();
+  addCommand(&app, context, "forget",
+             "Erase the metrics store, what waits to be taken away, and the history",
+             [&context, arguments] { return forget(context, *arguments); })
+      ->add_flag("--yes", arguments->yes, "Do not ask");
+}
+
+}  // namespace tally::tools

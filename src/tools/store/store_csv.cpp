@@ -1,0 +1,115 @@
+#include "tools/store/store_csv.h"
+
+#include <limits>
+
+#include "base/number_text.h"
+#include "host/store/store_schema.h"
+
+namespace tally::tools {
+namespace {
+
+constexpr std::string_view kByteOrderMark = "\xef\xbb\xbf";
+constexpr std::int64_t kSecondsOfDay = 86400;
+
+}  // namespace
+
+// Takes a field in quotes, in which "" is a quote, from the front of the rest.
+std::string_view StoreCsvParser::readQuoted(std::string_view& rest, std::size_t field) {
+  std::string& text = unquoted_[field];
+  text.clear();
+  rest.remove_prefix(1);
+  for (;;) {
+    const std::size_t quote = rest.find('"');
+    if (quote == std::string_view::npos) return "a quote is not closed";
+    text.append(rest.substr(0, quote));
+    rest.remove_prefix(quote + 1);
+    if (!rest.starts_with('"')) break;
+    text += '"';
+    rest.remove_prefix(1);
+  }
+  fields_[field] = text;
+  return rest.empty() || rest.starts_with(',') ? "" : "text follows a closing quote";
+}
+
+std::string_view StoreCsvParser::split(std::string_view record) {
+  for (std::size_t field = 0;; ++field) {
+    if (field == kFields) return "more than five fields";
+    if (record.starts_with('"')) {
+      if (const auto fault = readQuoted(record, field); !fault.empty()) return fault;
+    } else {
+      fields_[field] = record.substr(0, record.find(','));
+      record.remove_prefix(fields_[field].size());
+    }
+    if (record.empty()) return field + 1 < kFields ? "fewer than five fields" : "";
+    record.remove_prefix(1);
+  }
+}
+
+std::string_view StoreCsvParser::parse(std::string_view record, StoreRow& row) {
+  row = {};
+  if (record.starts_with(kByteOrderMark)) record.remove_prefix(kByteOrderMark.size());
+  if (record.empty() || record == kStoreCsvHeader) return "";
+  if (const auto fault = split(record); !fault.empty()) return fault;
+  const auto& [kind, key, day, offset, value] = fields_;
+  const bool isScalar = kind == "scalar";
+  if (!isScalar && kind != "distribution") return "the kind is neither scalar nor distribution";
+  if (key != checkedKey_ || key.empty()) {
+    if (!isStoreKey(key)) return kStoreKeyRule;
+    checkedKey_ = key;
+  }
+  const auto dayNumber = parseInt64(day);
+  if (!dayNumber || *dayNumber != static_cast<std::int32_t>(*dayNumber)) {
+    return "the day is not a whole number of 32 bits";
+  }
+  if (isScalar) {
+    if (!offset.empty()) return "a scalar has no offset";
+    const auto number = parseInt64(value);
+    if (!number) return "the value is not a whole number of 64 bits";
+    row.scalar = *number;
+  } else {
+    const auto seconds = parseInt64(offset);
+    if (!seconds || *seconds < 0 || *seconds >= kSecondsOfDay) {
+      return "the offset is not a second of the day (0 to 86399)";
+    }
+    const auto number = parseDouble(value);
+    if (!number) return "the value is not a number that a double can hold";
+    row.offset = static_cast<std::uint32_t>(*seconds);
+    row.sample = *number;
+  }
+  row.key = key;
+  row.day = static_cast<std::int32_t>(*dayNumber);
+  row.kind = isScalar ? StoreRow::Kind::Scalar : StoreRow::Kind::Distribution;
+  return "";
+}
+
+std::string csvField(std::string_view text) {
+  if (text.find_first_of(",\"\r\n") == std::string_view::npos) return std::string(text);
+  std::string quoted = "\"";
+  for (const char c : text) {
+    if (c == '"') quoted += '"';
+    quoted += c;
+  }
+  return quoted + '"';
+}
+
+void appendScalarRow(std::string& out, std::string_view field, std::int32_t day,
+                     std::int64_t value) {
+  out.append("scalar,").append(field) += ',';
+  appendInt64(out, day);
+  out += ",,";
+  appendInt64(out, value);
+  out += '\n';
+}
+
+void appendSampleRow(std::string& out, std::string_view field, std::int32_t day,
+                     std::uint32_t offset, double value) {
+  out.append("distribution,").append(field) += ',';
+  appendInt64(out, day);
+  out += ',';
+  appendUInt64(out, offset);
+  out += ',';
+  appendDouble(out, value);
+  out += '\n';
+}
+
+}  // namespace tally::tools

@@ -1,0 +1,123 @@
+#include "tools/store/store_dump.h"
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <string_view>
+
+#include "base/number_text.h"
+#include "base/printable.h"
+#include "tools/frame/output.h"
+#include "tools/store/store_csv.h"
+
+namespace tally::tools {
+namespace {
+
+// Text on its way to a file, written in large pieces.
+class Output {
+ public:
+  explicit Output(std::FILE* file) : file_(file) {}
+  std::string& text() {
+    constexpr std::size_t kPiece = 64u << 10;
+    if (text_.size() >= kPiece) flush();
+    return text_;
+  }
+  ~Output() { flush(); }
+  Output(const Output&) = delete;
+  Output& operator=(const Output&) = delete;
+  bool failed() const { return std::ferror(file_) != 0; }
+
+ private:
+  void flush() {
+    print(file_, text_);
+    text_.clear();
+  }
+  std::FILE* file_;
+  std::string text_;
+};
+
+template <class Handler>
+void eachSample(DistributionValues& values, const Handler& handler) {
+  constexpr std::size_t kBatch = 1024;
+  double batch[kBatch];
+  std::uint32_t offsets[kBatch];
+  while (const std::size_t count = values.nextValues(batch, offsets, kBatch)) {
+    for (std::size_t i = 0; i < count; ++i) handler(offsets[i], batch[i]);
+  }
+}
+
+std::string jsonText(std::string_view text) {
+  return printableJson(
+      nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace));
+}
+
+}  // namespace
+
+void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson) {
+  Output output(out);
+  const auto fieldOf = [forPerson](std::string_view key) {
+    return csvField(forPerson ? printable(key) : std::string(key));
+  };
+  output.text().append(kStoreCsvHeader) += '\n';
+  history.enumerateScalars(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
+        appendScalarRow(output.text(), fieldOf(key), day, value);
+        stop = output.failed();
+      });
+  history.enumerateDistributions(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool& stop) {
+        const std::string field = fieldOf(key);
+        stop = output.failed();
+        eachSample(values, [&](std::uint32_t offset, double value) {
+          appendSampleRow(output.text(), field, day, offset, value);
+        });
+      });
+}
+
+void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
+  Output output(out);
+  const auto beginRow = [&](const char* separator, std::string_view key, std::int32_t day) {
+    std::string& text = output.text();
+    text.append(separator).append("{\"key\": ").append(jsonText(key)).append(", \"day\": ");
+    appendInt64(text, day);
+  };
+  output.text() += "{\"scalars\": [";
+  const char* separator = "\n  ";
+  history.enumerateScalars(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
+        stop = output.failed();
+        beginRow(separator, key, day);
+        separator = ",\n  ";
+        output.text() += ", \"value\": ";
+        appendInt64(output.text(), value);
+        output.text() += '}';
+      });
+  output.text() += "],\n \"distributions\": [";
+  separator = "\n  ";
+  history.enumerateDistributions(
+      range.keyPrefix, range.minimumDay, range.maximumDay,
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool& stop) {
+        stop = output.failed();
+        beginRow(separator, key, day);
+        separator = ",\n  ";
+        output.text() += ", \"samples\": [";
+        const char* comma = "";
+        eachSample(values, [&](std::uint32_t offset, double value) {
+          std::string& text = output.text();
+          text.append(comma) += '[';
+          comma = ", ";
+          appendUInt64(text, offset);
+          text += ", ";
+          const char* quote = std::isfinite(value) ? "" : "\"";
+          text += quote;
+          appendDouble(text, value);
+          text.append(quote) += ']';
+        });
+        output.text() += "]}";
+      });
+  output.text() += "]}\n";
+}
+
+}  // namespace tally::tools

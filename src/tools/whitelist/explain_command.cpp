@@ -1,0 +1,248 @@
+#include "tools/whitelist/explain_command.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "base/time_text.h"
+#include "platform/platform.h"
+#include "tools/frame/day_argument.h"
+#include "tools/whitelist/key_story.h"
+#include "tools/report/log_view.h"
+#include "tools/frame/spelling.h"
+#include "tools/frame/table.h"
+
+namespace tally::tools {
+namespace {
+
+struct ExplainArguments {
+  std::string key;
+  std::string day = "yesterday";
+};
+
+void printRows(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, "In the store");
+  if (story.scalarRows.empty() && story.distributionRows.empty()) {
+    printLine(context, story.measured
+                           ? "  no rows: the report measures this key itself when it is written"
+                           : "  no rows of this key");
+    if (!story.similar.empty()) {
+      const std::vector<std::string_view> near(story.similar.begin(), story.similar.end());
+      printLine(context, "  did you mean " + alternatives(near) + "?", Ink::Doubtful);
+    }
+    return;
+  }
+  const auto dayCell = [&](std::int32_t day) {
+    return Cell(dayText(day), day == story.day ? Ink::Strong : Ink::Faint);
+  };
+  if (!story.scalarRows.empty()) {
+    Table table({{"day"}, {"scalar", Align::Right}});
+    for (const ScalarRow& row : story.scalarRows) {
+      table.add({dayCell(row.day), integerText(row.value)});
+    }
+    table.print(context);
+  }
+  if (!story.distributionRows.empty()) {
+    Table table({{"day"},
+                 {"samples", Align::Right},
+                 {"min", Align::Right},
+                 {"mean", Align::Right},
+                 {"max", Align::Right}});
+    for (const auto& [day, summary] : story.distributionRows) {
+      table.add({dayCell(day), integerText(summary.count), realText(summary.minimum),
+                 realText(summary.mean), realText(summary.maximum)});
+    }
+    table.print(context);
+  }
+}
+
+void printVerdicts(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, "In the whitelist");
+  if (!story.judge.file().root) return printLine(context, "  there is none", Ink::Doubtful);
+  Table table({{""}, {"", Align::Left, true}});
+  for (const KeyKind kind : story.kinds()) {
+    const KeyVerdict& verdict = kind == KeyKind::Scalar ? story.scalar : story.distribution;
+    const bool admitted = verdict.admitted();
+    table.add({admitted ? Cell("admitted", Ink::Good) : Cell("refused", Ink::Doubtful),
+               fmt::format("as a {}: {}", kindName(verdict.kind), verdict.reason)});
+    if (!admitted) continue;
+    table.add({"", "options: " + optionsText(*verdict.match.options)});
+    for (const KeyCandidate& other : verdict.others) {
+      const std::string_view off = whyNotInForce(other.state);
+      table.add({"", Cell(fmt::format("passed over: {} {} ({} {})",
+                                      isPrefixSection(other.section) ? "prefix" : "entry",
+                                      other.entry.key->view(), other.entry.group->view(),
+                                      !off.empty() ? off : "has it less specific or earlier"),
+                          Ink::Faint)});
+    }
+  }
+  table.print(context);
+}
+
+void printRounding(const ToolContext& context, const KeyStory& story) {
+  if (!story.trace.scalarBefore) return;
+  printHeading(context, "Rounding");
+  printLine(context, fmt::format("  {}  {}", story.measured ? "measured now" : "stored",
+                                 integerText(*story.trace.scalarBefore)));
+  for (const RoundingStep& step : story.trace.steps) {
+    printLine(context, fmt::format("  {} {}: {} becomes {}", step.option, step.setting,
+                                   integerText(step.before), integerText(step.after)));
+  }
+  if (story.trace.steps.empty()) printLine(context, "  no step: the value is reported unchanged");
+}
+
+void printValue(const ToolContext& context, const DailyLog& log, const std::string& key,
+                KeyKind kind) {
+  const KvObject* value = loggedValue(log, key, kind);
+  if (value == nullptr) {
+    printLine(context, fmt::format("  not there as a {}", kindName(kind)), Ink::Doubtful);
+    return;
+  }
+  if (kind == KeyKind::Scalar) {
+    const auto* number = kvCast<KvNumber>(value);
+    printLine(context, "  scalar " +
+                           (number != nullptr ? integerText(number->asInt64()) : valueText(value)));
+    return;
+  }
+  if (const auto statistics = statisticsOf(value)) {
+    printLine(context, fmt::format("  distribution of {}: min {}, mean {}, std dev {}, max {}",
+                                   counted(static_cast<std::uint64_t>(statistics->count), "sample"),
+                                   realText(statistics->minimum), realText(statistics->mean),
+                                   realText(statistics->standardDeviation()),
+                                   realText(statistics->maximum)));
+  } else {
+    printLine(context, "  distribution: damaged", Ink::Bad);
+  }
+  if (const auto* histogram = log.histograms().getAs<KvDictionary>(key)) {
+    printHistogram(context, *histogram, 4);
+  }
+}
+
+void printLogs(const ToolContext& context, const KeyStory& story) {
+  printHeading(context, fmt::format("In a log of {}, made now", dayText(story.day)));
+  const auto next = DailyLog::of(story.next);
+  for (const KeyKind kind : story.kinds()) {
+    const std::string reason = story.whyAbsent(kind);
+    if (reason.empty() && next) {
+      printValue(context, *next, story.key, kind);
+    } else {
+      printLine(context, fmt::format("  not there as a {}: {}", kindName(kind), reason),
+                Ink::Doubtful);
+    }
+  }
+  if (!story.submissionAllowed) {
+    printLine(context, "  the daily job makes no log at all: submission is not allowed",
+              Ink::Doubtful);
+  }
+  if (!story.submitted) {
+    printHeading(context, "In the submitted log");
+    printLine(context, "  no log of that day was submitted", Ink::Doubtful);
+    return;
+  }
+  printHeading(context, "In the submitted log " + story.submitted->log.fileName);
+  for (const KeyKind kind : story.kinds()) {
+    const DailyLog& log = story.submitted->content;
+    const KvObject* submitted = loggedValue(log, story.key, kind);
+    const bool same = submitted != nullptr && next &&
+                      kvEqual(submitted, loggedValue(*next, story.key, kind)) &&
+                      kvEqual(log.histograms().get(story.key), next->histograms().get(story.key));
+    if (same && kind == KeyKind::Distribution) {
+      printLine(context, "  the same distribution");
+    } else {
+      printValue(context, log, story.key, kind);
+    }
+  }
+  const auto* digest = story.submitted->content.document().getAs<KvString>("TBWhitelistDigest");
+  if (digest != nullptr && digest->view() != story.judge.file().digest) {
+    printLine(context, "  it was made with another whitelist", Ink::Doubtful);
+  }
+}
+
+Json storyJson(const KeyStory& story) {
+  Json scalars = Json::array();
+  for (const ScalarRow& row : story.scalarRows) {
+    scalars.push_back({{"day", row.day}, {"value", row.value}});
+  }
+  Json distributions = Json::array();
+  for (const auto& [day, summary] : story.distributionRows) {
+    distributions.push_back({{"day", day},
+                             {"samples", summary.count},
+                             {"minimum", jsonOfReal(summary.minimum)},
+                             {"mean", jsonOfReal(summary.mean)},
+                             {"maximum", jsonOfReal(summary.maximum)}});
+  }
+  Json json = {{"key", story.key},
+               {"day", story.day},
+               {"scalarRows", std::move(scalars)},
+               {"distributionRows", std::move(distributions)},
+               {"measuredByReport", story.measured},
+               {"similarKeys", story.similar},
+               {"whitelist",
+                {{"scalar", jsonOf(story.scalar)}, {"distribution", jsonOf(story.distribution)}}}};
+  if (story.trace.scalarBefore) {
+    Json steps = Json::array();
+    for (const RoundingStep& step : story.trace.steps) {
+      steps.push_back({{"option", step.option},
+                       {"setting", step.setting},
+                       {"before", step.before},
+                       {"after", step.after}});
+    }
+    json["rounding"] = {{"value", *story.trace.scalarBefore}, {"steps", std::move(steps)}};
+  }
+  const auto logged = [&](const DailyLog& log) {
+    return Json{{"scalar", jsonOf(loggedValue(log, story.key, KeyKind::Scalar))},
+                {"distribution", jsonOf(loggedValue(log, story.key, KeyKind::Distribution))},
+                {"histogram", jsonOf(log.histograms().get(story.key))}};
+  };
+  const auto next = DailyLog::of(story.next);
+  json["nextLog"] = next ? logged(*next) : Json(nullptr);
+  for (const KeyKind kind : story.kinds()) {
+    const std::string reason = story.whyAbsent(kind);
+    if (!reason.empty()) json["whyAbsent"][std::string(kindName(kind))] = reason;
+  }
+  json["submittedLog"] = nullptr;
+  if (story.submitted) {
+    json["submittedLog"] = logged(story.submitted->content);
+    json["submittedLog"]["file"] = story.submitted->log.fileName;
+  }
+  return json;
+}
+
+int explain(const ToolContext& context, const ExplainArguments& arguments) {
+  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
+  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const KeyStory story = tellStory(context, arguments.key, *day);
+  bool present = false;
+  for (const KeyKind kind : story.kinds()) present = present || story.whyAbsent(kind).empty();
+  if (context.json) {
+    printJson(context, storyJson(story));
+    return present ? kSuccess : kWrong;
+  }
+  if (!story.judge.file().root) {
+    printLine(context,
+              "No whitelist can be used, so nothing is reported: " + story.judge.file().fault,
+              Ink::Bad);
+  }
+  printLine(context, fmt::format("{} on {}", story.key, dayName(story.day)), Ink::Strong);
+  printRows(context, story);
+  printVerdicts(context, story);
+  printRounding(context, story);
+  printLogs(context, story);
+  return present ? kSuccess : kWrong;
+}
+
+}  // namespace
+
+void addExplainCommand(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<ExplainArguments>();
+  CLI::App* const command =
+      addCommand(&app, context, "explain", "Follow one key from the store to the log",
+                 [&context, arguments] { return explain(context, *arguments); });
+  command
+      ->add_option("KEY", arguments->key,
+                   "A key of the metrics store, or one that the report measures")
+      ->required();
+  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
+}
+
+}  // namespace tally::tools

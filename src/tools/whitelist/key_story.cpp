@@ -1,0 +1,125 @@
+#include "tools/whitelist/key_story.h"
+
+#include <algorithm>
+#include <iterator>
+#include <limits>
+#include <set>
+
+#include "host/linux_platform.h"
+#include "host/store/store_history.h"
+#include "host/store/store_schema.h"
+#include "platform/platform.h"
+#include "tools/report/preview.h"
+#include "tools/frame/spelling.h"
+
+namespace tally::tools {
+namespace {
+
+constexpr std::int32_t kBeforeAllDays = std::numeric_limits<std::int32_t>::min();
+constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
+
+void readRows(KeyStory& story) {
+  const auto history = platform().metricsStore->openHistory();
+  history->enumerateScalars(story.key, kBeforeAllDays, kLastDay,
+                            [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+                              if (key == story.key) story.scalarRows.push_back({day, value});
+                            });
+  const auto noOptions = ScalarOptions::create();
+  history->enumerateDistributions(
+      story.key, kBeforeAllDays, kLastDay,
+      [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
+        if (key != story.key) return;
+        story.distributionRows.push_back(
+            {day, summariseDistribution(values, key, *noOptions).summary});
+      });
+}
+
+class KeyCollector final : public WhitelistVisitor {
+ public:
+  explicit KeyCollector(std::set<std::string, std::less<>>& keys) : keys_(keys) {}
+  bool beginGroup(std::string_view) override { return true; }
+  void entry(WhitelistSection section, WhitelistEntry found) override {
+    if (!isPrefixSection(section)) keys_.emplace(found.key->view());
+  }
+  void malformed(const WhitelistPlace&) override {}
+
+ private:
+  std::set<std::string, std::less<>>& keys_;
+};
+
+std::vector<std::string> similarKeys(const ToolContext& context, const KeyStory& story) {
+  constexpr std::size_t kSuggested = 3;
+  std::set<std::string, std::less<>> keys;
+  listStoreKeys(
+      metricsStoreFile(context.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
+      [](const std::string&) {});
+  KeyCollector collector(keys);
+  if (const auto& whitelist = story.judge.file().root) visitWhitelist(*whitelist, collector);
+  const std::vector<std::string_view> known(keys.begin(), keys.end());
+  auto near = nearestWords(story.key, known, kSuggested);
+  if (near.empty() && !story.key.empty()) {
+    // Not a slip: perhaps a part of the name.
+    std::ranges::copy_if(known, std::back_inserter(near), [&story](std::string_view key) {
+      return key.find(story.key) != std::string_view::npos;
+    });
+    if (near.size() > kSuggested) near.resize(kSuggested);
+  }
+  return {near.begin(), near.end()};
+}
+
+template <class Rows>
+bool hasDay(const Rows& rows, std::int32_t day) {
+  return std::ranges::any_of(rows, [day](const auto& row) { return row.day == day; });
+}
+
+}  // namespace
+
+std::vector<KeyKind> KeyStory::kinds() const {
+  const bool isScalar = measured || !scalarRows.empty();
+  const bool isDistribution = !distributionRows.empty();
+  std::vector<KeyKind> kinds;
+  if (isScalar || !isDistribution) kinds.push_back(KeyKind::Scalar);
+  if (isDistribution || !isScalar) kinds.push_back(KeyKind::Distribution);
+  return kinds;
+}
+
+std::string KeyStory::whyAbsent(KeyKind kind) const {
+  const bool isScalar = kind == KeyKind::Scalar;
+  const KeyVerdict& verdict = isScalar ? scalar : distribution;
+  const bool stored = isScalar ? hasDay(scalarRows, day) : hasDay(distributionRows, day);
+  const bool mine = isScalar && measured;
+  if (!stored && !mine) return "the store has no such row on that day";
+  if (!verdict.admitted()) return "the whitelist refuses it";
+  if (!next) {
+    return "the day has no whitelisted value in the store, so no log is made and nothing is "
+           "measured";
+  }
+  if (mine && !trace.scalarBefore) {
+    return "it cannot be measured: a count that it needs cannot be read, or is 0";
+  }
+  return "";
+}
+
+KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day) {
+  KeyStory story(loadWhitelistFile());
+  story.key = key;
+  story.day = day;
+  story.measured = isMeasuredByReport(key);
+  story.scalar = story.judge.judge(key, KeyKind::Scalar);
+  story.distribution = story.judge.judge(key, KeyKind::Distribution);
+  readRows(story);
+  if (!story.measured && story.scalarRows.empty() && story.distributionRows.empty()) {
+    story.similar = similarKeys(context, story);
+  }
+  story.trace.key = key;
+  story.next = previewLog(day, &story.trace).document;
+  story.submitted = SubmittedLogs(context).newest(day);
+  story.submissionAllowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
+  return story;
+}
+
+const KvObject* loggedValue(const DailyLog& log, std::string_view key, KeyKind kind) {
+  return (kind == KeyKind::Scalar ? log.scalars() : log.distributions()).get(key);
+}
+
+}  // namespace tally::tools

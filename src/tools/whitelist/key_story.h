@@ -1,0 +1,57 @@
+// What there is to say about one key on one day.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "report/distribution_summary.h"
+#include "report/report.h"
+#include "tools/report/daily_log.h"
+#include "tools/whitelist/whitelist_verdict.h"
+
+namespace tally::tools {
+
+struct ScalarRow {
+  std::int32_t day;
+  std::int64_t value;
+};
+struct DistributionRow {
+  std::int32_t day;
+  DistributionSummary summary;
+};
+
+struct KeyStory {
+  explicit KeyStory(WhitelistFile file) : judge(std::move(file)) {}
+  std::string key;
+  std::int32_t day = 0;
+  // Every row of the key that the store has, by day.
+  std::vector<ScalarRow> scalarRows;
+  std::vector<DistributionRow> distributionRows;
+  bool measured = false;  // by the report itself, when it is written
+  // Of a key that has no rows and is not measured: keys of the store or the whitelist that may have
+  // been meant.
+  std::vector<std::string> similar;
+  WhitelistJudge judge;
+  KeyVerdict scalar, distribution;
+  // The day's log as it would be made now; null when there would be none.
+  KvRef<KvDictionary> next;
+  KeyTrace trace;                                 // of the key on its way into that log
+  std::optional<SubmittedLogs::Found> submitted;  // the newest log of the day
+  bool submissionAllowed = true;
+
+  // The kinds that the key is of: those that it has rows of or is measured as, both when there are
+  // none.
+  std::vector<KeyKind> kinds() const;
+  // Why the key does not stand in a log of the day as that kind; empty when it would.
+  std::string whyAbsent(KeyKind kind) const;
+};
+
+KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day);
+
+// The value that a log holds for the key; null when there is none.
+const KvObject* loggedValue(const DailyLog& log, std::string_view key, KeyKind kind);
+
+}  // namespace tally::tools

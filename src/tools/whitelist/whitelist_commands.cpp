@@ -1,0 +1,167 @@
+#include "tools/whitelist/whitelist_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <utility>
+
+#include "base/file.h"
+#include "kv/plist_codec.h"
+#include "tools/frame/table.h"
+#include "tools/whitelist/whitelist_check.h"
+#include "tools/whitelist/whitelist_verdict.h"
+
+namespace tally::tools {
+namespace {
+
+struct WhitelistArguments {
+  std::string file;
+  std::vector<std::string> keys;
+};
+
+WhitelistFile load(const WhitelistArguments& arguments) {
+  if (arguments.file.empty()) return loadWhitelistFile();
+  const auto bytes = readFile(arguments.file, kPlistMaximumBytes);
+  if (bytes) return parseWhitelistFile(*bytes);
+  WhitelistFile file;
+  file.fault = bytes.error().message;
+  return file;
+}
+
+std::string fileName(const WhitelistArguments& arguments) {
+  return arguments.file.empty() ? std::string(kWhitelistPath) : arguments.file;
+}
+
+class EntryCounter final : public WhitelistVisitor {
+ public:
+  std::size_t groups = 0, entries[kWhitelistSections] = {};
+  bool beginGroup(std::string_view) override { return ++groups > 0; }
+  void entry(WhitelistSection section, WhitelistEntry) override {
+    ++entries[static_cast<std::size_t>(section)];
+  }
+  void malformed(const WhitelistPlace&) override {}
+};
+
+std::size_t countOf(const std::vector<Finding>& findings, Severity severity) {
+  return static_cast<std::size_t>(std::ranges::count(findings, severity, &Finding::severity));
+}
+
+void printCheckJson(const ToolContext& context, const WhitelistArguments& arguments,
+                    const WhitelistFile& file, const std::vector<Finding>& findings) {
+  Json list = Json::array();
+  for (const Finding& finding : findings) {
+    Json item = {{"severity", finding.severity == Severity::Fault ? "fault" : "surprise"}};
+    const std::pair<const char*, const std::string*> levels[] = {{"group", &finding.group},
+                                                                 {"section", &finding.section},
+                                                                 {"key", &finding.key},
+                                                                 {"option", &finding.option}};
+    for (const auto& [name, text] : levels) {
+      if (!text->empty()) item[name] = *text;
+    }
+    item["message"] = finding.message;
+    list.push_back(std::move(item));
+  }
+  printJson(context, {{"file", fileName(arguments)},
+                      {"digest", file.digest},
+                      {"faults", countOf(findings, Severity::Fault)},
+                      {"surprises", countOf(findings, Severity::Surprise)},
+                      {"findings", std::move(list)}});
+}
+
+void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
+                const WhitelistFile& file, const std::vector<Finding>& findings) {
+  printLine(context, "Whitelist " + fileName(arguments), Ink::Strong);
+  if (file.root) {
+    EntryCounter counter;
+    visitWhitelist(*file.root, counter);
+    const auto& n = counter.entries;
+    printLine(context, fmt::format("  {}: scalars {} and {}, distributions {} and {}",
+                                   counted(counter.groups, "group"), counted(n[0], "key"),
+                                   n[2] == 1 ? "1 prefix" : fmt::format("{} prefixes", n[2]),
+                                   counted(n[1], "key"),
+                                   n[3] == 1 ? "1 prefix" : fmt::format("{} prefixes", n[3])));
+  }
+  if (!file.digest.empty()) printLine(context, "  digest " + file.digest);
+  if (!findings.empty()) print(context.out, "\n");
+  Table table({{""}, {"", Align::Left, true}});
+  for (const Finding& finding : findings) {
+    Cell severity = finding.severity == Severity::Fault ? Cell("fault", Ink::Bad)
+                                                        : Cell("surprise", Ink::Doubtful);
+    if (const std::string place = placeText(finding); !place.empty()) {
+      table.add({std::exchange(severity, ""), place});
+    }
+    table.add({severity, finding.message});
+  }
+  print(context.out, table.render(context.output, 0));
+  const auto faults = countOf(findings, Severity::Fault);
+  const auto surprises = countOf(findings, Severity::Surprise);
+  print(context.out, "\n");
+  printLine(context,
+            fmt::format("{}, {}", counted(faults, "fault"), counted(surprises, "surprise")),
+            faults > 0 ? Ink::Bad : Ink::Good);
+}
+
+int check(const ToolContext& context, const WhitelistArguments& arguments) {
+  const WhitelistFile file = load(arguments);
+  std::vector<Finding> findings;
+  if (file.root) {
+    findings = checkWhitelist(*file.root);
+  } else {
+    findings.push_back({Severity::Fault, "", "", "", "",
+                        "the file cannot be used, so nothing is reported: " + file.fault});
+  }
+  (context.json ? printCheckJson : printCheck)(context, arguments, file, findings);
+  return countOf(findings, Severity::Fault) > 0 ? kWrong : kSuccess;
+}
+
+int test(const ToolContext& context, const WhitelistArguments& arguments) {
+  const WhitelistJudge judge(load(arguments));
+  Json document = Json::array();
+  bool allReported = true;
+  for (const std::string& key : arguments.keys) {
+    const KeyVerdict verdicts[] = {judge.judge(key, KeyKind::Scalar),
+                                   judge.judge(key, KeyKind::Distribution)};
+    allReported = allReported && (verdicts[0].admitted() || verdicts[1].admitted());
+    if (context.json) {
+      document.push_back(
+          {{"key", key}, {"scalar", jsonOf(verdicts[0])}, {"distribution", jsonOf(verdicts[1])}});
+      continue;
+    }
+    printLine(context, key, Ink::Strong);
+    Table table({{""}, {""}, {"", Align::Left, true}});
+    for (const KeyVerdict& verdict : verdicts) {
+      std::string text = verdict.reason;
+      if (verdict.admitted()) text += "; " + optionsText(*verdict.match.options);
+      table.add({std::string("as a ") + std::string(kindName(verdict.kind)),
+                 verdict.admitted() ? Cell("reported", Ink::Good) : Cell("refused", Ink::Doubtful),
+                 text});
+    }
+    table.print(context);
+  }
+  if (context.json) printJson(context, document);
+  return allReported ? kSuccess : kWrong;
+}
+
+}  // namespace
+
+void addWhitelistCommands(CLI::App& app, ToolContext& context) {
+  const auto arguments = std::make_shared<WhitelistArguments>();
+  CLI::App* const whitelist =
+      app.add_subcommand("whitelist", "Check the whitelist, ask it of keys");
+  whitelist->require_subcommand(1);
+  const auto add = [&](const char* name, const char* description, auto run) {
+    return addCommand(whitelist, context, name, description,
+                      [&context, arguments, run] { return run(context, *arguments); });
+  };
+  constexpr const char* kFile = "A whitelist file in place of the device's";
+
+  CLI::App* command = add("check", "Find faults (exit status 1) and surprises", check);
+  command->add_option("FILE", arguments->file, kFile);
+
+  command = add("test", "Whether keys would be reported, and by which entry", test);
+  command->add_option("KEY", arguments->keys, "Keys of the metrics store")->required();
+  command->add_option("--file", arguments->file, kFile)->type_name("FILE");
+}
+
+}  // namespace tally::tools

@@ -1,0 +1,169 @@
+// The spool of analytics events: whole lines, within bounds, and only what the device wants.
+#include "host/spool/analytics_events.h"
+
+#include <random>
+
+#include "kv/json_writer.h"
+#include "host/temporary_root.h"
+
+namespace tally {
+namespace {
+
+using Names = std::vector<std::string>;
+
+class EventSpoolTest : public TemporaryRoot {
+ protected:
+  EventSpoolTest() {
+    preferences->calls = std::make_shared<fakes::CallLog>();
+    putPlist("device.plist", "<dict/>");
+  }
+  LinuxAnalyticsEvents service() {
+    const auto description = std::make_shared<DeviceDescription>(TemporaryRoot::folder(""), log);
+    return {analyticsEventsFolder(root),
+            log,
+            clock,
+            preferences,
+            description,
+            std::make_shared<SubmissionConsent>(root, log, preferences, description)};
+  }
+  bool send(std::string_view name, std::string_view text = "x") {
+    return service().PulseSendEventLazy(name, [&] {
+      ++built;
+      return KvDictionary::create({{"text", KvString::create(text)}});
+    });
+  }
+  std::string spooled() const {
+    std::string all;
+    for (const std::string& name : names(folder)) all += get(folder + "/" + name);
+    return all;
+  }
+
+  const std::string folder = "var/mobile/Library/Logs/AnalyticsEvents";
+  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
+  std::shared_ptr<fakes::FakePreferences> preferences = std::make_shared<fakes::FakePreferences>();
+  int built = 0;
+};
+
+TEST_F(EventSpoolTest, OneObjectALineAndTornLinesAreCut) {
+  clock->setDay(20000, 1.5);
+  EXPECT_TRUE(send("a", "1"));
+  const std::string line =
+      "{\"event\":\"a\",\"time\":\"2024-10-04T00:00:01Z\",\"payload\":{\"text\":\"1\"}}\n";
+  EXPECT_EQ(spooled(), line);
+  const std::string file = folder + "/0000000001-events.jsonl";
+  put(file, line + line.substr(0, line.size() - 1));
+  EXPECT_TRUE(send("a", "1"));
+  EXPECT_EQ(spooled(), line + line);
+  put(folder + "/0000000007-other.txt", "not ours");
+  EXPECT_TRUE(send("a", "1"));
+  EXPECT_EQ(get(folder + "/0000000007-other.txt"), "not ours");
+  EXPECT_EQ(get(folder + "/0000000008-events.jsonl"), line);
+  EXPECT_TRUE(errors().empty());
+  std::filesystem::create_directories(at(folder + "/0000000009-events.jsonl"));
+  EXPECT_TRUE(send("a", "1"));
+  EXPECT_EQ(get(folder + "/0000000010-events.jsonl"), line);
+  EXPECT_EQ(errors().size(), 1u);
+}
+
+TEST_F(EventSpoolTest, TheDescriptionSaysWhatIsWanted) {
+  const struct {
+    const char* entry;
+    bool available;
+    std::string wanted;  // of a, b, bc
+    std::size_t errors;
+  } cases[] = {
+      {"", true, "a b bc", 0},
+      {"<key>AnalyticsEvents</key><dict/>", true, "a b bc", 0},
+      {"<key>AnalyticsEvents</key><dict><key>Absent</key><true/></dict>", false, "", 0},
+      {"<key>AnalyticsEvents</key><dict><key>Wanted</key><array/></dict>", true, "", 0},
+      {"<key>AnalyticsEvents</key><dict><key>Wanted</key><array><string>b</string>"
+       "<integer>1</integer></array></dict>",
+       true, "b", 0},
+      {"<key>AnalyticsEvents</key><dict><key>Wanted</key><array><string>b*</string></array>"
+       "</dict>",
+       true, "b bc", 0},
+      {"<key>AnalyticsEvents</key><dict><key>Wanted</key><string>b</string></dict>", true, "", 1},
+      {"<key>AnalyticsEvents</key><string>b</string>", true, "a b bc", 1},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.entry);
+    useBoundedLog();
+    built = 0;
+    putPlist("device.plist", std::string("<dict>") + c.entry + "</dict>");
+    LinuxAnalyticsEvents events = service();
+    EXPECT_EQ(events.isAvailable(), c.available);
+    std::string sent;
+    for (const char* name : {"a", "b", "bc"}) {
+      if (events.PulseSendEventLazy(name, [&] { return ++built, KvDictionary::create(); })) {
+        sent += (sent.empty() ? "" : " ") + std::string(name);
+      }
+    }
+    EXPECT_EQ(sent, c.wanted);
+    EXPECT_EQ(static_cast<std::size_t>(built),
+              c.wanted.empty() ? 0 : 1 + std::count(sent.begin(), sent.end(), ' '))
+        << "built without need";
+    EXPECT_EQ(errors().size(), c.errors);
+  }
+}
+
+TEST_F(EventSpoolTest, TheFolderStaysWithinItsBounds) {
+  preferences->put("SpoolMaximumBytes", KvNumber::int32(4000), "vellum.tallyd.tallyrun");
+  for (int i = 0; i < 60; ++i) ASSERT_TRUE(send(std::to_string(i), std::string(300, 'x')));
+  std::size_t bytes = 0;
+  for (const std::string& name : names(folder)) bytes += get(folder + "/" + name).size();
+  EXPECT_LE(bytes, 4000u);
+  EXPECT_GT(bytes, 2000u);
+  EXPECT_NE(spooled().find("\"event\":\"59\""), std::string::npos);
+  EXPECT_FALSE(send("large", std::string(4000, 'x')));
+  EXPECT_EQ(errors().size(), 1u);
+}
+
+TEST_F(EventSpoolTest, SendersTakeTurnsAndKillsLeaveWholeLines) {
+  runTogether(4, [&](int i) {
+    bool all = true;
+    for (int n = 0; n < 20; ++n) all = send(std::to_string(i), std::string(2000, 'y')) && all;
+    return all;
+  });
+  const std::string text = spooled();
+  EXPECT_EQ(std::count(text.begin(), text.end(), '\n'), 80);
+  std::mt19937 random(5);
+  for (int round = 0; round < 10; ++round) {
+    runAndKill(random() % 3000, [&] {
+      for (;;) send("killed", std::string(5000, 'z'));
+    });
+  }
+  EXPECT_TRUE(send("last"));
+  const std::string after = spooled();
+  for (std::size_t at = 0; at < after.size();) {
+    const std::size_t end = after.find('\n', at);
+    ASSERT_NE(end, std::string::npos);
+    EXPECT_EQ(after.compare(at, 10, "{\"event\":\""), 0);
+    EXPECT_EQ(after.compare(end - 3, 3, "\"}}"), 0);
+    at = end + 1;
+  }
+}
+
+TEST(Json, EveryKindOfValueOnOneLine) {
+  const auto bytes = std::as_bytes(std::span("ab", 2));
+  const auto value = KvDictionary::create(
+      {{"q\"\\\n\x7f", KvString::create("\x1b[2J\xc3\xa9")},
+       {"n", KvArray::create({KvNumber::int8(-1), KvNumber::int64(INT64_MIN),
+                              KvNumber::uint64(UINT64_MAX), KvNumber::float32(0.1f),
+                              KvNumber::float64(1e22), KvNumber::float64(-INFINITY)})},
+       {"o", KvArray::create({KvBoolean::of(true), KvDate::create(0), KvData::create(bytes),
+                              KvArray::create(), KvDictionary::create()})}});
+  std::string text;
+  appendJson(text, *value);
+  EXPECT_EQ(text,
+            "{\"q\\\"\\\\\\u000a\\u007f\":\"\\u001b[2J\xc3\xa9\","
+            "\"n\":[-1,-9223372036854775808,18446744073709551615,0.1,1e+22,\"-inf\"],"
+            "\"o\":[true,\"1970-01-01T00:00:00Z\",\"YWI=\",[],{}]}");
+  KvRef<KvArray> deep = KvArray::create();
+  for (int i = 0; i < 2000; ++i) deep = KvArray::create({deep});
+  text.clear();
+  appendJson(text, *deep);
+  EXPECT_EQ(text, std::string(512, '[') + "null" + std::string(512, ']'));
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,289 @@
+// What faults and hostile files leave of the metrics store, and what they reach beside it.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <functional>
+#include <random>
+
+#include "host/store_fixture.h"
+#include "host/store/store_history.h"
+#include "host/store/store_importer.h"
+
+namespace tally {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
+  const struct {
+    const char* name;
+    std::function<void()> spoil;
+    const char* reason;
+  } cases[] = {
+      {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
+      {"zeros", [&] { put("data/TBDataStore.sqlitedb", std::string(9000, '\0')); },
+       "not a database"},
+      {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
+      {"newer", [&] { sql("PRAGMA user_version = 2"); }, "newer version"},
+      {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
+      {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE chunks"); }, "its tables are not"},
+      {"endless view",
+       [&] {
+         sql("DROP TABLE scalars; CREATE VIEW scalars AS WITH RECURSIVE n(x) AS (SELECT 1 UNION "
+             "ALL "
+             "SELECT x + 1 FROM n) SELECT x AS day, 'k' AS key, 1 AS value FROM n");
+       },
+       "its tables are not"},
+      {"trigger",
+       [&] { sql("CREATE TRIGGER t AFTER INSERT ON scalars BEGIN DELETE FROM chunks; END"); },
+       "its tables are not"},
+      {"virtual table", [&] { sql("CREATE VIRTUAL TABLE v USING fts5(x)"); }, "its tables are not"},
+      {"computed column", [&] { sql("ALTER TABLE scalars ADD COLUMN x AS (day + 1)"); },
+       "its tables are not"},
+      {"folder",
+       [&] {
+         std::filesystem::remove(path);
+         std::filesystem::create_directories(path);
+       },
+       "not a regular file"},
+      {"pipe",
+       [&] {
+         std::filesystem::remove(path);
+         ASSERT_EQ(::mkfifo(path.c_str(), 0600), 0);
+       },
+       "not a regular file"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("data"));
+    store()->TBClientSetValueForScalarKey("a", 1);
+    c.spoil();
+    const std::string before = get("data/TBDataStore.sqlitedb");
+    useBoundedLog();
+    const auto spoiled = store();
+    spoiled->TBClientCheckpoint();
+    spoiled->openHistory()->enumerateScalars(
+        "", kFirst, kLast, [](std::string_view, std::int32_t, std::int64_t, bool&) { FAIL(); });
+    spoiled->TBClientSetValueForScalarKey("b", 2);
+    ASSERT_EQ(errors().size(), 1u) << testing::PrintToString(errors());
+    EXPECT_THAT(errors()[0], testing::HasSubstr(path));
+    EXPECT_THAT(errors()[0], testing::HasSubstr(c.reason));
+    EXPECT_EQ(get("data/TBDataStore.sqlitedb"), before);
+  }
+}
+
+TEST_F(StoreTest, NoForeignFileIsOpenedGivenAwayOrRemoved) {
+  if (::geteuid() != 0) GTEST_SKIP() << "needs a directory of another user";
+  constexpr uid_t kUser = 65534;
+  const auto link = [&](const std::string& end) {
+    std::filesystem::create_symlink(at("precious"), path + end);
+  };
+  const auto hardLink = [&](const std::string& end) {
+    std::filesystem::create_hard_link(at("precious"), path + end);
+  };
+  const auto pipe = [&](const std::string& end) {
+    ASSERT_EQ(::mkfifo((path + end).c_str(), 0600), 0);
+  };
+  // When it has been rolled back, SQLite removes the file that it names.
+  const auto journal = [&](const std::string& end) {
+    const auto word = [](std::uint64_t number) {
+      std::string bytes;
+      for (int shift = 24; shift >= 0; shift -= 8) bytes += static_cast<char>(number >> shift);
+      return bytes;
+    };
+    const std::string magic = "\xd9\xd5\x05\xf9\x20\xa1\x63\xd7", name = at("precious");
+    std::string text = magic + word(0) + word(0) + word(std::filesystem::file_size(path) / 8192) +
+                       word(512) + word(8192);
+    text.resize(512);
+    std::size_t sum = 0;
+    for (const char c : name) sum += static_cast<unsigned char>(c);
+    put("data/TBDataStore.sqlitedb" + end,
+        text + word((1u << 30) / 8192 + 1) + name + word(name.size()) + word(sum) + magic);
+  };
+  const struct {
+    const char* name;
+    const char* end;
+    std::function<void(const std::string&)> make;
+    bool refused = true;
+  } cases[] = {
+      {"link", "", link},
+      {"link", "-wal", link},
+      {"link", "-shm", link},
+      {"link", "-journal", link},
+      {"hard link", "", hardLink},
+      {"hard link", "-wal", hardLink},
+      {"hard link", "-shm", hardLink},
+      {"hard link", "-journal", hardLink},
+      {"pipe", "-wal", pipe},
+      {"pipe", "-shm", pipe},
+      {"pipe", "-journal", pipe},
+      {"journal of a foreign file", "-journal", journal, false},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(std::string(c.name) + " " + c.end);
+    std::filesystem::remove_all(at("data"));
+    std::filesystem::create_directory(at("data"));
+    ASSERT_EQ(::chown(at("data").c_str(), kUser, kUser), 0);
+    store()->TBClientSetValueForScalarKey("a", 1);
+    put("precious", "root's");
+    if (*c.end == '\0') std::filesystem::remove(path);
+    c.make(c.end);
+    useBoundedLog();
+    const auto spoiled = store();
+    spoiled->TBClientCheckpoint();
+    spoiled->TBClientSetValueForScalarKey("b", 2);
+    (void)spoiled->openHistory();
+    EXPECT_EQ(errors().size(), c.refused ? 1u : 0u) << testing::PrintToString(errors());
+    for (const std::string& error : errors()) {
+      EXPECT_THAT(error, testing::HasSubstr(path + c.end));
+    }
+    struct stat status {};
+    ASSERT_EQ(::stat(at("precious").c_str(), &status), 0);
+    EXPECT_EQ(status.st_uid, 0u);
+    EXPECT_EQ(get("precious"), "root's");
+  }
+}
+
+TEST_F(StoreTest, WhatHasNoEndIsEnded) {
+  store()->TBClientSetValueForScalarKey("a", 1);
+  auto database = Database::openAtPath(path, Database::Access::ReadOnly);
+  ASSERT_TRUE(database);
+  const auto counted = database->integer(
+      "WITH RECURSIVE n(x) AS (SELECT 1 UNION ALL SELECT x + 1 FROM n) SELECT count(*) FROM n");
+  ASSERT_FALSE(counted);
+  EXPECT_THAT(counted.error().message, testing::HasSubstr("no end"));
+
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    for (int i = 0; i < 4000; ++i) {
+      if (auto set = writer.setScalar(1, std::to_string(i), i); !set) return set;
+    }
+    return Done{};
+  }));
+  const auto page =
+      std::stoul(sql("SELECT rootpage - 1 FROM sqlite_schema WHERE name = 'scalars'")) * 8192;
+  std::string spoiled = get("data/TBDataStore.sqlitedb");
+  const std::string child = spoiled.substr(page + 8, 4);  // the last one, now in place of each
+  const auto word = [&](std::size_t at) {
+    return static_cast<unsigned char>(spoiled[at]) * 256u +
+           static_cast<unsigned char>(spoiled[at + 1]);
+  };
+  for (std::size_t cell = 0; cell < word(page + 3); ++cell) {
+    spoiled.replace(page + word(page + 12 + 2 * cell), 4, child);
+  }
+  put("data/TBDataStore.sqlitedb", spoiled);
+  useBoundedLog();
+  EXPECT_LT(scalars().size(), 4000u);
+  ASSERT_EQ(errors().size(), 1u);
+  EXPECT_THAT(errors()[0], testing::HasSubstr("out of order"));
+}
+
+TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
+  ASSERT_TRUE(push(1, "good", {1, 2, 3}, true) && push(1, "good", {4}));
+  store()->TBClientSetValueForScalarKey("good", 1);
+  const char* const damage[] = {
+      "INSERT INTO scalars VALUES (1, 'text', 'x')",
+      "INSERT INTO scalars VALUES (1, 'real', 1.5)",
+      "INSERT INTO scalars VALUES (1, '', 1)",
+      "INSERT INTO scalars VALUES (1, CAST(x'61ff' AS TEXT), 1)",
+      "INSERT INTO chunks VALUES (1, 'good', 5, 2, zeroblob(16), zeroblob(4))",
+      "INSERT INTO chunks VALUES (1, 'lie', 0, 3, zeroblob(16), zeroblob(8))",
+      "INSERT INTO chunks VALUES (1, 'negative', 0, -1, x'', x'')",
+      "INSERT INTO chunks VALUES (1, 'huge', 0, 1152921504606846976, zeroblob(8), zeroblob(4))",
+      "INSERT INTO chunks VALUES (1, 'numbers', 0, 'two', 3, 4.5)",
+      "INSERT INTO chunks VALUES (1, 'last', 2147483647, 1, zeroblob(8), zeroblob(4))",
+      "INSERT INTO recent VALUES (1, 'odd', 0, 1, zeroblob(7), zeroblob(4))",
+      "INSERT INTO recent VALUES (1, 'good', -7, 1, zeroblob(8), x'')",
+      "INSERT INTO recent VALUES (9223372036854775807, 'far', 0, 1, zeroblob(8), zeroblob(4))",
+  };
+  for (const char* text : damage) sql(text);
+  clock->setDay(1);
+  const auto check = [&] {
+    useBoundedLog();
+    EXPECT_THAT(scalars(), ElementsAre("20514 good=1"));
+    EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1"));
+    ASSERT_EQ(errors().size(), 2u) << "one line for each enumeration";
+    EXPECT_THAT(errors()[0], testing::HasSubstr("damaged rows are left out"));
+  };
+  check();
+  store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "3") << "the damaged ones and the far day stay";
+  check();
+}
+
+TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
+  ASSERT_TRUE(push(1, "d", sequence(0, 9000), true) && push(1, "e", sequence(0, 300)));
+  for (int i = 0; i < 41; ++i) {
+    ASSERT_TRUE(write([&](StoreWriter& w) { return w.setScalar(1, std::to_string(i), i); }));
+  }
+  const std::string whole = get("data/TBDataStore.sqlitedb");
+  std::minstd_rand random(11);
+  for (int round = 0; round < 120; ++round) {
+    std::string spoiled = whole;
+    for (int i = 0; i < 12; ++i) spoiled[random() % whole.size()] = static_cast<char>(random());
+    if (round % 3 == 0) spoiled.resize(random() % whole.size());
+    for (const auto& file : names("data")) std::filesystem::remove(at("data/" + file));
+    put("data/TBDataStore.sqlitedb", spoiled);
+    const auto rows = scalars();
+    EXPECT_LE(rows.size(), 41u);
+    (void)lengths();
+    store()->TBClientCheckpoint();
+    listStoreKeys(
+        storeFile, [](const StoreKey&) {}, [](const std::string&) {});
+  }
+}
+
+TEST_F(StoreTest, AKillLeavesAllOfATransactionOrNothing) {
+  constexpr std::int64_t kEach = 20000;
+  ASSERT_TRUE(push(kToday, "first", {1}));
+  std::minstd_rand random(3);
+  std::int64_t before = 0;
+  for (int round = 0; round < 25; ++round) {
+    const bool import = round % 2 == 0;
+    ASSERT_TRUE(import || push(kToday, "second", sequence(0, 5000)));
+    before = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
+    runAndKill(random() % 30'000, [&] {
+      if (!import) return store()->TBClientCheckpoint();
+      StoreImporter importer(storeFile);
+      for (std::int64_t i = 0; i < kEach; ++i) {
+        (void)importer.addSample(kToday, "k" + std::to_string(i % 50), 0, 1);
+        (void)importer.addScalar(kToday, "s" + std::to_string(i % 50), round);
+      }
+      (void)importer.finish();
+    });
+    ASSERT_EQ(sql("PRAGMA integrity_check"), "ok");
+    if (import) {
+      const auto recent = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM recent"));
+      const auto after = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
+      const bool nothing = after == before, all = recent == 0 && after >= before + kEach;
+      ASSERT_TRUE(nothing || all) << before << " became " << after;
+    } else {
+      std::int64_t samples = 0;
+      for (const auto& row : distributions("second")) samples += std::ssize(row.values);
+      ASSERT_EQ(samples, (round + 1) / 2 * 5000);
+    }
+  }
+}
+
+TEST_F(StoreTest, AFullVolumeUndoesTheTransactionAndAReadOnlyOneCanBeRead) {
+  const TinyVolume volume(at("data"), "size=1m");
+  if (!volume) GTEST_SKIP() << "needs the right to mount";
+  ASSERT_TRUE(push(kToday, "d", {1, 2, 3}));
+  {
+    StoreImporter importer(storeFile);
+    Status imported = Done{};
+    for (int i = 0; imported && i < 2'000'000; ++i) {
+      imported = importer.addSample(kToday, "big" + std::to_string(i % 9), 0, 1);
+    }
+    EXPECT_FALSE(imported && importer.finish()) << "2 million samples in 1 MiB";
+  }
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
+  ASSERT_EQ(::mount("tally", at("data").c_str(), "tmpfs", MS_REMOUNT | MS_RDONLY, ""), 0);
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
+  EXPECT_THAT(errors(), IsEmpty());
+  store()->TBClientSetValueForScalarKey("a", 1);
+  EXPECT_EQ(errors().size(), 1u);
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,201 @@
+// The statistics hub: what it refuses, what it shares, how frames follow one another.
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <numeric>
+
+#include "host/described_device.h"
+#include "host/described/described_frames.h"
+
+namespace tally {
+namespace {
+
+using tests::DescribedDevice;
+
+constexpr std::uint32_t kStart = 0, kConfigure = 2, kUpdate = 3;
+constexpr std::uint64_t kState = 2;  // the format of a state channel
+
+// A driver with three channels: 1 counts over four frames, 2 has two states, 3 is malformed.
+std::string described(const std::string& hub) {
+  return "<dict><key>Entries</key><array><dict><key>Class</key><string>HwReportHub</string>"
+         "<key>Hub</key><dict>" +
+         hub + R"(</dict></dict>
+    <dict><key>Class</key><string>Driver</string><key>ID</key><integer>5</integer>
+      <key>Properties</key><dict>
+      <key>HwReportLegend</key><array><dict><key>HwReportChannels</key><array>
+        <array><integer>1</integer><integer>1</integer></array></array></dict></array>
+      <key>HwReportValues</key><array>
+      <dict><key>Channel</key><integer>1</integer><key>Frames</key><array>
+        <integer>10</integer><integer>17</integer><integer>-1</integer><real>-2.5</real></array></dict>
+      <dict><key>Channel</key><integer>2</integer><key>Value</key><array>
+        <dict><key>ID</key><string>IDLE</string><key>InTransitions</key><integer>3</integer>
+          <key>Residency</key><integer>99</integer><key>Time</key><integer>8</integer></dict>
+        <dict><key>ID</key><string>BUSY</string></dict></array></dict>
+      <dict><key>Channel</key><integer>3</integer><key>Value</key><string>x</string></dict>
+      </array></dict></dict></array></dict>)";
+}
+
+std::vector<std::byte> interestList(std::uint32_t count,
+                                    const std::vector<std::array<std::uint64_t, 3>>& entries) {
+  std::vector<std::byte> list(8 + 24 * entries.size());
+  std::memcpy(list.data(), &count, sizeof count);
+  if (!entries.empty()) std::memcpy(list.data() + 8, entries.data(), 24 * entries.size());
+  return list;
+}
+
+struct Hub {
+  explicit Hub(const std::string& description) : device(described(description).c_str()) {
+    connection = device.connect("HwReportHub");
+  }
+  RegistryResult start() {
+    MethodCall call;
+    return device.registry().ConnectionCallMethod(connection, kStart, call);
+  }
+  RegistryResult configure(const std::vector<std::byte>& list) {
+    MethodCall call{.structInput = list, .scalarOutput = {&token, 1}};
+    return device.registry().ConnectionCallMethod(connection, kConfigure, call);
+  }
+  RegistryResult map() {
+    return device.registry().ConnectionMapMemory(connection, static_cast<std::uint32_t>(token),
+                                                 kMapAnywhere, &memory, &length);
+  }
+  RegistryResult update() {
+    MethodCall call{.scalarInput = {&token, 1}};
+    return device.registry().ConnectionCallMethod(connection, kUpdate, call);
+  }
+  std::uint64_t word(std::size_t offset) const {
+    std::uint64_t value = 0;
+    std::memcpy(&value, memory + offset, sizeof value);
+    return value;
+  }
+  DescribedDevice device;
+  ConnectionHandle connection = 0;
+  std::uint64_t token = 0;
+  const std::byte* memory = nullptr;
+  std::size_t length = 0;
+};
+
+const auto kOneInterest = interestList(1, {{5, 1, 1}});
+
+TEST(StatisticsHub, RefusesMalformedInterestLists) {
+  const std::vector<std::byte> cut(kOneInterest.begin(), kOneInterest.begin() + 31);
+  auto reserved = kOneInterest;
+  reserved[4] = std::byte{1};
+  const struct {
+    const char* name;
+    std::vector<std::byte> list;
+  } cases[] = {
+      {"empty", {}},
+      {"a header cut short", std::vector<std::byte>(7)},
+      {"no entries", interestList(0, {})},
+      {"a count above the entries", interestList(2, {{5, 1, 1}})},
+      {"a count below them", interestList(1, {{5, 1, 1}, {5, 2, 2}})},
+      {"a count that overflows", interestList(0x0AAAAAAB, {{5, 1, 1}})},
+      {"the largest count", interestList(UINT32_MAX, {{5, 1, 1}})},
+      {"an entry cut short", cut},
+      {"a reserved word in use", reserved},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    Hub hub("");
+    ASSERT_EQ(hub.start(), 0u);
+    EXPECT_EQ(hub.configure(c.list), kRegistryBadArgument);
+    EXPECT_NE(hub.map(), 0u);
+    EXPECT_NE(hub.update(), 0u);
+  }
+}
+
+TEST(StatisticsHub, KeepsTheOrderOfCalls) {
+  Hub hub("");
+  EXPECT_EQ(hub.configure(kOneInterest), kRegistryNotOpen);
+  EXPECT_EQ(hub.update(), kRegistryNotOpen);
+  ASSERT_EQ(hub.start(), 0u);
+  ASSERT_EQ(hub.configure(kOneInterest), 0u);
+  EXPECT_EQ(hub.configure(kOneInterest), kRegistryBadArgument);
+  ++hub.token;
+  EXPECT_NE(hub.map(), 0u);
+  EXPECT_NE(hub.update(), 0u);
+}
+
+TEST(StatisticsHub, FailsWhereTheDescriptionSaysSo) {
+  const char* const steps[] = {"Open", "Start", "Configure", "Map", "Update"};
+  for (std::size_t failing = 0; failing < std::size(steps); ++failing) {
+    SCOPED_TRACE(steps[failing]);
+    Hub hub("<key>" + std::string(steps[failing]) + "Status</key><integer>3758097084</integer>");
+    EXPECT_EQ(hub.connection == 0, failing == 0);
+    const RegistryResult results[] = {hub.start(), hub.configure(kOneInterest), hub.map(),
+                                      hub.update()};
+    for (std::size_t i = 0; failing > 0 && i < failing; ++i) {
+      EXPECT_EQ(results[i], i + 1 == failing ? 0xE00002BCu : 0u);
+    }
+    if (hub.connection != 0) hub.device.registry().ServiceCloseConnection(hub.connection);
+    EXPECT_EQ(hub.device.openHandles(), 0u);
+  }
+}
+
+TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
+  Hub hub("");
+  ASSERT_EQ(hub.start(), 0u);
+  // The second channel and the counter; a malformed one, an unknown one and a stranger's are not
+  // served.
+  ASSERT_EQ(
+      hub.configure(interestList(5, {{5, 2, kState}, {5, 3, 1}, {5, 1, 0}, {5, 9, 1}, {6, 1, 1}})),
+      0u);
+  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_EQ(hub.length, 3 * kElementSize);
+  const struct {
+    const char* name;
+    std::uint64_t counter;
+  } refreshes[] = {{"first", 10},
+                   {"second", 17},
+                   {"third", ~std::uint64_t{0}},
+                   {"a real", ~std::uint64_t{1}},
+                   {"after the last", ~std::uint64_t{1}}};
+  for (const auto& refresh : refreshes) {
+    SCOPED_TRACE(refresh.name);
+    ASSERT_EQ(hub.update(), 0u);
+    EXPECT_EQ(hub.word(2 * kElementSize + ElementLayout::values), refresh.counter);
+  }
+  EXPECT_EQ(hub.word(ElementLayout::driver), 5u);
+  EXPECT_EQ(hub.word(ElementLayout::channel), 2u);
+  EXPECT_EQ(hub.word(ElementLayout::type), kState | std::uint64_t{2} << 32);
+  EXPECT_EQ(hub.word(ElementLayout::time), 8u);
+  EXPECT_EQ(hub.word(ElementLayout::values), 0x49444C45u);
+  EXPECT_EQ(hub.word(ElementLayout::values + 16), 99u);
+  EXPECT_EQ(hub.word(kElementSize + ElementLayout::values + 16), kMissingValue);
+  // The type that nobody stated is the legend's.
+  EXPECT_EQ(hub.word(2 * kElementSize + ElementLayout::type), 1 | std::uint64_t{1} << 32);
+  EXPECT_EQ(hub.device.registry().ConnectionUnmapMemory(
+                hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),
+            0u);
+  EXPECT_NE(hub.device.registry().ConnectionUnmapMemory(
+                hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),
+            0u);
+}
+
+TEST(StatisticsHub, HasARunOfNobodysWhenNothingIsServed) {
+  Hub hub("");
+  ASSERT_EQ(hub.start(), 0u);
+  ASSERT_EQ(hub.configure(interestList(2, {{5, 9, 1}, {6, 1, 1}})), 0u);
+  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_EQ(hub.update(), 0u);
+  EXPECT_EQ(hub.length, kElementSize);
+  EXPECT_EQ(hub.word(ElementLayout::driver), kMissingValue);
+  EXPECT_EQ(hub.word(ElementLayout::channel), kMissingValue);
+  EXPECT_EQ(hub.word(ElementLayout::type), std::uint64_t{1} << 32) << "not a run of no elements";
+}
+
+TEST(StatisticsHub, ServesRawRegionsVerbatim) {
+  Hub hub("<key>RawFrames</key><array><data>AQID</data><data>/w==</data></array>");
+  ASSERT_EQ(hub.start(), 0u);
+  ASSERT_EQ(hub.configure(kOneInterest), 0u);
+  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_EQ(hub.length, 3u);
+  hub.update();
+  EXPECT_EQ(std::memcmp(hub.memory, "\1\2\3", 3), 0);
+  hub.update();
+  EXPECT_EQ(std::memcmp(hub.memory, "\xff\0\0", 3), 0);
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,212 @@
+// The spool: whole logs or none, within bounds, oldest out first.
+#include "host/spool/log_spool.h"
+
+#include <random>
+
+#include "host/temporary_root.h"
+
+namespace tally {
+namespace {
+
+using Names = std::vector<std::string>;
+
+class SpoolTest : public TemporaryRoot {
+ protected:
+  SpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
+  std::shared_ptr<SubmissionConsent> consent() {
+    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
+    return std::make_shared<SubmissionConsent>(root, log, preferences, description);
+  }
+  SpoolSubmission spool() { return {folder("spool"), log, clock, preferences, consent()}; }
+  bool submit(std::string_view body, std::string_view name = "log-test",
+              const KvDictionary* options = nullptr) {
+    return spool().SMAWriteLogForSubmission("193", name, options, nullptr,
+                                            [body](LogFile& file) { file.write(body); });
+  }
+  std::vector<SpooledLog> list() const {
+    auto logs = SpoolReader(folder("spool")).list();
+    EXPECT_TRUE(logs);
+    return *std::move(logs);
+  }
+  std::string body(const SpooledLog& entry) const {
+    return *SpoolReader(folder("spool")).readBody(entry, 1u << 30);
+  }
+  void bound(const char* key, std::int32_t value) {
+    preferences->put(key, KvNumber::int32(value), "vellum.tallyd.tallyrun");
+  }
+
+  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
+  std::shared_ptr<fakes::FakePreferences> preferences = std::make_shared<fakes::FakePreferences>();
+};
+
+TEST_F(SpoolTest, KeepsBodyAndInformation) {
+  clock->now = 1000;
+  const auto options = KvDictionary::create({{"previous_os_version", KvString::create("1.0")}});
+  const std::string bytes("<plist>\0\xff\n", 10);
+  ASSERT_TRUE(submit(bytes, "log-tallyd", options.get()));
+  clock->now = 10;  // the clock went back: age is the number's
+  ASSERT_TRUE(submit("", "empty"));
+  EXPECT_EQ(names("spool"), (Names{"0000000001-log-tallyd.info.plist", "0000000001-log-tallyd.log",
+                                   "0000000002-empty.info.plist", "0000000002-empty.log"}));
+  const auto logs = list();
+  ASSERT_EQ(logs.size(), 2u);
+  EXPECT_EQ(body(logs[0]), bytes);
+  EXPECT_EQ(logs[0].typeCode, "193");
+  EXPECT_EQ(logs[0].name, "log-tallyd");
+  EXPECT_EQ(logs[0].creationTime, 1000);
+  EXPECT_TRUE(kvEqual(logs[0].options.get(), options.get()));
+  EXPECT_FALSE(logs[1].options);
+  EXPECT_EQ(logs[1].bytes, 0u);
+  for (const std::string& name : names("spool")) {
+    EXPECT_EQ(std::filesystem::status(at("spool/" + name)).permissions(),
+              std::filesystem::perms(0600));
+  }
+}
+
+TEST_F(SpoolTest, TheOldestGoWhenABoundIsReached) {
+  bound("SpoolMaximumLogs", 3);
+  for (const char* text : {"a", "b", "c", "d", "e"}) ASSERT_TRUE(submit(text));
+  std::string kept;
+  for (const auto& entry : list()) kept += body(entry);
+  EXPECT_EQ(kept, "cde");
+  EXPECT_EQ(names("spool").size(), 6u) << "information of a removed log";
+
+  bound("SpoolMaximumLogs", 0);  // no bound: the default
+  bound("SpoolMaximumBytes", 3500);
+  ASSERT_TRUE(submit(std::string(2500, 'f')));
+  const auto logs = list();
+  EXPECT_EQ(body(logs.back()), std::string(2500, 'f'));
+  EXPECT_EQ(logs.size(), 2u) << "a third log and its information of about 370 bytes are too much";
+  std::uint64_t bytes = 0;
+  for (const std::string& name : names("spool")) bytes += *fileSize(at("spool/" + name));
+  EXPECT_LE(bytes, 3500u);
+
+  std::filesystem::create_directories(at("spool/0000000000-in-the-way.log"));
+  bound("SpoolMaximumLogs", 1);
+  ASSERT_TRUE(submit("g"));
+  EXPECT_EQ(names("spool").size(), 3u) << "what cannot be removed keeps older logs";
+}
+
+TEST_F(SpoolTest, RefusalsLeaveNothingBehindAndCostNoLog) {
+  ASSERT_TRUE(submit("first"));
+  const auto before = names("spool");
+  bound("SpoolMaximumBytes", 2000);
+  const struct {
+    const char* name;
+    std::function<bool()> attempt;
+    const char* reason;
+  } cases[] = {
+      {"larger than the spool", [&] { return submit(std::string(2001, 'x')); }, "larger than"},
+      {"unsafe name", [&] { return submit("x", "../x"); }, "not a name"},
+      {"name of a temporary file", [&] { return submit("x", "a.tmp~1"); }, "not a name"},
+      {"name too long", [&] { return submit("x", std::string(190, 'n')); }, "not a name"},
+      {"larger in pieces",
+       [&] {
+         return spool().SMAWriteLogForSubmission("1", "pieces", nullptr, nullptr,
+                                                 [](LogFile& file) {
+                                                   for (int i = 0; i < 30; ++i)
+                                                     file.write(std::string(100, 'p'));
+                                                 });
+       },
+       "larger than"},
+      {"reserved",
+       [&] {
+         const auto reserved = KvString::create("x");
+         return spool().SMAWriteLogForSubmission("1", "r", nullptr, reserved.get(),
+                                                 [](LogFile&) {});
+       },
+       "reserved"},
+      {"nested",
+       [&] {
+         auto submission = spool();
+         bool inner = true;
+         submission.SMAWriteLogForSubmission("1", "outer", nullptr, nullptr, [&](LogFile& file) {
+           inner =
+               submission.SMAWriteLogForSubmission("1", "inner", nullptr, nullptr, [](LogFile&) {});
+           file.write(std::string(5000, 'o'));
+         });
+         return inner;
+       },
+       "submitted while"},
+  };
+  for (const auto& c : cases) {
+    log->lines.clear();
+    EXPECT_FALSE(c.attempt()) << c.name;
+    ASSERT_FALSE(errors().empty()) << c.name;
+    EXPECT_NE(errors()[0].find(c.reason), std::string::npos) << errors()[0];
+    EXPECT_EQ(names("spool"), before) << c.name;
+  }
+}
+
+TEST_F(SpoolTest, AVolumeIsNotFilledToItsEnd) {
+  const TinyVolume volume(at("spool"), "size=17m");
+  if (!volume) GTEST_SKIP() << "mounting is not allowed here";
+  EXPECT_TRUE(submit(std::string(100'000, 'a')));
+  EXPECT_FALSE(submit(std::string(1'000'000, 'b')));
+  ASSERT_EQ(errors().size(), 1u);
+  EXPECT_NE(errors()[0].find("bytes are left on the volume"), std::string::npos) << errors()[0];
+  EXPECT_EQ(list().size(), 1u);
+  EXPECT_EQ(names("spool").size(), 2u);
+}
+
+TEST_F(SpoolTest, AFolderThatCannotBeWrittenIsOneErrorLine) {
+  put("spool", "a file where the folder should be");
+  EXPECT_FALSE(submit("x"));
+  EXPECT_EQ(errors().size(), 1u);
+  EXPECT_EQ(get("spool"), "a file where the folder should be");
+}
+
+TEST_F(SpoolTest, AKillLeavesNoHalfLog) {
+  const std::string text(200'000, 'k');
+  std::mt19937 random(11);
+  for (int round = 0; round < 40; ++round) {
+    runAndKill(random() % 6000, [&] {
+      for (;;) submit(text);
+    });
+    for (const auto& entry : list()) {
+      EXPECT_EQ(entry.bytes, text.size());
+      EXPECT_EQ(entry.typeCode, "193");
+    }
+  }
+  ASSERT_TRUE(submit(text));
+  const auto logs = list();
+  EXPECT_EQ(names("spool").size(), logs.size() * 2) << "left-overs";
+  for (std::size_t i = 1; i < logs.size(); ++i) EXPECT_GT(logs[i].sequence, logs[i - 1].sequence);
+}
+
+TEST_F(SpoolTest, SubmittersDoNotClash) {
+  constexpr int kProcesses = 4, kLogs = 10;
+  runTogether(kProcesses, [this](int process) {
+    bool whole = true;
+    for (int i = 0; i < kLogs; ++i) whole = submit(std::to_string(process)) && whole;
+    return whole;
+  });
+  std::map<std::string, int> counts;
+  for (const auto& entry : list()) ++counts[body(entry)];
+  EXPECT_EQ(counts.size(), static_cast<std::size_t>(kProcesses));
+  for (const auto& [process, count] : counts) EXPECT_EQ(count, kLogs) << process;
+}
+
+TEST_F(SpoolTest, StrangeFilesInTheFolderDoNotMatter) {
+  put("spool/notes.txt", "mine");
+  put("spool/0000000007-old.log", "old");
+  put("spool/0000000007-old.info.plist", "damaged");
+  put("spool/0000000009-gone.info.plist", "its body was removed");
+  put("spool/0000000003-x.log.tmp~1.0", "left by a killed run");
+  put("spool/0999999999-stray.log", "its number leaves too few");
+  put("spool/9999999999-x.log", "its number leaves none");
+  useBoundedLog();
+  ASSERT_TRUE(submit("new"));
+  EXPECT_EQ(names("spool"),
+            (Names{"0000000007-old.info.plist", "0000000007-old.log",
+                   "0000000008-log-test.info.plist", "0000000008-log-test.log", "notes.txt",
+                   "set-aside-0999999999-stray.log", "set-aside-9999999999-x.log"}));
+  EXPECT_EQ(errors().size(), 1u);
+  const auto logs = list();
+  ASSERT_EQ(logs.size(), 2u);
+  EXPECT_EQ(logs[0].typeCode, "");
+  EXPECT_EQ(body(logs[0]), "old");
+}
+
+}  // namespace
+}  // namespace tally

@@ -1,0 +1,278 @@
+// The metrics store on disk: what comes back, in which order, and which days stay.
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+
+#include "host/store_fixture.h"
+#include "host/store/sample_chunk.h"
+#include "host/store/store_history.h"
+#include "host/store/store_importer.h"
+
+namespace tally {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+TEST_F(StoreTest, ScalarsComeInOrderOfDayAndKeyFromTheHalfOpenRange) {
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    for (const std::int32_t day : {12, 10, 11, -5}) {
+      for (const char* key : {"b", "a", "B", "\xc3\xa9", "aa"}) {
+        if (auto set = writer.setScalar(day, key, day); !set) return set;
+      }
+    }
+    return writer.setScalar(11, "a", std::numeric_limits<std::int64_t>::min());
+  }));
+  EXPECT_THAT(scalars("", 10, 12), ElementsAre("11 B=11", "11 a=-9223372036854775808", "11 aa=11",
+                                               "11 b=11", "11 \xc3\xa9=11", "12 B=12", "12 a=12",
+                                               "12 aa=12", "12 b=12", "12 \xc3\xa9=12"));
+  EXPECT_THAT(scalars("a", kFirst, 10), ElementsAre("-5 a=-5", "-5 aa=-5", "10 a=10", "10 aa=10"));
+  EXPECT_THAT(scalars("\xff\xff"), IsEmpty());
+  EXPECT_EQ(scalars("\xc3").size(), 4u);
+  EXPECT_THAT(scalars("", 12, 12), IsEmpty());
+  int rows = 0;
+  store()->openHistory()->enumerateScalars(
+      "", kFirst, kLast,
+      [&](std::string_view, std::int32_t, std::int64_t, bool& stop) { stop = ++rows == 3; });
+  EXPECT_EQ(rows, 3);
+}
+
+TEST_F(StoreTest, SamplesComeBackBitForBitInRecordedOrderHoweverTheyAreStored) {
+  const double odd[] = {-0.0, std::numeric_limits<double>::infinity(), std::nan(""), 5e-324,
+                        -1e300};
+  std::vector<double> expected;
+  const auto record = [&](std::vector<double> values, bool toChunks) {
+    ASSERT_TRUE(push(kToday, "d", values, toChunks));
+    expected.insert(expected.end(), values.begin(), values.end());
+  };
+  const auto check = [&](const char* when) {
+    for (const std::size_t batch : {std::size_t{1}, std::size_t{999}, 3 * kChunkSamples}) {
+      const auto rows = distributions("d", kFirst, kLast, batch);
+      ASSERT_EQ(rows.size(), 1u) << when;
+      ASSERT_EQ(rows[0].values.size(), expected.size()) << when;
+      EXPECT_EQ(std::memcmp(rows[0].values.data(), expected.data(), expected.size() * 8), 0)
+          << when << ", " << batch << " at a time";
+      EXPECT_EQ(rows[0].offsets[4], 4u);
+      EXPECT_EQ(rows[0].offsets[5], 0u) << "the first of the second push";
+    }
+  };
+  record({odd, odd + 5}, false);
+  record(sequence(0, 2 * kChunkSamples + 3), false);
+  check("pushed");
+  store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "0");
+  check("folded");
+  record(sequence(7, 10), true);
+  record(sequence(1e9, kChunkSamples), true);
+  record({1}, false);
+  check("chunks and new ones");
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    const auto complete = writer.foldRecentUntil({});  // a time that is up
+    return complete && !*complete ? Status(Done{}) : Error{"not a part"};
+  }));
+  check("folded in part");
+  store()->TBClientCheckpoint();
+  check("folded again");
+  EXPECT_EQ(
+      sql("SELECT count(*) || ' ' || sum(samples) FROM chunks"),
+      std::to_string(expected.size() / kChunkSamples + 1) + " " + std::to_string(expected.size()))
+      << "small chunks are merged";
+  EXPECT_THAT(errors(), IsEmpty());
+}
+
+TEST_F(StoreTest, DistributionsOfBothTablesAreOneSeriesInOrder) {
+  clock->setDay(12);
+  ASSERT_TRUE(push(11, "b", {1}) && push(10, "c", {1, 2}) && push(10, "a", {1}));
+  store()->TBClientCheckpoint();
+  ASSERT_TRUE(push(10, "b", {1}) && push(10, "c", {3}) && push(11, "a", {1}) && push(12, "z", {1}));
+  EXPECT_THAT(lengths(),
+              ElementsAre("10 a x1", "10 b x1", "10 c x3", "11 a x1", "11 b x1", "12 z x1"));
+  std::vector<std::string> keys;
+  store()->openHistory()->enumerateDistributions(
+      "", 9, 11, [&](std::string_view key, std::int32_t, DistributionValues& values, bool& stop) {
+        double value = 0;
+        if (key == "c") values.nextValue(&value, nullptr);  // and leaves the rest
+        keys.emplace_back(key);
+        stop = keys.size() == 4;
+      });
+  EXPECT_THAT(keys, ElementsAre("a", "b", "c", "a"));
+}
+
+TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClockGoes) {
+  const auto record = [&](std::int32_t first, std::int32_t last) {
+    ASSERT_TRUE(write([&](StoreWriter& writer) -> Status {
+      for (std::int64_t each = first; each <= last; ++each) {
+        const auto day = static_cast<std::int32_t>(each);
+        const double value = 1;
+        const std::uint32_t offset = 0;
+        if (auto set = writer.setScalar(day, "s", day); !set) return set;
+        if (auto pushed = writer.pushSamples(day, "d", {&value, 1}, {&offset, 1}); !pushed) {
+          return pushed;
+        }
+      }
+      return Done{};
+    }));
+  };
+  const auto checkpointOn = [&](std::int32_t day, std::uint64_t most = kMostStoreBytes) {
+    clock->setDay(day);
+    makeSqliteMetricsStore(storeFile, log, clock, most)->TBClientCheckpoint();
+  };
+  const auto left = [&](std::int32_t first, std::int32_t last) {
+    return scalars("s", first - 1, last).size() + distributions("d", first - 1, last).size();
+  };
+  constexpr std::int32_t kDays = 30;
+  const struct {
+    const char* name;
+    std::vector<std::int32_t> wrong;  // the days of runs under the wrong clock
+    std::size_t wrongLeft;            // of them, after the clock is right again
+  } cases[] = {
+      {"one run ten days ahead", {kToday + 10}, 1},
+      {"a week ten years ahead", {24000, 24001, 24002, 24003, 24004, 24005, 24006}, 7},
+      {"a week of boots in 1970", {0, 0, 1, 0}, 0},
+      {"days of a year ago", {20100, 20101, 20102}, 0},
+      {"the ends of time", {kFirst, kLast - 1, kToday + 4000, kLast, 0}, 3},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("data"));
+    record(kToday - kDays - 4, kToday - 1);
+    checkpointOn(kToday - 1);
+    for (const std::int32_t day : c.wrong) {
+      checkpointOn(day);
+      record(day, day);
+      EXPECT_EQ(left(kToday - kDays, kToday - 1), 2u * kDays) << "after a run on day " << day;
+    }
+    checkpointOn(kToday);
+    EXPECT_EQ(left(kToday - kDays, kToday - 1), 2u * kDays);
+    EXPECT_EQ(scalars().size(), kDays + c.wrongLeft);
+    EXPECT_THAT(errors(), IsEmpty());
+  }
+  checkpointOn(kToday, 24u << 10);  // less than the tables alone take
+  EXPECT_THAT(lengths(), ElementsAre("20513 d x1")) << "what is still to be reported stays";
+  EXPECT_EQ(log->texts(LogLevel::Default).size(), 1u);
+}
+
+TEST_F(StoreTest, AStoreThatIsTooLargeFirstLosesWhatAWrongClockRecorded) {
+  const struct {
+    std::vector<std::int32_t> days;  // from the newest on
+    std::vector<std::int32_t> order;
+  } cases[] = {
+      {{20014, 20013, 20012, 20011, 3, 2}, {2, 3, 20011, 20012}},
+      {{24000, 20014, 20013, 20012, 19970, 19969}, {24000, 19969, 19970, 20012}},
+      {{24001, 24000, 20000, 19999}, {24000, 24001, 19999, 20000}},  // as long: the farthest first
+      {{20014, 20013}, {}},
+  };
+  for (const auto& c : cases) EXPECT_EQ(leastCredibleDays(c.days, 20014), c.order);
+  store()->TBClientSetValueForScalarKey("a", 1);
+  sql("WITH RECURSIVE n(d) AS (SELECT 1 UNION ALL SELECT d + 40 FROM n LIMIT 5000) "
+      "INSERT INTO scalars SELECT d, 'x', 0 FROM n");
+  sql("INSERT INTO scalars VALUES (-1.5, 'x', 0), ('x', 'x', 0), (9e18, 'x', 0)");
+  for (int run = 0; run < 3; ++run) store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT count(DISTINCT day) FROM scalars"), std::to_string(kMostDaysKept + 3))
+      << "one day for each row: only the damaged rows are left beside the bound";
+  EXPECT_THAT(scalars("a"), ElementsAre("20514 a=1"));
+}
+
+TEST_F(StoreTest, ABatchIsOneTransactionOfTheDayInProgress) {
+  const auto writer = store();
+  writer->beginBatch();
+  writer->TBClientSetValueForScalarKey("a", 1);
+  writer->beginBatch();
+  writer->TBClientSetValueForScalarKey("b", 2);
+  writer->endBatch();
+  EXPECT_FALSE(std::filesystem::exists(path)) << "written before the outer batch ended";
+  writer->endBatch();
+  writer->TBClientSetValueForScalarKey("a", 3);
+  EXPECT_THAT(scalars(), ElementsAre("20514 a=3", "20514 b=2"));
+  EXPECT_EQ(std::filesystem::status(path).permissions(), std::filesystem::perms(0600));
+  for (const std::string& key :
+       {std::string(), std::string("a\0b", 3), std::string("\xff"), std::string(513, 'a')}) {
+    log->lines.clear();
+    store()->TBClientSetValueForScalarKey(key, 1);
+    EXPECT_EQ(errors().size(), 1u) << key;
+  }
+  EXPECT_EQ(scalars().size(), 2u);
+}
+
+TEST_F(StoreTest, AMissingStoreHasNoRowsAndIsNotMadeByReading) {
+  EXPECT_THAT(scalars(), IsEmpty());
+  EXPECT_THAT(lengths(), IsEmpty());
+  store()->TBClientCheckpoint();
+  EXPECT_FALSE(std::filesystem::exists(at("data")));
+  put("data/TBDataStore.sqlitedb", "");
+  EXPECT_THAT(scalars(), IsEmpty()) << "as when its maker was killed at once";
+  EXPECT_THAT(errors(), IsEmpty());
+  store()->TBClientSetValueForScalarKey("a", 1);
+  EXPECT_EQ(scalars().size(), 1u);
+}
+
+TEST_F(StoreTest, AnImportAboveItsBuffersKeepsTheOrderOfEachKey) {
+  constexpr int kSamples = 1'300'000, kKeys = 7;
+  for (int key = 0; key < kKeys; ++key) ASSERT_TRUE(push(1, std::to_string(key), {-1}));
+  StoreImporter importer(storeFile);
+  for (int i = 0; i < kSamples; ++i) {
+    ASSERT_TRUE(importer.addSample(1, std::to_string(i % kKeys), 0, i));
+  }
+  EXPECT_EQ(lengths().size(), std::size_t{kKeys}) << "not seen before the end";
+  EXPECT_EQ(distributions()[0].values.size(), 1u);
+  ASSERT_TRUE(importer.finish());
+  const auto rows = distributions();
+  ASSERT_EQ(rows.size(), std::size_t{kKeys});
+  std::size_t samples = 0;
+  for (const auto& row : rows) {
+    samples += row.values.size();
+    EXPECT_EQ(row.values[0], -1) << "what was pushed before comes first";
+    EXPECT_TRUE(std::is_sorted(row.values.begin(), row.values.end()));
+  }
+  EXPECT_EQ(samples, std::size_t{kSamples + kKeys});
+}
+
+TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {
+  runTogether(6, [&](int number) {
+    const auto mine = makeSqliteMetricsStore(storeFile, log, clock);
+    for (int i = 0; i < 20; ++i) {
+      mine->TBClientSetValueForScalarKey(std::to_string(number) + "." + std::to_string(i), i);
+      if (!push(kToday, "d", {1.0 * number})) return false;
+      if (i % 5 == 0) mine->TBClientCheckpoint();
+    }
+    return log->lines.empty();
+  });
+  EXPECT_EQ(scalars().size(), 120u);
+  EXPECT_THAT(lengths(), ElementsAre("20514 d x120"));
+}
+
+TEST_F(StoreTest, AReaderSeesOneStateWhileOthersCommit) {
+  // Every transaction keeps the scalar and the number of samples equal.
+  const auto commit = [&](std::int64_t count) {
+    return write([&](StoreWriter& writer) -> Status {
+      if (auto set = writer.setScalar(1, "count", count); !set) return set;
+      const double value = 1;
+      const std::uint32_t offset = 0;
+      if (auto pushed = writer.pushSamples(1, "d", {&value, 1}, {&offset, 1}); !pushed) {
+        return pushed;
+      }
+      return count % 7 == 0 ? writer.foldRecent() : Status(Done{});
+    });
+  };
+  ASSERT_TRUE(commit(1));
+  clock->setDay(1);
+  runTogether(2, [&](int number) {
+    for (std::int64_t i = 2; i < 150; ++i) {
+      if (number == 0 && !commit(i)) return false;
+      if (number == 0) continue;
+      std::int64_t counted = 0, expected = -1;
+      const auto history = store()->openHistory();
+      history->enumerateDistributions("", 0, 1, [&](auto, auto, DistributionValues& values, bool&) {
+        double value = 0;
+        while (values.nextValue(&value, nullptr)) ++counted;
+      });
+      history->enumerateScalars("", 0, 1,
+                                [&](auto, auto, std::int64_t value, bool&) { expected = value; });
+      if (counted != expected || !log->lines.empty()) return false;
+    }
+    return true;
+  });
+}
+
+}  // namespace
+}  // namespace tally

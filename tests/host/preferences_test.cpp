@@ -1,0 +1,233 @@
+// Preference files: what other processes, kills and damage do to them.
+#include "host/preferences/property_list_preferences.h"
+
+#include <random>
+
+#include "kv/plist_codec.h"
+#include "host/temporary_root.h"
+
+namespace tally {
+namespace {
+
+constexpr char kDomain[] = "vellum.test";
+constexpr char kFile[] = "prefs/vellum.test.plist";
+
+class PreferencesTest : public TemporaryRoot {
+ protected:
+  PropertyListPreferences open() { return {folder("prefs"), log}; }
+  static KvRef<KvObject> number(std::int64_t value) { return KvNumber::int64(value); }
+  std::int32_t stored(std::string_view key) {
+    return open().SMAPreferencesGetIntegerValue(key, kDomain);
+  }
+};
+
+TEST_F(PreferencesTest, WritesReachStorageAtSynchroniseOrAtTheEnd) {
+  {
+    auto preferences = open();
+    preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+    preferences.SMAPreferencesSetValue("b", number(2), kDomain);
+    EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 1);
+    EXPECT_FALSE(exists(kFile)) << "written before it was asked for";
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_EQ(stored("b"), 2);
+    preferences.SMAPreferencesSetValue("a", nullptr, kDomain);
+    preferences.SMAPreferencesSetValue("c", number(3), kDomain);
+    EXPECT_EQ(preferences.SMAPreferencesGetValue("a", kDomain).get(), nullptr);
+    preferences.SMAPreferencesSetValue("other", number(4), "vellum.other");
+  }
+  const auto preferences = std::make_unique<PropertyListPreferences>(folder("prefs"), log);
+  EXPECT_EQ(kvText(preferences->copyDomain(kDomain).get()),
+            kvText(KvDictionary::create({{"b", number(2)}, {"c", number(3)}}).get()));
+  EXPECT_EQ(*preferences->listDomains(), (std::vector<std::string>{"vellum.other", kDomain}));
+  EXPECT_TRUE(errors().empty());
+}
+
+TEST_F(PreferencesTest, OnlyWhatChangesIsWritten) {
+  const auto list = [](KvRef<KvObject> item) { return KvArray::create({std::move(item)}); };
+  const struct {
+    const char* name;
+    const char* key;
+    KvRef<KvObject> former, next;  // null: absent
+    bool writes;
+  } cases[] = {
+      {"the same", "a", number(1), number(1), false},
+      {"absent", "a", nullptr, nullptr, false},
+      {"another width", "a", number(1), KvNumber::int8(1), false},
+      {"an integer over a real", "a", KvNumber::float64(1), number(1), true},
+      {"inside of an array", "a", list(KvNumber::float64(1)), list(number(1)), true},
+      {"an integer that doubles round", "a", KvNumber::float64(9007199254740992.0),
+       number(9007199254740993), true},
+      {"a boolean over a number", "a", number(1), KvBoolean::of(true), true},
+      {"the empty key", "", number(1), number(2), true},
+      {"a key with a slash", "Wi-Fi / Cellular", number(1), number(2), true},
+      {"a key that names a folder", "..", number(1), nullptr, true},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    std::filesystem::remove_all(at("prefs"));
+    auto preferences = open();
+    preferences.SMAPreferencesSetValue(c.key, c.former, kDomain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    const auto before = DeviceRoot(root).identity("/" + std::string(kFile));
+    EXPECT_EQ(before.has_value(), static_cast<bool>(c.former)) << "a file without a value";
+    preferences.SMAPreferencesSetValue(c.key, c.next, kDomain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_EQ(DeviceRoot(root).identity("/" + std::string(kFile)) != before, c.writes);
+    EXPECT_TRUE(kvIdentical(open().SMAPreferencesGetValue(c.key, kDomain).get(), c.next.get()));
+  }
+  EXPECT_TRUE(errors().empty());
+}
+
+TEST_F(PreferencesTest, SeesAndKeepsWhatOtherProcessesWrite) {
+  auto first = open();
+  auto second = open();
+  EXPECT_EQ(first.SMAPreferencesGetIntegerValue("b", kDomain), 0);
+  first.SMAPreferencesSetValue("a", number(1), kDomain);
+  second.SMAPreferencesSetValue("b", number(2), kDomain);
+  EXPECT_TRUE(second.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(first.SMAPreferencesGetIntegerValue("b", kDomain), 2) << "a clean key is stale";
+  EXPECT_TRUE(first.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(second.SMAPreferencesGetIntegerValue("a", kDomain), 1);
+  EXPECT_EQ(stored("b"), 2);
+
+  constexpr int kProcesses = 4, kKeys = 25;
+  runTogether(kProcesses, [this](int process) {
+    auto preferences = open();
+    bool whole = true;
+    for (int i = 0; i < kKeys; ++i) {
+      preferences.SMAPreferencesSetValue(std::to_string(process * 100 + i), number(1), kDomain);
+      whole = static_cast<bool>(preferences.SMAPreferencesSynchronize(kDomain)) && whole;
+    }
+    return whole;
+  });
+  EXPECT_EQ(open().copyDomain(kDomain)->size(), 2u + kProcesses * kKeys);
+}
+
+TEST_F(PreferencesTest, AKillLeavesTheOldFileOrTheNew) {
+  std::mt19937 random(7);
+  for (int round = 0; round < 40; ++round) {
+    runAndKill(random() % 3000, [this] {
+      auto preferences = open();
+      for (int i = 1;; ++i) {
+        preferences.SMAPreferencesSetValue("x", number(i), kDomain);
+        preferences.SMAPreferencesSetValue("y", number(i), kDomain);
+        preferences.SMAPreferencesSynchronize(kDomain);
+      }
+    });
+    auto preferences = open();
+    EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("x", kDomain),
+              preferences.SMAPreferencesGetIntegerValue("y", kDomain));
+  }
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("end", number(1), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(names("prefs"), std::vector<std::string>{"vellum.test.plist"}) << "left-overs";
+  EXPECT_TRUE(errors().empty());
+}
+
+TEST_F(PreferencesTest, DamagedFilesAreSetAsideAndTheProgramGoesOn) {
+  constexpr int kRounds = 10, kKept = 8;
+  for (int round = 1; round <= kRounds; ++round) {
+    const std::string damage = "<plist><dict><key>" + std::to_string(round);
+    put(kFile, damage);
+    auto preferences = open();
+    EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 0);
+    EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 0);
+    EXPECT_EQ(errors().size(), static_cast<std::size_t>(round)) << "one line for each damage";
+    preferences.SMAPreferencesSetValue("a", number(round), kDomain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_EQ(stored("a"), round);
+    if (round <= kKept) {
+      EXPECT_EQ(get(std::string(kFile) + ".damaged-" + std::to_string(round)), damage);
+    }
+  }
+  EXPECT_EQ(get(std::string(kFile) + ".damaged-1"), "<plist><dict><key>1") << "overwritten";
+  EXPECT_EQ(names("prefs").size(), 1u + kKept);
+}
+
+TEST_F(PreferencesTest, WhatIsNoDictionaryCountsAsDamage) {
+  const struct {
+    const char* name;
+    const char* document;
+  } cases[] = {{"empty", ""},
+               {"array", "<plist version=\"1.0\"><array/></plist>"},
+               {"string", "<plist version=\"1.0\"><string>a</string></plist>"},
+               {"zeros", "\0\0\0\0"}};
+  for (const auto& c : cases) {
+    log->lines.clear();
+    put(kFile, c.document);
+    auto preferences = open();
+    EXPECT_FALSE(preferences.SMAPreferencesGetValue("a", kDomain)) << c.name;
+    ASSERT_EQ(errors().size(), 1u) << c.name;
+    EXPECT_TRUE(errors()[0].starts_with("preferences vellum.test: damaged, set aside: "))
+        << errors()[0];
+  }
+  std::filesystem::remove(at(kFile));
+  std::filesystem::create_directories(at(kFile));
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain)) << "a folder in the file's place";
+}
+
+TEST_F(PreferencesTest, UnsafeDomainsAreRefused) {
+  put("outside.plist", "untouched");
+  const std::string_view domains[] = {
+      "../outside", "a/b", "", ".", "..", std::string_view("a\0b", 3), "/etc/passwd", "a.tmp~1.0"};
+  for (const auto domain : domains) {
+    log->lines.clear();
+    auto preferences = open();
+    preferences.SMAPreferencesSetValue("a", number(1), domain);
+    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(domain).isRefused()) << domain;
+    EXPECT_FALSE(preferences.SMAPreferencesGetValue("a", domain)) << domain;
+    EXPECT_EQ(errors().size(), 3u) << domain;
+  }
+  EXPECT_EQ(get("outside.plist"), "untouched");
+  EXPECT_FALSE(exists("prefs"));
+  EXPECT_EQ(userPreferencesFolder(root, "mobile")->text(), at("var/mobile/Library/Preferences"));
+  for (const auto user : {"..", "", "a/b"}) EXPECT_FALSE(userPreferencesFolder(root, user));
+}
+
+TEST_F(PreferencesTest, AFailedWriteKeepsTheChangesForTheNextAttempt) {
+  put("prefs", "a file where the folder should be");
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+  EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
+  EXPECT_EQ(errors().size(), 1u) << "said once";
+  EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 1);
+  std::filesystem::remove(at("prefs"));
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(stored("a"), 1);
+}
+
+TEST_F(PreferencesTest, AValueThatNoFileHoldsFailsNoLaterWrite) {
+  auto deep = KvArray::create();
+  for (int i = 0; i < kPlistMaximumDepth; ++i) deep = KvArray::create({deep});
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("deep", deep, kDomain);
+  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
+  EXPECT_FALSE(exists(kFile)) << "half of what belongs together";
+  preferences.SMAPreferencesSetValue("a", number(2), kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(stored("a"), 2);
+  EXPECT_EQ(errors().size(), 1u);
+}
+
+TEST_F(PreferencesTest, AFullDiskLeavesTheOldFile) {
+  const TinyVolume volume(at("prefs"), "size=64k");
+  if (!volume) GTEST_SKIP() << "mounting is not allowed here";
+  auto preferences = open();
+  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
+  ASSERT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  preferences.SMAPreferencesSetValue("big", KvString::create(std::string(100000, 'x')), kDomain);
+  EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_EQ(errors().size(), 1u);
+  EXPECT_EQ(stored("a"), 1);
+  EXPECT_EQ(names("prefs"), std::vector<std::string>{"vellum.test.plist"});
+  preferences.SMAPreferencesSetValue("big", nullptr, kDomain);
+  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+}
+
+}  // namespace
+}  // namespace tally

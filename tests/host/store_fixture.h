@@ -1,0 +1,125 @@
+// A metrics store on disk, and what a test does with it.
+#pragma once
+
+#include <gmock/gmock.h>
+#include <sqlite3.h>
+
+#include <limits>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "host/temporary_root.h"
+#include "host/store/metrics_store.h"
+#include "host/store/store_writer.h"
+
+namespace tally {
+
+constexpr std::int32_t kToday = 20514;
+constexpr std::int32_t kFirst = std::numeric_limits<std::int32_t>::min();
+constexpr std::int32_t kLast = std::numeric_limits<std::int32_t>::max();
+
+inline std::vector<double> sequence(double first, std::size_t count) {
+  std::vector<double> values(count);
+  for (std::size_t i = 0; i < count; ++i) values[i] = first + static_cast<double>(i);
+  return values;
+}
+
+class StoreTest : public TemporaryRoot {
+ protected:
+  StoreTest() { clock->setDay(kToday, 3600); }
+
+  std::shared_ptr<MetricsStore> store() const {
+    return makeSqliteMetricsStore(storeFile, log, clock);
+  }
+
+  template <class Work>
+  bool write(const Work& work) const {
+    auto writer = StoreWriter::open(storeFile, IfMissing::Create);
+    return writer && (*writer)->begin() && work(**writer) && (*writer)->commit();
+  }
+  // Each value one second after the one before.
+  bool push(std::int32_t day, std::string_view key, const std::vector<double>& values,
+            bool toChunks = false) const {
+    std::vector<std::uint32_t> offsets(values.size());
+    for (std::size_t i = 0; i < offsets.size(); ++i) offsets[i] = static_cast<std::uint32_t>(i);
+    return write([&](StoreWriter& writer) -> Status {
+      return toChunks ? writer.appendToChunks(day, key, values, offsets)
+                      : writer.pushSamples(day, key, values, offsets);
+    });
+  }
+
+  // "20513 key=7" for each row.
+  std::vector<std::string> scalars(std::string_view prefix = "", std::int32_t minimum = kFirst,
+                                   std::int32_t maximum = kLast) const {
+    std::vector<std::string> rows;
+    store()->openHistory()->enumerateScalars(
+        prefix, minimum, maximum,
+        [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+          rows.push_back(std::to_string(day) + " " + std::string(key) + "=" +
+                         std::to_string(value));
+        });
+    return rows;
+  }
+
+  struct Distribution {
+    std::int32_t day;
+    std::string key;
+    std::vector<double> values;
+    std::vector<std::uint32_t> offsets;
+  };
+  std::vector<Distribution> distributions(std::string_view prefix = "",
+                                          std::int32_t minimum = kFirst,
+                                          std::int32_t maximum = kLast,
+                                          std::size_t batch = 1000) const {
+    std::vector<Distribution> rows;
+    store()->openHistory()->enumerateDistributions(
+        prefix, minimum, maximum,
+        [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
+          Distribution row{day, std::string(key), {}, {}};
+          std::vector<double> some(batch);
+          std::vector<std::uint32_t> seconds(batch);
+          while (const auto count = values.nextValues(some.data(), seconds.data(), batch)) {
+            row.values.insert(row.values.end(), some.begin(), some.begin() + std::ptrdiff_t(count));
+            row.offsets.insert(row.offsets.end(), seconds.begin(),
+                               seconds.begin() + std::ptrdiff_t(count));
+          }
+          rows.push_back(std::move(row));
+        });
+    return rows;
+  }
+  // As "20513 key x3" for each row.
+  std::vector<std::string> lengths() const {
+    std::vector<std::string> rows;
+    for (const auto& row : distributions()) {
+      rows.push_back(std::to_string(row.day) + " " + row.key + " x" +
+                     std::to_string(row.values.size()));
+    }
+    return rows;
+  }
+
+  // Runs SQL behind the program's back; the first column of the last row.
+  std::string sql(const char* text) const {
+    sqlite3* handle = nullptr;
+    EXPECT_EQ(::sqlite3_open(path.c_str(), &handle), SQLITE_OK);
+    std::string answer;
+    char* message = nullptr;
+    ::sqlite3_exec(
+        handle, text,
+        [](void* out, int, char** columns, char**) {
+          *static_cast<std::string*>(out) = columns[0] != nullptr ? columns[0] : "NULL";
+          return 0;
+        },
+        &answer, &message);
+    EXPECT_EQ(message, nullptr) << message;
+    ::sqlite3_free(message);
+    ::sqlite3_close(handle);
+    return answer;
+  }
+
+  StoreFile storeFile{{root, "/data"}, "TBDataStore.sqlitedb"};
+  std::string path = at("data/TBDataStore.sqlitedb");
+  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
+};
+
+}  // namespace tally
