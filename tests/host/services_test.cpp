@@ -140,7 +140,7 @@ TEST_F(ServicesTest, LogHeaderFactsAreLines) {
   EXPECT_FALSE(wrong.HardwareModelString().empty());
   EXPECT_EQ(errors().size(), 2u);
   EXPECT_EQ(wrong.processIdentifier(), ::getpid());
-  EXPECT_EQ(wrong.processName(), "linux_test");
+  EXPECT_EQ(wrong.processName(), "host_test");
   const std::string incident = wrong.NewIncidentID();
   EXPECT_THAT(incident, testing::MatchesRegex(
                             "[0-9A-F]{8}-[0-9A-F]{4}-4[0-9A-F]{3}-[89AB][0-9A-F]{3}-[0-9A-F]{12}"));
