@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "base/device_root.h"
-#include "kv/plist_codec.h"
 #include "host/store/store_importer.h"
+#include "kv/plist_codec.h"
 #include "tools/store/store_csv.h"
 
 namespace tally::bench {

@@ -2,9 +2,9 @@
 #include <array>
 
 #include "described_folder.h"
-#include "host/spool/analytics_events.h"
 #include "host/described/described_purgeable_space.h"
 #include "host/described/described_stackshot.h"
+#include "host/spool/analytics_events.h"
 #include "host/system/device_information.h"
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"

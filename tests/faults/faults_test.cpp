@@ -22,8 +22,8 @@
 #include "base/file.h"
 #include "faults/sample_device.h"
 #include "host/spool/sequence_folder.h"
-#include "host/store/sqlite_database.h"
 #include "host/spool/structured_data.h"
+#include "host/store/sqlite_database.h"
 
 namespace tally::faults {
 

@@ -21,9 +21,9 @@
 #include "driver/telemetry_sweep.h"
 #include "fakes/fake_platform.h"
 #include "host/host_platform.h"
-#include "kv/plist_codec.h"
 #include "host/store/store_schema.h"
 #include "host/store/store_writer.h"
+#include "kv/plist_codec.h"
 
 namespace tally::faults {
 namespace {

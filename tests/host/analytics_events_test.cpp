@@ -3,8 +3,8 @@
 
 #include <random>
 
-#include "kv/json_writer.h"
 #include "host/temporary_root.h"
+#include "kv/json_writer.h"
 
 namespace tally {
 namespace {

@@ -5,9 +5,9 @@
 #include <functional>
 #include <random>
 
-#include "host/store_fixture.h"
 #include "host/store/store_history.h"
 #include "host/store/store_importer.h"
+#include "host/store_fixture.h"
 
 namespace tally {
 namespace {

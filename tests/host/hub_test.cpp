@@ -4,8 +4,8 @@
 #include <cstring>
 #include <numeric>
 
-#include "host/described_device.h"
 #include "host/described/described_frames.h"
+#include "host/described_device.h"
 
 namespace tally {
 namespace {

@@ -3,10 +3,10 @@
 #include <cmath>
 #include <cstring>
 
-#include "host/store_fixture.h"
 #include "host/store/sample_chunk.h"
 #include "host/store/store_history.h"
 #include "host/store/store_importer.h"
+#include "host/store_fixture.h"
 
 namespace tally {
 namespace {

@@ -3,8 +3,8 @@
 
 #include <random>
 
-#include "kv/plist_codec.h"
 #include "host/temporary_root.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {

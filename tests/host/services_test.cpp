@@ -10,17 +10,17 @@
 #include <chrono>
 #include <cstring>
 
-#include "host/temporary_root.h"
+#include "host/linux_platform.h"
 #include "host/system/applications.h"
 #include "host/system/device_information.h"
 #include "host/system/event_loop.h"
 #include "host/system/files.h"
 #include "host/system/kernel_values.h"
-#include "host/linux_platform.h"
 #include "host/system/locale.h"
 #include "host/system/log_header_facts.h"
 #include "host/system/run_lock.h"
 #include "host/system/system_log.h"
+#include "host/temporary_root.h"
 
 namespace tally {
 namespace {

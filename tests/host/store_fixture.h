@@ -9,9 +9,9 @@
 #include <string_view>
 #include <vector>
 
-#include "host/temporary_root.h"
 #include "host/store/metrics_store.h"
 #include "host/store/store_writer.h"
+#include "host/temporary_root.h"
 
 namespace tally {
 

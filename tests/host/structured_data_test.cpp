@@ -3,10 +3,10 @@
 
 #include <random>
 
-#include "kv/plist_codec.h"
-#include "host/temporary_root.h"
-#include "host/spool/crash_reporting.h"
 #include "host/linux_platform.h"
+#include "host/spool/crash_reporting.h"
+#include "host/temporary_root.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {

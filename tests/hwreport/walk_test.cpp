@@ -1,8 +1,8 @@
 // The walk over collections: order, results, what malformed ones come to.
 #include <gmock/gmock.h>
 
-#include "hwreport/channels/channel_walk.h"
 #include "hwreport/channel_world.h"
+#include "hwreport/channels/channel_walk.h"
 
 namespace tally {
 namespace {

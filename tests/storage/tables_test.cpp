@@ -7,11 +7,11 @@
 #include <set>
 #include <string>
 
+#include "storage/statistics.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
 #include "storage/statistics/statistic_key_table.h"
 #include "storage/statistics/statistic_keys.h"
-#include "storage/statistics.h"
 
 namespace tally {
 namespace {

@@ -7,9 +7,9 @@
 #include <set>
 #include <string>
 
-#include "platform/ipc_endpoint.h"
 #include "host/bus/bus_connection.h"
 #include "host/system/event_loop.h"
+#include "platform/ipc_endpoint.h"
 #include "platform/system_log.h"
 
 struct sd_bus_message;

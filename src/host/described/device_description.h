@@ -9,8 +9,8 @@
 #include <type_traits>
 
 #include "base/device_root.h"
-#include "kv/value.h"
 #include "host/described/described_entries.h"
+#include "kv/value.h"
 #include "platform/system_log.h"
 
 namespace tally {

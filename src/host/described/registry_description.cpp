@@ -2,9 +2,9 @@
 
 #include <set>
 
-#include "kv/plist_codec.h"
 #include "host/described/described_driver.h"
 #include "host/described/statistics_hub.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {

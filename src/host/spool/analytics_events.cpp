@@ -3,9 +3,9 @@
 #include <algorithm>
 
 #include "base/time_text.h"
-#include "kv/json_writer.h"
 #include "host/spool/log_spool.h"
 #include "host/spool/waiting_logs.h"
+#include "kv/json_writer.h"
 
 namespace tally {
 namespace {

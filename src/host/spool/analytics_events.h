@@ -7,11 +7,11 @@
 #include <string_view>
 
 #include "base/result.h"
-#include "platform/analytics_events.h"
-#include "platform/clock.h"
 #include "host/described/device_description.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/submission_consent.h"
+#include "platform/analytics_events.h"
+#include "platform/clock.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 

@@ -4,10 +4,10 @@
 #include <memory>
 #include <string>
 
-#include "platform/crash_reporting.h"
 #include "host/described/device_description.h"
 #include "host/spool/structured_data.h"
 #include "host/spool/submission_consent.h"
+#include "platform/crash_reporting.h"
 #include "platform/preferences.h"
 
 namespace tally {

@@ -6,8 +6,8 @@
 #include <cerrno>
 
 #include "base/file.h"
-#include "kv/plist_codec.h"
 #include "host/spool/waiting_logs.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {

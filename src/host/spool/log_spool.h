@@ -9,9 +9,9 @@
 #include <vector>
 
 #include "base/device_root.h"
-#include "platform/clock.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/submission_consent.h"
+#include "platform/clock.h"
 #include "platform/log_submission.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"

@@ -6,8 +6,8 @@
 #include <cerrno>
 
 #include "base/number_text.h"
-#include "kv/plist_codec.h"
 #include "host/spool/waiting_logs.h"
+#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {

@@ -8,9 +8,9 @@
 #include <string_view>
 
 #include "base/result.h"
+#include "host/spool/sequence_folder.h"
 #include "kv/value.h"
 #include "platform/clock.h"
-#include "host/spool/sequence_folder.h"
 
 namespace tally {
 

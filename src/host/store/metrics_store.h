@@ -4,9 +4,9 @@
 #include <memory>
 #include <string>
 
-#include "platform/clock.h"
 #include "host/store/store_retention.h"
 #include "host/store/store_schema.h"
+#include "platform/clock.h"
 #include "platform/metrics_store.h"
 #include "platform/system_log.h"
 

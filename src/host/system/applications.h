@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "base/device_root.h"
-#include "platform/applications.h"
 #include "host/described/device_description.h"
+#include "platform/applications.h"
 
 namespace tally {
 

@@ -5,8 +5,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/device_information.h"
 #include "host/described/device_description.h"
+#include "platform/device_information.h"
 
 namespace tally {
 

@@ -11,8 +11,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/kernel_values.h"
 #include "host/described/device_description.h"
+#include "platform/kernel_values.h"
 
 namespace tally {
 

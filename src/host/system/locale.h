@@ -8,8 +8,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/applications.h"
 #include "host/described/device_description.h"
+#include "platform/applications.h"
 
 namespace tally {
 

@@ -4,8 +4,8 @@
 #include <memory>
 #include <string>
 
-#include "platform/device_information.h"
 #include "host/described/device_description.h"
+#include "platform/device_information.h"
 #include "platform/log_header_facts.h"
 
 namespace tally {

@@ -1,8 +1,8 @@
 #include "hwreport/channels/channel_builder.h"
 
 #include "hwreport/channel.h"
-#include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels.h"
+#include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/type_word.h"

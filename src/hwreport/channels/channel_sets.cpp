@@ -1,8 +1,8 @@
 // The channels of many drivers, and the filters over them.
 #include "hwreport/channel.h"
+#include "hwreport/channels.h"
 #include "hwreport/channels/channel_builder.h"
 #include "hwreport/channels/channel_walk.h"
-#include "hwreport/channels.h"
 #include "hwreport/channels/drivers.h"
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/keys.h"

@@ -3,8 +3,8 @@
 
 #include <functional>
 
-#include "hwreport/channels/channel_builder.h"
 #include "hwreport/channels.h"
+#include "hwreport/channels/channel_builder.h"
 
 namespace tally {
 

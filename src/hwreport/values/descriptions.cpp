@@ -10,9 +10,9 @@
 #include "hwreport/channel.h"
 #include "hwreport/channels/printf_hex.h"
 #include "hwreport/channels/raw_element.h"
+#include "hwreport/values.h"
 #include "hwreport/values/state_values.h"
 #include "hwreport/values/unit_word.h"
-#include "hwreport/values.h"
 
 namespace tally {
 namespace {

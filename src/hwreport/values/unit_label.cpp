@@ -3,8 +3,8 @@
 #include <string_view>
 
 #include "hwreport/channel.h"
-#include "hwreport/descriptions.h"
 #include "hwreport/channels/keys.h"
+#include "hwreport/descriptions.h"
 #include "hwreport/values/unit_word.h"
 
 namespace tally {

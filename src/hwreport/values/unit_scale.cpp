@@ -1,8 +1,8 @@
 // Expressing a value in another unit.
 #include <limits>
 
-#include "hwreport/values/unit_word.h"
 #include "hwreport/values.h"
+#include "hwreport/values/unit_word.h"
 
 namespace tally {
 namespace {

@@ -8,10 +8,10 @@
 #include <span>
 
 #include "platform/platform.h"
-#include "storage/nand_info/analytics_day.h"
 #include "storage/analytics_events.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/exporter.h"
+#include "storage/nand_info/analytics_day.h"
 #include "storage/nand_info/nand_info_failure.h"
 
 namespace tally {

@@ -4,10 +4,10 @@
 #include <string_view>
 
 #include "platform/platform.h"
-#include "storage/statistics/counter_names.h"
-#include "storage/statistics/key_map.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info/nand_info_failure.h"
+#include "storage/statistics/counter_names.h"
+#include "storage/statistics/key_map.h"
 
 namespace tally {
 

@@ -4,10 +4,10 @@
 #include <array>
 #include <vector>
 
+#include "storage/statistics.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/decimal_names.h"
 #include "storage/statistics/key_map_families.h"
-#include "storage/statistics.h"
 
 namespace tally {
 namespace {

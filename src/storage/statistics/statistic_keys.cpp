@@ -1,7 +1,7 @@
 #include "storage/statistics/statistic_keys.h"
 
-#include "storage/statistics/counter_names.h"
 #include "storage/statistics.h"
+#include "storage/statistics/counter_names.h"
 
 namespace tally {
 namespace {

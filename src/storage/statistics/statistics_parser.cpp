@@ -3,9 +3,9 @@
 #include <span>
 
 #include "base/byte_reader.h"
+#include "storage/statistics.h"
 #include "storage/statistics/counter_list.h"
 #include "storage/statistics/statistic_keys.h"
-#include "storage/statistics.h"
 
 namespace tally {
 namespace {

@@ -3,18 +3,18 @@
 #include <limits>
 
 #include "base/device_root.h"
-#include "kv/plist_codec.h"
 #include "host/described/described_entries.h"
-#include "host/system/device_information.h"
 #include "host/linux_platform.h"
-#include "host/spool/log_spool.h"
 #include "host/preferences/property_list_preferences.h"
+#include "host/spool/log_spool.h"
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
-#include "tools/report/daily_log.h"
+#include "host/system/device_information.h"
+#include "kv/plist_codec.h"
 #include "tools/doctor/health_checks.h"
 #include "tools/frame/output.h"
 #include "tools/frame/spelling.h"
+#include "tools/report/daily_log.h"
 #include "tools/whitelist/whitelist_check.h"
 
 namespace tally::tools {

@@ -1,16 +1,16 @@
 // The table of all commands, in the order of the help.
 #include "tools/channels/channel_commands.h"
-#include "tools/frame/complete_command.h"
 #include "tools/doctor/doctor_command.h"
-#include "tools/whitelist/explain_command.h"
-#include "tools/store/forget_command.h"
-#include "tools/storage/nand_commands.h"
+#include "tools/endpoint/send_commands.h"
+#include "tools/frame/complete_command.h"
+#include "tools/frame/tool.h"
 #include "tools/preferences/prefs_commands.h"
 #include "tools/report/report_commands.h"
-#include "tools/endpoint/send_commands.h"
+#include "tools/storage/nand_commands.h"
+#include "tools/store/forget_command.h"
 #include "tools/store/store_commands.h"
 #include "tools/tasking/tasking_commands.h"
-#include "tools/frame/tool.h"
+#include "tools/whitelist/explain_command.h"
 #include "tools/whitelist/whitelist_commands.h"
 
 namespace tally::tools {

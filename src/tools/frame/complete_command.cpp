@@ -15,9 +15,9 @@
 #include "platform/platform.h"
 #include "report/report.h"
 #include "tools/frame/command_help.h"
-#include "tools/report/daily_log.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
+#include "tools/report/daily_log.h"
 
 namespace tally::tools {
 namespace {

@@ -9,14 +9,14 @@
 #include "base/file.h"
 #include "base/number_text.h"
 #include "base/utf8.h"
-#include "kv/plist_codec.h"
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"
+#include "kv/plist_codec.h"
 #include "platform/platform.h"
 #include "report/report.h"
-#include "tools/report/log_view.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
+#include "tools/report/log_view.h"
 
 namespace tally::tools {
 namespace {

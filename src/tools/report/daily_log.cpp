@@ -5,8 +5,8 @@
 
 #include "base/number_text.h"
 #include "base/time_text.h"
-#include "kv/plist_codec.h"
 #include "host/linux_platform.h"
+#include "kv/plist_codec.h"
 #include "report/report.h"
 
 namespace tally::tools {

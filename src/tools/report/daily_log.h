@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "base/result.h"
-#include "kv/value.h"
 #include "host/spool/log_spool.h"
+#include "kv/value.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {

@@ -6,9 +6,9 @@
 #include <optional>
 
 #include "base/number_text.h"
-#include "tools/report/log_view.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
+#include "tools/report/log_view.h"
 
 namespace tally::tools {
 namespace {

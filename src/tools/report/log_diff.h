@@ -4,8 +4,8 @@
 #include <string>
 #include <vector>
 
-#include "tools/report/daily_log.h"
 #include "tools/frame/output.h"
+#include "tools/report/daily_log.h"
 
 namespace tally::tools {
 

@@ -1,8 +1,8 @@
 // A daily log, drawn for people.
 #pragma once
 
-#include "tools/report/daily_log.h"
 #include "tools/frame/output.h"
+#include "tools/report/daily_log.h"
 
 namespace tally::tools {
 

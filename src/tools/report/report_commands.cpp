@@ -10,13 +10,13 @@
 #include "kv/plist_codec.h"
 #include "platform/platform.h"
 #include "report/report.h"
-#include "tools/report/daily_log.h"
 #include "tools/frame/day_argument.h"
+#include "tools/frame/standard_input.h"
+#include "tools/frame/table.h"
+#include "tools/report/daily_log.h"
 #include "tools/report/log_diff.h"
 #include "tools/report/log_view.h"
 #include "tools/report/preview.h"
-#include "tools/frame/standard_input.h"
-#include "tools/frame/table.h"
 
 namespace tally::tools {
 namespace {

@@ -5,17 +5,17 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "storage/auxiliary/health.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/exporter.h"
-#include "storage/auxiliary/health.h"
 #include "storage/nand_info.h"
+#include "tools/frame/output.h"
+#include "tools/frame/table.h"
 #include "tools/storage/nand_command.h"
 #include "tools/storage/nand_event_commands.h"
 #include "tools/storage/nand_groups.h"
 #include "tools/storage/nand_list_commands.h"
 #include "tools/storage/nand_snapshot_commands.h"
-#include "tools/frame/output.h"
-#include "tools/frame/table.h"
 
 namespace tally::tools {
 namespace {

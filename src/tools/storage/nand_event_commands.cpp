@@ -6,12 +6,12 @@
 #include <utility>
 #include <vector>
 
-#include "storage/nand_info/analytics_day.h"
 #include "storage/analytics_events.h"
 #include "storage/nand_info.h"
-#include "tools/storage/nand_command.h"
+#include "storage/nand_info/analytics_day.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
+#include "tools/storage/nand_command.h"
 
 namespace tally::tools {
 namespace {

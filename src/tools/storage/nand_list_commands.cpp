@@ -10,12 +10,12 @@
 #include "base/time_text.h"
 #include "storage/lists/log_writer.h"
 #include "storage/lists/storage_lists.h"
-#include "storage/storage_log.h"
 #include "storage/lists/write_amplification.h"
+#include "storage/storage_log.h"
 #include "tools/frame/dry_run.h"
-#include "tools/storage/nand_command.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
+#include "tools/storage/nand_command.h"
 
 namespace tally::tools {
 namespace {

@@ -6,8 +6,8 @@
 #include <nlohmann/json.hpp>
 
 #include "host/linux_platform.h"
-#include "host/store/store_schema.h"
 #include "host/spool/waiting_logs.h"
+#include "host/store/store_schema.h"
 #include "report/report.h"
 #include "tools/frame/output.h"
 

@@ -17,10 +17,10 @@
 #include "tools/frame/day_argument.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
+#include "tools/frame/table.h"
 #include "tools/store/store_csv.h"
 #include "tools/store/store_dump.h"
 #include "tools/store/store_import.h"
-#include "tools/frame/table.h"
 
 namespace tally::tools {
 namespace {

@@ -7,11 +7,11 @@
 
 #include "base/file.h"
 #include "driver/tasking.h"
-#include "kv/plist_codec.h"
 #include "host/linux_platform.h"
+#include "kv/plist_codec.h"
 #include "report/report.h"
-#include "tools/report/log_view.h"
 #include "tools/frame/table.h"
+#include "tools/report/log_view.h"
 
 namespace tally::tools {
 namespace {

@@ -7,10 +7,10 @@
 #include "base/time_text.h"
 #include "platform/platform.h"
 #include "tools/frame/day_argument.h"
-#include "tools/whitelist/key_story.h"
-#include "tools/report/log_view.h"
 #include "tools/frame/spelling.h"
 #include "tools/frame/table.h"
+#include "tools/report/log_view.h"
+#include "tools/whitelist/key_story.h"
 
 namespace tally::tools {
 namespace {

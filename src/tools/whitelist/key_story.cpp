@@ -9,8 +9,8 @@
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
 #include "platform/platform.h"
-#include "tools/report/preview.h"
 #include "tools/frame/spelling.h"
+#include "tools/report/preview.h"
 
 namespace tally::tools {
 namespace {
