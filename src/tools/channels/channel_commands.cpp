@@ -271,7 +271,7 @@ int sample(const ToolContext& context, const ChannelArguments& wanted) {
 }
 
 void addFilters(CLI::App* command, ChannelArguments& wanted) {
-  command->add_option("--driver", wanted.driver, "Only drivers whose name or id holds it")
+  command->add_option("--driver", wanted.driver, "Only drivers whose name or id contains it")
       ->type_name("TEXT");
   command->add_option("--group", wanted.group, "Only this group")->type_name("NAME");
   command->add_option("--subgroup", wanted.subgroup, "Only this subgroup")->type_name("NAME");
@@ -301,9 +301,9 @@ void addChannelCommands(CLI::App& app, ToolContext& context) {
     addFilters(command, *wanted);
     return command;
   };
-  add("list", "Which channels there are", list);
-  add("sample", "What they hold; exit status 1 when one is not served", sample)
-      ->add_option("--delta", wanted->delta, "Show what changes in so many seconds")
+  add("list", "List the channels", list);
+  add("sample", "Print their values; exit status 1 if one is not served", sample)
+      ->add_option("--delta", wanted->delta, "Show what changes in this many seconds")
       ->type_name("SECONDS")
       ->check(CLI::Range(0.001, kLongestWait));
 }

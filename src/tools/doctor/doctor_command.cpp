@@ -52,7 +52,7 @@ int examine(const ToolContext& context) {
 
 void addDoctorCommand(CLI::App& app, ToolContext& context) {
   addCommand(&app, context, "doctor",
-             "What of this device the program can reach, and what is missing",
+             "Check which parts of this device respond, and what is missing",
              [&context] { return examine(context); });
 }
 

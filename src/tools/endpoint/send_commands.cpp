@@ -58,7 +58,7 @@ int sendApplications(const ToolContext& context, const SendArguments& arguments)
 void addSendCommands(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<SendArguments>();
   CLI::App* const family = app.add_subcommand(
-      "send", "Send a message to the program of this device root, which the bus starts if need be");
+      "send", "Send a message to the program of this device root, which the bus starts if needed");
   family->require_subcommand(1);
   const auto add = [&](const char* name, const char* description, auto run) {
     return addCommand(family, context, name, description,

@@ -32,7 +32,7 @@ OptionHelp describeOption(const CLI::Option& option) {
   if (option.get_positional() && help.names.empty()) help.value = option.get_name(true);
   help.description = option.get_description();
   if (!option.get_default_str().empty()) {
-    help.description += "; " + option.get_default_str() + " when left out";
+    help.description += "; " + option.get_default_str() + " by default";
   }
   help.required = option.get_required();
   help.repeats = option.get_items_expected_max() > 1;

@@ -70,12 +70,12 @@ void reportFailure(const ToolContext& context, int status) {
 
 void addAllCommands(CLI::App& app, ToolContext& context) {
   app.name("tallyctl");
-  app.description("Looks into a device's analytics: what is stored, what is reported, and why.");
+  app.description("Inspects a device's analytics: what is stored, what is reported, and why.");
   app.set_help_flag("-h,--help", "Print this help");
   app.require_subcommand(1);
   app.fallthrough();  // the common options may stand anywhere
   app.set_version_flag("--version", std::string(kProgramVersion), "Print the version");
-  app.add_option("--root", context.root, "The device root; TALLYRUN_ROOT when left out, else /")
+  app.add_option("--root", context.root, "The device root; TALLYRUN_ROOT or / by default")
       ->type_name("DIR");
   app.add_flag("--json", context.json, "Print JSON");
   for (const CommandFamily addCommands : commandFamilies()) addCommands(app, context);

@@ -242,7 +242,7 @@ void addPrefsCommands(CLI::App& app, ToolContext& context) {
           ->excludes(value);
   command
       ->add_option("--type", arguments->type,
-                   "string, integer, real or boolean; auto takes the first that fits of boolean "
+                   "string, integer, real or boolean; auto uses the first that fits of boolean "
                    "(true, false, yes, no), integer, real, string")
       ->check(CLI::IsMember({"auto", "string", "integer", "real", "boolean"}))
       ->type_name("TYPE")

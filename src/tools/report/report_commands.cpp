@@ -239,7 +239,7 @@ int show(const ToolContext& context, const ReportArguments& arguments) {
 
 void addReportCommands(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<ReportArguments>();
-  CLI::App* const report = app.add_subcommand("report", "Look at the next log and at earlier ones");
+  CLI::App* const report = app.add_subcommand("report", "Show the next log and earlier ones");
   report->require_subcommand(1);
   const auto add = [&](const char* name, const char* description, auto run) {
     return addCommand(report, context, name, description,
@@ -249,16 +249,15 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
       add("preview", "The log that would be submitted; changes nothing on the device", preview);
   command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
   CLI::Option* const diff =
-      command->add_flag("--diff", arguments->diff, "Only what differs from the last submitted log");
+      command->add_flag("--diff", arguments->diff, "Only differences from the last submitted log");
   command->add_flag("--xml", arguments->xml, "The document itself, byte for byte")->excludes(diff);
 
-  add("list", "The logs that were submitted", list);
+  add("list", "List the submitted logs", list);
 
   command = add("show", "A submitted log: statistics, histograms, scalars", show);
   command->add_option(
       "LOG", arguments->name,
-      "Its number or name, a file, or - for standard input; the last daily log when "
-      "left out");
+      "Its number or name, a file, or - for standard input; the last daily log by default");
 }
 
 }  // namespace tally::tools

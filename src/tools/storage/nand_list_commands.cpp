@@ -231,13 +231,12 @@ void addNandListCommands(CLI::App& nand, ToolContext& context) {
       ->check(CLI::Range(std::uint32_t{0}, kTelemetryModes - 1));
   addNandCommand(nand, context, "validity", "The validity lists",
                  [&context] { return runValidity(context); });
-  addNandCommand(nand, context, "defects",
-                 "Defects of the flash, the factory's and those found since",
+  addNandCommand(nand, context, "defects", "Defects of the flash: factory defects and later ones",
                  [&context] { return runDefects(context); });
-  addNandCommand(nand, context, "storage-log", "The weekly log of the storage's state",
+  addNandCommand(nand, context, "storage-log", "The weekly storage log",
                  [&context] { return runStorageLog(context); })
       ->add_flag_callback(
-          "--preview", [] {}, "Show it as it would be now, and write nothing")
+          "--preview", [] {}, "Show it as it would be written now; write nothing")
       ->required();
 }
 

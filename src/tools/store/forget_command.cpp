@@ -87,8 +87,7 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
 
 void addForgetCommand(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<ForgetArguments>();
-  addCommand(&app, context, "forget",
-             "Erase the metrics store, what waits to be taken away, and the history",
+  addCommand(&app, context, "forget", "Erase the metrics store, all waiting files, and the history",
              [&context, arguments] { return forget(context, *arguments); })
       ->add_flag("--yes", arguments->yes, "Do not ask");
 }

@@ -238,22 +238,22 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
     command->add_option("--day", arguments->dayForm, kDayForms + std::string(otherwise))
         ->type_name("DAY");
   };
-  constexpr const char* kDay = "; today when left out";
+  constexpr const char* kDay = "; today by default";
 
   constexpr const char* kStoreKeyHelp = "Valid UTF-8 of 1 to 512 bytes without a zero byte";
   CLI::App* command = add("set", "Set a scalar", setScalar);
   command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
-  command->add_option("VALUE", arguments->value, "A whole number of 64 bits")->required();
+  command->add_option("VALUE", arguments->value, "A 64-bit whole number")->required();
   addDay(command, kDay);
 
   command = add("push", "Add samples to a distribution", pushSamples);
   command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
   command
       ->add_option("VALUE", arguments->values,
-                   "Numbers, inf and nan too; -inf only after --, which ends the options")
+                   "Numbers, inf or nan; -inf only after --, which ends the options")
       ->required();
   addDay(command, kDay);
-  command->add_option("--offset", arguments->offset, "Seconds into the day; now when left out")
+  command->add_option("--offset", arguments->offset, "Second of the day; now by default")
       ->check(CLI::Range(0, 86399))
       ->type_name("S");
 
@@ -261,8 +261,9 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   command->add_option("FILE", arguments->file, "A file, or - for standard input")->required();
 
   command = add("dump", "Print all rows as CSV, in the form that import reads", dump);
-  addDay(command, "; all days when left out");
-  command->add_option("--prefix", arguments->prefix, "Only keys that begin so")->type_name("TEXT");
+  addDay(command, "; all days by default");
+  command->add_option("--prefix", arguments->prefix, "Only keys that start with it")
+      ->type_name("TEXT");
 
   add("keys", "List the keys, with their days and numbers of samples", listKeys);
 }

@@ -176,7 +176,7 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
 void addTaskingCommands(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<TaskingArguments>();
   CLI::App* const family =
-      app.add_subcommand("tasking", "Scheduled changes of preferences: in force, due, tried out");
+      app.add_subcommand("tasking", "Show and apply scheduled changes of preferences");
   family->require_subcommand(1);
   addCommand(family, context, "show", "The tasking in force, the schedule, and what would change",
              [&context, arguments] { return show(context, *arguments); });

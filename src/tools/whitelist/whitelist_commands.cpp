@@ -148,18 +148,18 @@ int test(const ToolContext& context, const WhitelistArguments& arguments) {
 void addWhitelistCommands(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<WhitelistArguments>();
   CLI::App* const whitelist =
-      app.add_subcommand("whitelist", "Check the whitelist, ask it of keys");
+      app.add_subcommand("whitelist", "Check the whitelist, test keys against it");
   whitelist->require_subcommand(1);
   const auto add = [&](const char* name, const char* description, auto run) {
     return addCommand(whitelist, context, name, description,
                       [&context, arguments, run] { return run(context, *arguments); });
   };
-  constexpr const char* kFile = "A whitelist file in place of the device's";
+  constexpr const char* kFile = "A whitelist file instead of the device's";
 
   CLI::App* command = add("check", "Find faults (exit status 1) and surprises", check);
   command->add_option("FILE", arguments->file, kFile);
 
-  command = add("test", "Whether keys would be reported, and by which entry", test);
+  command = add("test", "Say whether keys would be reported, and by which entry", test);
   command->add_option("KEY", arguments->keys, "Keys of the metrics store")->required();
   command->add_option("--file", arguments->file, kFile)->type_name("FILE");
 }
