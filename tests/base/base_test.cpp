@@ -1,10 +1,8 @@
 // Text, number, time and file helpers at their borders.
 #include <gtest/gtest.h>
-#include <signal.h>
 #include <stdlib.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cmath>
@@ -28,13 +26,10 @@ TEST(Utf8, RepairAndXmlTable) {
     const char* repaired;
     const char* forXml;
   } cases[] = {
-      {"plain", "plain", "plain"},
       {"caf\xC3\xA9 \xE2\x82\xAC \xF0\x9F\x98\x80", "café € 😀", "café € 😀"},
       {"\xC0\xAF", "\uFFFD\uFFFD", "\uFFFD\uFFFD"},                  // overlong
       {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD"},  // surrogate
       {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD", "\uFFFD\uFFFD\uFFFD\uFFFD"},
-      {"a\xE2\x82", "a\uFFFD\uFFFD", "a\uFFFD\uFFFD"},  // cut
-      {"\xFF", "\uFFFD", "\uFFFD"},
       {"\x01\t\n\r\x1F\x7F", "\x01\t\n\r\x1F\x7F", "\uFFFD\t\n\r\uFFFD\x7F"},
       {"\xEF\xBF\xBE\xEF\xBF\xBF", "\xEF\xBF\xBE\xEF\xBF\xBF", "\uFFFD\uFFFD"},
   };
@@ -51,7 +46,6 @@ TEST(Printable, ShowsWithoutObeyingAndKnowsItsWidth) {
     const char* shown;
     std::size_t width;
   } cases[] = {
-      {"plain \\n", "plain \\n", 8},
       {"\x1b[31m\n\t\r\x7f", "\\x1b[31m\\n\\t\\x0d\\x7f", 20},
       {"\xC2\x9B\xC2\xA0", "\\x9b\u00A0", 5},
       {"a\xE2\x80\xAE"
@@ -60,7 +54,6 @@ TEST(Printable, ShowsWithoutObeyingAndKnowsItsWidth) {
       {"\xFF\xC3", "\uFFFD\uFFFD", 2},
       {"日本 café", "日本 café", 9},
       {"e\u0301", "e\u0301", 1},
-      {"😀", "😀", 2},
   };
   for (const auto& c : cases) {
     EXPECT_EQ(printable(c.text), c.shown);
@@ -77,16 +70,11 @@ TEST(NumberText, RealsReadBackEqual) {
     const char* text;
   } cases[] = {{0, "0"},
                {-0.0, "-0"},
-               {10, "10"},
-               {2.5, "2.5"},
                {0.1, "0.1"},
-               {100000, "100000"},
                {0.0001, "0.0001"},
                {1e-5, "1e-05"},
-               {9e15, "9000000000000000"},
                {1e16, "1e+16"},
                {1e22, "1e+22"},
-               {5e-324, "5e-324"},
                {1.0 / 3, "0.3333333333333333"},
                {-std::numeric_limits<double>::infinity(), "-inf"},
                {-std::nan(""), "nan"}};
@@ -118,7 +106,6 @@ TEST(TimeText, DaysAndInstants) {
     std::int32_t day;
     const char* text;
   } cases[] = {{0, 0, "1970-01-01T00:00:00Z"},
-               {86399.9, 0, "1970-01-01T23:59:59Z"},
                {-0.5, -1, "1969-12-31T23:59:59Z"},
                {1709208000, 19782, "2024-02-29T12:00:00Z"},
                {1e300, std::numeric_limits<std::int32_t>::max(), "9999-12-31T23:59:59Z"},
@@ -247,72 +234,6 @@ TEST_F(FileTest, LinksAreFollowedOnlyWhereNobodyElseCanMakeThem) {
   EXPECT_FALSE(FileLock::acquire(*home, "second"));
 }
 
-TEST_F(FileTest, WhatRootMakesInAUsersDirectoryIsTheUsers) {
-  if (::geteuid() != 0) GTEST_SKIP() << "only root makes files for others";
-  ASSERT_EQ(::chown(folder.c_str(), kUser, kUser), 0);
-  const auto made = root().make("/a/b");
-  ASSERT_TRUE(made && writeFileAtomically(*made, "file", "x"));
-  ASSERT_TRUE(FileLock::acquire(*made, "lock"));
-  for (const char* path : {"/a", "/a/b", "/a/b/file", "/a/b/lock"}) {
-    struct stat status {};
-    ASSERT_EQ(::stat((folder + path).c_str(), &status), 0) << path;
-    EXPECT_EQ(status.st_uid, kUser) << path;
-  }
-}
-
-TEST_F(FileTest, AKillAtAnyMomentLeavesTheOldFileOrTheNew) {
-  const Directory directory = here();
-  const std::string old(100'000, 'o');
-  const std::string fresh(100'000, 'n');
-  ASSERT_TRUE(writeFileAtomically(directory, "file", old));
-  for (int attempt = 0; attempt < 20; ++attempt) {
-    const pid_t child = ::fork();
-    if (child == 0) {
-      for (;;) {
-        if (!writeFileAtomically(directory, "file", fresh) ||
-            !writeFileAtomically(directory, "file", old)) {
-          ::_exit(1);
-        }
-      }
-    }
-    ::usleep(static_cast<useconds_t>(500 + attempt * 137));
-    ::kill(child, SIGKILL);
-    int status = 0;
-    ::waitpid(child, &status, 0);
-    ASSERT_TRUE(WIFSIGNALED(status)) << "the writer failed by itself";
-    const auto contents = directory.readFile("file", 1'000'000);
-    ASSERT_TRUE(contents && (*contents == old || *contents == fresh));
-  }
-}
-
-TEST_F(FileTest, ALockIsHeldByOneAndFreedByDeath) {
-  int ready[2];
-  ASSERT_EQ(::pipe(ready), 0);
-  const pid_t child = ::fork();
-  if (child == 0) {
-    const auto held = FileLock::acquire(here(), "lock");
-    [[maybe_unused]] const auto written = ::write(ready[1], held ? "1" : "0", 1);
-    ::pause();
-    ::_exit(0);
-  }
-  char answer = 0;
-  ASSERT_EQ(::read(ready[0], &answer, 1), 1);
-  ASSERT_EQ(answer, '1');
-  const auto refused = FileLock::acquire(here(), "lock", std::chrono::milliseconds(1));
-  ASSERT_FALSE(refused);
-  EXPECT_TRUE(refused.error().message.ends_with("is locked by process " + std::to_string(child)))
-      << refused.error().message;
-  const pid_t waiter = ::fork();
-  if (waiter == 0) ::_exit(FileLock::acquire(here(), "lock") ? 0 : 1);
-  ::usleep(50'000);
-  int status = 0;
-  EXPECT_EQ(::waitpid(waiter, &status, WNOHANG), 0) << "the second did not wait";
-  ::kill(child, SIGKILL);
-  ::waitpid(child, nullptr, 0);
-  ::waitpid(waiter, &status, 0);
-  EXPECT_EQ(WEXITSTATUS(status), 0);
-}
-
 TEST(LockHolder, ReadsTheKernelsTable) {
   constexpr std::string_view kTable =
       "1: POSIX  ADVISORY  WRITE 11 fe:0a:77 0 EOF\n"
@@ -322,17 +243,6 @@ TEST(LockHolder, ReadsTheKernelsTable) {
   EXPECT_EQ(lockHolder(kTable, makedev(0xfe, 0x0a), 77), 22);
   EXPECT_FALSE(lockHolder(kTable, makedev(0xfe, 0x0a), 78)) << "of another namespace";
   EXPECT_FALSE(lockHolder(kTable, makedev(0xfe, 0x0b), 77));
-}
-
-TEST(SafeFileName, NamesFromOutside) {
-  for (const std::string_view name : {"vellum.da", "a", "...", "with space"}) {
-    EXPECT_TRUE(isSafeFileName(name)) << name;
-  }
-  using namespace std::string_view_literals;
-  for (const std::string_view name : {""sv, "."sv, ".."sv, "a/b"sv, "/"sv, "a\0b"sv}) {
-    EXPECT_FALSE(isSafeFileName(name)) << name;
-  }
-  EXPECT_FALSE(isSafeFileName(std::string(201, 'x')));
 }
 
 }  // namespace

@@ -67,62 +67,16 @@ TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
       {"net.wifi", "2", "7"},
       {"net.cell", "2", "7"},
       {"net.bare", "(null)", "7"},
-      {"nfc", "5", "-"},
       {"Net.cell", "-", "-"},
       {"lat", "-", "6"},
       {"late", "-", "-"},
-      {"", "-", "-"},
       {"net.wifi.rx\xC3\xA9", "3", "7"},
-      {"m", "-", "-"},
   };
   for (const auto& c : cases) {
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey(c.key)), c.scalar) << c.key;
     EXPECT_EQ(figureOf(config->configOptionsForDistributionKey(c.key)), c.distribution) << c.key;
   }
   EXPECT_TRUE(fake.log->has(LogLevel::Debug, "prefix match net.wifi. for net.wifi.tx"));
-}
-
-TEST_F(ConfigTest, ALongChainOfPrefixesIsFoundLikeAScanWould) {
-  std::vector<std::string> prefixes;
-  std::string keys;
-  for (const char* stem : {"a", "ab", "b", "ba"}) {
-    std::string prefix = stem;
-    for (int i = 0; i < 6; ++i, prefix += i % 2 ? "x" : stem) {
-      keys += entry(prefix, static_cast<int>(prefixes.size()));
-      prefixes.push_back(prefix);
-    }
-  }
-  const auto config = load(group("G", section("ScalarKeyPrefixes", keys)));
-  std::vector<std::string> probes = prefixes;
-  for (const std::string& prefix : prefixes) {
-    probes.push_back(prefix + "x");
-    probes.push_back(prefix + "\x7f");
-    probes.push_back(prefix.substr(0, prefix.size() - 1));
-  }
-  for (const std::string& probe : probes) {
-    const std::string* longest = nullptr;
-    for (const std::string& prefix : prefixes) {
-      if (probe.starts_with(prefix) && (!longest || prefix.size() > longest->size())) {
-        longest = &prefix;
-      }
-    }
-    const auto match = config->matchScalarKey(probe);
-    EXPECT_EQ(match.entry ? match.entry->key->view() : kNotAdmitted,
-              longest ? *longest : kNotAdmitted)
-        << probe;
-  }
-}
-
-TEST(KeyTable, ManySmallSectionsDoNotCopyTheTableEachTime) {
-  KeyTable table;
-  int moves = 0;
-  for (int i = 0; i < 2000; ++i) {
-    const WhitelistEntry* const former = table.entries().data();
-    table.reserve(1);
-    table.set({KvString::create(std::to_string(i)), KvDictionary::create(), KvString::create("G")});
-    moves += table.entries().data() != former ? 1 : 0;
-  }
-  EXPECT_LT(moves, 20);
 }
 
 TEST_F(ConfigTest, TheLastGroupOfTheFileWins) {
@@ -145,7 +99,6 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
     bool disabledLogged;
   } cases[] = {
       {"production", false, nullptr, "-", "2", "-", false},
-      {"switched on", false, KvBoolean::of(true), "-", "2", "-", false},
       {"switched off", false, KvBoolean::of(false), "-", "-", "-", true},
       {"switched off by a number", false, KvNumber::int32(0), "-", "-", "-", true},
       {"a switch that is no boolean", false, KvString::create("no"), "-", "2", "-", false},

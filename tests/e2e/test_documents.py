@@ -30,7 +30,7 @@ RUN_BY_OTHERS = {
     "example/channels": "test_library.py",
     "scripts/demo": ".ci/run", "scripts/test": ".ci/run", "scripts/test --sanitize": ".ci/run",
     "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
-    "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "test_load.py, at a smaller size",
+    "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "the test bench.load, at a smaller size",
     "scripts/test --arch armhf": "by hand, since it takes a sysroot and an emulator",
     "scripts/bench": "by hand, when docs/performance.md is made anew",
 }

@@ -26,21 +26,17 @@ MOST_MEMORY_KB = 96 * 1024
 # The sanitizers' own memory is not the program's.
 IS_SANITIZED = b"__asan" in (BIN / "tallyrun").read_bytes()
 
-
 def simple(device):
     device.describe(SystemVersion={"ProductBuildVersion": "16S46"})
     device.whitelist(G=group({"a": {}}))
     device.store([("a", day, day) for day in range(TODAY - 4, TODAY + 4)])
 
-
 def applications(count, **changes):
     return [{"bundle_id": f"org.example.app{i}", "version": "1", "adam_id": i, "arch": 1,
              "uuid": "00112233-4455-6677-8899-aabbccddeeff", **changes} for i in range(count)]
 
-
 def send_applications(device, elements, status=0):
     return device.tool("send", "apps", "-", stdin=json.dumps(elements).encode(), status=status)
-
 
 def expected_conversation(test, device):
     """Two messages by stock tools, and the list is in the day's log."""
@@ -65,7 +61,6 @@ def expected_conversation(test, device):
     monitor.wait()
     test.assertEqual([signal[-2:] for signal in device.signals()], [LOGGING, LOGGING])
 
-
 def list_that_never_comes(test, device):
     began = time.monotonic()
     device.tool("send", "logging")
@@ -76,14 +71,6 @@ def list_that_never_comes(test, device):
     test.assertEqual((found.count(NOTIFIED), found.count(NEVER)), (1, 1))
     test.assertNotIn("TBActivatedAppInfo", device.log())
     test.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
-
-
-def unsolicited_list(test, device):
-    device.busctl("operation", "x", "2", "app_data", *ELEMENTS, count=2)
-    found = device.wait_for_end()
-    test.assertEqual(len(found), 3, found)
-    test.assertEqual((device.log_files(), device.preferences()), ([], {}))
-
 
 def day_request(test, device):
     device.set_preferences(**{LAST_DAY: 5})
@@ -98,7 +85,6 @@ def day_request(test, device):
     test.assertEqual(device.preferences()[LAST_DAY], 5)
     test.assertNotIn(NOTIFIED, found)
 
-
 def twenty_thousand_applications(test, device):
     device.tool("send", "logging")
     peak = device.watch_memory()
@@ -112,7 +98,6 @@ def twenty_thousand_applications(test, device):
     test.assertEqual(device.error_texts(), [
         f"endpoint {NAME}: a message is refused: more elements than a message may have"])
     test.assert_memory(peak())
-
 
 def hostile_messages(test, device):
     bad_uuid = ELEMENTS[:-17] + ["3", "1", "2", "3"]
@@ -155,7 +140,6 @@ def hostile_messages(test, device):
         test.assertIn(line, error)
     test.assertEqual(device.log()["TBScalars"]["a"], TODAY - 2)
 
-
 def flood(test, device):
     peer = RawPeer(device)
     test.addCleanup(peer.socket.close)
@@ -171,7 +155,6 @@ def flood(test, device):
     test.assertEqual(device.error_texts(), [skipped, f"{skipped}: 9999 more"])
     test.assertEqual(found.count(NEVER), 1)
     test.assert_memory(peak())
-
 
 def sender_that_is_gone(test, device):
     """Whether its message counts is the bus's policy's affair; a lost one has its line."""
@@ -190,7 +173,6 @@ def sender_that_is_gone(test, device):
         test.assertEqual(device.log_files(), [])
         test.assertIn("its sender did not wait", device.error_texts()[1])
 
-
 def refused_messages(test, device):
     """They do not keep the program, however many come."""
     if os.getuid() != 0:
@@ -200,14 +182,12 @@ def refused_messages(test, device):
         device.busctl("operation", "x", "0", user="nobody", status=1)
     test.assertEqual(device.default_texts()[:2], ["tallyrun started", "tallyrun ended"])
 
-
 def bus_that_dies(test, device):
     device.tool("send", "logging")
     device.until(lambda: NOTIFIED in device.default_texts(), 30, "the announcement")
     device.kill_daemon()
     test.assertIn(NEVER, device.wait_for_end())
     test.assertEqual(device.preferences()[LAST_DAY], YESTERDAY)
-
 
 def no_bus(test, device):
     device.kill_daemon()
@@ -219,13 +199,11 @@ def no_bus(test, device):
         [BIN / "tallyctl", "send", "logging"], capture_output=True, env=device.environment(),
         check=False).stderr.decode())
 
-
-CONVERSATIONS = [expected_conversation, list_that_never_comes, unsolicited_list, day_request,
+CONVERSATIONS = [expected_conversation, list_that_never_comes, day_request,
                  sender_that_is_gone, refused_messages, bus_that_dies, no_bus]
 WITH_SHIPPED_POLICY = [expected_conversation, sender_that_is_gone] if os.getuid() == 0 else []
 # Apart from the others, whose ten seconds they would eat up on a slow machine.
 LOADS = [twenty_thousand_applications, hostile_messages, flood]
-
 
 class Endpoint(unittest.TestCase):
     def hold(self, conversation, shipped_policy=False):
@@ -259,7 +237,6 @@ class Endpoint(unittest.TestCase):
         start = found.index(f"daily tasks for day {YESTERDAY}") + 1
         end = [text.startswith("OS change") for text in found].index(True)
         return found[start:end]
-
 
 if __name__ == "__main__":
     unittest.main()

@@ -33,11 +33,9 @@ EXPECTED = (
     "                  Mode[     OFF] = { # 4        3.000e+01 s / 75.0% }\n"
     "                  Mode[      ON] = { # 5        1.000e+01 s / 25.0% }\n")
 
-
 def run(*command, **environment):
     return subprocess.run([str(part) for part in command], env={**os.environ, **environment},
                           capture_output=True, text=True, timeout=200)
-
 
 @unittest.skipUnless((BUILD / "libhwreport.so").exists(), "built without shared libraries")
 class Library(unittest.TestCase):
@@ -109,19 +107,6 @@ class Library(unittest.TestCase):
                     for line in lines.splitlines()}
         self.assertEqual(declared ^ exported, set())
 
-    def test_root_is_chosen_by_the_program(self):
-        source = self.folder / "chosen.cpp"
-        source.write_text('#include <hwreport/hwreport.h>\nint main(int, char** arguments) {\n'
-                          '  tally::HwReportSetDeviceRoot(arguments[1]);\n'
-                          '  return tally::HwReportGetChannelCount('
-                          'tally::HwReportCopyAllChannels(0).get());\n}\n')
-        program = self.folder / "chosen"
-        self.check(run("g++", "-std=c++20", source, "-o", program, f"-I{self.prefix}/include",
-                       f"-L{self.library}", "-lhwreport", "-ltallykv"))
-        result = run(program, self.device, TALLYRUN_ROOT="/nowhere",
-                     LD_LIBRARY_PATH=str(self.library))
-        self.assertEqual(result.returncode, 2, result.stderr)
-
     def test_only_what_is_public_is_exported(self):
         declared = set(re.findall(r"TALLY_API[^;{(]*?(HwReport\w+)\(", "".join(
             header.read_text() for header in (self.prefix / "include/hwreport").iterdir())))
@@ -147,7 +132,6 @@ class Library(unittest.TestCase):
             self.check(run("g++", "-std=c++20", "-fsyntax-only", "-Wall", "-Wextra", "-Wpedantic",
                            "-Werror", f"-I{self.prefix}/include", "-x", "c++", "-include", header,
                            "/dev/null"))
-
 
 if __name__ == "__main__":
     unittest.main()

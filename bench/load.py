@@ -5,6 +5,7 @@ import io
 import json
 import multiprocessing
 import os
+import pathlib
 import plistlib
 import re
 import signal
@@ -16,6 +17,7 @@ import tempfile
 import time
 import unittest
 
+sys.path.insert(0, str(pathlib.Path(__file__).resolve().parents[1] / "tests/e2e"))
 from device import BIN, DeviceTest, SPOOL, STORE, TODAY, group, parse_messages, texts
 
 SHARE = float(os.environ.get("TALLYRUN_LOAD", "0.01"))
