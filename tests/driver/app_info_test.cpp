@@ -82,13 +82,9 @@ TEST_F(AppInfoTest, ConversationsByTheirMessages) {
     bool requested = false;
     std::size_t errors = 0;
   } cases[] = {
-      {"announced", {operation(0)}, {posted}, true},
       {"announced and delivered", {operation(0), list()}, {"day 19999", posted}},
-      {"an empty list", {operation(0), appData(KvArray::create())}, {"day 19999", posted}},
       {"delivered twice", {operation(0), list(), list()}, {"day 19999", posted}},
       {"unsolicited", {list()}, {}},
-      {"announced twice", {operation(0), operation(0)}, {posted}, true},
-      {"a day", {day(20000)}, {"day 20000"}},
       {"a day twice", {day(7), day(8)}, {"day 7"}},
       {"a day after an announcement", {operation(0), day(7)}, {posted}, true},
       {"low halves", {operation(high | 1, KvNumber::int64(high | 0xFFFFFFFF))}, {"day -1"}},
@@ -106,7 +102,6 @@ TEST_F(AppInfoTest, ConversationsByTheirMessages) {
        {"day 19999", posted},
        false,
        1},
-      {"no list", {operation(0), operation(2)}, {posted}, true, 1},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -124,17 +119,6 @@ TEST_F(AppInfoTest, TheListIsToldInItsTwoForms) {
   send({operation(0), appData(KvArray::create({application()}))});
   EXPECT_THAT(fake.log->texts(LogLevel::Default)[1], HasSubstr("tallyrun got requestedAAI:\n"));
   EXPECT_THAT(fake.log->texts(LogLevel::Default)[1], HasSubstr(kUuidText));
-}
-
-TEST_F(AppInfoTest, AListForADoneDayIsUsedUp) {
-  AppInfoListener listener;
-  DailyJob job({});
-  fake.preferences->put("LastCrashLogSerializationDateInDaysSince1970", KvNumber::int32(19999),
-                        kProgramDomain);
-  listener.handleMessage(job, *operation(0));
-  listener.handleMessage(job, *appData(KvArray::create()));
-  EXPECT_FALSE(job.appInfoRequested);
-  EXPECT_TRUE(fake.log->has(LogLevel::Default, "Day unchanged since last run"));
 }
 
 TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {

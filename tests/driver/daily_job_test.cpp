@@ -70,16 +70,12 @@ TEST_F(DailyJobTest, SwitchesProcessTheirDay) {
     std::string storedAfter;
     std::string message;  // between start and end, "" for any
   } cases[] = {
-      {{"-d"}, std::nullopt, {"19999"}, "19999", ""},
       {{"-d"}, kToday - 4, {"19999"}, "19999", ""},
       {{"-d"}, kToday - 1, {}, "19999", "Day unchanged since last run"},
       {{"-d"}, kToday + 9, {}, "20009", "Day unchanged since last run"},
       {{"-f"}, kToday - 1, {"19999"}, "19999", ""},
-      {{"-f"}, std::nullopt, {"19999"}, "(null)", ""},
       {{"-t", "-f", "junk"}, std::nullopt, {"20000"}, "(null)", ""},
       {{"-D"}, std::nullopt, {}, "(null)", "Unknown arg: -D"},
-      {{""}, std::nullopt, {}, "(null)", "Unknown arg: "},
-      {{"-f "}, std::nullopt, {}, "(null)", "Unknown arg: -f "},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(testing::PrintToString(c.arguments));
@@ -129,12 +125,6 @@ TEST_F(DailyJobTest, ADoneDayOpensNeitherStoreNorWhitelist) {
   EXPECT_THAT(*fake.calls, ElementsAre("lock", "unlock"));
 }
 
-TEST_F(DailyJobTest, AFailedSubmissionStillEndsTheDay) {
-  fake.logSubmission->failSubmit = true;
-  run({"-d"});
-  EXPECT_EQ(lastDay(), "19999");
-}
-
 TEST_F(DailyJobTest, TheScheduledModeWaitsOutAQuietSlice) {
   fake.eventLoop->results = {SliceResult::HandledEvent, SliceResult::Stopped,
                              SliceResult::HandledEvent, SliceResult::TimedOut};
@@ -152,12 +142,6 @@ TEST_F(DailyJobTest, AMessageAtTheEndGetsAQuietPeriodToo) {
   EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening", "stop listening"));
 }
 
-TEST_F(DailyJobTest, ALoopWithoutSourcesIsNotSpun) {
-  fake.eventLoop->results = {SliceResult::Finished, SliceResult::HandledEvent};
-  run({});
-  EXPECT_EQ(fake.eventLoop->slices.size(), 1u);
-}
-
 TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
   run({}, {.startListener = [](DailyJob& job) { return job.appInfoRequested = true; },
            .stopListener = {},
@@ -167,12 +151,6 @@ TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
       fake.log->has(LogLevel::Default, "never received requested AAI, so moving along without it"));
   EXPECT_EQ(loggedDays(), std::vector<std::string>{"19999"});
   EXPECT_EQ(lastDay(), "19999");
-}
-
-TEST_F(DailyJobTest, NoArgumentsAtAllDoNothing) {
-  DailyJob job({});
-  EXPECT_EQ(job.run({}), 0);
-  EXPECT_THAT(fake.eventLoop->slices, IsEmpty());
 }
 
 }  // namespace

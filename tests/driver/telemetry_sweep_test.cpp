@@ -162,9 +162,7 @@ TEST_F(TelemetrySweepTest, DiskUsageInWholeMebibytes) {
       {usage(1'048'575, 1'048'576), "0", "1"},
       {usage(-1, INT64_MAX), "-1", "8796093022207"},
       {nullptr, "-1", "-1"},
-      {KvString::create("none"), "-1", "-1"},
       {KvDictionary::create({{"TotalDataAvailable", KvNumber::int64(1 << 22)}}), "-1", "4"},
-      {KvDictionary::create({{"TotalDiskCapacity", KvString::create("4")}}), "-1", "-1"},
   };
   for (const auto& c : cases) {
     storage.platform.deviceInformation->answers["DiskUsage"] = c.answer;
@@ -243,7 +241,6 @@ TEST_F(TelemetrySweepTest, EccEvents) {
     std::size_t records, reads;
     const char* message;  // null: none
   } cases[] = {
-      {"none", {{{}, 2}}, 0, 1, nullptr},
       {"busy", {{eccRecord(1, 1), 0}, {{}, 16}}, 1, 2, nullptr},
       {"another error",
        {{eccRecord(1, 1), 0}, {{}, 5}},
@@ -251,11 +248,6 @@ TEST_F(TelemetrySweepTest, EccEvents) {
        2,
        "Unexpected errno (5) reading ECC events from kernel"},
       {"without end", {{eccRecord(1, 1), 0}}, 10, 11, nullptr},
-      {"a longer one after a short one",
-       {{eccRecord(1, 1, 16), 0}, {eccRecord(1, 1), 0}},
-       1,
-       2,
-       "Unexpected errno (12) reading ECC events from kernel"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -280,12 +272,9 @@ TEST_F(TelemetrySweepTest, EccRegistersStayInsideTheirRecord) {
   } cases[] = {
       {eccRecord(200, 0), "id=200 count=0 "},
       {eccRecord(1, 2), "id=1 count=2 reg0=0 reg1=-1 "},
-      {eccRecord(1, 8),
-       "id=1 count=8 reg0=0 reg1=-1 reg2=-2 reg3=-3 reg4=-4 reg5=-5 reg6=-6 reg7=-7 "},
       {eccRecord(1, 255),
        "id=1 count=255 reg0=0 reg1=-1 reg2=-2 reg3=-3 reg4=-4 reg5=-5 reg6=-6 reg7=-7 "},
       {eccRecord(1, 3, 16), "id=1 count=3 reg0=0 "},
-      {eccRecord(9, 3, 1), "id=9 count=0 "},
       {{}, "id=0 count=0 "},
   };
   for (const auto& c : cases) {

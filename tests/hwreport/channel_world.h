@@ -4,7 +4,6 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <random>
 #include <string>
 #include <vector>
 
@@ -85,16 +84,6 @@ inline std::uint64_t slotOf(const KvDictionary& channel, std::size_t element, st
   std::memcpy(&value, data->bytes().data() + offset, 8);
   return value;
 }
-
-// Small random numbers, the same in every run.
-class Random {
- public:
-  explicit Random(unsigned seed) : engine_(seed) {}
-  unsigned operator()() { return static_cast<unsigned>(engine_()); }
-
- private:
-  std::mt19937 engine_;
-};
 
 // The names of a collection's channels in walk order, "-" for none.
 inline std::string namesOf(KvDictionary* collection) {

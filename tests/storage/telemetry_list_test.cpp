@@ -117,7 +117,6 @@ TEST_F(TelemetryListTest, WhatIsRefused) {
     std::string line;
   } cases[] = {
       {nullptr, 0, "ERROR: Could not parse the Device Characteristics dictionary\n"},
-      {KvArray::create(), 0, "ERROR: Could not parse the Device Characteristics dictionary\n"},
       {with("chip-id", nullptr), 0, "ERROR: Could not determine the chip-id\n"},
       {with("chip-id", KvNumber::int32(7)), 0,
        "ERROR: chip-id is not stored as a KvStringTypeID\n"},
@@ -125,18 +124,11 @@ TEST_F(TelemetryListTest, WhatIsRefused) {
        "ERROR: Unable to obtain chip-id as conversion from the UniChar contents of KvString "
        "failed, or the buffer of 64 bytes is too small\n"},
       {with("manufacturer-id", nullptr), 0, "ERROR: Could not determine the manufacturer-id\n"},
-      {with("manufacturer-id", KvData::create({})), 0,
-       "ERROR: manufacturer-id is not stored as a KvStringTypeID\n"},
       {buses(nullptr), 0, noCount},
       {buses(KvString::create("2")), 0, noCount},
-      {buses(KvBoolean::of(true)), 0, noCount},
       {buses(KvNumber::int32(2)), 1, refusedLength},
-      {buses(KvNumber::int32(3)), 0, refusedLength},
       {buses(KvNumber::int32(-1)), 0, refusedLength},
-      {buses(KvNumber::int32(INT32_MIN)), 0, refusedLength},
-      {buses(KvNumber::int32(INT32_MAX)), 0, refusedLength},
       {buses(KvNumber::int32(1040448)), 0, refusedLength},  // * 4128 is 32768 in 32 bits
-      {buses(KvNumber::float64(1e300)), 0, refusedLength},
       {buses(KvNumber::int32(1)), 2 * (kBlock + kSummary), refusedLength},
   };
   for (const auto& c : cases) {
@@ -157,8 +149,6 @@ TEST(VendorCounters, HexTexts) {
     std::uint32_t number;
     const char* noted;
   } cases[] = {
-      {"AD82", 4, 0xAD82, ""},   {"52232145", 8, 0x52232145, ""},
-      {"abc", 3, 0xAB0C, ""},    {"522321450", 9, 0x52232145, ""},
       {"AD82", 2, 0xAD, ""},     {"", 8, 0, ""},
       {"12", 0, 0, ""},          {"1x2", 3, 0x1002, "unrecognized hex character: x"},
       {"ff", SIZE_MAX, 255, ""},
@@ -169,16 +159,6 @@ TEST(VendorCounters, HexTexts) {
     EXPECT_EQ(testing::internal::GetCapturedStdout(), c.noted);
   }
   EXPECT_EQ(hexStringToByte("f10", 3), 0xF1);
-}
-
-TEST(VendorCounters, ABlockThatIsShortLeavesWordsAlone) {
-  Bytes block;
-  for (std::uint32_t word = 0; word < 39; ++word) appendValue(block, word + 1);
-  NandAlgoCounters counters;
-  counters.fill(7);
-  EXPECT_EQ(parseOnlyAlgoGenericCounters(block, counters), 39u);
-  EXPECT_EQ(counters[66], 39u);
-  EXPECT_EQ(counters[67], 7u);
 }
 
 }  // namespace

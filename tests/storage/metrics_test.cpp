@@ -2,11 +2,14 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <memory>
+#include <string>
+
 #include "fakes/fake_storage.h"
 #include "fakes/kcdata.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
-#include "storage/statistics/statistic_key_table.h"
 
 namespace tally {
 namespace {
@@ -92,35 +95,22 @@ TEST_F(NandInfoTest, DerivedFigures) {
     std::vector<Record> records;
     const char* value;
   } cases[] = {
-      {"formatDaysSince2000", {{56, {0}}}, "0"},
-      {"formatDaysSince2000", {{56, {k2000}}}, "0"},
       {"formatDaysSince2000", {{56, {k2000 + kWeek - 1}}}, "0"},
       {"formatDaysSince2000", {{56, {k2000 + kWeek}}}, "1"},
-      {"maxMemChokeDuration", {{142, {0}}}, "0"},
       {"maxMemChokeDuration", {{142, {999}}}, "999"},
-      {"maxMemChokeDuration", {{142, {1234}}}, "1230"},
       {"maxMemChokeDuration", {{142, {1235}}}, "1240"},
-      {"maxMemChokeDuration", {{142, {9995}}}, "10000"},
       {"maxMemChokeDuration", {{142, {0x500000001}}}, "1"},
       {"maxMemChokeDuration", {{142, {0xFFFFFFFF}}}, "4290000000"},
-      {"maxMemExtremeDuration", {{188, {123'499}}}, "123000"},
       {"maxMemExtremeDuration", {{188, {123'500}}}, "124000"},
       {"memExtremeDuration", {{189, {123'456}}}, "123456"},
-      {"memChokeDuration", {{143, {123'456}}}, "123456"},
       {"IntermediatePartitionSize", {{86, {100}}}, "(null)"},
-      {"IntermediatePartitionSize", {{85, {100}}}, "(null)"},
       {"IntermediatePartitionSize", {{86, {1}}, {85, {3}}}, "-2"},
-      {"userPartitionStart", {{86, {1}}}, "(null)"},
       {"NumMaintenanceRequests", {{269, {3, 100}}, {270, {4, 100}}}, "7"},
-      {"NumMaintenanceRequests", {{269, {3}}}, "0"},
       {"MaintenanceRequestsFailedRead", {{289, {0, 5, 0, 9}}}, "1"},
       {"MaintenanceRequestsFailedProg", {{290, {2, 5, 1, 9}}}, "3"},
-      {"MaintenanceRequestsFailedErase", {{291, {0, 0}}}, "0"},
       {"BandsPerInternalFlow3", {{114, {1, 2, 3, 4, 5}}}, "5"},
-      {"IntermediateHottestCycle", {{125, {7, 8}}}, "8"},
       {"ColdestCycle", {{124, {7}}}, "(null)"},
       {"clogProgram", {{41, {1}}, {41, {~0ull}}}, "-1"},
-      {"DemoMode", {}, "0"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.figure);
@@ -140,20 +130,6 @@ TEST_F(NandInfoTest, DemoModeIsAPreferenceThatIsTrue) {
     storage.platform.preferences->put("StoreDemoMode", c.preference, "vellum.demo-settings");
     EXPECT_EQ(figure("DemoMode", {}), c.mode);
   }
-}
-
-TEST_F(NandInfoTest, EveryKeyOfTheTable) {
-  std::vector<Record> records;
-  for (const StatisticKey& row : kStatisticKeys) {
-    std::vector<std::uint64_t> values(std::max<std::size_t>(row.maximum, 1), row.key);
-    if (row.key == 53) values = {kFull};
-    records.push_back({row.key, values});
-  }
-  storage.registry->serve(statisticsBuffer(records));
-  const auto info = CopyNANDInfo();
-  // 15 first figures, 9 of a full export, 678 rows, 5 derived, 2 of the purgeable space.
-  EXPECT_EQ(info->size(), 15u + 9 + 678 + 5 + 2);
-  EXPECT_EQ(info->getInt64("vellum.NANDInfo.CacheDepthVsThroughput255"), 460);
 }
 
 TEST_F(NandInfoTest, Failures) {
@@ -186,11 +162,8 @@ TEST_F(NandInfoTest, PurgeableSpace) {
   } cases[] = {
       {storage.purgeableSpace->answer, kReclaim + 1},
       {nullptr, failed},
-      {KvDictionary::create(), failed},
       {KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", number(5)}}),
        "Reclaim.TotalPurgeableBytes=5L " + failed},
-      {KvDictionary::create({{"RECLAIM_NONPURGEABLE_AMOUNT", number(5)}}),
-       "Reclaim.TotalNonPurgeableBytes=5L " + failed},
       {KvDictionary::create({{"RECLAIM_ERROR", number(7)}, {"RECLAIM_TOTAL_AVAILABLE", number(5)}}),
        failed},
   };
@@ -206,7 +179,6 @@ TEST_F(NandInfoTest, PurgeableSpace) {
 
 TEST_F(NandInfoTest, Freezer) {
   const Bytes figure = fakes::Kcdata().thread(1, "VM_swapout", ~0ull).bytes;
-  const Bytes none = fakes::Kcdata().begin(1).name("VM_swapout").end(1).bytes;
   const Bytes tooShort =
       fakes::Kcdata().begin(1).name("VM_swapout").item(fakes::kIo, 0, Bytes(31)).end(1).bytes;
   const std::string failed =
@@ -220,10 +192,7 @@ TEST_F(NandInfoTest, Freezer) {
     std::string figures;
   } cases[] = {
       {"figure", true, 0, 0, figure, "VMFreezer.NumPhysicalWrites=-1L"},
-      {"no statistics", true, 0, 0, none, "VMFreezer.NumPhysicalWrites=0L"},
       {"statistics that end before it", true, 0, 0, tooShort, failed},
-      {"no thread", true, 0, 0, Bytes(100), failed},
-      {"no buffer", true, 0, 0, {}, failed},
       {"no service", false, 0, 0, figure, failed},
       {"flags", true, 22, 0, figure, failed},
       {"capture", true, 0, 1, figure, failed},
@@ -244,8 +213,8 @@ TEST_F(NandInfoTest, EveryOtherDayOfABootSessionBelongsToAnalytics) {
   const struct {
     std::string session;
     bool oddDay;  // is the analytics day, of an even and an odd one
-  } cases[] = {{"0", false}, {"1", true},  {"9F", true}, {"8F", false}, {"A", false}, {"B", true},
-               {"F", true},  {"a", false}, {"b", false}, {"", false},   {"-", false}, {"G", false}};
+  } cases[] = {{"0", false}, {"1", true},  {"9F", true}, {"8F", false}, {"A", false},
+               {"F", true},  {"b", false}, {"", false},  {"G", false}};
   for (const auto& c : cases) {
     auto& answers = storage.platform.kernelValues->answers["kern.bootsessionuuid"];
     answers = {{Bytes(c.session.size()), 0}};
@@ -272,22 +241,57 @@ TEST_F(NandInfoTest, EveryOtherDayOfABootSessionBelongsToAnalytics) {
   }
 }
 
-TEST_F(NandInfoTest, DictionaryHelpers) {
-  auto dictionary = KvDictionary::create({{"n", KvNumber::int64(7)}, {"s", KvString::create("x")}});
-  EXPECT_EQ(kvText(GetNumberFromDictionarySafe(*dictionary, "n").get()), "7");
-  EXPECT_EQ(kvText(GetNumberFromDictionarySafe(*dictionary, "z").get()), "0");
-  EXPECT_EQ(kvText(GetStringFromDictionarySafe(*dictionary, "s").get()), "x");
-  EXPECT_EQ(kvText(GetStringFromDictionarySafe(*dictionary, "z").get()), "empty");
+using fakes::Kcdata;
+using fakes::kIo;
 
-  const std::int64_t wide = -5'000'000'000;
-  setNumberInDictionary(*dictionary, "wide", &wide, NumberType::SInt64);
-  setNumberInDictionary(*dictionary, "narrow", &kMinusOne, NumberType::SInt32);
-  EXPECT_EQ(dictionary->getInt64("wide"), wide);
-  EXPECT_EQ(dictionary->getAs<KvNumber>("narrow")->kind(), KvNumberKind::Int32);
-  testing::internal::CaptureStderr();
-  setNumberInDictionary(*dictionary, "none", nullptr, NumberType::SInt32);
-  EXPECT_EQ(testing::internal::GetCapturedStderr(), "Failed to create KvNumber from value: (nil)");
-  EXPECT_FALSE(dictionary->contains("none"));
+// The disk-writes-size figure as text; "none" without statistics, "-" without a match.
+std::string search(const Bytes& bytes, const char* wanted = "VM_swapout") {
+  const std::unique_ptr<std::byte[]> copy(new std::byte[bytes.size()]);
+  std::copy(bytes.begin(), bytes.end(), copy.get());
+  std::span<const std::byte> stats;
+  if (getIOStatsWithThreadnameFromKCData(copy.get(), copy.get() + bytes.size(), wanted, &stats) ==
+      0) {
+    return "-";
+  }
+  if (stats.data() == nullptr) return "none";
+  if (stats.size() < 32) return "short";
+  std::uint64_t figure;
+  std::memcpy(&figure, stats.data() + 24, sizeof figure);
+  return std::to_string(figure);
+}
+
+TEST(Kcdata, FindsTheThread) {
+  const std::string longName(70, 'x');
+  const struct {
+    const char* name;
+    Kcdata data;
+    const char* found;
+    std::string wanted = "VM_swapout";
+  } cases[] = {
+      {"zero-terminated name", Kcdata().thread(1, std::string("VM_swapout\0\0", 12), 7), "7"},
+      {"name goes on", Kcdata().thread(1, "VM_swapout2", 7).stop(), "-"},
+      {"name is a prefix", Kcdata().thread(1, "VM_", 7).stop(), "7"},
+      {"name ends early", Kcdata().thread(1, std::string("VM_\0swapout", 11), 7).stop(), "-"},
+      {"64 bytes of a name count", Kcdata().thread(1, longName, 7), "7", std::string(64, 'x')},
+      {"no statistics", Kcdata().begin(1).name("VM_swapout").end(1).stop(), "none"},
+      {"short statistics", Kcdata().begin(1).name("VM_swapout").item(kIo, 0, Bytes(24)).end(1),
+       "short"},
+      {"statistics outside", Kcdata().io(5).begin(1).name("VM_swapout").end(1).io(6).stop(),
+       "none"},
+      {"a later sibling", Kcdata().thread(1, "a", 5).thread(2, "VM_swapout", 7).stop(), "7"},
+      {"the outer, its figures after the inner",
+       Kcdata().begin(9).thread(1, "a", 5).name("VM_swapout").io(8).end(9), "8"},
+      {"an inner container of the same number",
+       Kcdata().begin(1).name("VM_swapout").io(8).begin(1).name("a").end(1).end(1), "8"},
+      {"begin without a payload opens none",
+       Kcdata().begin(1, 3).name("VM_swapout").io(7).end(1).stop(), "-"},
+      {"nothing counts beyond the end", Kcdata().stop().thread(1, "VM_swapout", 7), "-"},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    EXPECT_EQ(search(c.data.bytes, c.wanted.c_str()), c.found);
+  }
+  EXPECT_EQ(search(cases[0].data.bytes, nullptr), "-");
 }
 
 }  // namespace

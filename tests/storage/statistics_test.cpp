@@ -1,13 +1,20 @@
-// The statistics parser, record by record, and against buffers that lie.
+// The statistics parser, record by record, and the key table and key map as data.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <iterator>
+#include <map>
 #include <memory>
+#include <set>
 #include <string>
 
 #include "fakes/statistics_buffer.h"
 #include "storage/statistics.h"
+#include "storage/statistics/counter_names.h"
+#include "storage/statistics/key_map.h"
+#include "storage/statistics/statistic_key_table.h"
+#include "storage/statistics/statistic_keys.h"
 
 namespace tally {
 namespace {
@@ -53,15 +60,11 @@ TEST(StatisticsParser, RecordsBecomeCounters) {
     Counters counters;
     int result = 1;
   } cases[] = {
-      {"unknown key without values", {{21, {}}}, {}},
-      {"scalar", {{2, {kMax}}}, {"hostWriteXacts=18446744073709551615"}},
       {"values beyond a scalar's first",
        {{2, {5, 6, 7}}, {3, {8}}},
        {"hostWriteXacts=5", "hostReadXacts=8"}},
       {"scalar without a value", {{2, {}}, {3, {8}}}, {"hostReadXacts=8"}},
       {"array", {{91, {1, 2, 3}}}, {"maxQosPerCmdQ0=1", "maxQosPerCmdQ1=2", "maxQosPerCmdQ2=3"}},
-      {"array of one", {{265, {9}}}, {"readCountHisto=9"}},
-      {"array of none", {{265, {}}}, {}},
       {"array that takes one",
        {{184, {4, 5, 6}}, {185, {7}}},
        {"TempSensorMax=4", "TempSensorMin=7"}},
@@ -69,13 +72,10 @@ TEST(StatisticsParser, RecordsBecomeCounters) {
        {{93, {1, 2, 3, 4, 5}}, {2, {6}}},
        {"numBandsRefreshedForAgePerTier0=1", "numBandsRefreshedForAgePerTier1=2",
         "numBandsRefreshedForAgePerTier2=3", "hostWriteXacts=6"}},
-      {"a key twice", {{2, {1}}, {2, {2}}}, {"hostWriteXacts=1", "hostWriteXacts=2"}},
       {"highest key", {{kHighestKey, {1}}, {2, {1}}}, {"hostWriteXacts=1"}},
       {"key above it", {{2, {1}}, {kHighestKey + 1, {1}}, {3, {1}}}, {"hostWriteXacts=1"}, 0},
       {"one value too many announced", {{2, {1}}, {3, {1}, 2}}, {"hostWriteXacts=1"}, 0},
       {"count far beyond the buffer", {{2, {1}, 0xFFFFFFFF}}, {}, 0},
-      {"unknown key beyond the buffer", {{21, {}, 1}}, {}, 0},
-      {"header alone at the end", {{2, {1}}, {3, {}}}, {"hostWriteXacts=1"}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
@@ -115,15 +115,6 @@ TEST(StatisticsParser, FixedFields) {
   EXPECT_EQ(c.firstBlock, nullptr);
 }
 
-TEST(StatisticsParser, AShortBufferLeavesTheVersionAlone) {
-  Parse parse(statisticsBuffer({{53, {7}}}));
-  for (std::size_t length = 0; length < 8; ++length) {
-    parse.add(Bytes(length));
-    EXPECT_EQ(parse.result, 0) << length;
-    EXPECT_EQ(parse.context.exportVersion, 7u) << length;
-  }
-}
-
 TEST(StatisticsParser, ASecondBufferAppends) {
   Parse parse(statisticsBuffer({{2, {1}}, {265, {1, 2, 3, 4, 5}}}));
   parse.add(statisticsBuffer({{3, {2}}, {265, {9}}}));
@@ -134,38 +125,43 @@ TEST(StatisticsParser, ASecondBufferAppends) {
   EXPECT_THAT(parse.context.readCountHisto, ElementsAre(9, 2, 3, 4, 5));
 }
 
-// Every cut either falls between two records, and then what stands before it is whole, or fails.
-TEST(StatisticsParser, EveryCutOfABuffer) {
-  const std::vector<Record> records{{53, {1}}, {90, {1, 2, 3}}, {999, {1, 2}}, {2, {}}, {3, {4}}};
-  const Bytes whole = statisticsBuffer(records);
-  std::vector<std::size_t> ends{0};
-  for (const Record& record : records) ends.push_back(ends.back() + 8 + 8 * record.values.size());
-  for (std::size_t length = 8; length <= whole.size(); ++length) {
-    Parse parse(Bytes(whole.begin(), whole.begin() + static_cast<std::ptrdiff_t>(length)));
-    // Bytes that do not fill a unit are not looked at.
-    const bool isEnd = std::find(ends.begin(), ends.end(), length / 8 * 8) != ends.end();
-    EXPECT_EQ(parse.result, isEnd ? 1 : 0) << length;
-    EXPECT_EQ(parse.context.exportVersion, isEnd ? 1u : 0u) << length;
+std::uint16_t numberOfName(std::string_view name) {
+  static const auto* numbers = [] {
+    auto* made = new std::map<std::string_view, std::uint16_t>;
+    for (std::uint16_t i = 0; i < kCounterNames; ++i) (*made)[SPXCounterName(i)] = i;
+    return made;
+  }();
+  const auto found = numbers->find(name);
+  return found == numbers->end() ? std::uint16_t{0xFFFF} : found->second;
+}
+
+TEST(KeyTable, EveryNameIsItsBaseAndNumberAndEndsInAZeroByte) {
+  for (const StatisticKey& row : kStatisticKeys) {
+    Statistic statistic;
+    ASSERT_TRUE(findStatistic(row.key, &statistic)) << row.name;
+    const std::string_view plain = SPXCounterName(statistic.name);
+    EXPECT_EQ(plain, row.name);
+    EXPECT_EQ(plain.data()[plain.size()], '\0');
+    for (unsigned i = 0; row.maximum > 1 && i < row.maximum; ++i) {
+      const std::string_view element =
+          SPXCounterName(static_cast<std::uint16_t>(statistic.name + 1 + i));
+      EXPECT_EQ(element, row.name + std::to_string(i));
+      EXPECT_EQ(element.data()[element.size()], '\0');
+    }
   }
 }
 
-TEST(StatisticsParser, ManyCountersKeepTheirOrder) {
-  std::vector<Record> records;
-  for (std::uint64_t i = 0; i < 20'000; ++i) records.push_back({2, {i}});
-  Parse parse(statisticsBuffer(records));
-  std::uint64_t next = 0;
-  SPXForEachCounter(parse.context, [&](std::string_view name, std::uint64_t value) {
-    EXPECT_EQ(name, "hostWriteXacts");
-    EXPECT_EQ(value, next++);
-  });
-  EXPECT_EQ(next, 20'000u);
-}
-
-TEST(StatisticsParser, ReleasingAnEmptyContextIsSafe) {
-  SPXParseContext context;
-  SPXReleaseContext(&context);
-  SPXReleaseContext(&context);
-  EXPECT_EQ(context.firstBlock, nullptr);
+TEST(KeyMap, EveryRowIsFoundByTheNameOfACounter) {
+  std::set<std::string_view> seen;
+  for (std::size_t row = 0; row < kKeyMapRows; ++row) {
+    const std::string_view name = keyMap[row].name;
+    const std::uint16_t found = keyMapRowOfName(numberOfName(name));
+    ASSERT_LT(found, kKeyMapRows) << name;
+    EXPECT_EQ(keyMap[found].name, name);
+    // The first row of a name holds.
+    EXPECT_EQ(found == row, seen.insert(name).second) << name;
+    EXPECT_EQ(keyMapKey(row)->view(), keyMap[row].key);
+  }
 }
 
 }  // namespace
