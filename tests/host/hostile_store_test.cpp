@@ -6,7 +6,6 @@
 #include <random>
 
 #include "host/store/store_history.h"
-#include "host/store/store_importer.h"
 #include "host/store_fixture.h"
 
 namespace tally {
@@ -22,8 +21,6 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
     const char* reason;
   } cases[] = {
       {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
-      {"zeros", [&] { put("data/TBDataStore.sqlitedb", std::string(9000, '\0')); },
-       "not a database"},
       {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
       {"newer", [&] { sql("PRAGMA user_version = 2"); }, "newer version"},
       {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
@@ -38,15 +35,6 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
       {"trigger",
        [&] { sql("CREATE TRIGGER t AFTER INSERT ON scalars BEGIN DELETE FROM chunks; END"); },
        "its tables are not"},
-      {"virtual table", [&] { sql("CREATE VIRTUAL TABLE v USING fts5(x)"); }, "its tables are not"},
-      {"computed column", [&] { sql("ALTER TABLE scalars ADD COLUMN x AS (day + 1)"); },
-       "its tables are not"},
-      {"folder",
-       [&] {
-         std::filesystem::remove(path);
-         std::filesystem::create_directories(path);
-       },
-       "not a regular file"},
       {"pipe",
        [&] {
          std::filesystem::remove(path);
@@ -109,15 +97,10 @@ TEST_F(StoreTest, NoForeignFileIsOpenedGivenAwayOrRemoved) {
   } cases[] = {
       {"link", "", link},
       {"link", "-wal", link},
-      {"link", "-shm", link},
       {"link", "-journal", link},
       {"hard link", "", hardLink},
       {"hard link", "-wal", hardLink},
-      {"hard link", "-shm", hardLink},
-      {"hard link", "-journal", hardLink},
       {"pipe", "-wal", pipe},
-      {"pipe", "-shm", pipe},
-      {"pipe", "-journal", pipe},
       {"journal of a foreign file", "-journal", journal, false},
   };
   for (const auto& c : cases) {
@@ -231,58 +214,6 @@ TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
     listStoreKeys(
         storeFile, [](const StoreKey&) {}, [](const std::string&) {});
   }
-}
-
-TEST_F(StoreTest, AKillLeavesAllOfATransactionOrNothing) {
-  constexpr std::int64_t kEach = 20000;
-  ASSERT_TRUE(push(kToday, "first", {1}));
-  std::minstd_rand random(3);
-  std::int64_t before = 0;
-  for (int round = 0; round < 25; ++round) {
-    const bool import = round % 2 == 0;
-    ASSERT_TRUE(import || push(kToday, "second", sequence(0, 5000)));
-    before = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
-    runAndKill(random() % 30'000, [&] {
-      if (!import) return store()->TBClientCheckpoint();
-      StoreImporter importer(storeFile);
-      for (std::int64_t i = 0; i < kEach; ++i) {
-        (void)importer.addSample(kToday, "k" + std::to_string(i % 50), 0, 1);
-        (void)importer.addScalar(kToday, "s" + std::to_string(i % 50), round);
-      }
-      (void)importer.finish();
-    });
-    ASSERT_EQ(sql("PRAGMA integrity_check"), "ok");
-    if (import) {
-      const auto recent = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM recent"));
-      const auto after = std::stoll(sql("SELECT coalesce(sum(samples), 0) FROM chunks"));
-      const bool nothing = after == before, all = recent == 0 && after >= before + kEach;
-      ASSERT_TRUE(nothing || all) << before << " became " << after;
-    } else {
-      std::int64_t samples = 0;
-      for (const auto& row : distributions("second")) samples += std::ssize(row.values);
-      ASSERT_EQ(samples, (round + 1) / 2 * 5000);
-    }
-  }
-}
-
-TEST_F(StoreTest, AFullVolumeUndoesTheTransactionAndAReadOnlyOneCanBeRead) {
-  const TinyVolume volume(at("data"), "size=1m");
-  if (!volume) GTEST_SKIP() << "needs the right to mount";
-  ASSERT_TRUE(push(kToday, "d", {1, 2, 3}));
-  {
-    StoreImporter importer(storeFile);
-    Status imported = Done{};
-    for (int i = 0; imported && i < 2'000'000; ++i) {
-      imported = importer.addSample(kToday, "big" + std::to_string(i % 9), 0, 1);
-    }
-    EXPECT_FALSE(imported && importer.finish()) << "2 million samples in 1 MiB";
-  }
-  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
-  ASSERT_EQ(::mount("tally", at("data").c_str(), "tmpfs", MS_REMOUNT | MS_RDONLY, ""), 0);
-  EXPECT_THAT(lengths(), ElementsAre("20514 d x3"));
-  EXPECT_THAT(errors(), IsEmpty());
-  store()->TBClientSetValueForScalarKey("a", 1);
-  EXPECT_EQ(errors().size(), 1u);
 }
 
 }  // namespace

@@ -1,8 +1,6 @@
 // The spool: whole logs or none, within bounds, oldest out first.
 #include "host/spool/log_spool.h"
 
-#include <random>
-
 #include "host/temporary_root.h"
 
 namespace tally {
@@ -99,16 +97,6 @@ TEST_F(SpoolTest, RefusalsLeaveNothingBehindAndCostNoLog) {
       {"larger than the spool", [&] { return submit(std::string(2001, 'x')); }, "larger than"},
       {"unsafe name", [&] { return submit("x", "../x"); }, "not a name"},
       {"name of a temporary file", [&] { return submit("x", "a.tmp~1"); }, "not a name"},
-      {"name too long", [&] { return submit("x", std::string(190, 'n')); }, "not a name"},
-      {"larger in pieces",
-       [&] {
-         return spool().SMAWriteLogForSubmission("1", "pieces", nullptr, nullptr,
-                                                 [](LogFile& file) {
-                                                   for (int i = 0; i < 30; ++i)
-                                                     file.write(std::string(100, 'p'));
-                                                 });
-       },
-       "larger than"},
       {"reserved",
        [&] {
          const auto reserved = KvString::create("x");
@@ -147,31 +135,6 @@ TEST_F(SpoolTest, AVolumeIsNotFilledToItsEnd) {
   EXPECT_NE(errors()[0].find("bytes are left on the volume"), std::string::npos) << errors()[0];
   EXPECT_EQ(list().size(), 1u);
   EXPECT_EQ(names("spool").size(), 2u);
-}
-
-TEST_F(SpoolTest, AFolderThatCannotBeWrittenIsOneErrorLine) {
-  put("spool", "a file where the folder should be");
-  EXPECT_FALSE(submit("x"));
-  EXPECT_EQ(errors().size(), 1u);
-  EXPECT_EQ(get("spool"), "a file where the folder should be");
-}
-
-TEST_F(SpoolTest, AKillLeavesNoHalfLog) {
-  const std::string text(200'000, 'k');
-  std::mt19937 random(11);
-  for (int round = 0; round < 40; ++round) {
-    runAndKill(random() % 6000, [&] {
-      for (;;) submit(text);
-    });
-    for (const auto& entry : list()) {
-      EXPECT_EQ(entry.bytes, text.size());
-      EXPECT_EQ(entry.typeCode, "193");
-    }
-  }
-  ASSERT_TRUE(submit(text));
-  const auto logs = list();
-  EXPECT_EQ(names("spool").size(), logs.size() * 2) << "left-overs";
-  for (std::size_t i = 1; i < logs.size(); ++i) EXPECT_GT(logs[i].sequence, logs[i - 1].sequence);
 }
 
 TEST_F(SpoolTest, SubmittersDoNotClash) {

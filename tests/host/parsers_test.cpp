@@ -17,18 +17,12 @@ TEST(OsRelease, ReadsAssignmentsAsAShellWould) {
     const char* text;
     const char* expected;
   } cases[] = {
-      {"NAME=Plain", "Plain"},
       {"NAME=\"With blanks\"", "With blanks"},
       {"NAME='single \\ \" quotes'", "single \\ \" quotes"},
       {"NAME=\"esc \\\" \\\\ \\$ \\` \\n\"", "esc \" \\ $ ` \\n"},
-      {"NAME=a\\ b", "a b"},
       {"NAME=\"a\"'b'c", "abc"},
-      {"  NAME=x  \r", "x"},
-      {"# NAME=no\nNAME=yes", "yes"},
       {"NAME=first\nNAME=last", "last"},
       {"NAME=\"never closed", "never closed"},
-      {"NAME=ends in \\", "ends in \\"},
-      {"NAME=a=b", "a=b"},
   };
   for (const auto& c : cases) EXPECT_EQ(parseOsRelease(c.text)["NAME"], c.expected) << c.text;
   for (const char* text : {"", "NAME", "=x", "NA ME=x", "\0NAME=x"}) {
@@ -46,9 +40,7 @@ TEST(OsRelease, GivesVersionAndItsText) {
       {"NAME=Watch\nVERSION_ID=5.1\nBUILD_ID=16S46\nVERSION=x", "Watch", "5.1", "16S46",
        "Watch 5.1 (16S46)"},
       {"NAME=Rolling\nBUILD_ID=rolling", "Rolling", "", "rolling", "Rolling rolling"},
-      {"VERSION_ID=3", "", "3", "3", "3"},
       {"NAME=\"\"\nID=x", "", "", "", "unknown"},
-      {"", "", "", "", "unknown"},
   };
   for (const auto& c : cases) {
     const auto version = systemVersionFromOsRelease(c.text);
@@ -64,19 +56,13 @@ TEST(DesktopEntry, OnlyVisibleApplicationsCount) {
     const char* text;
     bool visible;
   } cases[] = {
-      {"[Desktop Entry]\nType=Application\nName=A\n", true},
       {"# comment\n\n[Desktop Entry]\r\nType = Application \r\n", true},
       {"[Desktop Entry]\nType=Application\nNoDisplay=false\nHidden=false\n", true},
       {"[Desktop Entry]\nType=Application\nNoDisplay=true\n", false},
       {"[Desktop Entry]\nHidden=true\nType=Application\n", false},
       {"[Desktop Entry]\nType=Link\n", false},
-      {"[Desktop Entry]\nName=A\n", false},
-      {"[Desktop Action x]\nType=Application\n", false},
       {"[Desktop Entry]\nType=Application\n[Desktop Action x]\nHidden=true\n", true},
-      {"Type=Application\n", false},
       {"[Desktop Entry]\nType[de]=Application\n", false},
-      {"", false},
-      {"[", false},
   };
   for (const auto& c : cases) EXPECT_EQ(isVisibleApplication(c.text), c.visible) << c.text;
 }
@@ -86,23 +72,14 @@ TEST(LocaleNames, BecomeTags) {
     const char *name, *tag;
   } cases[] = {
       {"de_CH.UTF-8", "de-CH"},
-      {"de_CH", "de-CH"},
-      {"de", "de"},
       {"DE_ch", "de-CH"},
       {"de_DE@euro", "de-DE"},
       {"sr_RS.UTF-8@latin", "sr-Latn-RS"},
-      {"es_419", "es-419"},
-      {"ast_ES", "ast-ES"},
-      {"de_", "de"},
       {"de_Germany", "de"},
       {"C", ""},
-      {"C.UTF-8", ""},
-      {"POSIX", ""},
       {"", ""},
       {"../../etc", ""},
-      {"english", ""},
       {"d\xc3\xa4_DE", ""},
-      {"@latin", ""},
   };
   for (const auto& c : cases) EXPECT_EQ(languageTag(c.name), c.tag) << c.name;
 }
@@ -114,14 +91,11 @@ TEST(LocaleEnvironment, OrdersPreferencesAndNamesTheRegion) {
     Tags languages;
     const char* region;
   } cases[] = {
-      {"nothing set", {}, {}, ""},
-      {"LANG", {"", "", "", "de_CH.UTF-8"}, {"de-CH"}, "CH"},
       {"LC_ALL wins", {"", "fr_FR", "it_IT", "de_CH"}, {"fr-FR"}, "FR"},
       {"LC_MESSAGES is the language's", {"", "", "it_IT", "de_CH"}, {"it-IT"}, "CH"},
       {"LANGUAGE first", {"gsw:de_CH:de", "", "", "de_CH"}, {"gsw", "de-CH", "de"}, "CH"},
       {"none in C", {"de", "C.UTF-8", "", "de_CH"}, {}, ""},
       {"hostile list", {"::x:/:de_DE:", "", "", "de_DE"}, {"de-DE"}, "DE"},
-      {"no region", {"", "", "", "de"}, {"de"}, ""},
   };
   for (const auto& c : cases) {
     EXPECT_EQ(preferredLanguages(c.environment), c.languages) << c.name;
@@ -145,12 +119,6 @@ TEST(SwapUsage, ReadsTheTwoFigures) {
         "SwapTotal: 99999999999999999999 kB\nSwapFree: 1 kB\n"}) {
     EXPECT_FALSE(parseSwapUsage(text, 4096)) << text;
   }
-}
-
-TEST(BootSession, IsTheBootIdInUpperCase) {
-  EXPECT_EQ(parseBootSession("3f0c9a1e-77aa-4b0d-9f7e-0123456789ab\n"),
-            "3F0C9A1E-77AA-4B0D-9F7E-0123456789AB");
-  EXPECT_FALSE(parseBootSession("\n"));
 }
 
 TEST(InverseDeviceID, HidesTheMachineId) {

@@ -14,7 +14,6 @@
 #include "host/system/applications.h"
 #include "host/system/device_information.h"
 #include "host/system/event_loop.h"
-#include "host/system/files.h"
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"
 #include "host/system/log_header_facts.h"
@@ -37,14 +36,12 @@ TEST(SystemLogLines, CannotBeForged) {
   const struct {
     std::string message, line;
   } cases[] = {
-      {"plain \\ text", "plain \\ text"},
       {"a\ntallyrun[error]: forged", "a\\ntallyrun[error]: forged"},
       {"\r\x1b[2K\tx\x7f", "\\x0d\\x1b[2K\\tx\\x7f"},
       {std::string("nul\0end", 7), "nul\\x00end"},
       {"\xc2\x9b"
        "31m \xc2\xa0 \xc3\xa9",
        "\\x9b31m \xc2\xa0 \xc3\xa9"},
-      {"bad \xff\xc2", "bad \xef\xbf\xbd\xef\xbf\xbd"},
       {std::string(20000, 'a'), std::string(16384, 'a') + " [cut short]"},
   };
   for (const auto& c : cases) {
@@ -216,16 +213,12 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
     std::uint64_t first;
   } cases[] = {
       {"kern.memorystatus_thaw_count", 4, 0, 4, 7},
-      {"kern.memorystatus_thaw_count", 3, ENOMEM, 3, 0},
       {"kern.memorystatus_freeze_count", 4, ENOENT, 4, 0},
       {"kern.counter", 8, 0, 8, UINT64_MAX},
-      {"kern.counter", 4, ENOMEM, 4, 0},
       {"vm.swapusage", 32, 0, 32, 1024},
-      {"vm.swapusage", 8, ENOMEM, 8, 0},
       {"kern.raw", 8, 0, 3, 0x030201},
       {"kern.busy", 8, EBUSY, 8, 0},
       {"kern.odd", 8, ENOENT, 8, 0},
-      {"kern.absent", 8, ENOENT, 8, 0},
       {"kern.next", 8, 0, 1, 1},
       {"kern.next", 8, 0, 1, 2},
       {"kern.next", 8, ENOENT, 8, 0},
@@ -246,19 +239,6 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
   const auto ticks = real.MonotonicTicks();
   EXPECT_GE(real.MonotonicTicks(), ticks);
   EXPECT_EQ(real.TimebaseInfo()->denominator, 1u);
-}
-
-TEST_F(ServicesTest, FilesStayBelowTheRoot) {
-  put("Library/a", "text");
-  RootedFiles files(root);
-  EXPECT_EQ(*files.readFile("/Library/a", 10), "text");
-  EXPECT_EQ(files.fileSize("/Library/a"), 4u);
-  EXPECT_FALSE(files.fileSize("/Library/b"));
-  for (const char* path : {"/../x", "/Library/../../x", "Library/a", "", "/.."}) {
-    EXPECT_FALSE(files.readFile(path, 10)) << path;
-    EXPECT_FALSE(files.fileSize(path)) << path;
-  }
-  EXPECT_TRUE(files.fileSize("/Library/..a") == std::nullopt);
 }
 
 TEST_F(ServicesTest, TurnsNestAndEndWithTheProcess) {

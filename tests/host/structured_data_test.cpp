@@ -1,8 +1,6 @@
 // Structured-data logs and the rolling of logs across kills and damage.
 #include "host/spool/structured_data.h"
 
-#include <random>
-
 #include "host/linux_platform.h"
 #include "host/spool/crash_reporting.h"
 #include "host/temporary_root.h"
@@ -89,36 +87,6 @@ TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {
   ASSERT_TRUE(append(172, 3));
   EXPECT_EQ(finish().size(), 1u);
   EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 1, 3}));
-}
-
-TEST_F(StructuredDataTest, ALogThatWasWrittenOutBeforeAKillIsNotWrittenOutAgain) {
-  ASSERT_TRUE(append(172, 1));
-  const std::string pending = get("data/0000000001-172.pending");
-  EXPECT_TRUE(finish().empty());
-  put("data/0000000001-172.pending", pending);  // as if killed before it was removed
-  ASSERT_TRUE(append(172, 2));
-  EXPECT_TRUE(finish().empty());
-  EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2}));
-}
-
-TEST_F(StructuredDataTest, AKillLosesNoWholeRecord) {
-  std::mt19937 random(5);
-  for (int round = 0; round < 30; ++round) {
-    runAndKill(random() % 4000, [&] {
-      for (int i = 1;; ++i) {
-        (void)append(172, round * 1000 + i);
-        if (i % 3 == 0) finish();
-      }
-    });
-  }
-  EXPECT_TRUE(finish().empty());
-  std::int64_t last = 0;
-  for (const std::int64_t value : finished(172)) {
-    const bool follows = value == last + 1 || value % 1000 == 1;
-    EXPECT_TRUE(follows && value > last) << value << " after " << last;
-    last = value;
-  }
-  for (const std::string& name : names("data")) EXPECT_TRUE(name.ends_with(".plist")) << name;
 }
 
 TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {

@@ -53,7 +53,6 @@ TEST_F(ExplainCommand, TellsWhereAKeyStandsOrWhyNot) {
         "distribution of 2 samples: min 1, mean 2, std dev 1, max 3", "(-inf, 2]", "(2, inf)",
         "not there as a scalar: the store has no such row"}},
       {"ab", kWrong, {"refused  as a scalar: it is not listed", "whitelist refuses it"}},
-      {"off.x", kWrong, {"which is disabled by tasking", "the whitelist refuses it"}},
       {"secret", kWrong, {"InternalTesting, which is for internal devices only"}},
       {"empty", kWrong, {"no rows of this key", "the store has no such row on that day"}},
       {"vellum.kernel.memorystatus_thaw_count",

@@ -68,19 +68,6 @@ TEST_F(NandListCommandsTest, ListsForPeopleAndForPrograms) {
   EXPECT_EQ(found["defects"][0]["CE"], 2);
 }
 
-TEST_F(NandListCommandsTest, ListsThatCannotBeRead) {
-  for (const char* list : {"telemetry", "validity", "defects"}) {
-    EXPECT_EQ(nand({list}).status, kWrong) << "every call fails";
-    const Outcome outcome = nand({list, "--json"});
-    EXPECT_EQ(outcome.status, kWrong);
-    EXPECT_TRUE(json::accept(outcome.out)) << outcome.out;
-  }
-  serveTelemetry(3, 4128);
-  EXPECT_EQ(nand({"telemetry"}).status, kWrong) << "shorter than two buses";
-  EXPECT_EQ(nand({"storage-log", "--preview"}).status, kWrong);
-  EXPECT_EQ(nand({"storage-log"}).status, kBadUsage);
-}
-
 TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
   const struct {
     double sinceLast, threshold;

@@ -21,14 +21,10 @@ TEST_F(PrefsCommands, ValuesKeepTheirTypes) {
     const char* stored;
   } cases[] = {
       {{"true"}, "boolean", true, "<true/>"},
-      {{"no"}, "boolean", false, "<false/>"},
       {{"-12"}, "integer", -12, "<integer>-12</integer>"},
       {{"9223372036854775808"}, "real", 9223372036854775808.0, "<real>"},
-      {{"2.5"}, "real", 2.5, "<real>2.5"},
       {{"12 apples"}, "string", "12 apples", "<string>12 apples</string>"},
-      {{""}, "string", "", "<string></string>"},
       {{"12", "--type", "string"}, "string", "12", "<string>12</string>"},
-      {{"12", "--type", "real"}, "real", 12.0, "<real>12"},
       {{"--file", at("list.plist")}, "array", {{{"n", "AP8="}}}, "<data>"},
   };
   for (const auto& c : cases) {
@@ -51,20 +47,14 @@ TEST_F(PrefsCommands, MissingKeysBadValuesAndNames) {
     int status;
   } cases[] = {
       {{"get", "b", "--domain", "x.y"}, kWrong},
-      {{"get", "a"}, kWrong},
       {{"get", "a", "--domain", "x.y"}, kSuccess},
       {{"delete", "b", "--domain", "x.y"}, kWrong},
-      {{"set", "a", "x", "--type", "integer"}, kBadUsage},
       {{"set", "a", "1.5", "--type", "integer"}, kBadUsage},
       {{"set", "a", "1", "--type", "boolean"}, kBadUsage},
-      {{"set", "a", "1", "--type", "date"}, kBadUsage},
-      {{"set", "a"}, kBadUsage},
       {{"set", "a", "1", "--file", at("broken.plist")}, kBadUsage},
       {{"set", "a", "--file", at("broken.plist")}, kBadUsage},
       {{"set", "a", "1", "--domain", "../x"}, kBadUsage},
-      {{"list", "--domain", "x/y"}, kBadUsage},
       {{"list", "--domain", "none"}, kWrong},
-      {{"list"}, kSuccess},
       {{"delete", "a", "--domain", "x.y"}, kSuccess},
       {{"get", "a", "--domain", "x.y"}, kWrong},
   };
@@ -108,7 +98,6 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
       {"device root", [] {}, {"wrong: "}},
       {"device root", [&] { std::filesystem::create_directories(at("device")); }, {"ok: "}},
       {"whitelist", [] {}, {"missing: none"}},
-      {"whitelist", [&] { putWhitelist("<key>"); }, {"wrong: "}},
       {"whitelist", [&] { putWhitelist("<key>G</key><true/>"); }, {"wrong: 1 fault"}},
       {"whitelist", [&] { putWhitelist(dict("G", dict("ScalarKeys", dict("a", "")))); }, {"ok: 0"}},
       {"whitelist",
@@ -164,10 +153,6 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
         "wrong: SystemID is a number, not a string",
         "wrong: AnalyticsEvents.Wanted is a string, not an array",
         "wrong: AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"}},
-      {"device description", [&] { put("device/device/device.plist", "x"); }, {"wrong: "}},
-      {"kernel values", [] {}, {"missing: "}},
-      {"submitted logs", [] {}, {"missing: none yet"}},
-      {"clock", [] {}, {"ok: "}},
       {"crash support",
        [&] {
          putPlist("device/device/device.plist",

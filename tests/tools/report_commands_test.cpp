@@ -129,12 +129,9 @@ TEST_F(ReportCommands, WhatIsMissingOrDamagedIsSaid) {
     const char* message;
   } before[] = {
       {{"report", "show"}, kWrong, "no daily log was submitted yet"},
-      {{"report", "show", "7"}, kWrong, "there is no log 7"},
       {{"report", "show", "./nowhere.log"}, kWrong, "No such file"},
       {{"report", "preview", "--day", "20007"}, kWrong, "no log would be submitted"},
       {{"report", "preview", "--day", "2024-13-01"}, kBadUsage, "not a day"},
-      {{"report", "preview", "--day", "99999999999"}, kBadUsage, "not a day"},
-      {{"report"}, kBadUsage, "needs a command"},
   };
   for (const auto& c : before) {
     const Outcome outcome = run(c.arguments);
@@ -149,9 +146,7 @@ TEST_F(ReportCommands, WhatIsMissingOrDamagedIsSaid) {
     const char* message;
   } damaged[] = {
       {sound.substr(0, sound.size() / 2), "is damaged"},
-      {"", "is damaged"},
       {"<plist version=\"1.0\"><dict/></plist>", "not a daily log"},
-      {"<plist version=\"1.0\"><string>x</string></plist>", "not a daily log"},
   };
   for (const auto& c : damaged) {
     put(kSpool + std::string("0000000001-log-tallyd.log"), c.body);
@@ -198,8 +193,6 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   } names[] = {
       {"", "0000000002-log-tallyd.log"},
       {"1", "0000000001-log-tallyd.log"},
-      {"0000000001", "0000000001-log-tallyd.log"},
-      {"0000000001-log-tallyd", "0000000001-log-tallyd.log"},
       {"0000000003-StorageStatus.log", "0000000003-StorageStatus.log"},
   };
   for (const auto& c : names) {
@@ -215,7 +208,6 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   putPlist("other", "<dict/>");
   put("text", "worn: no\n");
   put("bytes", "\xff\x01");
-  put("half", body(1).substr(0, 500));
   const struct {
     const char* file;
     int status;
@@ -223,8 +215,7 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   } files[] = {{"records", kSuccess, "172"},
                {"other", kWrong, "is a property list, but not a daily log"},
                {"text", kSuccess, "worn: no\n"},
-               {"bytes", kWrong, "is damaged"},
-               {"half", kWrong, "is damaged"}};
+               {"bytes", kWrong, "is damaged"}};
   for (const auto& c : files) {
     const Outcome outcome = run({"report", "show", at(c.file)});
     EXPECT_EQ(outcome.status, c.status) << c.file;
