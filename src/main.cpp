@@ -21,7 +21,7 @@ int main(int count, char** arguments) {
     // A question about the file, not a run: nothing is opened and nothing is logged.
     std::printf("tallyrun %.*s\n", static_cast<int>(tally::kProgramVersion.size()),
                 tally::kProgramVersion.data());
-    return 0;
+    return std::fflush(stdout) == 0 ? 0 : 1;
   }
   // A run is short: memory that it gave back to the kernel it would soon ask for again, at the
   // price of a fault for each page.

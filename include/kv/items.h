@@ -1,6 +1,7 @@
 // KvItems: the items of an array or the entries of a dictionary.
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -72,7 +73,9 @@ class KvItems {
 
  private:
   void grow(std::size_t capacity) {
-    if (capacity > kMostItems || capacity > SIZE_MAX / sizeof(T)) throw std::bad_alloc();
+    // Where sizes have 32 bits, the product may not fit.
+    if (capacity > std::min<std::uint64_t>(kMostItems, SIZE_MAX / sizeof(T)))
+      throw std::bad_alloc();
     auto* const moved = static_cast<T*>(kvAllocateItems(capacity * sizeof(T)));
     std::uninitialized_move(begin(), end(), moved);
     std::destroy(begin(), end());

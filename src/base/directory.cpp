@@ -19,10 +19,6 @@
 namespace tally {
 namespace {
 
-Error systemError(std::string_view what, const std::string& path, int code = errno) {
-  return {std::string(what) + " " + path + ": " + std::strerror(code), code};
-}
-
 bool isTrusted(uid_t user) { return user == 0 || user == ::geteuid(); }
 
 bool writableByOthers(const struct stat& directory) {

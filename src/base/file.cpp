@@ -15,15 +15,19 @@
 namespace tally {
 namespace {
 
-Error systemError(std::string_view what, const std::string& path) {
-  return {std::string(what) + " " + path + ": " + std::strerror(errno), errno};
-}
-
 Error tooLarge(const std::string& path, std::size_t limit) {
   return {path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
 }
 
 }  // namespace
+
+Error systemError(std::string_view what, const std::string& path) {
+  return systemError(what, path, errno);
+}
+
+Error systemError(std::string_view what, const std::string& path, int code) {
+  return {std::string(what) + " " + path + ": " + std::strerror(code), code};
+}
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
   // Non-blocking, so that a pipe put in a file's place cannot hold the run up.

@@ -12,6 +12,10 @@
 
 namespace tally {
 
+// That a system call failed on a path, with the reason that errno or the code given names.
+Error systemError(std::string_view what, const std::string& path);
+Error systemError(std::string_view what, const std::string& path, int code);
+
 // The whole file. Refuses directories, devices and files larger than limit, without reading them.
 Result<std::string> readFile(const std::string& path, std::size_t limit);
 // The same for an open one, which the path names in messages. The descriptor stays open.

@@ -31,6 +31,9 @@ class TBConfig::Loader final : public WhitelistVisitor {
     if (state == GroupState::DisabledByTasking) {
       logBounded(LogLevel::Default, "keyGroups disabled by tasking",
                  "keyGroup {} is disabled by tasking", name);
+    } else if (state == GroupState::SwitchUnreadable) {
+      logBounded(LogLevel::Error, "keyGroups whose switch cannot be read",
+                 "keyGroup {} is left out: its switch cannot be read", name);
     }
     return state == GroupState::InForce;
   }

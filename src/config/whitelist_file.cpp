@@ -123,9 +123,11 @@ GroupState groupState(std::string_view group) {
   if (TBIsInternalDevice()) return GroupState::InForce;
   if (group == kInternalTestingGroup) return GroupState::InternalOnly;
   bool exists = false;
-  const bool enabled =
-      platform().preferences->SMAPreferencesGetBoolValue(group, kGroupSwitchDomain, &exists);
-  return enabled || !exists ? GroupState::InForce : GroupState::DisabledByTasking;
+  Preferences& preferences = *platform().preferences;
+  const bool enabled = preferences.SMAPreferencesGetBoolValue(group, kGroupSwitchDomain, &exists);
+  if (exists) return enabled ? GroupState::InForce : GroupState::DisabledByTasking;
+  return preferences.isReadable(kGroupSwitchDomain) ? GroupState::InForce
+                                                    : GroupState::SwitchUnreadable;
 }
 
 std::string_view whyNotInForce(GroupState state) {
@@ -134,6 +136,8 @@ std::string_view whyNotInForce(GroupState state) {
       return "is for internal devices only";
     case GroupState::DisabledByTasking:
       return "is disabled by tasking";
+    case GroupState::SwitchUnreadable:
+      return "has a switch that cannot be read";
     default:
       return "";
   }

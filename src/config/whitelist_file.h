@@ -71,10 +71,15 @@ class WhitelistVisitor {
 void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
 
 // Whether a group of the file counts on this device.
-enum class GroupState { InForce, InternalOnly, DisabledByTasking };
+enum class GroupState {
+  InForce,
+  InternalOnly,
+  DisabledByTasking,
+  SwitchUnreadable,  // it may be switched off, so nothing of it leaves the device
+};
 GroupState groupState(std::string_view group);
-// What is to be said of the group: "is for internal devices only", "is disabled by tasking"; empty
-// when it is in force.
+// What is to be said of the group: "is for internal devices only", "is disabled by tasking" and so
+// on; empty when it is in force.
 std::string_view whyNotInForce(GroupState state);
 
 }  // namespace tally

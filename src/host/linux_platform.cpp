@@ -67,9 +67,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   const auto eventLoop = std::make_shared<SdEventLoop>(log);
   const auto bus = std::make_shared<BusConnection>();
 
-  const auto consent = std::make_shared<SubmissionConsent>(
-      root, log, preferences, description,
-      [preferences](std::string_view domain) { return preferences->isReadable(domain); });
+  const auto consent = std::make_shared<SubmissionConsent>(root, log, preferences, description);
 
   Platform services;
   services.log = log;

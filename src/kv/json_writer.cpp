@@ -31,7 +31,7 @@ void appendString(std::string& out, std::string_view text) {
   out += '"';
 }
 
-void appendNumber(std::string& out, const KvNumber& number) {
+void appendJsonNumber(std::string& out, const KvNumber& number) {
   if (number.isReal() && !std::isfinite(number.asDouble())) {
     out += '"';
     appendDouble(out, number.asDouble());
@@ -80,7 +80,7 @@ void appendValue(std::string& out, const KvObject& value, int depth) {
     case KvType::String:
       return appendString(out, kvCast<KvString>(&value)->view());
     case KvType::Number:
-      return appendNumber(out, *kvCast<KvNumber>(&value));
+      return appendJsonNumber(out, *kvCast<KvNumber>(&value));
     case KvType::Boolean:
       out += kvCast<KvBoolean>(&value)->value() ? "true" : "false";
       return;

@@ -8,6 +8,9 @@
 
 namespace tally {
 
+// The domain of the program's own preferences.
+inline constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
+
 // How a write ended. True when it is done.
 class WriteResult {
  public:
@@ -39,6 +42,10 @@ class Preferences {
   // once until a write to the domain succeeds, and the writes are kept for the next attempt;
   // refused ones are forgotten.
   virtual WriteResult SMAPreferencesSynchronize(std::string_view domain) = 0;
+
+  // False while the domain's values are there but cannot be read, so that an absent key says
+  // nothing.
+  virtual bool isReadable(std::string_view) { return true; }
 
   // 0 when the key is absent or not a number.
   std::int32_t SMAPreferencesGetIntegerValue(std::string_view key, std::string_view domain);

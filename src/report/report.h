@@ -19,7 +19,6 @@
 namespace tally {
 
 // The preference domain of the program.
-constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 // The integer preference that holds the last day that the day check processed.
 constexpr std::string_view kLastProcessedDay = "LastCrashLogSerializationDateInDaysSince1970";
 // What log submission knows the daily log by.

@@ -97,11 +97,13 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
     const char* radioKey;
     const char* unlisted;
     bool disabledLogged;
+    bool unreadable = false;
   } cases[] = {
       {"production", false, nullptr, "-", "2", "-", false},
       {"switched off", false, KvBoolean::of(false), "-", "-", "-", true},
       {"switched off by a number", false, KvNumber::int32(0), "-", "-", "-", true},
       {"a switch that is no boolean", false, KvString::create("no"), "-", "2", "-", false},
+      {"switches that cannot be read", false, nullptr, "-", "-", "-", false, true},
       {"internal", true, nullptr, "1", "2", "(null)", false},
       {"internal, switched off", true, KvBoolean::of(false), "1", "2", "(null)", false},
   };
@@ -112,6 +114,7 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
     scope = fake.install();
     fake.deviceInformation->answers["InternalBuild"] = KvBoolean::of(c.internal);
     fake.preferences->put("Radio", c.radioSwitch, "vellum.da");
+    if (c.unreadable) fake.preferences->unreadableDomain = "vellum.da";
     const auto config = load(groups);
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey("internal")), c.internalKey);
     EXPECT_EQ(figureOf(config->configOptionsForScalarKey("radio")), c.radioKey);

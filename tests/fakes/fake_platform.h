@@ -110,6 +110,8 @@ struct FakePreferences final : Preferences {
   std::shared_ptr<CallLog> calls;
   std::map<std::pair<std::string, std::string>, KvRef<KvObject>> values;  // by domain and key
   std::set<std::string> failingDomains;  // whose synchronisation fails
+  std::string unreadableDomain;
+  bool isReadable(std::string_view domain) override { return domain != unreadableDomain; }
 
   KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view domain) override {
     const auto found = values.find({std::string(domain), std::string(key)});

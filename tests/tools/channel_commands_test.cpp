@@ -5,17 +5,16 @@
 namespace tally::tools {
 namespace {
 
-using nlohmann::json;
 using testing::HasSubstr;
 
 std::string key(const std::string& name, const std::string& value) {
   return "<key>" + name + "</key>" + value;
 }
-std::string integer(std::uint64_t value) {
+std::string integerElement(std::uint64_t value) {
   return "<integer>" + std::to_string(value) + "</integer>";
 }
 std::string text(const std::string& value) { return "<string>" + value + "</string>"; }
-std::string dict(const std::string& content) { return "<dict>" + content + "</dict>"; }
+std::string dictElement(const std::string& content) { return "<dict>" + content + "</dict>"; }
 std::string array(const std::string& content) { return "<array>" + content + "</array>"; }
 
 constexpr std::uint64_t word(std::uint64_t format, std::uint64_t categories, std::uint64_t count) {
@@ -23,39 +22,40 @@ constexpr std::uint64_t word(std::uint64_t format, std::uint64_t categories, std
 }
 
 std::string entry(const std::string& className, const std::string& content) {
-  return dict(key("Class", text(className)) + content);
+  return dictElement(key("Class", text(className)) + content);
 }
 std::string driver(const std::string& name, const std::string& legend, const std::string& values) {
   return entry("Driver", key("Name", text(name)) +
-                             key("Properties", dict(key("HwReportLegendPublic", "<true/>") +
-                                                    key("HwReportLegend", legend) +
-                                                    key("HwReportValues", array(values)))));
+                             key("Properties", dictElement(key("HwReportLegendPublic", "<true/>") +
+                                                           key("HwReportLegend", legend) +
+                                                           key("HwReportValues", array(values)))));
 }
 std::string channel(std::uint64_t id, std::uint64_t type, const std::string& name) {
-  return array(integer(id) + integer(type) + text(name));
+  return array(integerElement(id) + integerElement(type) + text(name));
 }
 constexpr const char* kThreeBuckets = "CgAAAAAAAAAAAAAAAwAAAA==";  // 10 wide
 std::string group(const std::string& names, std::uint64_t unit, const std::string& channels,
                   const std::string& config = kThreeBuckets) {
-  return dict(names +
-              key("HwReportChannelInfo",
-                  dict(key("HwReportChannelUnit", integer(unit)) +
-                       key("HwReportChannelConfig", "<data>" + config + "</data>"))) +
-              key("HwReportChannels", array(channels)));
+  return dictElement(names +
+                     key("HwReportChannelInfo",
+                         dictElement(key("HwReportChannelUnit", integerElement(unit)) +
+                                     key("HwReportChannelConfig", "<data>" + config + "</data>"))) +
+                     key("HwReportChannels", array(channels)));
 }
 std::string frames(std::uint64_t id, const std::string& values) {
-  return dict(key("Channel", integer(id)) + key("Frames", array(values)));
+  return dictElement(key("Channel", integerElement(id)) + key("Frames", array(values)));
 }
 
 constexpr std::uint64_t kMilliseconds = 0x01'00'00'7C'00000000, kEvents = 0x64'00'00'00'00000000;
 
 std::string state(const std::string& name, std::uint64_t entries, std::uint64_t residency,
                   std::uint64_t time) {
-  return dict(key("ID", text(name)) + key("InTransitions", integer(entries)) +
-              key("Residency", integer(residency)) + key("Time", integer(time)));
+  return dictElement(key("ID", text(name)) + key("InTransitions", integerElement(entries)) +
+                     key("Residency", integerElement(residency)) +
+                     key("Time", integerElement(time)));
 }
 std::string bucket(std::uint64_t hits, std::uint64_t sum) {
-  return dict(key("Hits", integer(hits)) + key("Sum", integer(sum)));
+  return dictElement(key("Hits", integerElement(hits)) + key("Sum", integerElement(sum)));
 }
 
 // One channel of each format, and one that is described nowhere.
@@ -67,31 +67,33 @@ std::string goodDriver() {
             group(groupA + key("HwReportSubGroupName", text("Sub")), kMilliseconds,
                   channel(2, word(2, 0, 2), "power") + channel(3, word(3, 0x102, 3), "latency") +
                       channel(4, word(4, 0, 2), "lanes"))),
-      frames(1, integer(10) + integer(7)) +
+      frames(1, integerElement(10) + integerElement(7)) +
           frames(2, array(state("IDLE", 3, 1000, 5) + state("BUSY", 4, 3000, 9)) +
                         array(state("IDLE", 5, 2500, 11) + state("BUSY", 5, 3500, 10))) +
           frames(3, array(bucket(0, 0) + bucket(2, 30) + bucket(0, 0)) +
                         array(bucket(0, 0) + bucket(6, 90) + bucket(0, 0))) +
-          frames(4, array(integer(1) + integer(2) + integer(3) + integer(4) + integer(5)) +
-                        array(integer(2) + integer(4) + integer(6) + integer(8) + integer(10))));
+          frames(4, array(integerElement(1) + integerElement(2) + integerElement(3) +
+                          integerElement(4) + integerElement(5)) +
+                        array(integerElement(2) + integerElement(4) + integerElement(6) +
+                              integerElement(8) + integerElement(10))));
 }
 std::string hub(const std::string& content = "") {
-  return entry("HwReportHub", key("Hub", dict(content)));
+  return entry("HwReportHub", key("Hub", dictElement(content)));
 }
 
 class ChannelCommands : public ToolTest {
  protected:
   void describe(const std::string& entries) const {
-    putPlist("device/device/registry.plist", dict(key("Entries", array(entries))));
+    putPlist("device/device/registry.plist", dictElement(key("Entries", array(entries))));
   }
   Outcome channels(std::vector<std::string> arguments) {
     arguments.insert(arguments.begin(), "channels");
     return run(arguments);
   }
   // What is read from the sample of a device, by the names of channels.
-  static std::map<std::string, json> byName(const Outcome& outcome) {
-    std::map<std::string, json> channels;
-    const json document = outcome.json();
+  static std::map<std::string, nlohmann::json> byName(const Outcome& outcome) {
+    std::map<std::string, nlohmann::json> channels;
+    const nlohmann::json document = outcome.json();
     for (const auto& item : document["channels"]) channels[item["name"]] = item;
     return channels;
   }
@@ -119,7 +121,7 @@ TEST_F(ChannelCommands, FiltersChooseAndCombine) {
     arguments.insert(arguments.begin(), {"list", "--json"});
     const Outcome outcome = channels(arguments);
     std::string names;
-    const json list = outcome.json();
+    const nlohmann::json list = outcome.json();
     for (const auto& item : list) names += item["name"].get<std::string>() + " ";
     EXPECT_EQ(names, c.names);
     EXPECT_EQ(outcome.status, *c.names != '\0' ? kSuccess : kWrong);
@@ -135,7 +137,7 @@ TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
     std::int64_t count;
     std::uint64_t entries, residency, hits, sum;
     double share;
-    json lanes;
+    nlohmann::json lanes;
   } cases[] = {
       {{"sample", "--json"}, 10, 3, 1000, 2, 30, 0.25, {1, 2, 3, 4, 5}},
       {{"sample", "--json", "--delta", "0.01"}, -3, 2, 1500, 4, 60, 0.75, {1, 2, 3, 4, 5}},
@@ -146,12 +148,12 @@ TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
     ASSERT_EQ(outcome.status, kSuccess) << outcome.err;
     auto shown = byName(outcome);
     EXPECT_EQ(shown["count"]["value"], c.count);
-    const json& idle = shown["power"]["states"][0];
+    const nlohmann::json& idle = shown["power"]["states"][0];
     EXPECT_EQ(idle["name"], "IDLE");
     EXPECT_EQ(idle["entries"], c.entries);
     EXPECT_EQ(idle["residency"], c.residency);
     EXPECT_EQ(idle["share"], c.share);
-    const json& middle = shown["latency"]["buckets"][1];
+    const nlohmann::json& middle = shown["latency"]["buckets"][1];
     EXPECT_EQ(middle["lower"], 10);
     EXPECT_EQ(middle["upper"], 20);
     EXPECT_EQ(middle["hits"], c.hits);
@@ -183,11 +185,12 @@ TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
 }
 
 TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
-  const std::string code = integer(0xE00002BC), good = hub() + goodDriver();
+  const std::string code = integerElement(0xE00002BC), good = hub() + goodDriver();
   const std::string ghost =
       driver("ghost", array(group("", kEvents, channel(8, word(1, 0, 1), "unserved"))), "");
-  const std::string broken = driver("bro&#27;ken", array(group("", 0, array(integer(1)))), "");
-  const std::string legend = driver("odd", integer(3), "");
+  const std::string broken =
+      driver("bro&#27;ken", array(group("", 0, array(integerElement(1)))), "");
+  const std::string legend = driver("odd", integerElement(3), "");
   const std::string lost = driver("lost", array(group("", kEvents, channel(5, word(1, 0, 1), "x"))),
                                   frames(5, array(integer(1)) + "<array><dict/></array>"));
   const struct {
@@ -221,10 +224,11 @@ TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
       const std::string said =
           *form == '\0'
               ? outcome.err
-              : printable(json::parse(outcome.err)["error"]["message"].get<std::string>());
+              : printable(
+                    nlohmann::json::parse(outcome.err)["error"]["message"].get<std::string>());
       EXPECT_THAT(said, HasSubstr(c.message));
       EXPECT_EQ(outcome.out.find("latency") != std::string::npos, c.showsGood);
-      EXPECT_TRUE(*form == '\0' || outcome.out.empty() || json::accept(outcome.out));
+      EXPECT_TRUE(*form == '\0' || outcome.out.empty() || nlohmann::json::accept(outcome.out));
     }
   }
 }

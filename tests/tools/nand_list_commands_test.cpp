@@ -8,7 +8,6 @@ namespace {
 
 using fakes::appendValue;
 using fakes::Bytes;
-using nlohmann::json;
 using testing::HasSubstr;
 using testing::Not;
 
@@ -48,7 +47,7 @@ TEST_F(NandListCommandsTest, ListsForPeopleAndForPrograms) {
   EXPECT_THAT(telemetry.out, HasSubstr("0 42 0"));
   serveTelemetry(1);
   const Outcome one = nand({"telemetry", "--mode", "1", "--json"});
-  const json modes = one.json();  // the digit that is none is not named in it
+  const nlohmann::json modes = one.json();  // the digit that is none is not named in it
   ASSERT_EQ(modes.size(), 1u);
   EXPECT_EQ(modes[0]["mode"], 1);
   EXPECT_EQ(modes[0]["buses"].size(), 2u);
@@ -58,12 +57,12 @@ TEST_F(NandListCommandsTest, ListsForPeopleAndForPrograms) {
   storage.registry->serve(validity);
   EXPECT_THAT(nand({"validity"}).out, HasSubstr("70 71"));
   storage.registry->serve(validity);
-  EXPECT_EQ(nand({"validity", "--json"}).json(), json({{"ValidityList[3]", {70, 71}}}));
+  EXPECT_EQ(nand({"validity", "--json"}).json(), nlohmann::json({{"ValidityList[3]", {70, 71}}}));
 
   storage.registry->serve(defects);
   EXPECT_THAT(nand({"defects"}).out, HasSubstr("41 of the factory, 1 found since"));
   storage.registry->serve(defects);
-  const json found = nand({"defects", "--json"}).json();
+  const nlohmann::json found = nand({"defects", "--json"}).json();
   EXPECT_EQ(found["summary"]["Factory Count"], 41);
   EXPECT_EQ(found["defects"][0]["CE"], 2);
 }
@@ -95,7 +94,7 @@ TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
     EXPECT_THAT(text.out, HasSubstr("FaultDesk Key: error\n"));
     EXPECT_EQ(text.out.find("Next one from") != std::string::npos, c.sinceLast < 604800);
     serve();
-    const json preview = nand({"storage-log", "--preview", "--json"}).json();
+    const nlohmann::json preview = nand({"storage-log", "--preview", "--json"}).json();
     EXPECT_EQ(preview["wouldBeWritten"], c.written);
     EXPECT_EQ(preview["structuredRecords"], 3 * 2 + 2);
     EXPECT_THAT(preview["text"].get<std::string>(), HasSubstr("ValidityList[3]:70,71\n"));

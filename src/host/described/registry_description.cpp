@@ -10,13 +10,13 @@ namespace tally {
 namespace {
 
 // Entries without an id are numbered from here, in the order of the file.
-constexpr std::string_view kFileName = "registry.plist";
+constexpr std::string_view kRegistryFile = "registry.plist";
 constexpr std::uint64_t kFirstID = 0x100;
 // What of an entry is not a property that clients see, and where it is kept for open().
 constexpr std::string_view kHub = "Hub";
 constexpr std::string_view kUserClient = "UserClient";
 
-struct DescribedEntry final : RegistryEntry {
+struct DescribedRegistryEntry final : RegistryEntry {
   KvRef<KvDictionary> hub;
   KvRef<KvDictionary> userClient;
 };
@@ -44,9 +44,9 @@ bool takeDictionary(const KvDictionary& description, std::string_view key,
 }
 
 // Null, with the reason, when it is malformed.
-std::shared_ptr<DescribedEntry> parseEntry(const KvDictionary& description, std::uint64_t id,
-                                           std::string* fault) {
-  auto entry = std::make_shared<DescribedEntry>();
+std::shared_ptr<DescribedRegistryEntry> parseEntry(const KvDictionary& description,
+                                                   std::uint64_t id, std::string* fault) {
+  auto entry = std::make_shared<DescribedRegistryEntry>();
   const auto className = description.getString("Class");
   if (!className || className->empty()) {
     *fault = "no Class";
@@ -83,7 +83,7 @@ RegistryDescription::RegistryDescription(DeviceDirectory folder, std::shared_ptr
       files_(std::make_shared<DescribedFiles>(folder_, std::move(log))) {}
 
 std::shared_ptr<const RegistrySource::Entries> RegistryDescription::entries() {
-  const auto identity = folder_.identity(kFileName);
+  const auto identity = folder_.identity(kRegistryFile);
   if (!entries_ || identity != identity_) {
     identity_ = identity;
     entries_ = identity ? read() : std::make_shared<const Entries>();
@@ -93,8 +93,8 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::entries() {
 
 std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
   auto entries = std::make_shared<Entries>();
-  const std::string path = folder_.text() + "/" + std::string(kFileName);
-  const auto content = folder_.readFile(kFileName, kPlistMaximumBytes);
+  const std::string path = folder_.text() + "/" + std::string(kRegistryFile);
+  const auto content = folder_.readFile(kRegistryFile, kPlistMaximumBytes);
   if (!content) {
     files_->report("unreadable", content.error().message);
     return entries;
@@ -129,7 +129,7 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
 
 std::unique_ptr<UserClient> RegistryDescription::open(const RegistryEntry& entry,
                                                       std::uint32_t type, RegistryResult* result) {
-  const auto& described = static_cast<const DescribedEntry&>(entry);
+  const auto& described = static_cast<const DescribedRegistryEntry&>(entry);
   *result = kRegistryUnsupported;
   if (type != 0) return nullptr;
   if (described.className == kStatisticsHubClass) {

@@ -37,11 +37,10 @@ class PropertyListPreferences final : public Preferences {
   void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
                               std::string_view domain) override;
   WriteResult SMAPreferencesSynchronize(std::string_view domain) override;
+  bool isReadable(std::string_view domain) override;
 
   // All keys of a domain as they read now; empty when there are none.
   KvRef<KvDictionary> copyDomain(std::string_view domain);
-  // False while a domain's file is there and was never read, so that an absent key says nothing.
-  bool isReadable(std::string_view domain);
   // The domains that have a file, sorted.
   Result<std::vector<std::string>> listDomains() const;
 

@@ -12,7 +12,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 constexpr std::string_view kBodySuffix = ".log";
 constexpr std::string_view kInfoSuffix = ".info.plist";
 constexpr std::size_t kLargestInfo = 1u << 20;

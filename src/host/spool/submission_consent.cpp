@@ -10,7 +10,6 @@ namespace {
 constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";
 constexpr std::string_view kSwitchDomain = "vellum.tallyd";
 constexpr std::string_view kWithdrawn = "WithdrawnLogs";
-constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 
 bool holds(Preferences& preferences) {
   const auto value = preferences.SMAPreferencesGetValue(kWithdrawn, kProgramDomain);
@@ -29,7 +28,7 @@ SubmissionConsent::Wish SubmissionConsent::wish() const {
   const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &isSwitch);
   if (isSwitch) return enabled ? Wish::Allowed : Wish::Forbidden;
   const bool isAbsent = !preferences_->SMAPreferencesGetValue(kSwitch, kSwitchDomain) &&
-                        (!isReadable_ || isReadable_(kSwitchDomain));
+                        preferences_->isReadable(kSwitchDomain);
   return isAbsent ? Wish::Allowed : Wish::Unknown;
 }
 

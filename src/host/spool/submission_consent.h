@@ -1,7 +1,6 @@
 // Whether the user allows logs to leave the device, and what follows when not.
 #pragma once
 
-#include <functional>
 #include <memory>
 #include <mutex>
 #include <set>
@@ -17,16 +16,13 @@ namespace tally {
 // Every service that puts files where they wait to be taken away asks here first. Any thread may.
 class SubmissionConsent {
  public:
-  using IsReadable = std::function<bool(std::string_view domain)>;
-  // The function tells whether a domain of the preferences can be read; null: each can.
   SubmissionConsent(DeviceRoot root, std::shared_ptr<SystemLog> log,
                     std::shared_ptr<Preferences> preferences,
-                    std::shared_ptr<DeviceDescription> description, IsReadable isReadable = {})
+                    std::shared_ptr<DeviceDescription> description)
       : root_(std::move(root)),
         log_(std::move(log)),
         preferences_(std::move(preferences)),
-        description_(std::move(description)),
-        isReadable_(std::move(isReadable)) {}
+        description_(std::move(description)) {}
 
   // The description's word, else the user's preference; allowed when neither says anything. A
   // preference that cannot be read, or is neither a boolean nor a number, may be a refusal.
@@ -46,7 +42,6 @@ class SubmissionConsent {
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Preferences> preferences_;
   std::shared_ptr<DeviceDescription> description_;
-  IsReadable isReadable_;
   std::mutex mutex_;
   std::set<std::string, std::less<>> refused_;
 };

@@ -9,17 +9,17 @@ namespace {
 
 // 32-bit words, little endian: an unused one, the factory's count, the number of records; then
 // the records.
-constexpr std::size_t kFactoryCountOffset = 4, kRecordCountOffset = 8, kHeaderBytes = 12;
-constexpr std::size_t kRecordBytes = 32;
+constexpr std::size_t kFactoryCountOffset = 4, kRecordCountOffset = 8, kDefectsHeaderBytes = 12;
+constexpr std::size_t kDefectBytes = 32;
 constexpr std::size_t kBusOffset = 0, kChipEnableOffset = 2;  // 16 bits each
 constexpr std::size_t kReasonOffset = 16, kTemperatureOffset = 24, kDefectModeOffset = 28;
 
 // The 32-bit fields of a record, in the order in which they are reported.
-struct Field {
+struct DefectField {
   std::string_view name;
   std::size_t offset;
 };
-constexpr Field kFields[] = {
+constexpr DefectField kDefectFields[] = {
     {"CAU", 4}, {"Block", 8}, {"Cycle", 12}, {"Reason", kReasonOffset}, {"Page", 20}};
 
 // On one of the controllers the reasons of a mode are told apart by their hundreds.
@@ -47,7 +47,7 @@ KvRef<KvDictionary> defectOf(const ByteReader& record, bool plainReasons) {
   auto defect = KvDictionary::create(8);
   defect->set("Bus", KvNumber::int32(record.read<std::uint16_t>(kBusOffset).value_or(0)));
   defect->set("CE", KvNumber::int32(record.read<std::uint16_t>(kChipEnableOffset).value_or(0)));
-  for (const Field& field : kFields) {
+  for (const DefectField& field : kDefectFields) {
     auto value = record.read<std::uint32_t>(field.offset).value_or(0);
     if (field.offset == kReasonOffset && !plainReasons) {
       value = adjusted(value, record.read<std::uint32_t>(kDefectModeOffset).value_or(0));
@@ -70,10 +70,11 @@ bool readDefectsList(const StorageList& list, const RecordSink& sink) {
     return false;
   }
   sink(*summaryOf(*factoryCount, list.characteristics));
-  const std::size_t present = (list.bytes.size() - kHeaderBytes) / kRecordBytes;
+  const std::size_t present = (list.bytes.size() - kDefectsHeaderBytes) / kDefectBytes;
   const bool plainReasons = list.className == kPlainReasonsClass;
   for (std::size_t i = 0; i < *announced && i < present; ++i) {
-    const ByteReader record(list.bytes.subspan(kHeaderBytes + i * kRecordBytes, kRecordBytes));
+    const ByteReader record(
+        list.bytes.subspan(kDefectsHeaderBytes + i * kDefectBytes, kDefectBytes));
     sink(*defectOf(record, plainReasons));
   }
   if (*announced <= present) return true;

@@ -30,12 +30,12 @@ constexpr std::string_view kSummaryNames[] = {"RD",  "PE",         "Max_PE_rate"
                                               "Ret", "block_type", "num_pages"};
 
 // An array of the record: its first word, and how many elements each generation reports.
-struct Field {
+struct TelemetryField {
   std::string_view name;
   std::size_t firstWord;
   std::array<std::size_t, kGenerations> elements;
 };
-constexpr Field kFields[] = {
+constexpr TelemetryField kTelemetryFields[] = {
     {"readStage", 0, {23, 23, 33}},
     {"initialReadStage", 33, {23, 23, 23}},
     {"nandStageOfLife", 56, {8, 8, 8}},
@@ -165,7 +165,7 @@ struct Element {
 };
 std::vector<Element> elementsOf(Generation generation) {
   std::vector<Element> elements;
-  for (const Field& field : kFields) {
+  for (const TelemetryField& field : kTelemetryFields) {
     for (std::size_t i = 0; i < field.elements[generation]; ++i) {
       std::string name(field.name);
       name += '[';

@@ -7,6 +7,7 @@
 #include <optional>
 #include <span>
 
+#include "base/time_text.h"
 #include "platform/platform.h"
 #include "storage/analytics_events.h"
 #include "storage/auxiliary_metrics.h"
@@ -19,7 +20,6 @@ namespace {
 
 constexpr std::string_view kUnparsable = "Unable to parse buffer";
 constexpr std::size_t kBootSessionRoom = 100;
-constexpr double kSecondsPerDay = 86400;
 
 // The first character of the boot session identifier; a zero byte of an empty one. Empty when
 // there is no identifier.

@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::size_t kUnit = 8;  // a header, or a value
 constexpr std::size_t kCountOffset = 4;
-constexpr std::uint32_t kHighestKey = 0x30000000;
+constexpr std::uint32_t kHighestWireKey = 0x30000000;
 constexpr std::uint32_t kUnset = 0xFFFFFFFF;
 constexpr std::uint32_t kReadCountHistoKey = 265;
 
@@ -105,7 +105,7 @@ int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_
     // Compared in units: in bytes the product would wrap where sizes have 32 bits.
     const std::size_t unitsLeft = (reader.size() - at) / kUnit - 1;
     const auto values = count <= unitsLeft ? reader.slice(at + kUnit, count * kUnit) : std::nullopt;
-    if (key > kHighestKey || !values) return fail(*context);
+    if (key > kHighestWireKey || !values) return fail(*context);
     if (!appendRecord(*context, key, Values(*values))) return fail(*context);
     at += kUnit + values->size();
   }

@@ -118,9 +118,10 @@ void examineWhitelist(Lines& lines) {
                                counted(findings.size() - faults, "surprise"),
                                findings.empty() ? "" : "; see tallyctl whitelist check")});
   for (const auto& group : *file.root) {
-    if (groupState(group.key->view()) == GroupState::DisabledByTasking) {
+    const GroupState state = groupState(group.key->view());
+    if (state == GroupState::DisabledByTasking || state == GroupState::SwitchUnreadable) {
       lines.push_back({Health::Missing, kSubject,
-                       fmt::format("the group {} is disabled by tasking", group.key->view())});
+                       fmt::format("the group {} {}", group.key->view(), whyNotInForce(state))});
     }
   }
 }

@@ -20,6 +20,7 @@ class OverlayPreferences final : public Preferences {
     written_.insert_or_assign({std::string(domain), std::string(key)}, std::move(value));
   }
   WriteResult SMAPreferencesSynchronize(std::string_view) override { return WriteResult::Written; }
+  bool isReadable(std::string_view domain) override { return base_->isReadable(domain); }
 
  private:
   std::shared_ptr<Preferences> base_;

@@ -168,7 +168,7 @@ LogPreview previewStorageLog(std::FILE* notices) {
                                    kSecondsBetweenStorageLogs);
   const PlatformScope scope(preview.run.platform());
   platform().preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr,
-                                                 "vellum.tallyd.tallyrun");
+                                                 kProgramDomain);
   const std::uint8_t force = std::exchange(gForceCollectionSet, std::uint8_t{1});
   preview.complete = dumpStorageLists(false, notices);
   gForceCollectionSet = force;
