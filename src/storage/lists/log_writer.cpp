@@ -13,7 +13,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 constexpr std::string_view kLastLoggedKey = "SSLastLoggedAt";
 constexpr std::string_view kLogName = "StorageStatus";
 
