@@ -167,8 +167,7 @@ LogPreview previewStorageLog(std::FILE* notices) {
   preview.due = !preview.last || !(platform().clock->secondsSince1970() - *preview.last <
                                    kSecondsBetweenStorageLogs);
   const PlatformScope scope(preview.run.platform());
-  platform().preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr,
-                                                 kProgramDomain);
+  platform().preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr, kProgramDomain);
   const std::uint8_t force = std::exchange(gForceCollectionSet, std::uint8_t{1});
   preview.complete = dumpStorageLists(false, notices);
   gForceCollectionSet = force;
