@@ -192,7 +192,7 @@ TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
       driver("bro&#27;ken", array(group("", 0, array(integerElement(1)))), "");
   const std::string legend = driver("odd", integerElement(3), "");
   const std::string lost = driver("lost", array(group("", kEvents, channel(5, word(1, 0, 1), "x"))),
-                                  frames(5, array(integer(1)) + "<array><dict/></array>"));
+                                  frames(5, array(integerElement(1)) + "<array><dict/></array>"));
   const struct {
     const char* name;
     std::string entries;
