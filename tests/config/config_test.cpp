@@ -135,7 +135,8 @@ TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
                              entry("good", 1) + "<key>bad</key><integer>1</integer>" +
                                  "<key>half</key><dict><key>sig_fig</key><integer>2</integer>"
                                  "<key>intervals</key><array><string>1</string></array>"
-                                 "<key>bucket_interval</key><integer>-5</integer></dict>")));
+                                 "<key>bucket_interval</key><integer>-5</integer></dict>"
+                                 "<key>odd</key><dict><key>sig_fig</key><real>1.5</real></dict>")));
   ASSERT_TRUE(config);
   EXPECT_EQ(figureOf(config->configOptionsForDistributionKey("good")), "1");
   EXPECT_EQ(config->configOptionsForDistributionKey("bad"), nullptr);
@@ -144,13 +145,15 @@ TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
   EXPECT_EQ(half->size(), 1u);
   EXPECT_THAT(
       fake.log->texts(LogLevel::Error),
-      ElementsAre("whitelist: malformed group NoDictionary skipped",
-                  "whitelist: group G: malformed section ScalarKeys skipped",
-                  "whitelist: group G, DistributionKeys: malformed options of key bad, skipped",
-                  "whitelist: group G, DistributionKeys, key half: malformed option intervals "
-                  "skipped",
-                  "whitelist: group G, DistributionKeys, key half: malformed option "
-                  "bucket_interval skipped"));
+      ElementsAre(
+          "whitelist: malformed group NoDictionary skipped",
+          "whitelist: group G: malformed section ScalarKeys skipped",
+          "whitelist: group G, DistributionKeys: malformed options of key bad, skipped",
+          "whitelist: group G, DistributionKeys, key half: malformed option intervals "
+          "skipped",
+          "whitelist: group G, DistributionKeys, key half: malformed option "
+          "bucket_interval skipped",
+          "whitelist: group G, DistributionKeys, key odd: malformed option sig_fig skipped"));
 }
 
 TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {

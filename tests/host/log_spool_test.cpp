@@ -94,7 +94,14 @@ TEST_F(SpoolTest, RefusalsLeaveNothingBehindAndCostNoLog) {
     std::function<bool()> attempt;
     const char* reason;
   } cases[] = {
-      {"larger than the spool", [&] { return submit(std::string(2001, 'x')); }, "larger than"},
+      {"larger than the spool, piece by piece",
+       [&] {
+         const std::string piece(500, 'x');
+         return spool().SMAWriteLogForSubmission("1", "r", nullptr, nullptr, [&](LogFile& file) {
+           for (int i = 0; i < 4; ++i) file.write(piece);
+         });
+       },
+       "larger than"},
       {"unsafe name", [&] { return submit("x", "../x"); }, "not a name"},
       {"name of a temporary file", [&] { return submit("x", "a.tmp~1"); }, "not a name"},
       {"reserved",

@@ -75,6 +75,8 @@ TEST(LocaleNames, BecomeTags) {
       {"DE_ch", "de-CH"},
       {"de_DE@euro", "de-DE"},
       {"sr_RS.UTF-8@latin", "sr-Latn-RS"},
+      {"es_419", "es-419"},
+      {"es_4190", "es"},
       {"de_Germany", "de"},
       {"C", ""},
       {"", ""},

@@ -49,6 +49,7 @@ TEST(Registry, MatchesByEveryKeyAndTheirCombinations) {
   } cases[] = {
       {"class", ServiceMatchingByClass("Bus"), "bus0 bus1 "},
       {"id", KvDictionary::create({{kMatchEntryID, number(2)}}), "bus0 "},
+      {"a real id", KvDictionary::create({{kMatchEntryID, KvNumber::float64(2)}}), ""},
       {"class and name",
        KvDictionary::create({{kMatchClass, text("Root")}, {kMatchName, text("bus1")}}), ""},
       {"property value",

@@ -217,6 +217,7 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
       {"kern.counter", 8, 0, 8, UINT64_MAX},
       {"vm.swapusage", 32, 0, 32, 1024},
       {"kern.raw", 8, 0, 3, 0x030201},
+      {"kern.raw", 2, ENOMEM, 2, 0},
       {"kern.busy", 8, EBUSY, 8, 0},
       {"kern.odd", 8, ENOENT, 8, 0},
       {"kern.next", 8, 0, 1, 1},

@@ -198,6 +198,7 @@ TEST(PlistCodec, RefusesDamagedXml) {
       {"<date>2024-01-01T24:00:00Z</date>", "not a date"},
       {"<data>Y</data>", "base64"},
       {"<data>YWJj=</data>", "base64"},
+      {"<data>YW=J</data>", "base64"},
       {"<data>Y*Jj</data>", "base64"},
       {"<string>&foo;</string>", "reference"},
       {"<string>&#xD800;</string>", "reference"},

@@ -302,6 +302,8 @@ TEST_F(StorageLogTest, WriteAmplification) {
   EXPECT_EQ(case_(1, 255, 16, 1, 1, 1), std::pair(0.0f, 0.0f)) << "less than a unit";
   EXPECT_EQ(case_(1, 0x10000, 0x10000, 0x10000, 1, 1), std::pair(0.0f, 1048576.0f))
       << "the product of the band's size has 32 bits, the other one 64";
+  putThreshold(KvNumber::float64(10));
+  EXPECT_EQ(writeAmplificationThreshold(), 2.0) << "of what is too large";
 }
 
 TEST_F(StorageLogTest, TheNeedForTheValidityList) {
