@@ -1,5 +1,6 @@
 """A device far larger than any should be. TALLYRUN_LOAD is the share of the full size: 1 is a million
 scalars, a hundred million samples, a million records, 200,000 channels and three years of logs."""
+import contextlib
 import csv
 import io
 import json
@@ -14,11 +15,14 @@ import struct
 import subprocess
 import sys
 import tempfile
+import threading
 import time
 import unittest
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parents[1] / "tests/e2e"))
+from bus import BusDevice, NAME
 from device import BIN, DeviceTest, SPOOL, STORE, TODAY, group, parse_messages, texts
+from raw_peer import RawPeer, int64_fields
 
 SHARE = float(os.environ.get("TALLYRUN_LOAD", "0.01"))
 YESTERDAY = TODAY - 1
@@ -243,6 +247,55 @@ class Load(DeviceTest):
                          [int(commits), *range(1, int(commits) + 1)])
         say(f"{len(runs)} daily runs, the longest {max(run.seconds for run in runs):.1f} s, beside "
                  f"{commits} commits, {rate} a second")
+
+    def messages(self, send):
+        """Sends to a program that waits for a list; the device after it has ended, with bounded memory."""
+        device = BusDevice()
+        self.addCleanup(device.remove)
+        device.whitelist(G=group({"a": {}}))
+        device.store([("a", device.today - 1, 1)])
+        device.tool("send", "logging")
+        status, peaks = pathlib.Path("/proc", (device.folder / "pid").read_text().strip(), "status"), [0]
+
+        def follow():
+            with contextlib.suppress(OSError, IndexError):  # it ends
+                while True:
+                    peaks.append(int(status.read_text().partition("VmHWM:")[2].split()[0]))
+                    time.sleep(0.2)
+        follower = threading.Thread(target=follow, daemon=True)
+        follower.start()
+        send(device)
+        device.wait_for_end()
+        follower.join(30)
+        self.assertTrue(max(peaks) < 96 * MIB or not MEMORY_COUNTS)
+        return device
+
+    def test_applications(self):
+        most = 20_000  # that a message may have
+        apps = [{"bundle_id": f"org.example.app{i}", "version": "1", "adam_id": i, "arch": 1,
+                 "uuid": "00112233-4455-6677-8899-aabbccddeeff"} for i in range(most + 1)]
+
+        def send(device):
+            with device.kept_awake():
+                for elements, status in ((apps, 1), (apps[:most], 0)):
+                    device.tool("send", "apps", "-", stdin=json.dumps(elements).encode(), status=status)
+        device = self.messages(send)
+        self.assertEqual([app["adamID"] for app in device.log()["TBActivatedAppInfo"]], list(range(most)))
+        self.assertEqual(device.error_texts(), [
+            f"endpoint {NAME}: a message is refused: more elements than a message may have"])
+
+    def test_flood(self):
+        count = sized(500_000)
+
+        def send(device):
+            peer = RawPeer(device)
+            for flags in (peer.NO_REPLY, 0):
+                for _ in range(count):
+                    peer.send(int64_fields(operation=2), flags=flags)  # without a list
+            peer.wait_for_answers(count)
+            peer.socket.close()
+        skipped = 'message skipped: no array "app_data"'
+        self.assertEqual(self.messages(send).error_texts(), [skipped, f"{skipped}: {2 * count - 1} more"])
 
 
 if __name__ == "__main__":

@@ -17,25 +17,18 @@ if 86400 - time.time() % 86400 < 300:
 TODAY = int(time.time() // 86400)
 NAME = "vellum.tallyd.tallyrun"
 OBJECT = "/vellum/tallyd/tallyrun"
-CONFIG = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configuration 1.0//EN"
- "http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd">
-<busconfig><type>system</type><listen>unix:path={folder}/socket</listen>
-<servicedir>{folder}/services</servicedir>{limits}
-<policy context="default"><allow user="*"/><allow own="*"/>
-<allow send_destination="*" eavesdrop="true"/><allow eavesdrop="true"/></policy></busconfig>"""
+CONFIG = """<busconfig><type>system</type><listen>unix:path={folder}/socket</listen>
+<servicedir>{folder}/services</servicedir><limit name="max_replies_per_connection">50000</limit>
+<policy context="default"><allow user="*"/>{rules}</policy>{include}</busconfig>"""
+OPEN = {"rules": '<allow own="*"/><allow send_destination="*" eavesdrop="true"/><allow eavesdrop="true"/>',
+        "include": ""}
 # As the machine's system bus has it: what no policy allows is refused.
-SHIPPED_CONFIG = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-BUS Bus Configuration 1.0//EN"
- "http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd">
-<busconfig><type>system</type><listen>unix:path={folder}/socket</listen>
-<servicedir>{folder}/services</servicedir>{limits}
-<policy context="default"><allow user="*"/><deny own="*"/><deny send_type="method_call"/>
+SHIPPED = {"rules": """<deny own="*"/><deny send_type="method_call"/>
 <allow send_type="signal"/><allow send_requested_reply="true" send_type="method_return"/>
 <allow send_requested_reply="true" send_type="error"/><allow receive_type="method_call"/>
 <allow receive_type="method_return"/><allow receive_type="error"/><allow receive_type="signal"/>
-<allow send_destination="org.freedesktop.DBus"/></policy>
-<include>%s/packaging/dbus/system.conf</include></busconfig>""" % pathlib.Path(__file__).parents[2]
-# So that a test can have many messages under way.
-LIMITS = '<limit name="max_replies_per_connection">50000</limit>'
+<allow send_destination="org.freedesktop.DBus"/>""",
+           "include": f"<include>{pathlib.Path(__file__).parents[2]}/packaging/dbus/system.conf</include>"}
 
 
 class BusDevice(Device):
@@ -64,7 +57,7 @@ class BusDevice(Device):
         (self.folder / "services" / f"{NAME}.service").write_text(
             f"[D-BUS Service]\nName={NAME}\nExec={starter}\nUser=root\n")
         config = self.folder / "config"
-        config.write_text((SHIPPED_CONFIG if shipped_policy else CONFIG).format(folder=self.folder, limits=LIMITS))
+        config.write_text(CONFIG.format(folder=self.folder, **(SHIPPED if shipped_policy else OPEN)))
         with open(self.folder / "daemon", "wb") as errors:
             self.daemon = subprocess.Popen(["dbus-daemon", f"--config-file={config}", "--nofork",
                                             "--nopidfile", "--nosyslog"], stderr=errors)
@@ -105,27 +98,6 @@ class BusDevice(Device):
                    seconds, "the end of the run")
         return self.default_texts()
 
-    def watch_memory(self):
-        """Follows the running program; what is returned gives its peak in kB, at its end."""
-        status = pathlib.Path("/proc", (self.folder / "pid").read_text().strip(), "status")
-        peaks = [0]
-
-        def follow():
-            try:
-                while True:
-                    text = status.read_text()
-                    peaks.append(int(text.partition("VmHWM:")[2].split()[0]))
-                    time.sleep(0.2)
-            except (OSError, IndexError):
-                pass  # it ended
-        thread = threading.Thread(target=follow, daemon=True)
-        thread.start()
-
-        def peak():
-            thread.join(30)
-            return max(peaks)
-        return peak
-
     @contextlib.contextmanager
     def kept_awake(self):
         """A slow machine may take more than ten seconds for what comes next: the run gets messages meanwhile
@@ -157,8 +129,9 @@ class BusDevice(Device):
         self.daemon.send_signal(signal.SIGKILL)
         self.daemon.wait()
 
-    def busctl(self, *fields, count=1, user=None, status=0):
-        return self.client("busctl", f"--address={self.address}", "--", "call", NAME, OBJECT, NAME, "Send",
+    def busctl(self, *fields, count=1, user=None, status=0, waits=True):
+        return self.client("busctl", f"--address={self.address}",
+                           f"--expect-reply={'yes' if waits else 'no'}", "--", "call", NAME, OBJECT, NAME, "Send",
                            "a{sv}", str(count), *fields, user=user, status=status)
 
     def gdbus(self, dictionary):

@@ -1,7 +1,6 @@
-"""The sample storage of examples/device: what its driver exports reaches the log, and its lists their records."""
+"""The sample storage of examples/device: what its driver exports reaches the log of the next day."""
 import csv
 import io
-import json
 import pathlib
 import plistlib
 import struct
@@ -9,9 +8,9 @@ import subprocess
 import sys
 import unittest
 
-from device import DeviceTest, SPOOL, TODAY, group
+from device import DeviceTest, TODAY, group
 
-SAMPLE = pathlib.Path(__file__).resolve().parents[2] / "examples/device"
+MAKE_STORAGE = pathlib.Path(__file__).resolve().parents[2] / "examples/device/make-storage.py"
 BUFFER = "device/storage-statistics.bin"
 PREFIX = "vellum.NANDInfo."
 STRUCTURED_DATA = "var/mobile/Library/Logs/StructuredData"
@@ -31,24 +30,17 @@ def records(buffer):
 
 
 class Storage(DeviceTest):
-    def sample(self, *lists):
-        for script, *arguments in (("make-storage.py", str(TODAY)), ("make-storage-lists.py", *lists))[:1 + bool(lists)]:
-            subprocess.run([sys.executable, SAMPLE / script, self.device.root, *arguments], check=True)
-
-    def structured(self, kind):
-        return [record for path in sorted((self.device.root / STRUCTURED_DATA).glob(f"*-{kind}.plist"))
-                for record in plistlib.loads(path.read_bytes())["Records"]]
-
     def test_the_next_day_reports_what_the_driver_exported(self):
-        self.sample()
         device = self.device
+        subprocess.run([sys.executable, MAKE_STORAGE, device.root, str(TODAY)], check=True)
         device.whitelist(G=group(scalar_prefixes={"vellum.": {}}))
         buffer = (device.root / BUFFER).read_bytes()
         expected = {PREFIX + name: records(buffer)[key][element] for name, (key, element) in SPOTS.items()}
         expected |= {PREFIX + "VMFreezer.NumPhysicalWrites": 522_305_536, "vellum.hwreport.wakeups": 48_210}
         device.run("-f")
-        self.assertEqual(self.structured(172), [{"id": 3, "count": 2, "reg0": 0x1F40, "reg1": -1},
-                                                {"id": 4, "count": 1, "reg0": 0x2A00}])
+        log, = (device.root / STRUCTURED_DATA).glob("*-172.plist")
+        self.assertEqual(plistlib.loads(log.read_bytes())["Records"],
+                         [{"id": 3, "count": 2, "reg0": 0x1F40, "reg1": -1}, {"id": 4, "count": 1, "reg0": 0x2A00}])
         device.run("-f", day=TODAY + 1)
         scalars = device.log()["TBScalars"]
         self.assertEqual({key: scalars.get(key) for key in expected}, expected)
@@ -60,35 +52,6 @@ class Storage(DeviceTest):
         swept = {row["key"] for row in csv.DictReader(io.StringIO(dump))}
         self.assertFalse(any(key.startswith(PREFIX) for key in swept))
         self.assertIn("vellum.hwreport.wakeups", swept)
-
-    def test_lists_and_the_weekly_log(self):
-        self.sample("nvme", "2")
-        device = self.device
-        words = {}
-        for name in ("telemetry-0", "defects"):
-            data = (device.root / f"device/storage-{name}.bin").read_bytes()
-            words[name] = struct.unpack(f"<{len(data) // 4}i", data)
-        buses = json.loads(device.tool("nand", "telemetry", "--json"))[0]["buses"]
-        self.assertEqual([(bus["readStage"][0], bus["RD"]) for bus in buses],
-                         [(words["telemetry-0"][1024 * i], words["telemetry-0"][4096 + 8 * i]) for i in range(4)])
-        found = json.loads(device.tool("nand", "defects", "--json"))["defects"]
-        self.assertEqual([defect["Reason"] for defect in found],
-                         [words["defects"][7 + 8 * i] + added for i, added in enumerate((0, 200, 100, 0))])
-        validity = json.loads(device.tool("nand", "validity", "--json"))
-        self.assertTrue(json.loads(device.tool("nand", "storage-log", "--preview", "--json"))["wouldBeWritten"])
-        self.assertFalse((device.root / SPOOL).exists(), "a preview leaves nothing behind")
-        # On the days between the lists are recorded, the log is not written.
-        for run, (day, logs) in enumerate(((TODAY, 1), (TODAY + 6, 1), (TODAY + 8, 2)), 1):
-            subprocess.run(device.command("-f"), check=True, capture_output=True, timeout=120,
-                           env=device.environment(day))
-            texts = [path.read_text() for path in sorted((device.root / SPOOL).glob("*-StorageStatus.log"))]
-            self.assertEqual((len(texts), len(self.structured(176))), (logs, run * 17))
-        header, line = texts[0].split("\n\n")
-        self.assertIn("Date: 2026-03-02 12:00:0", header)
-        self.assertIn(";UserWamp:0.56;", line)
-        for name, values in validity.items():
-            self.assertIn(f"{name}:{','.join(map(str, values))}", line)
-
 
 if __name__ == "__main__":
     unittest.main()

@@ -24,9 +24,6 @@ class Tasking(DeviceTest):
             found[user] = plistlib.loads(file.read_bytes()) if file.exists() else {}
         return found
 
-    def faults(self, device):
-        return [text for text in texts(device.run("-f"), "error") if text.startswith("tasking: ")]
-
     def test_scheduled_changed_and_repaired(self):
         device = self.simple()
         device.describe(SystemVersion={"ProductBuildVersion": "16S46"})
@@ -51,26 +48,6 @@ class Tasking(DeviceTest):
         self.assertEqual(self.values(device), {user: {"B0": 0} for user in FILES})
         self.assertEqual(device.preferences()["TaskingID"], "B")
         self.assertNotIn("TaskingUnfinished", device.preferences())
-
-    def test_what_could_not_be_written_is_tried_again(self):
-        device = self.simple()
-        device.describe(SystemVersion={"ProductBuildVersion": "16S46"})
-        device.write("var/guest", b"a file in the folder's place")
-        # The record cannot hold this identifier as it is, and still tells that it is in force.
-        self.schedule(device, "A\x01", payload("A"))
-        for _ in range(2):
-            self.assertEqual(len(self.faults(device)), 1)
-            self.assertNotIn("TaskingID", device.preferences())
-            self.assertIn("TaskingUnfinished", device.preferences())
-        written = (device.root / FILES["mobile"]).stat().st_ino
-        (device.root / "var/guest").unlink()
-        self.assertEqual(self.faults(device), [])
-        self.assertEqual(self.values(device), {user: {"A0": 0} for user in FILES})
-        self.assertEqual((device.root / FILES["mobile"]).stat().st_ino, written)
-        record = device.preferences()
-        self.assertEqual([record.get(key) for key in RECORD],
-                         ["A\ufffd", "16S46", b"\1\2", payload("A"), None])
-        self.assertNotIn("asking", " ".join(texts(device.run("-f"))))
 
 if __name__ == "__main__":
     unittest.main()
