@@ -38,8 +38,8 @@ EventFigures makeFigures() {
   EventFigures figures;
   figures.info = KvDictionary::create();
   std::int64_t value = 1000;
-  for (std::size_t row = 0; row < kKeyMapRows; ++row) {
-    figures.info->set(keyMap[row].key, KvNumber::int64(value += 37));
+  for (const SPXKeyMapRow& row : keyMap) {
+    figures.info->set(row.key, KvNumber::int64(value += 37));
   }
   for (const std::string_view key :
        {kNANDInfoNumLogicalReadsKey, kNANDInfoNumLogicalWritesKey, kNANDInfoNumPhysicalReadsKey,

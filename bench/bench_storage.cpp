@@ -15,7 +15,7 @@
 #include "platform/platform.h"
 #include "storage/exporter.h"
 #include "storage/nand_info.h"
-#include "storage/statistics/statistic_key_table.h"
+#include "storage/statistics/counter_names.h"
 
 namespace {
 
@@ -100,9 +100,10 @@ void appendRecord(Bytes& bytes, std::uint32_t key, std::uint32_t count, std::uin
 // All keys, all elements.
 Bytes fullBuffer() {
   Bytes bytes;
-  for (const StatisticKey& row : kStatisticKeys) {
-    const std::uint64_t value = row.key == 53 ? 0x20002 : row.key * 1'000'003ull;
-    appendRecord(bytes, row.key, std::max<std::uint32_t>(row.maximum, 1), value);
+  for (const StorageCounter* row : kFirstRows) {
+    if (row == nullptr) continue;
+    const std::uint64_t value = row->statistic == 53 ? 0x20002 : row->statistic * 1'000'003ull;
+    appendRecord(bytes, row->statistic, row->elements, value);
   }
   return bytes;
 }
@@ -139,15 +140,13 @@ std::uint64_t sumOfValues(const Bytes& bytes) {
 KvRef<KvDictionary> linearNandInfo(const Bytes& bytes) {
   auto info = KvDictionary::create();
   walk(bytes, [&](std::uint32_t key, const ByteReader& values, std::uint32_t count) {
-    const auto* row = std::find_if(std::begin(kStatisticKeys), std::end(kStatisticKeys),
-                                   [&](const StatisticKey& known) { return known.key == key; });
-    if (row == std::end(kStatisticKeys)) return;
-    const std::uint32_t taken = std::min<std::uint32_t>(count, std::max<unsigned>(row->maximum, 1));
+    const auto* row = std::ranges::find(kStorageCounters, key, &StorageCounter::statistic);
+    if (row == kStorageCounters.end()) return;
+    const std::uint32_t taken = std::min<std::uint32_t>(count, row->elements);
     for (std::size_t i = 0; i < taken; ++i) {
       const std::string name = taken == 1 ? row->name : row->name + std::to_string(i);
-      const auto* found = std::find_if(keyMap.begin(), keyMap.end() - 1,
-                                       [&](const SPXKeyMapRow& r) { return r.name == name; });
-      if (found == keyMap.end() - 1) continue;
+      const auto found = std::ranges::find(keyMap, name, &SPXKeyMapRow::name);
+      if (found == keyMap.end()) continue;
       const auto value = static_cast<std::int64_t>(*values.read<std::uint64_t>(i * 8));
       info->set(found->key, KvNumber::int64(value));
     }

@@ -14,7 +14,7 @@ import re
 import struct
 import sys
 
-TABLE = pathlib.Path(__file__).resolve().parents[2] / "src/storage/statistics/statistic_key_table.h"
+TABLE = pathlib.Path(__file__).resolve().parents[2] / "src/storage/statistics/counter_table.h"
 SECONDS_PER_DAY = 86400
 
 # What a storage of 32 GB shows after a year or so of use. What is not here is made up by its kind.
@@ -45,10 +45,10 @@ DURATION = re.compile(r"duration|time|_us$|_ms$|Ms$", re.IGNORECASE)
 
 
 def statistics():
-    """(key, name, maximum) of every statistic; the maximum is 0 for a scalar."""
-    row = re.compile(r'\{(\d+), "(\w+)"(?:, (\d+))?\}')
-    return [(int(key), name, int(maximum or 0))
-            for key, name, maximum in row.findall(TABLE.read_text())]
+    """(key, name, number of elements) of every statistic, by key. Some have several rows."""
+    row = re.compile(r'\{(\d+), "(\w+)", (\d+), ')
+    return sorted({(int(key), name, int(elements))
+                   for key, name, elements in row.findall(TABLE.read_text())})
 
 
 def bell(count, total, middle, dice):
@@ -57,8 +57,7 @@ def bell(count, total, middle, dice):
     return [int(total * weight * dice.uniform(0.85, 1.15)) for weight in weights]
 
 
-def values_of(name, maximum, day, dice):
-    count = max(maximum, 1)
+def values_of(name, count, day, dice):
     if name == "utilFormatTime":
         return [(day - 391) * SECONDS_PER_DAY + 34_211]
     if name in ("calendarTime", "wallTime"):
@@ -78,8 +77,8 @@ def values_of(name, maximum, day, dice):
 def statistics_buffer(day, dice):
     """Records of key, count and 64-bit values, little endian."""
     buffer = b""
-    for key, name, maximum in statistics():
-        values = values_of(name, maximum, day, dice)
+    for key, name, count in statistics():
+        values = values_of(name, count, day, dice)
         buffer += struct.pack(f"<II{len(values)}Q", key, len(values), *values)
     return buffer
 

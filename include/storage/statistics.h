@@ -4,6 +4,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string_view>
 
 #include "kv/export.h"
@@ -88,8 +89,8 @@ struct SPXKeyMapRow {
   std::string_view key;
 };
 
-// The rows, and an end row whose name is empty. Where a name occurs twice the first row holds.
-constexpr std::size_t kKeyMapRows = 679;
-TALLY_API extern const std::array<SPXKeyMapRow, kKeyMapRows + 1> keyMap;
+// The rows; an end row with an empty name follows the last. If a name occurs twice, the first row
+// applies.
+TALLY_API extern const std::span<const SPXKeyMapRow> keyMap;
 
 }  // namespace tally

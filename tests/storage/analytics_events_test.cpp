@@ -31,7 +31,7 @@ class AnalyticsEventsTest : public testing::Test {
   KvRef<KvDictionary> result;
 };
 
-TEST(EventReferenceText, MapsKnownKeysAlone) {
+TEST(EventReferenceText, MapsEveryCounterAndOnlyKnownKeys) {
   fakes::FakeStorage storage;
   const auto reference = parseEventReference(kEventPulseRefJson);
   ASSERT_TRUE(reference);
@@ -45,12 +45,18 @@ TEST(EventReferenceText, MapsKnownKeysAlone) {
   const auto info = buildNandInfo(context, false);
   for (const auto& [key, value] : *info) known.emplace(key->view());
   known.emplace(kNANDInfoIntermediatePartitionSizeKey);
-  for (const std::string_view event : kEventPulseEvents) {
-    const auto mapping = reference->find(event);
-    ASSERT_NE(mapping, reference->end()) << event;
-    for (const EventField& field : mapping->second) {
+  std::set<std::string, std::less<>> mapped;
+  for (const auto& [event, mapping] : *reference) {
+    EXPECT_TRUE(std::ranges::count(kEventPulseEvents, event) == 1) << event << " is never sent";
+    for (const EventField& field : mapping) {
       EXPECT_TRUE(known.contains(field.key->view())) << event << " " << field.key->view();
+      mapped.emplace(field.key->view());
     }
+  }
+  EXPECT_EQ(reference->size(), kEventPulseEvents.size());
+  for (const SPXKeyMapRow& row : keyMap) {
+    EXPECT_TRUE(mapped.contains(row.key))
+        << row.key << " is in no event of src/storage/events/analytics_events.json";
   }
 }
 

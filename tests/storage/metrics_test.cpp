@@ -10,6 +10,7 @@
 #include "fakes/kcdata.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
+#include "storage/nand_info/figure_groups.h"
 
 namespace tally {
 namespace {
@@ -86,6 +87,19 @@ TEST_F(NandInfoTest, AFullExport) {
                         "NumMaintenanceRequests=0L MaintenanceRequestsFailedRead=0L "
                         "MaintenanceRequestsFailedProg=0L MaintenanceRequestsFailedErase=0L") +
                 kReclaim);
+}
+
+TEST_F(NandInfoTest, EveryFigureIsShownInItsGroup) {
+  auto info = infoOf(kFull, {{86, {100}}, {85, {40}}});
+  storage.stackshot->buffer = fakes::Kcdata().thread(1, "VM_swapout", 1).bytes;
+  const auto freezer = CopyVMFreezerNANDInfo();
+  for (const auto& [key, value] : *freezer) info->set(key, value);
+  for (const auto& [key, value] : *info) {
+    EXPECT_NE(figureGroup(key->view()), FigureGroup::Other)
+        << key->view() << " has no row in kKeyGroups of figure_groups.cpp";
+  }
+  EXPECT_EQ(figureGroup("vellum.NANDInfo.PadSectorsPerHostFlow3"), FigureGroup::Traffic);
+  EXPECT_EQ(figureGroup("vellum.NANDInfo.padSectorsPerFlow4"), FigureGroup::Other);
 }
 
 TEST_F(NandInfoTest, DerivedFigures) {

@@ -1,19 +1,16 @@
-// The statistics parser, record by record, and the key table and key map as data.
+// The statistics parser, record by record, and the counter table and the key map as data.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <iterator>
 #include <map>
 #include <memory>
-#include <set>
 #include <string>
 
 #include "fakes/statistics_buffer.h"
 #include "storage/statistics.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
-#include "storage/statistics/statistic_key_table.h"
 #include "storage/statistics/statistic_keys.h"
 
 namespace tally {
@@ -125,26 +122,25 @@ TEST(StatisticsParser, ASecondBufferAppends) {
   EXPECT_THAT(parse.context.readCountHisto, ElementsAre(9, 2, 3, 4, 5));
 }
 
-std::uint16_t numberOfName(std::string_view name) {
-  static const auto* numbers = [] {
-    auto* made = new std::map<std::string_view, std::uint16_t>;
-    for (std::uint16_t i = 0; i < kCounterNames; ++i) (*made)[SPXCounterName(i)] = i;
-    return made;
-  }();
-  const auto found = numbers->find(name);
-  return found == numbers->end() ? std::uint16_t{0xFFFF} : found->second;
+// Every name that a counter can have, and its number.
+std::map<std::string_view, std::uint16_t> numbersOfNames() {
+  std::map<std::string_view, std::uint16_t> numbers;
+  for (std::uint16_t i = 0; i < kCounterNames; ++i) numbers[SPXCounterName(i)] = i;
+  return numbers;
 }
 
-TEST(KeyTable, EveryNameIsItsBaseAndNumberAndEndsInAZeroByte) {
-  for (const StatisticKey& row : kStatisticKeys) {
-    Statistic statistic;
-    ASSERT_TRUE(findStatistic(row.key, &statistic)) << row.name;
-    const std::string_view plain = SPXCounterName(statistic.name);
+TEST(CounterTable, EveryNameIsItsBaseAndNumberAndEndsInAZeroByte) {
+  EXPECT_EQ(numbersOfNames().size(), kCounterNames) << "two counters have the same name";
+  for (const StorageCounter& row : kStorageCounters) {
+    const Statistic* const statistic = findStatistic(row.statistic);
+    ASSERT_NE(statistic, nullptr) << row.name;
+    EXPECT_EQ(statistic->elements, row.elements) << row.name;
+    const std::string_view plain = SPXCounterName(statistic->name);
     EXPECT_EQ(plain, row.name);
     EXPECT_EQ(plain.data()[plain.size()], '\0');
-    for (unsigned i = 0; row.maximum > 1 && i < row.maximum; ++i) {
+    for (unsigned i = 0; row.elements > 1 && i < row.elements; ++i) {
       const std::string_view element =
-          SPXCounterName(static_cast<std::uint16_t>(statistic.name + 1 + i));
+          SPXCounterName(static_cast<std::uint16_t>(statistic->name + 1 + i));
       EXPECT_EQ(element, row.name + std::to_string(i));
       EXPECT_EQ(element.data()[element.size()], '\0');
     }
@@ -152,15 +148,40 @@ TEST(KeyTable, EveryNameIsItsBaseAndNumberAndEndsInAZeroByte) {
 }
 
 TEST(KeyMap, EveryRowIsFoundByTheNameOfACounter) {
-  std::set<std::string_view> seen;
-  for (std::size_t row = 0; row < kKeyMapRows; ++row) {
-    const std::string_view name = keyMap[row].name;
-    const std::uint16_t found = keyMapRowOfName(numberOfName(name));
-    ASSERT_LT(found, kKeyMapRows) << name;
-    EXPECT_EQ(keyMap[found].name, name);
-    // The first row of a name holds.
-    EXPECT_EQ(found == row, seen.insert(name).second) << name;
-    EXPECT_EQ(keyMapKey(row)->view(), keyMap[row].key);
+  const auto numbers = numbersOfNames();
+  std::map<std::string_view, std::string_view> names;  // by key
+  for (std::size_t row = 0; row < keyMap.size(); ++row) {
+    const auto& [name, key] = keyMap[row];
+    ASSERT_TRUE(numbers.contains(name)) << name;
+    // The first row of a name applies.
+    const bool isFirst = names.emplace(key, name).second;
+    EXPECT_EQ(names[key], name) << "both are reported as " << key;
+    EXPECT_EQ(keyMapRowOfName(numbers.at(name)) == row, isFirst) << name;
+    EXPECT_EQ(keyMapKey(row)->view(), key);
+  }
+  EXPECT_TRUE(keyMap.data()[keyMap.size()].name.empty()) << "the end row";
+}
+
+TEST(KeyMap, ReportNames) {
+  std::map<std::string, std::string> keys;
+  for (const SPXKeyMapRow& row : keyMap) keys.emplace(row.name, row.key);
+  const struct {
+    const char *name, *report;
+  } cases[] = {{"numFlushes", "NumFlushes"},
+               {"clogProgram", "clogProgram"},
+               {"padSizes0", "PadSize1"},
+               {"padSizes3", "PadSize4"},
+               {"bandsPerSpecialFlow2", "BandsPerInternalFlow2"},
+               {"bandsPerSpecialFlow4", "BandsPerInternalFlow3"},
+               {"coldestCycle1", "IntermediateColdestCycle"},
+               {"E2EDPErrorCounters11", "E2E_F2H_SL_UECC"},
+               {"raidReconstructFailPartition0", "raidReconstructFailPartition"},
+               {"raidReconstructFailPartition1", "raidReconstructFailPartition1"},
+               {"CacheDepthVsThroughput255", "CacheDepthVsThroughput255"},
+               {"padSectorsPerFlow4", "padSectorsPerFlow4"}};
+  for (const auto& c : cases) EXPECT_EQ(keys[c.name], std::string("vellum.NANDInfo.") + c.report);
+  for (const char* const name : {"bandsPerSpecialFlow3", "coldestCycle", "padSizes", "version"}) {
+    EXPECT_FALSE(keys.contains(name)) << name;
   }
 }
 

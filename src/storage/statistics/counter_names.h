@@ -1,4 +1,4 @@
-// All names that a counter can have, numbered and laid out at compile time: a parse keeps a number
+// All names that a counter can have, numbered and laid out at compile time. A parse keeps a number
 // for each counter, and what is known of a name is found by it.
 #pragma once
 
@@ -6,57 +6,95 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <iterator>
 #include <string_view>
 
+#include "storage/statistics/counter_table.h"
 #include "storage/statistics/decimal_names.h"
-#include "storage/statistics/statistic_key_table.h"
 
 namespace tally {
 
-// A statistic's plain name has a number, and its elements' names (when it has several) the numbers
-// after it.
-constexpr std::size_t namesOf(const StatisticKey& row) {
-  return row.maximum > 1 ? 1u + row.maximum : 1u;
+constexpr std::uint16_t kHighestStatistic =
+    std::ranges::max(kStorageCounters, {}, &StorageCounter::statistic).statistic;
+
+// The first row of a statistic gives it its names. Further rows report other elements of it, and
+// must repeat its name and number of elements.
+using FirstRows = std::array<const StorageCounter*, kHighestStatistic + 1>;  // null: not known
+constexpr FirstRows findFirstRows() {
+  FirstRows first{};
+  for (const StorageCounter& row : kStorageCounters) {
+    if (first[row.statistic] == nullptr) first[row.statistic] = &row;
+  }
+  return first;
+}
+inline constexpr FirstRows kFirstRows = findFirstRows();
+
+constexpr bool rowsOfEachStatisticAgree() {
+  return std::ranges::all_of(kStorageCounters, [](const StorageCounter& row) {
+    const StorageCounter& first = *kFirstRows[row.statistic];
+    return &row == &first || (std::string_view(row.name) == first.name &&
+                              row.elements == first.elements && row.isReported());
+  });
+}
+static_assert(
+    rowsOfEachStatisticAgree(),
+    "two rows of a statistic differ in its name or number of elements, or report nothing");
+static_assert(std::ranges::none_of(kStorageCounters,
+                                   [](const StorageCounter& row) {
+                                     return row.group == FigureGroup::Unassigned;
+                                   }),
+              "a storage counter has no group");
+static_assert(std::ranges::all_of(kStorageCounters,
+                                  [](const StorageCounter& row) {
+                                    return row.elements > 0 &&
+                                           row.firstElement() + row.reportCount() <= row.elements;
+                                  }),
+              "a storage counter reports elements that it does not have");
+
+// A statistic's plain name has a number, and the names of its elements, if there are several, have
+// the numbers after it.
+constexpr std::size_t namesOf(const StorageCounter& row) {
+  return row.elements > 1 ? 1u + row.elements : 1u;
 }
 
-// The text of the name-th of them, written at `to`; returns the place behind.
-constexpr char* appendName(char* to, const StatisticKey& row, std::size_t name) {
+// Writes the index-th of them; returns the end.
+constexpr char* appendName(char* to, const StorageCounter& row, std::size_t index) {
   to = appendText(to, row.name);
-  return name == 0 ? to : appendDecimal(to, static_cast<unsigned>(name - 1));
+  return index == 0 ? to : appendDecimal(to, static_cast<unsigned>(index - 1));
 }
-constexpr std::size_t nameLength(const StatisticKey& row, std::size_t name) {
-  const std::size_t number = name == 0 ? 0 : decimalDigits(static_cast<unsigned>(name - 1));
+constexpr std::size_t nameLength(const StorageCounter& row, std::size_t index) {
+  const std::size_t number = index == 0 ? 0 : decimalDigits(static_cast<unsigned>(index - 1));
   return std::string_view(row.name).size() + number;
 }
 
-constexpr std::size_t kStatistics = std::size(kStatisticKeys);
-
-constexpr std::size_t countNames() {
-  std::size_t count = 0;
-  for (const StatisticKey& row : kStatisticKeys) count += namesOf(row);
-  return count;
-}
-constexpr std::size_t kCounterNames = countNames();
-static_assert(kCounterNames <= 0xFFFF);
-
-constexpr std::size_t countNameBytes() {
-  std::size_t bytes = 0;
-  for (const StatisticKey& row : kStatisticKeys) {
-    for (std::size_t name = 0; name < namesOf(row); ++name) bytes += nameLength(row, name) + 1;
+struct NameTotals {
+  std::size_t names = 0;
+  std::size_t bytes = 0;  // each name ends in a zero byte
+};
+constexpr NameTotals countNames() {
+  NameTotals totals;
+  for (const StorageCounter* row : kFirstRows) {
+    if (row == nullptr) continue;
+    totals.names += namesOf(*row);
+    for (std::size_t i = 0; i < namesOf(*row); ++i) totals.bytes += nameLength(*row, i) + 1;
   }
-  return bytes;
+  return totals;
 }
-constexpr std::size_t kCounterNameBytes = countNameBytes();
-static_assert(kCounterNameBytes <= 0xFFFF);
+constexpr std::size_t kCounterNames = countNames().names;
+constexpr std::size_t kCounterNameBytes = countNames().bytes;
+static_assert(kCounterNames <= 0xFFFF && kCounterNameBytes <= 0xFFFF);
 
 struct CounterNames {
-  std::array<char, kCounterNameBytes> pool{};            // each ends in a zero byte
+  std::array<char, kCounterNameBytes> pool{};
   std::array<std::uint16_t, kCounterNames + 1> start{};  // of each name in the pool, and its end
-  std::array<std::uint16_t, kStatistics> plainName{};    // number of each statistic's plain name
+  std::array<std::uint16_t, kHighestStatistic + 1> plainName{};  // number, by statistic
 
   constexpr std::string_view name(std::size_t number) const {
     return {&pool[start[number]], start[number + 1] - start[number] - 1u};
+  }
+  // Of an element of the row, which is the plain name where there is one value only.
+  constexpr std::uint16_t numberOf(const StorageCounter& row, unsigned element) const {
+    const unsigned offset = row.elements > 1 ? 1 + element : 0;
+    return static_cast<std::uint16_t>(plainName[row.statistic] + offset);
   }
 };
 
@@ -65,12 +103,12 @@ constexpr CounterNames makeCounterNames() {
   char* const pool = names.pool.data();
   char* to = pool;
   std::size_t number = 0;
-  for (std::size_t statistic = 0; statistic < kStatistics; ++statistic) {
-    const StatisticKey& row = kStatisticKeys[statistic];
-    names.plainName[statistic] = static_cast<std::uint16_t>(number);
-    for (std::size_t name = 0; name < namesOf(row); ++name) {
+  for (const StorageCounter* row : kFirstRows) {
+    if (row == nullptr) continue;
+    names.plainName[row->statistic] = static_cast<std::uint16_t>(number);
+    for (std::size_t i = 0; i < namesOf(*row); ++i) {
       names.start[number++] = static_cast<std::uint16_t>(to - pool);
-      to = appendName(to, row, name) + 1;
+      to = appendName(to, *row, i) + 1;
     }
   }
   names.start[number] = static_cast<std::uint16_t>(to - pool);

@@ -6,19 +6,12 @@
 namespace tally {
 namespace {
 
-constexpr std::uint16_t kHighestKey =
-    std::max_element(std::begin(kStatisticKeys), std::end(kStatisticKeys),
-                     [](const StatisticKey& a, const StatisticKey& b) { return a.key < b.key; })
-        ->key;
-
-using KeyIndex = std::array<Statistic, kHighestKey + 1>;  // maximum 0: not known
+using KeyIndex = std::array<Statistic, kHighestStatistic + 1>;  // no elements: not known
 
 constexpr KeyIndex makeKeyIndex() {
   KeyIndex index{};
-  for (std::size_t row = 0; row < kStatistics; ++row) {
-    const StatisticKey& key = kStatisticKeys[row];
-    index[key.key] = {key.maximum != 0, std::max<std::uint16_t>(key.maximum, 1),
-                      kNames.plainName[row]};
+  for (const StorageCounter& row : kStorageCounters) {
+    index[row.statistic] = {row.elements, kNames.plainName[row.statistic]};
   }
   return index;
 }
@@ -27,10 +20,8 @@ constexpr KeyIndex kIndex = makeKeyIndex();
 
 }  // namespace
 
-bool findStatistic(std::uint32_t key, Statistic* statistic) noexcept {
-  if (key >= kIndex.size() || kIndex[key].maximum == 0) return false;
-  *statistic = kIndex[key];
-  return true;
+const Statistic* findStatistic(std::uint32_t key) noexcept {
+  return key < kIndex.size() && kIndex[key].elements != 0 ? &kIndex[key] : nullptr;
 }
 
 std::string_view SPXCounterName(std::uint16_t number) noexcept {

@@ -1,18 +1,16 @@
-// What is known of a statistic, by its key.
+// Finds a statistic by its key in the driver's buffer.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 
 namespace tally {
 
 struct Statistic {
-  bool isArray = false;
-  std::uint16_t maximum = 0;  // elements taken; 1 for a scalar
-  std::uint16_t name = 0;     // number of the plain name; those of its elements follow
+  std::uint16_t elements = 0;  // taken from a record
+  std::uint16_t name = 0;      // number of the plain name; those of its elements follow
 };
 
-// False when the key is not known; in constant time.
-bool findStatistic(std::uint32_t key, Statistic* statistic) noexcept;
+// Null when the key is not known; in constant time.
+const Statistic* findStatistic(std::uint32_t key) noexcept;
 
 }  // namespace tally

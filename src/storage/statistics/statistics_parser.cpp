@@ -1,5 +1,6 @@
 // The statistics buffer: one pass over its records, which become fixed fields and counters.
 #include <algorithm>
+#include <array>
 #include <span>
 
 #include "base/byte_reader.h"
@@ -16,21 +17,20 @@ constexpr std::uint32_t kHighestWireKey = 0x30000000;
 constexpr std::uint32_t kUnset = 0xFFFFFFFF;
 constexpr std::uint32_t kReadCountHistoKey = 265;
 
-// The statistics that also have a field of their own.
-struct NarrowField {
+// The statistics that also have a field of their own, and where it is, by key.
+template <class T>
+struct FieldOfKey {
   std::uint32_t key;
-  std::uint32_t SPXParseContext::*field;
+  T SPXParseContext::*field;
 };
-struct WideField {
-  std::uint32_t key;
-  std::uint64_t SPXParseContext::*field;
-};
-constexpr NarrowField kNarrowFields[] = {
-    {49, &SPXParseContext::bytesPerPage},          {50, &SPXParseContext::pagesPerVirtualBlock},
-    {51, &SPXParseContext::blocksPerVirtualBlock}, {52, &SPXParseContext::numVirtualBlocks},
+constexpr auto kNarrowFields = std::to_array<FieldOfKey<std::uint32_t>>({
+    {49, &SPXParseContext::bytesPerPage},
+    {50, &SPXParseContext::pagesPerVirtualBlock},
+    {51, &SPXParseContext::blocksPerVirtualBlock},
+    {52, &SPXParseContext::numVirtualBlocks},
     {53, &SPXParseContext::exportVersion},
-};
-constexpr WideField kWideFields[] = {
+});
+constexpr auto kWideFields = std::to_array<FieldOfKey<std::uint64_t>>({
     {4, &SPXParseContext::hostWrites},
     {7, &SPXParseContext::hostReads},
     {12, &SPXParseContext::indPoolFree},
@@ -43,17 +43,22 @@ constexpr WideField kWideFields[] = {
     {45, &SPXParseContext::maxHighEnduranceBlockErases},
     {48, &SPXParseContext::numFreeVirtualBlocks},
     {56, &SPXParseContext::utilFormatTime},
-};
+});
 constexpr std::uint32_t kHighestFieldKey = 56;
 
+template <class T, std::size_t N>
+constexpr auto fieldsByKey(const std::array<FieldOfKey<T>, N>& rows) {
+  std::array<T SPXParseContext::*, kHighestFieldKey + 1> fields{};
+  for (const auto& [key, field] : rows) fields[key] = field;
+  return fields;
+}
+
 void storeField(SPXParseContext& context, std::uint32_t key, std::uint64_t value) {
+  static constexpr auto narrow = fieldsByKey(kNarrowFields);
+  static constexpr auto wide = fieldsByKey(kWideFields);
   if (key > kHighestFieldKey) return;
-  for (const NarrowField& narrow : kNarrowFields) {
-    if (narrow.key == key) context.*narrow.field = static_cast<std::uint32_t>(value);
-  }
-  for (const WideField& wide : kWideFields) {
-    if (wide.key == key) context.*wide.field = value;
-  }
+  if (narrow[key] != nullptr) context.*narrow[key] = static_cast<std::uint32_t>(value);
+  if (wide[key] != nullptr) context.*wide[key] = value;
 }
 
 // The values of one record, all of which lie in the buffer.
@@ -70,16 +75,16 @@ class Values {
 };
 
 bool appendRecord(SPXParseContext& context, std::uint32_t key, const Values& values) {
-  Statistic statistic;
-  if (!findStatistic(key, &statistic)) return true;
-  const std::size_t taken = std::min<std::size_t>(values.size(), statistic.maximum);
+  const Statistic* const statistic = findStatistic(key);
+  if (statistic == nullptr) return true;
+  const std::size_t taken = std::min<std::size_t>(values.size(), statistic->elements);
   if (taken == 0) return true;
-  if (!statistic.isArray) storeField(context, key, values.at(0));
+  storeField(context, key, values.at(0));
   if (key == kReadCountHistoKey) {
     for (std::size_t i = 0; i < taken; ++i) context.readCountHisto[i] = values.at(i);
   }
-  // A single value goes by the plain name, several by those of the elements.
-  const std::size_t firstName = statistic.name + (taken == 1 ? 0u : 1u);
+  // A single value has the plain name, several have those of the elements.
+  const std::size_t firstName = statistic->name + (taken == 1 ? 0u : 1u);
   for (std::size_t i = 0; i < taken; ++i) {
     const auto name = static_cast<std::uint16_t>(firstName + i);
     if (!appendCounter(context, name, values.at(i))) return false;

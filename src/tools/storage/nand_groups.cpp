@@ -3,62 +3,10 @@
 #include <algorithm>
 
 #include "base/number_text.h"
+#include "storage/nand_info/figure_groups.h"
 
 namespace tally::tools {
 namespace {
-
-struct NamesOfGroup {
-  std::string_view title;
-  std::vector<std::string_view> beginnings;  // of names; the first group that fits takes a name
-};
-
-const std::vector<NamesOfGroup>& groupsOfNames() {
-  static const std::vector<NamesOfGroup> groups = {
-      {"Device",
-       {"ExportVersion", "DriverVersion", "DemoMode", "NumVirtualBlocks", "PagesPerVirtualBlock",
-        "pagesPerVirtualBlockSlc", "BytesPerPage", "BlocksPerVirtualBlock", "nandDesc", "q7mFwVer",
-        "formatDaysSince2000", "IntermediatePartitionSize", "StaticDataSizeInMB"}},
-      {"Space",
-       {"NumFreeVirtualBlocks", "Nodes", "Reclaim.", "spareAvailablePercent", "numVertics",
-        "maxVerticsInBand", "exceededCVertics"}},
-      {"Wear",
-       {"fwUpdatesPercentUsed", "IntermediatePartitionPEPercentUsed", "UserPartitionPEPercentUsed",
-        "ColdestCycle", "HottestCycle", "IntermediateColdestCycle", "IntermediateHottestCycle",
-        "HighEnduranceBlockEraseCount", "NumPhysicalErases", "NumWearLevelOps",
-        "IntermediateBandErases", "ReadsBeforeErasure"}},
-      {"Traffic",
-       {"NumLogical", "NumPhysical", "hostWrites", "NumFlushes", "NumFences", "NumSleepOps",
-        "VMFreezer.", "numFirmwareWrites", "numBisWrites", "SectorsPerHostFlow", "Pad", "commitPad",
-        "directToTLC", "fallbackToWaterfall", "lockToTlc", "burstSize", "balanceProportion"}},
-      {"Errors",
-       {"ueccReads", "internalUeccs", "numPfail", "numEfail", "numGrownBad", "numFactoryBad",
-        "raidSmartErrors", "E2E_", "BitFlip", "numCrossTempUecc", "openBandReadFail",
-        "MetaMismatchReread", "numDieFailures", "firstFailedDieId", "UncleanBoots", "AbortSkip_"}},
-      {"Reconstruction",
-       {"SuccessfulReconstruction", "FailedReconstruction", "InvalidParity", "raid"}},
-      {"Garbage collection and refresh",
-       {"NumGC", "NumLOnlyGC", "gc", "NumIntermediateMoves", "NumRefreshes", "NumBandsRefreshed",
-        "NumPaddingsForAge", "AgeInducedWriteSectors", "NumOfAvoidedGC", "slcInvalidations"}},
-      {"Memory pressure", {"numMem", "maxMem", "mem", "NumHostChoke", "NumBandGets"}},
-      {"Write cache and indirection", {"wcache", "indmb", "ind", "CacheDepthVsThroughput"}},
-      {"Bands", {"Bands", "OverWrites", "Unmaps", "RD_"}},
-      {"Maintenance and boot",
-       {"NumMaintenanceRequests", "MaintenanceRequests", "maxGraceful", "maxUngraceful",
-        "averageGraceful", "averageUngraceful", "gracefulBoot", "ungracefulBoot", "clog", "numClog",
-        "maxFailedFastCxtSync", "numFWUpdates", "NumClockLoss", "cntCalTime"}},
-      {"Other", {""}},
-  };
-  return groups;
-}
-
-std::size_t groupOf(std::string_view name) {
-  const auto& groups = groupsOfNames();
-  const auto fits = [&](std::string_view beginning) { return name.starts_with(beginning); };
-  for (std::size_t group = 0; group < groups.size(); ++group) {
-    if (std::ranges::any_of(groups[group].beginnings, fits)) return group;
-  }
-  return groups.size() - 1;
-}
 
 // A name that ends in a number, and the number.
 struct Numbered {
@@ -95,13 +43,16 @@ void addFigure(std::vector<NandFigure>& figures, std::string_view name, std::int
 
 std::vector<NandGroup> groupNandInfo(const KvDictionary& info, std::string_view text) {
   std::vector<NandGroup> groups;
-  for (const NamesOfGroup& group : groupsOfNames()) groups.push_back({group.title, {}});
+  for (const FigureGroupTitle& group : kFigureGroups) groups.push_back({group.title, {}});
   for (const auto& [key, value] : info) {
     const auto* number = kvCast<KvNumber>(value.get());
     if (number == nullptr || key->view().find(text) == std::string_view::npos) continue;
+    const FigureGroup group = figureGroup(key->view());
+    const auto place = std::ranges::find(kFigureGroups, group, &FigureGroupTitle::group);
     std::string_view name = key->view();
     if (name.starts_with(kNandPrefix)) name.remove_prefix(kNandPrefix.size());
-    addFigure(groups[groupOf(name)].figures, name, number->asInt64());
+    addFigure(groups[static_cast<std::size_t>(place - kFigureGroups.begin())].figures, name,
+              number->asInt64());
   }
   std::erase_if(groups, [](const NandGroup& group) { return group.figures.empty(); });
   return groups;
