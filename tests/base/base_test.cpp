@@ -1,12 +1,10 @@
 // Text, number, time and file helpers at their borders.
 #include <gtest/gtest.h>
-#include <stdlib.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
 #include <cmath>
-#include <fstream>
 #include <limits>
 
 #include "base/byte_reader.h"
@@ -16,6 +14,7 @@
 #include "base/printable.h"
 #include "base/time_text.h"
 #include "base/utf8.h"
+#include "fakes/temporary_folder.h"
 
 namespace tally {
 namespace {
@@ -132,37 +131,26 @@ TEST(ByteReader, NothingOutsideIsRead) {
   EXPECT_TRUE(reader.slice(5, 0));
 }
 
-class FileTest : public testing::Test {
+class FileTest : public testing::Test, protected TemporaryFolder {
  protected:
-  FileTest() {
-    char name[] = "/tmp/tally-base-XXXXXX";
-    folder = ::mkdtemp(name);
-  }
-  ~FileTest() override { [[maybe_unused]] int status = std::system(("rm -rf " + folder).c_str()); }
-  void put(const std::string& name, std::string_view text) {
-    std::ofstream(folder + "/" + name) << text;
-  }
-  DeviceRoot root() const { return {folder}; }
-  Directory here() const { return *Directory::open(folder); }
+  Directory here() const { return *Directory::open(root); }
   static constexpr uid_t kUser = 12345;
-  std::string folder;
 };
 
 TEST_F(FileTest, ReadingRefusesWhatIsNoFileOrTooLarge) {
   put("ok", "12345");
-  EXPECT_EQ(*readFile(folder + "/ok", 5), "12345");
-  EXPECT_NE(readFile(folder + "/ok", 4).error().message.find("larger than 4 bytes"),
-            std::string::npos);
-  EXPECT_EQ(readFile(folder + "/none", 9).error().systemError, ENOENT);
-  EXPECT_FALSE(readFile(folder, 9));
+  EXPECT_EQ(*readFile(at("ok"), 5), "12345");
+  EXPECT_NE(readFile(at("ok"), 4).error().message.find("larger than 4 bytes"), std::string::npos);
+  EXPECT_EQ(readFile(at("none"), 9).error().systemError, ENOENT);
+  EXPECT_FALSE(readFile(root, 9));
   EXPECT_FALSE(readFile("/dev/zero", 9));
-  ASSERT_EQ(::mkfifo((folder + "/pipe").c_str(), 0600), 0);
-  EXPECT_FALSE(readFile(folder + "/pipe", 9)) << "a pipe without a writer must not be waited for";
+  ASSERT_EQ(::mkfifo(at("pipe").c_str(), 0600), 0);
+  EXPECT_FALSE(readFile(at("pipe"), 9)) << "a pipe without a writer must not be waited for";
   EXPECT_FALSE(readFile("/proc/self/comm", 100)->empty()) << "its size says 0";
 }
 
 TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
-  const auto deep = root().make("/deep/er");
+  const auto deep = DeviceRoot(root).make("/deep/er");
   ASSERT_TRUE(deep);
   ASSERT_TRUE(writeFileAtomically(*deep, "file", "one"));
   const auto first = deep->identity("file");
@@ -176,8 +164,8 @@ TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
     EXPECT_TRUE(isTemporaryName(deep->list()->back()));
   }
   EXPECT_EQ(deep->list()->size(), 1u) << "an abandoned file is removed";
-  EXPECT_FALSE(root().make("/deep/er/file/below-a-file"));
-  ASSERT_TRUE(root().make("/taken"));
+  EXPECT_FALSE(DeviceRoot(root).make("/deep/er/file/below-a-file"));
+  ASSERT_TRUE(DeviceRoot(root).make("/taken"));
   EXPECT_FALSE(writeFileAtomically(here(), "taken", "x"));
   EXPECT_EQ(here().list()->size(), 2u) << "nothing is left over on failure";
 }
@@ -185,12 +173,12 @@ TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
 TEST_F(FileTest, LinksAreFollowedOnlyWhereNobodyElseCanMakeThem) {
   if (::geteuid() != 0) GTEST_SKIP() << "only root can give files to others";
   put("outside", "secret");
-  ASSERT_TRUE(root().make("/device/mnt/var/home/user"));
+  ASSERT_TRUE(DeviceRoot(root).make("/device/mnt/var/home/user"));
   const auto link = [this](const std::string& target, const std::string& name) {
-    ASSERT_EQ(::symlink(target.c_str(), (folder + "/device" + name).c_str()), 0) << name;
+    ASSERT_EQ(::symlink(target.c_str(), (at("device") + name).c_str()), 0) << name;
   };
   const auto own = [this](const std::string& name) {
-    ASSERT_EQ(::lchown((folder + "/device" + name).c_str(), kUser, kUser), 0) << name;
+    ASSERT_EQ(::lchown((at("device") + name).c_str(), kUser, kUser), 0) << name;
   };
   link("/mnt/var", "/var");           // taken below the device root
   link("mnt/../mnt/var", "/climbs");  // as far as the device root
@@ -201,14 +189,12 @@ TEST_F(FileTest, LinksAreFollowedOnlyWhereNobodyElseCanMakeThem) {
   put("device/mnt/var/home/user/file", "mine");
   link("/mnt/var", "/mnt/var/home/user/var");
   link("file", "/mnt/var/home/user/link");
-  ASSERT_EQ(
-      ::link((folder + "/outside").c_str(), (folder + "/device/mnt/var/home/user/second").c_str()),
-      0);
+  ASSERT_EQ(::link(at("outside").c_str(), at("device/mnt/var/home/user/second").c_str()), 0);
   put("device/mnt/var/home/user/planted", "other");
-  ASSERT_EQ(::chown((folder + "/device/mnt/var/home/user/planted").c_str(), kUser + 1, kUser), 0);
+  ASSERT_EQ(::chown(at("device/mnt/var/home/user/planted").c_str(), kUser + 1, kUser), 0);
   own("/mnt/var/home/user");
   own("/mnt/var/home/user/file");
-  const DeviceRoot device(folder + "/device");
+  const DeviceRoot device(at("device"));
   const struct {
     const char* path;
     const char* content;  // null: refused

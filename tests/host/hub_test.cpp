@@ -44,7 +44,7 @@ std::vector<std::byte> interestList(std::uint32_t count,
 }
 
 struct Hub {
-  explicit Hub(const std::string& description) : device(described(description).c_str()) {
+  explicit Hub(const std::string& description) : device(described(description)) {
     connection = device.connect("HwReportHub");
   }
   RegistryResult start() {

@@ -11,7 +11,6 @@ namespace tally {
 namespace {
 
 using tests::DescribedDevice;
-using tests::plist;
 
 constexpr const char* kThreeEntries = R"(<dict><key>Entries</key><array>
   <dict><key>Class</key><string>Root</string><key>ID</key><integer>1</integer>
@@ -119,7 +118,8 @@ TEST(Registry, AnIteratorNoticesThatTheRegistryChanged) {
   RegistryHandle iterator = 0;
   registry.RegistryCopyMatchingServices(ServiceMatchingByClass("Bus"), &iterator);
   EXPECT_TRUE(registry.RegistryIteratorIsValid(iterator));
-  device.describe("<dict><key>Entries</key><array/></dict>");
+  std::filesystem::remove(device.at("registry.plist"));  // replaced, as an editor does
+  device.putPlist("registry.plist", "<dict><key>Entries</key><array/></dict>");
   EXPECT_FALSE(registry.RegistryIteratorIsValid(iterator));
   // What it had found stays usable.
   const RegistryHandle entry = registry.RegistryIteratorNext(iterator);
@@ -180,7 +180,7 @@ constexpr const char* kDriver = R"(<dict><key>Entries</key><array>
 
 TEST(DescribedDriver, AnswersByMethodSelectorAndFlags) {
   DescribedDevice device(kDriver);
-  device.write("list.bin", std::string(3, 'x'));
+  device.put("list.bin", std::string(3, 'x'));
   DeviceRegistry& registry = device.registry();
   const ConnectionHandle disk = device.connect("Disk");
   ASSERT_NE(disk, 0u);

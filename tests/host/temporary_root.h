@@ -2,14 +2,9 @@
 #pragma once
 
 #include <gtest/gtest.h>
-#include <signal.h>
-#include <stdlib.h>
-#include <sys/mount.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <filesystem>
-#include <fstream>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -18,31 +13,13 @@
 #include "base/device_root.h"
 #include "base/file.h"
 #include "fakes/fake_platform.h"
+#include "fakes/temporary_folder.h"
 
 namespace tally {
 
-class TemporaryRoot : public testing::Test {
+class TemporaryRoot : public testing::Test, protected TemporaryFolder {
  protected:
-  TemporaryRoot() {
-    std::string name = (std::filesystem::temp_directory_path() / "tally-linux-XXXXXX").string();
-    root = ::mkdtemp(name.data());
-  }
-  ~TemporaryRoot() override {
-    std::error_code ignored;
-    std::filesystem::remove_all(root, ignored);
-  }
-
-  std::string at(std::string_view path) const { return root + "/" + std::string(path); }
   DeviceDirectory folder(std::string_view path) const { return {root, "/" + std::string(path)}; }
-  bool exists(std::string_view path) const { return std::filesystem::exists(at(path)); }
-  void put(std::string_view path, std::string_view text) const {
-    std::filesystem::create_directories(std::filesystem::path(at(path)).parent_path());
-    std::ofstream(at(path), std::ios::binary) << text;
-  }
-  void putPlist(std::string_view path, const std::string& body) const {
-    put(path, "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">" + body +
-                  "</plist>\n");
-  }
   std::string get(std::string_view path) const {
     const auto text = readFile(at(path), 1u << 30);
     return text ? *text : "(" + text.error().message + ")";
@@ -63,24 +40,8 @@ class TemporaryRoot : public testing::Test {
   }
   std::vector<std::string> errors() const { return log->texts(LogLevel::Error); }
 
-  std::string root;
   std::shared_ptr<fakes::FakeSystemLog> log = std::make_shared<fakes::FakeSystemLog>();
 };
-
-// Runs work in a child process and kills it after so many microseconds, if it lives that long.
-template <class Work>
-void runAndKill(std::uint_fast32_t microseconds, const Work& work) {
-  const pid_t child = ::fork();
-  ASSERT_NE(child, -1);
-  if (child == 0) {
-    work();
-    ::_exit(0);
-  }
-  ::usleep(static_cast<useconds_t>(microseconds));
-  ::kill(child, SIGKILL);
-  int status = 0;
-  ASSERT_EQ(::waitpid(child, &status, 0), child);
-}
 
 // Runs work in several processes at once; each must return true.
 template <class Work>
@@ -98,22 +59,5 @@ void runTogether(int count, const Work& work) {
     EXPECT_EQ(status, 0);
   }
 }
-
-// True when the folder's volume was mounted as a small one; it is unmounted with the object.
-class TinyVolume {
- public:
-  TinyVolume(std::string folder, const char* size) : folder_(std::move(folder)) {
-    std::filesystem::create_directories(folder_);
-    mounted_ = ::mount("tally", folder_.c_str(), "tmpfs", 0, size) == 0;
-  }
-  ~TinyVolume() {
-    if (mounted_) ::umount(folder_.c_str());
-  }
-  explicit operator bool() const { return mounted_; }
-
- private:
-  std::string folder_;
-  bool mounted_;
-};
 
 }  // namespace tally
