@@ -1,12 +1,7 @@
 // The folder of a described device, in memory where there is such a file system (TMPDIR).
 #pragma once
 
-#include <unistd.h>
-
-#include <cstdio>
-#include <filesystem>
-#include <string>
-
+#include "fakes/temporary_folder.h"
 #include "fuzz_values.h"
 #include "platform/system_log.h"
 
@@ -18,38 +13,15 @@ struct UnreadLog final : SystemLog {
   void write(LogLevel, std::string_view) override {}
 };
 
-class DescribedFolder {
+class DescribedFolder : public TemporaryFolder {
  public:
-  DescribedFolder()
-      : path_(std::filesystem::temp_directory_path() / ("fuzz-" + std::to_string(::getpid()))) {
-    std::filesystem::create_directories(path_);
-    write("File", "bytes of a file that a description names");
-  }
-  ~DescribedFolder() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  DescribedFolder(const DescribedFolder&) = delete;
-  DescribedFolder& operator=(const DescribedFolder&) = delete;
-
-  std::string path() const { return path_; }
+  DescribedFolder() { put("File", "bytes of a file that a description names"); }
   // The input as a file: a property list as it stands, or what a value is written as.
-  void writeInput(const std::string& name, Input& input) const {
-    if (isDocument(input.rest())) return write(name, input.rest());
+  void putInput(std::string_view name, Input& input) const {
+    if (isDocument(input.rest())) return put(name, input.rest());
     const auto written = encodeXmlPlist(*valueOf(input));
-    write(name, written ? *written : "");
+    put(name, written ? *written : "");
   }
-
- private:
-  void write(const std::string& name, std::string_view content) const {
-    const std::string file = path_ / name;
-    std::FILE* const stream = std::fopen(file.c_str(), "w");
-    require(stream != nullptr, "the folder can be written to");
-    std::fwrite(content.data(), 1, content.size(), stream);
-    std::fclose(stream);
-  }
-
-  std::filesystem::path path_;
 };
 
 }  // namespace tally::fuzz

@@ -33,11 +33,11 @@ void askKernelValues(LinuxKernelValues& values) {
 int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   static const fuzz::DescribedFolder folder;
   fuzz::Input input(data, size);
-  folder.writeInput("device.plist", input);
-  const auto description = std::make_shared<DeviceDescription>(DeviceDirectory(folder.path(), ""),
+  folder.putInput("device.plist", input);
+  const auto description = std::make_shared<DeviceDescription>(DeviceDirectory(folder.root, ""),
                                                                std::make_shared<fuzz::UnreadLog>());
 
-  const auto device = std::make_shared<LinuxDeviceInformation>(folder.path(), description);
+  const auto device = std::make_shared<LinuxDeviceInformation>(folder.root, description);
   device->DeviceQuery("DiskUsage");
   device->DeviceQuery("InternalBuild");
   device->HasInternalDiagnostics("Value");
@@ -45,7 +45,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   device->SMAOSVersion();
   LinuxKernelValues values(description);
   askKernelValues(values);
-  LinuxLocale locale(folder.path(), {}, description);
+  LinuxLocale locale(folder.root, {}, description);
   locale.PreferredLanguages();
   locale.SystemLanguages();
   locale.CurrentRegionCode();
@@ -53,7 +53,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   for (const std::string& line : {facts.SysIdDescription(), facts.HardwareModelString()}) {
     require(line.find('\n') == line.npos, "a line of a log's header stays one");
   }
-  DescribedStackshot stackshot(DeviceDirectory(folder.path(), ""), description);
+  DescribedStackshot stackshot(DeviceDirectory(folder.root, ""), description);
   if (const auto config = stackshot.stackshotConfigCreate()) {
     config->stackshotConfigSetFlags(0x10000);
     config->stackshotCapture();

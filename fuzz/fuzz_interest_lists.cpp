@@ -1,5 +1,5 @@
 // Interest lists at the statistics hub: parsed, served from drivers of any values, and mapped.
-#include "fuzz_values.h"
+#include "described_folder.h"
 #include "host/described/hub_region.h"
 #include "host/described/statistics_hub.h"
 
@@ -10,11 +10,6 @@ namespace {
 
 constexpr std::uint32_t kStart = 0, kConfigure = 2, kUpdate = 3;
 constexpr std::size_t kElement = 64;
-
-struct NoLog final : SystemLog {
-  bool enabled(LogLevel) const override { return true; }
-  void write(LogLevel, std::string_view) override {}
-};
 
 std::shared_ptr<const RegistrySource::Entries> takeDrivers(fuzz::Input& input) {
   auto drivers = std::make_shared<RegistrySource::Entries>();
@@ -36,7 +31,7 @@ int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const auto hub = isRaw ? fuzz::ValueReader(input).takeDictionary() : nullptr;
   const auto list = input.takeRest();
   const auto files = std::make_shared<DescribedFiles>(
-      DeviceDirectory(DeviceRoot("/nonexistent"), ""), std::make_shared<NoLog>());
+      DeviceDirectory(DeviceRoot("/nonexistent"), ""), std::make_shared<fuzz::UnreadLog>());
 
   const auto interests = parseInterestList(list);
   if (interests) {

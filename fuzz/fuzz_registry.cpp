@@ -50,10 +50,10 @@ void useService(DeviceRegistry& registry, RegistryHandle service) {
 int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   static const fuzz::DescribedFolder folder;
   fuzz::Input input(data, size);
-  folder.writeInput("registry.plist", input);
+  folder.putInput("registry.plist", input);
 
   std::vector<std::unique_ptr<RegistrySource>> sources;
-  sources.push_back(std::make_unique<RegistryDescription>(DeviceDirectory(folder.path(), ""),
+  sources.push_back(std::make_unique<RegistryDescription>(DeviceDirectory(folder.root, ""),
                                                           std::make_shared<fuzz::UnreadLog>()));
   SourceRegistry registry(std::move(sources));
   for (const std::string_view className : {"HwReportHub", "SPXStorage"}) {

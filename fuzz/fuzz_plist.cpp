@@ -1,17 +1,18 @@
-// What holds of every value that the codec delivers or is given.
-#pragma once
-
+// Property lists as the codec reads them, and values that no property list delivered as it writes
+// them.
 #include <string>
 
-#include "fuzz.h"
+#include "fuzz_values.h"
 #include "kv/json_writer.h"
-#include "kv/plist_codec.h"
 
-namespace tally::fuzz {
+using namespace tally;
+using fuzz::require;
+
+namespace {
 
 // Writes the value in each form. The XML reads back as itself, but that keys which XML cannot carry
 // may have become one.
-inline void checkRoundTrip(const KvObject& value) {
+void checkRoundTrip(const KvObject& value) {
   std::string json;
   appendJson(json, value);
   require(!json.empty() && json.find('\n') == json.npos, "JSON is one line");
@@ -30,4 +31,10 @@ inline void checkRoundTrip(const KvObject& value) {
   require(third && *third == *second, "what was read once stays as it is");
 }
 
-}  // namespace tally::fuzz
+}  // namespace
+
+int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  fuzz::Input input(data, size);
+  if (const auto value = fuzz::valueOf(input)) checkRoundTrip(*value);
+  return 0;
+}
