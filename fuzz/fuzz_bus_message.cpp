@@ -73,96 +73,59 @@ void takeApplications(const KvDictionary& message) {
   }
 }
 
-// Appends a value of any type whatever: also of those that have no counterpart here.
+// Appends values of any types, also of those that have no counterpart here.
 class AnyMessage {
  public:
   AnyMessage(sd_bus_message* message, fuzz::Input& input) : message_(message), input_(input) {}
 
-  void appendDictionary() {
-    ::sd_bus_message_open_container(message_, 'a', "{sv}");
+  void appendDictionary() { appendArray("{sv}", 0); }
+
+ private:
+  void appendVariant(int depth) {
+    constexpr const char* kTypes[] = {"y", "b",  "n",  "q",   "i",     "u",    "x",   "t",
+                                      "d", "s",  "o",  "g",   "{yv}",  "(sv)", "v",   "av",
+                                      "h", "ay", "as", "aay", "a{sv}", "ax",   "aax", "aa{sv}"};
+    constexpr int kDeepest = 24;  // more than the reader follows
+    const std::string type =
+        kTypes[depth < kDeepest ? input_.take<std::uint8_t>() % std::size(kTypes) : 0];
+    if (type == "{yv}") {
+      ::sd_bus_message_append(message_, "v", "a{yv}", 1, 7, "s", "of no text");
+    } else if (type == "(sv)") {
+      ::sd_bus_message_append(message_, "v", "a(sv)", 1, "a", "i", 7);
+    } else if (type == "h") {
+      ::sd_bus_message_append(message_, "v", "h", STDIN_FILENO);
+    } else {
+      ::sd_bus_message_open_container(message_, 'v', type.c_str());
+      appendOne(type, depth + 1);
+      ::sd_bus_message_close_container(message_);
+    }
+  }
+
+  void appendOne(const std::string& type, int depth) {
+    if (type == "v") return appendVariant(depth);
+    if (type[0] == 'a') return appendArray(type.substr(1), depth);
+    if (type == "s" || type == "o" || type == "g") return appendText(type[0]);
+    const auto bits = type == "b" ? input_.take<std::uint8_t>() % 2 : input_.take<std::uint64_t>();
+    ::sd_bus_message_append_basic(message_, type[0], &bits);
+  }
+
+  void appendArray(const std::string& element, int depth) {
+    ::sd_bus_message_open_container(message_, 'a', element.c_str());
     for (int left = input_.take<std::uint8_t>() % 16; left > 0 && !input_.empty(); --left) {
+      if (element != "{sv}") {
+        appendOne(element, depth + 1);
+        continue;
+      }
       ::sd_bus_message_open_container(message_, 'e', "sv");
-      const std::string key(input_.takeText(input_.take<std::uint8_t>() % 16));
-      ::sd_bus_message_append_basic(message_, 's', key.c_str());
-      appendVariant(0);
+      appendText('s');
+      appendVariant(depth + 1);
       ::sd_bus_message_close_container(message_);
     }
     ::sd_bus_message_close_container(message_);
   }
 
- private:
-  void appendVariant(int depth) {
-    constexpr const char* kTypes[] = {"y",  "b",  "n",   "q",      "i",     "u",     "x",
-                                      "t",  "d",  "s",   "o",      "g",     "h",     "v",
-                                      "av", "ay", "aay", "a{sv}",  "a{yv}", "(sv)",  "a(iv)",
-                                      "as", "ax", "aax", "aa{sv}", "a{ss}", "a{sas}"};
-    constexpr int kDeepest = 24;  // more than the reader follows
-    const auto number = depth < kDeepest ? input_.take<std::uint8_t>() : 0;
-    const char* const type = kTypes[number % std::size(kTypes)];
-    ::sd_bus_message_open_container(message_, 'v', type);
-    appendTypes(type, depth + 1);
-    ::sd_bus_message_close_container(message_);
-  }
-
-  // The values of complete types in a row.
-  void appendTypes(std::string_view types, int depth) {
-    while (!types.empty()) {
-      const std::size_t length = lengthOfFirst(types);
-      appendOne(std::string(types.substr(0, length)), depth);
-      types.remove_prefix(length);
-    }
-  }
-
-  static std::size_t lengthOfFirst(std::string_view types) {
-    if (types[0] == 'a') return 1 + lengthOfFirst(types.substr(1));
-    if (types[0] != '(' && types[0] != '{') return 1;
-    return types.find(types[0] == '(' ? ')' : '}') + 1;  // none of the table nests them
-  }
-
-  void appendOne(const std::string& type, int depth) {
-    switch (type[0]) {
-      case 'v':
-        return appendVariant(depth);
-      case 'a': {
-        const std::string element = type.substr(1);
-        ::sd_bus_message_open_container(message_, 'a', element.c_str());
-        for (int left = input_.take<std::uint8_t>() % 8; left > 0 && !input_.empty(); --left) {
-          appendOne(element, depth + 1);
-        }
-        ::sd_bus_message_close_container(message_);
-        return;
-      }
-      case '(':
-      case '{': {
-        const std::string inner = type.substr(1, type.size() - 2);
-        ::sd_bus_message_open_container(message_, type[0] == '(' ? 'r' : 'e', inner.c_str());
-        appendTypes(inner, depth);
-        ::sd_bus_message_close_container(message_);
-        return;
-      }
-      case 's':
-      case 'o':
-      case 'g':
-        return appendText(type[0]);
-      case 'h': {
-        const int descriptor = STDIN_FILENO;
-        ::sd_bus_message_append_basic(message_, 'h', &descriptor);
-        return;
-      }
-      case 'b': {
-        const int flag = input_.takeFlag() ? 1 : 0;
-        ::sd_bus_message_append_basic(message_, 'b', &flag);
-        return;
-      }
-      default: {
-        const auto bits = input_.take<std::uint64_t>();
-        ::sd_bus_message_append_basic(message_, type[0], &bits);
-      }
-    }
-  }
-
   void appendText(char type) {
-    const std::string text(input_.takeText(input_.take<std::uint8_t>()));
+    const std::string text(input_.takeText(input_.take<std::uint8_t>() % 64));
     const char* const fallback = type == 'o' ? "/o" : "s";
     if (::sd_bus_message_append_basic(message_, type, text.c_str()) < 0) {
       ::sd_bus_message_append_basic(message_, type, fallback);
