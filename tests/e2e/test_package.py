@@ -7,8 +7,7 @@ import subprocess
 import tempfile
 import unittest
 
-from bus import BusDevice, NAME, TODAY
-from device import BIN, Device, LAST_DAY, group
+from device import BIN, Device, LAST_DAY, PROGRAM_DOMAIN as NAME, TODAY, group
 
 BUILD = BIN.parent
 DATA = {"var", "Library"}  # what a device recorded stays
@@ -25,17 +24,6 @@ def run(*command, **options):
     result = subprocess.run(command, capture_output=True, timeout=600, check=False, **options)
     assert result.returncode == 0, (command, (result.stdout + result.stderr).decode()[-3000:])
     return result.stdout.decode()
-
-
-class PackagedDevice(BusDevice):
-    """A bus that starts the installed program."""
-
-    def __init__(self, program):
-        self.program = program
-        super().__init__()
-
-    def command(self, *arguments):
-        return [str(self.program), *arguments]
 
 
 class InstalledDevice(Device):
@@ -89,7 +77,6 @@ class Package(unittest.TestCase):
         self.assertEqual(os.readlink(root / TIMER_LINK), f"/{wanted[5]}")
         user = re.search(r"^mobile:x:(\d+):", (root / "etc/passwd").read_text(), re.M)
         self.assertEqual((root / "var/mobile").stat().st_uid, int(user[1]))
-        self.use(root)
         (root / "var/mobile/Library").mkdir()
         (root / "var/mobile/Library/log").write_text("data")
         self.dpkg(root, "-r", "tallyrun")
@@ -149,28 +136,6 @@ class Package(unittest.TestCase):
             head, _, *symbols = file.read_text().splitlines()
             self.assertEqual(head.split()[:2], [name, package])
             self.assertEqual({line.split("@")[0].strip() for line in symbols}, exported)
-
-    def use(self, root):
-        """Two messages with stock tools, and the app list is in the day's log."""
-        device = PackagedDevice(root / "usr/bin/tallyrun")
-        self.addCleanup(device.remove)
-        device.whitelist(G=group({"a": {}}))
-        device.store([("a", TODAY - 1, 1)])
-        device.busctl("operation", "x", "0")
-        device.gdbus("{'operation': <int64 2>, 'app_data': <@aa{sv} []>}")
-        device.wait_for_end()
-        self.assertEqual(device.log()["TBActivatedAppInfo"], [])
-        output = run("dbus-daemon", f"--config-file={self.policy(root)}", "--print-address=1", "--fork",
-                     "--print-pid=1")
-        os.kill(int(output.split()[-1]), 15)
-
-    def policy(self, root):
-        """A bus configuration of the installed policy alone: it has to be one that the bus takes."""
-        config = self.folder / "policy.conf"
-        config.write_text(f"<busconfig><type>system</type><listen>unix:path={self.folder}/s</listen>"
-                          f"<includedir>{root}/usr/share/dbus-1/system.d</includedir>"
-                          f"<servicedir>{root}/usr/share/dbus-1/system-services</servicedir></busconfig>")
-        return config
 
     @unittest.skipUnless(shutil.which("systemd-tmpfiles"), "systemd-tmpfiles is missing")
     def test_a_home_stays_as_its_user_has_it(self):
