@@ -12,19 +12,31 @@ namespace {
 
 constexpr int kMostLinks = 40;
 
-// The components of a path, before those that are still to be walked. False for one that climbs or
-// cannot be a name, unless it is the target of a link.
-bool putFirst(std::deque<std::string>& components, std::string_view path, bool mayClimb) {
+// The first component of a path, which is removed from it with the slash after it.
+std::string_view takeComponent(std::string_view& path) {
+  const std::size_t end = std::min(path.find('/'), path.size());
+  const std::string_view component = path.substr(0, end);
+  path.remove_prefix(std::min(end + 1, path.size()));
+  return component;
+}
+
+// False for a path that climbs or cannot be a name.
+bool isWellFormed(std::string_view path) {
+  if (path.find('\0') != std::string_view::npos) return false;
+  while (!path.empty()) {
+    if (takeComponent(path) == "..") return false;
+  }
+  return true;
+}
+
+// Puts the components of a path before those that are still to be walked.
+void putFirst(std::deque<std::string>& components, std::string_view path) {
   std::deque<std::string> parts;
   while (!path.empty()) {
-    const std::size_t end = std::min(path.find('/'), path.size());
-    const std::string_view part = path.substr(0, end);
-    path.remove_prefix(std::min(end + 1, path.size()));
-    if (part.find('\0') != std::string_view::npos || (part == ".." && !mayClimb)) return false;
+    const std::string_view part = takeComponent(path);
     if (!part.empty() && part != ".") parts.emplace_back(part);
   }
   components.insert(components.begin(), parts.begin(), parts.end());
-  return true;
 }
 
 Error noPath(std::string_view path) {
@@ -35,11 +47,10 @@ Error noPath(std::string_view path) {
 class Walk {
  public:
   static Result<Walk> start(const Result<Directory>& root, std::string_view path) {
-    std::deque<std::string> components;
-    if (!putFirst(components, path, /*mayClimb=*/false)) {
-      return noPath(path);
-    }
+    if (!isWellFormed(path)) return noPath(path);
     if (!root) return root.error();
+    std::deque<std::string> components;
+    putFirst(components, path);
     return Walk(*root, std::move(components));
   }
 
@@ -53,7 +64,8 @@ class Walk {
     if (!target || ++links_ > kMostLinks) return false;
     components_.pop_front();
     if (target->starts_with('/')) way_.resize(1, way_.front());
-    return putFirst(components_, *target, /*mayClimb=*/true);
+    putFirst(components_, *target);
+    return true;
   }
 
   // One component down, or up where a link says so.
@@ -107,8 +119,7 @@ Result<Directory> DeviceRoot::openRoot() const {
 // In one call where there is no link on the way; else, and on kernels without that call, one
 // component at a time.
 Result<Directory> DeviceRoot::open(std::string_view path) const {
-  std::deque<std::string> components;
-  if (!putFirst(components, path, /*mayClimb=*/false)) return noPath(path);
+  if (!isWellFormed(path)) return noPath(path);
   const auto root = openRoot();
   if (!root) return root;
   const std::string_view below = path.substr(std::min(path.find_first_not_of('/'), path.size()));

@@ -103,9 +103,9 @@ std::string Directory::pathOf(std::string_view name) const {
 }
 
 Result<Directory> Directory::openDirectory(std::string_view name) const {
-  const std::string path = pathOf(name);
+  std::string path = pathOf(name);
   Descriptor opened(openDirectoryAt(descriptor(), std::string(name).c_str(), O_NOFOLLOW));
-  if (opened) return Directory(std::move(opened), path, this);
+  if (opened) return Directory(std::move(opened), std::move(path), this);
   int code = errno;
   struct stat status {};
   // The kernel calls a link no directory.
