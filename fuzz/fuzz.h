@@ -12,7 +12,13 @@
 #include <string_view>
 #include <vector>
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size);
+// The entry point of a target: the fuzzer's name for it, or one of its own where fuzz_replay links
+// all targets.
+#ifdef FUZZ_REPLAY
+#define FUZZ_TARGET(name) extern "C" int fuzz_##name
+#else
+#define FUZZ_TARGET(name) extern "C" int LLVMFuzzerTestOneInput
+#endif
 
 namespace tally::fuzz {
 

@@ -138,7 +138,7 @@ class AnyMessage {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(bus_message)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const fakes::FakePlatform fake = fakes::makeFakePlatform();
   const auto scope = fake.install();

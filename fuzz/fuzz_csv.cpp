@@ -36,7 +36,7 @@ void checkRoundTrip(const StoreRow& row) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(csv)(const std::uint8_t* data, std::size_t size) {
   tally::fuzz::Input input(data, size);
   std::string text(input.rest());
   if (text.empty()) return 0;

@@ -60,7 +60,7 @@ void checkLog(std::string_view body, const KvDictionary& whitelist) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(daily_log)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const fakes::FakePlatform fake = fakes::makeFakePlatform();
   const auto scope = fake.install();

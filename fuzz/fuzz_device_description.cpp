@@ -30,7 +30,7 @@ void askKernelValues(LinuxKernelValues& values) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(device_description)(const std::uint8_t* data, std::size_t size) {
   static const fuzz::DescribedFolder folder;
   fuzz::Input input(data, size);
   folder.putInput("device.plist", input);

@@ -53,7 +53,7 @@ void checkText(std::string_view text) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(host_texts)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const std::string text(input.rest());
   checkText(text);

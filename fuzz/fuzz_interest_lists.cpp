@@ -24,7 +24,7 @@ std::shared_ptr<const RegistrySource::Entries> takeDrivers(fuzz::Input& input) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(interest_lists)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const auto drivers = takeDrivers(input);
   const bool isRaw = input.takeFlag();

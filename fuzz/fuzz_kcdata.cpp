@@ -29,7 +29,7 @@ int searchStepwise(std::span<const std::byte> data, const char* name, Statistics
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(kcdata)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const std::string name(input.takeText(input.take<std::uint8_t>() % 80));
   const fakes::Bytes bytes = input.takeRest();

@@ -27,7 +27,7 @@ std::string printed(const std::string& format, std::uint32_t value) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(label_format)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const auto value = input.take<std::uint32_t>();
   const std::string format(input.takeText(LabelFormat::kLongestFormat));

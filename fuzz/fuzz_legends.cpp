@@ -27,7 +27,7 @@ std::shared_ptr<fakes::FakeRegistry> registryOf(const KvDictionary& described) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(legends)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const bool text = fuzz::isDocument(input.rest());
   const std::int32_t options = text ? kHwReportByGroup : input.take<std::int8_t>();

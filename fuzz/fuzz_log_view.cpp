@@ -44,7 +44,7 @@ class Screen {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(log_view)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const auto value = fuzz::valueOf(input);
   const auto* const document = kvCast<KvDictionary>(value.get());

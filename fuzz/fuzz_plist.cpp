@@ -33,7 +33,7 @@ void checkRoundTrip(const KvObject& value) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(plist)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   if (const auto value = fuzz::valueOf(input)) checkRoundTrip(*value);
   return 0;

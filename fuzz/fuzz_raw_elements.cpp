@@ -44,7 +44,7 @@ KvRef<KvDictionary> cut(KvDictionary* subscribed, const std::vector<std::byte>& 
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(raw_elements)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const auto subscribed = takeChannels(input);
   const auto earlierBuffer = input.takeCopy(input.take<std::uint16_t>());

@@ -47,7 +47,7 @@ void useService(DeviceRegistry& registry, RegistryHandle service) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(registry)(const std::uint8_t* data, std::size_t size) {
   static const fuzz::DescribedFolder folder;
   fuzz::Input input(data, size);
   folder.putInput("registry.plist", input);

@@ -27,7 +27,7 @@ Rendered render(std::span<const std::byte> records, std::uint32_t capacity) {
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(snapshot)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const std::uint32_t capacity = input.take<std::uint16_t>() % 8192;
   const auto records = input.takeRest();

@@ -6,7 +6,7 @@
 using namespace tally;
 using fuzz::require;
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(snapshot_described)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const std::uint32_t capacity = input.take<std::uint16_t>() % 8192;
   const std::uint32_t first = input.take<std::uint8_t>();

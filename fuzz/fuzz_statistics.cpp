@@ -8,7 +8,7 @@
 using namespace tally;
 using fuzz::require;
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(statistics)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const std::size_t announced = input.take<std::uint16_t>();
   const fakes::Bytes buffer = input.takeRest();

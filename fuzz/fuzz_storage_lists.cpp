@@ -6,7 +6,7 @@
 using namespace tally;
 using fuzz::require;
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(storage_lists)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const bool plainReasons = input.takeFlag();
   const auto bytes = input.takeRest();

@@ -9,7 +9,7 @@
 using namespace tally;
 using fuzz::require;
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(tasking)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   TaskingInputs inputs;
   if (fuzz::isDocument(input.rest())) {

@@ -7,7 +7,7 @@
 using namespace tally;
 using fuzz::require;
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(telemetry_list)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   const auto digits = input.takeText(input.take<std::uint8_t>() % 16);
   hexStringToByte(digits, digits.size());

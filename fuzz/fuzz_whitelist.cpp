@@ -46,7 +46,7 @@ void lookUp(const TBConfig& config, const KvDictionary& root, std::string_view k
 
 }  // namespace
 
-int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   fakes::FakePlatform fake = fakes::makeFakePlatform();
   const auto scope = fake.install();

@@ -109,7 +109,7 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
 }
 
 TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
-  const char* const kFile = "var/mobile/Library/Preferences/vellum.tallyd.plist";
+  const char* const kProgramFile = "var/mobile/Library/Preferences/vellum.tallyd.plist";
   const std::string waiting = "var/mobile/Library/Logs/Submission/0000000001-a.log";
   const auto enabled = [&] {
     const Platform device = makeLinuxPlatform(root, {log, false});
@@ -122,14 +122,14 @@ TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
   put(waiting, "x");
   EXPECT_TRUE(enabled());
   // What may be a refusal lets nothing out, and deletes nothing.
-  putSwitch(kFile, "<string>no</string>");
+  putSwitch(kProgramFile, "<string>no</string>");
   EXPECT_FALSE(enabled());
-  std::filesystem::remove(at(kFile));
-  std::filesystem::create_symlink("vellum.tallyd.plist", at(kFile));  // to itself
+  std::filesystem::remove(at(kProgramFile));
+  std::filesystem::create_symlink("vellum.tallyd.plist", at(kProgramFile));  // to itself
   EXPECT_FALSE(enabled());
   EXPECT_TRUE(exists(waiting));
-  std::filesystem::remove(at(kFile));
-  putSwitch(kFile, "<false/>");
+  std::filesystem::remove(at(kProgramFile));
+  putSwitch(kProgramFile, "<false/>");
   EXPECT_FALSE(enabled());
   EXPECT_FALSE(exists(waiting));
   putSwitch("device/device.plist", "<true/>");
