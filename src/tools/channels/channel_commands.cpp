@@ -72,7 +72,7 @@ bool isWanted(KvDictionary* channel, const ChannelArguments& wanted) {
 // Adds the channels of every driver that publishes some. One that cannot be read is named and
 // passed over; false then.
 bool addAllDrivers(const ToolContext& context, KvDictionary& channels) {
-  DeviceRegistry& registry = *platform().deviceRegistry;
+  DeviceRegistry& registry = *context.platform->deviceRegistry;
   RegistryHandle drivers = 0;
   const auto published = KvDictionary::create({{"HwReportLegendPublic", KvBoolean::of(true)}});
   const RegistryResult result = registry.RegistryCopyMatchingServices(

@@ -1,4 +1,6 @@
 // Checks of what lies below the device root.
+#include "tools/doctor/health_files.h"
+
 #include <algorithm>
 #include <limits>
 
@@ -11,7 +13,6 @@
 #include "host/store/store_schema.h"
 #include "host/system/device_information.h"
 #include "kv/plist_codec.h"
-#include "tools/doctor/health_checks.h"
 #include "tools/frame/output.h"
 #include "tools/frame/spelling.h"
 #include "tools/report/daily_log.h"
@@ -19,8 +20,6 @@
 
 namespace tally::tools {
 namespace {
-
-using Lines = std::vector<HealthLine>;
 
 // Keeps the errors that a check provokes, so that they stand in its own lines.
 class ErrorCollector final : public SystemLog {
@@ -33,15 +32,15 @@ class ErrorCollector final : public SystemLog {
   }
 };
 
-void examineRoot(const DeviceRoot& root, Lines& lines) {
+void examineRoot(const DeviceRoot& root, HealthChecks& checks) {
   const auto directory = root.open("/");
-  lines.push_back({directory ? Health::Ok : Health::Wrong, "device root",
-                   directory ? directory->path() : directory.error().message});
+  checks.push_back({directory ? Health::Ok : Health::Wrong, "device root",
+                    directory ? directory->path() : directory.error().message});
   const auto volume = openDataVolume(root);
   const auto space = volume ? volume->freeSpace() : std::nullopt;
   if (!space) return;
   const bool enough = *space > kReservedBytes;
-  lines.push_back(
+  checks.push_back(
       {enough ? Health::Ok : Health::Wrong, "free space",
        fmt::format("{}; logs leave {} free", byteText(*space), byteText(kReservedBytes))});
 }
@@ -54,7 +53,7 @@ std::string withArticle(std::string_view noun) {
 // Names what is not of its type, and what is near to a name that is known.
 template <class Entries>
 void examineEntries(const KvDictionary& found, const Entries& known, const std::string& place,
-                    Lines& lines) {
+                    HealthChecks& checks) {
   constexpr const char* kSubject = "device description";
   std::vector<std::string_view> names;
   for (const auto& entry : known) names.push_back(entry.name);
@@ -64,74 +63,75 @@ void examineEntries(const KvDictionary& found, const Entries& known, const std::
     const std::string name = place + std::string(key->view());
     if (entry == std::ranges::end(known)) {
       if (const auto meant = nearestWord(key->view(), names)) {
-        lines.push_back({Health::Wrong, kSubject,
-                         fmt::format("{} is not known; {}{} may be meant", name, place, *meant)});
+        checks.push_back({Health::Wrong, kSubject,
+                          fmt::format("{} is not known; {}{} may be meant", name, place, *meant)});
       }
     } else if (value->type() != entry->type) {
-      lines.push_back(
+      checks.push_back(
           {Health::Wrong, kSubject,
            fmt::format("{} is {}, not {}, and is ignored", name,
                        withArticle(typeName(value->type())), withArticle(typeName(entry->type)))});
     } else if constexpr (requires { entry->members; }) {
       if (!entry->members.empty()) {
-        examineEntries(static_cast<const KvDictionary&>(*value), entry->members, name + ".", lines);
+        examineEntries(static_cast<const KvDictionary&>(*value), entry->members, name + ".",
+                       checks);
       }
     }
   }
 }
 
-void examineDescription(const DeviceRoot& root, Lines& lines) {
+void examineDescription(const DeviceRoot& root, HealthChecks& checks) {
   constexpr const char* kSubject = "device description";
   const auto document = root.readFile("/device/device.plist", kPlistMaximumBytes);
   if (!document) {
     const bool absent = !root.identity("/device/device.plist");
-    lines.push_back({absent ? Health::Missing : Health::Wrong, kSubject,
-                     absent ? "none; Linux answers for the device" : document.error().message});
+    checks.push_back({absent ? Health::Missing : Health::Wrong, kSubject,
+                      absent ? "none; Linux answers for the device" : document.error().message});
     return;
   }
   const auto decoded = decodePlist(*document);
   const auto* entries = decoded ? kvCast<KvDictionary>(decoded->get()) : nullptr;
   if (entries == nullptr) {
-    lines.push_back(
+    checks.push_back(
         {Health::Wrong, kSubject,
          decoded ? "device/device.plist is not a dictionary" : decoded.error().message});
     return;
   }
-  lines.push_back({Health::Ok, kSubject, counted(entries->size(), "entry")});
-  examineEntries(*entries, kDescribedEntries, "", lines);
+  checks.push_back({Health::Ok, kSubject, counted(entries->size(), "entry")});
+  examineEntries(*entries, kDescribedEntries, "", checks);
 }
 
-void examineWhitelist(Lines& lines) {
+void examineWhitelist(Platform& platform, HealthChecks& checks) {
   constexpr const char* kSubject = "whitelist";
   const WhitelistFile file = loadWhitelistFile();
   if (!file.root) {
-    const bool there = platform().files->fileSize(kWhitelistPath).has_value();
-    lines.push_back({there ? Health::Wrong : Health::Missing, kSubject,
-                     (there ? file.fault : std::string("none")) + "; nothing is reported"});
+    const bool there = platform.files->fileSize(kWhitelistPath).has_value();
+    checks.push_back({there ? Health::Wrong : Health::Missing, kSubject,
+                      (there ? file.fault : std::string("none")) + "; nothing is reported"});
     return;
   }
-  const auto findings = checkWhitelist(*file.root);
+  const auto findings = checkWhitelist(platform, *file.root);
   const auto faults =
       static_cast<std::size_t>(std::ranges::count(findings, Severity::Fault, &Finding::severity));
-  lines.push_back({faults > 0 ? Health::Wrong : Health::Ok, kSubject,
-                   fmt::format("{}, {}{}", counted(faults, "fault"),
-                               counted(findings.size() - faults, "surprise"),
-                               findings.empty() ? "" : "; see tallyctl whitelist check")});
+  checks.push_back({faults > 0 ? Health::Wrong : Health::Ok, kSubject,
+                    fmt::format("{}, {}{}", counted(faults, "fault"),
+                                counted(findings.size() - faults, "surprise"),
+                                findings.empty() ? "" : "; see tallyctl whitelist check")});
   for (const auto& group : *file.root) {
     const GroupState state = groupState(group.key->view());
     if (state == GroupState::DisabledByTasking || state == GroupState::SwitchUnreadable) {
-      lines.push_back({Health::Missing, kSubject,
-                       fmt::format("the group {} {}", group.key->view(), whyNotInForce(state))});
+      checks.push_back({Health::Missing, kSubject,
+                        fmt::format("the group {} {}", group.key->view(), whyNotInForce(state))});
     }
   }
 }
 
-void examineStore(const DeviceRoot& root, Lines& lines) {
+void examineStore(Platform& platform, const DeviceRoot& root, HealthChecks& checks) {
   constexpr const char* kSubject = "metrics store";
   const StoreFile file = metricsStoreFile(root);
   const auto identity = file.directory.identity(file.name);
   if (!identity) {
-    lines.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
+    checks.push_back({Health::Missing, kSubject, "none yet; there is nothing to report"});
     return;
   }
   std::uint64_t scalars = 0;
@@ -146,20 +146,20 @@ void examineStore(const DeviceRoot& root, Lines& lines) {
       },
       [&](const std::string& message) { fault = message; });
   if (!fault.empty()) {
-    lines.push_back({Health::Wrong, kSubject, fault});
+    checks.push_back({Health::Wrong, kSubject, fault});
     return;
   }
   std::string text = counted(scalars, "scalar") + ", " + counted(distributions, "distribution");
   if (scalars + distributions > 0) {
     text += ", up to " + dayName(static_cast<std::int32_t>(lastDay));
   }
-  lines.push_back({Health::Ok, kSubject, text + ", " + byteText(identity->size)});
-  if (scalars + distributions > 0 && lastDay > platform().metricsStore->TBDaysSince1970()) {
-    lines.push_back({Health::Wrong, kSubject, "it has days that have not come yet"});
+  checks.push_back({Health::Ok, kSubject, text + ", " + byteText(identity->size)});
+  if (scalars + distributions > 0 && lastDay > platform.metricsStore->TBDaysSince1970()) {
+    checks.push_back({Health::Wrong, kSubject, "it has days that have not come yet"});
   }
 }
 
-void examinePreferences(const DeviceRoot& root, Lines& lines) {
+void examinePreferences(const DeviceRoot& root, HealthChecks& checks) {
   constexpr const char* kSubject = "preferences";
   const DeviceDirectory folder = *userPreferencesFolder(root, kProgramUser);
   const auto collector = std::make_shared<ErrorCollector>();
@@ -167,16 +167,16 @@ void examinePreferences(const DeviceRoot& root, Lines& lines) {
                                       PropertyListPreferences::Access::ReadOnly);
   const auto domains = preferences.listDomains();
   if (!domains) {
-    lines.push_back({Health::Wrong, kSubject, domains.error().message});
+    checks.push_back({Health::Wrong, kSubject, domains.error().message});
     return;
   }
   for (const std::string& domain : *domains) (void)preferences.copyDomain(domain);
   for (const std::string& error : collector->errors) {
-    lines.push_back({Health::Wrong, kSubject, error});
+    checks.push_back({Health::Wrong, kSubject, error});
   }
   if (collector->errors.empty()) {
-    lines.push_back({domains->empty() ? Health::Missing : Health::Ok, kSubject,
-                     domains->empty() ? "none are set" : counted(domains->size(), "domain")});
+    checks.push_back({domains->empty() ? Health::Missing : Health::Ok, kSubject,
+                      domains->empty() ? "none are set" : counted(domains->size(), "domain")});
   }
   const auto names = folder.list();
   const auto aside =
@@ -186,46 +186,47 @@ void examinePreferences(const DeviceRoot& root, Lines& lines) {
                                     })
             : 0;
   if (aside > 0) {
-    lines.push_back(
+    checks.push_back(
         {Health::Wrong, kSubject,
          fmt::format("{} set aside in {}",
                      counted(static_cast<std::uint64_t>(aside), "damaged file"), folder.text())});
   }
 }
 
-void examineSpool(const ToolContext& context, Lines& lines) {
+void examineSpool(const ToolContext& context, HealthChecks& checks) {
   constexpr const char* kSubject = "submitted logs";
   const SubmittedLogs spool(context);
   const auto logs = spool.list();
   if (!logs) {
-    lines.push_back({Health::Wrong, kSubject, logs.error().message});
+    checks.push_back({Health::Wrong, kSubject, logs.error().message});
     return;
   }
   std::uint64_t bytes = 0;
   for (const SpooledLog& log : *logs) bytes += log.bytes;
-  const FolderBounds bounds = folderBounds(*platform().preferences);
-  lines.push_back({logs->empty() ? Health::Missing : Health::Ok, kSubject,
-                   logs->empty() ? "none yet"
-                                 : fmt::format("{} with {}; at most {} and {} are kept",
-                                               counted(logs->size(), "log"), byteText(bytes),
-                                               bounds.maximumLogs, byteText(bounds.maximumBytes))});
+  const FolderBounds bounds = folderBounds(*context.platform->preferences);
+  checks.push_back(
+      {logs->empty() ? Health::Missing : Health::Ok, kSubject,
+       logs->empty()
+           ? "none yet"
+           : fmt::format("{} with {}; at most {} and {} are kept", counted(logs->size(), "log"),
+                         byteText(bytes), bounds.maximumLogs, byteText(bounds.maximumBytes))});
   for (const SpooledLog& log : *logs) {
     const std::string_view fault = faultOf(log, spool.read(log));
     if (fault.empty()) continue;
-    lines.push_back({Health::Wrong, kSubject, fmt::format("{} is {}", log.fileName, fault)});
+    checks.push_back({Health::Wrong, kSubject, fmt::format("{} is {}", log.fileName, fault)});
   }
 }
 
 }  // namespace
 
-void examineFiles(const ToolContext& context, Lines& lines) {
+void examineFiles(const ToolContext& context, HealthChecks& checks) {
   const DeviceRoot root(context.root);
-  examineRoot(root, lines);
-  examineDescription(root, lines);
-  examinePreferences(root, lines);
-  examineWhitelist(lines);
-  examineStore(root, lines);
-  examineSpool(context, lines);
+  examineRoot(root, checks);
+  examineDescription(root, checks);
+  examinePreferences(root, checks);
+  examineWhitelist(*context.platform, checks);
+  examineStore(*context.platform, root, checks);
+  examineSpool(context, checks);
 }
 
 }  // namespace tally::tools

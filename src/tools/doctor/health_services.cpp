@@ -1,4 +1,6 @@
 // Checks of what the device and the machine answer.
+#include "tools/doctor/health_services.h"
+
 #include <algorithm>
 #include <vector>
 
@@ -8,23 +10,20 @@
 #include "host/system/system_log.h"
 #include "platform/platform.h"
 #include "report/report.h"
-#include "tools/doctor/health_checks.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
 namespace {
 
-using Lines = std::vector<HealthLine>;
-
-void examineClock(Lines& lines) {
+void examineClock(Platform& platform, HealthChecks& checks) {
   constexpr double kFirstSane = kFirstPlausibleDay * kSecondsPerDay;
   constexpr double kLastSane = 4102444800;  // 2100-01-01
-  const double now = platform().clock->secondsSince1970();
+  const double now = platform.clock->secondsSince1970();
   std::string text;
   appendTimestamp(text, now);
   const bool sane = now >= kFirstSane && now < kLastSane;
-  lines.push_back({sane ? Health::Ok : Health::Wrong, "clock",
-                   sane ? text : text + " cannot be now: it was never set"});
+  checks.push_back({sane ? Health::Ok : Health::Wrong, "clock",
+                    sane ? text : text + " cannot be now: it was never set"});
 }
 
 // The text as one word of a POSIX shell.
@@ -34,17 +33,17 @@ std::string shellWord(std::string_view text) {
   return word + "'";
 }
 
-void examineDay(const ToolContext& context, Lines& lines) {
+void examineDay(const ToolContext& context, HealthChecks& checks) {
   constexpr const char* kSubject = "last day";
-  const std::int32_t yesterday = platform().metricsStore->TBDaysSince1970() - 1;
-  const std::int32_t last =
-      platform().preferences->SMAPreferencesGetIntegerValue(kLastProcessedDay, kProgramDomain);
+  const std::int32_t yesterday = context.platform->metricsStore->TBDaysSince1970() - 1;
+  const std::int32_t last = context.platform->preferences->SMAPreferencesGetIntegerValue(
+      kLastProcessedDay, kProgramDomain);
   if (last == 0) {
-    lines.push_back({Health::Missing, kSubject, "tallyrun -d has processed no day yet"});
+    checks.push_back({Health::Missing, kSubject, "tallyrun -d has processed no day yet"});
   } else if (last > yesterday) {
     // With a clock that was never set, it is the clock that has to be repaired.
     const bool clockIsSet = yesterday >= kFirstPlausibleDay;
-    lines.push_back(
+    checks.push_back(
         {Health::Wrong, kSubject,
          fmt::format("{} was processed, which is not over: no day is processed until then",
                      dayName(last)),
@@ -52,92 +51,92 @@ void examineDay(const ToolContext& context, Lines& lines) {
                                   kLastProcessedDay, yesterday - 1)
                     : ""});
   } else {
-    lines.push_back({last == yesterday ? Health::Ok : Health::Missing, kSubject,
-                     fmt::format("{} was processed{}", dayName(last),
-                                 last == yesterday ? "" : "; yesterday is still to come")});
+    checks.push_back({last == yesterday ? Health::Ok : Health::Missing, kSubject,
+                      fmt::format("{} was processed{}", dayName(last),
+                                  last == yesterday ? "" : "; yesterday is still to come")});
   }
 }
 
-void examineLogging(Lines& lines) {
+void examineLogging(HealthChecks& checks) {
   const SystemLogEnvironment found = systemLogEnvironment();
   const bool journal = journalIsThere() && !found.settings.forceStandardError;
-  lines.push_back(
+  checks.push_back(
       {journal || found.settings.forceStandardError ? Health::Ok : Health::Missing, "system log",
        fmt::format("{}, from the level {} up",
                    journal                             ? "the journal"
                    : found.settings.forceStandardError ? "standard error, by TALLYRUN_LOG"
                                                        : "no journal here; standard error",
                    levelText(found.settings.lowest))});
-  if (!found.fault.empty()) lines.push_back({Health::Wrong, "system log", found.fault});
+  if (!found.fault.empty()) checks.push_back({Health::Wrong, "system log", found.fault});
 }
 
-void examineIdentity(Lines& lines) {
-  DeviceInformation& device = *platform().deviceInformation;
+void examineIdentity(Platform& platform, HealthChecks& checks) {
+  DeviceInformation& device = *platform.deviceInformation;
   const std::string version = device.SMAOSVersion();
   const bool known = version != "unknown";
-  lines.push_back({known ? Health::Ok : Health::Missing, "system version", version});
+  checks.push_back({known ? Health::Ok : Health::Missing, "system version", version});
   const auto identifier = device.DeviceQuery("InverseDeviceID");
-  lines.push_back({identifier ? Health::Ok : Health::Missing, "device identifier",
-                   identifier ? kvText(identifier.get()) : "none"});
+  checks.push_back({identifier ? Health::Ok : Health::Missing, "device identifier",
+                    identifier ? kvText(identifier.get()) : "none"});
   const auto usage = device.DeviceQuery("DiskUsage");
   const auto* disk = kvCast<KvDictionary>(usage.get());
   const auto bytes = [&](std::string_view key) {
     const auto* number = disk != nullptr ? disk->getAs<KvNumber>(key) : nullptr;
     return number != nullptr ? byteText(number->asUInt64()) : std::string("unknown");
   };
-  lines.push_back({disk != nullptr ? Health::Ok : Health::Missing, "disk",
-                   disk != nullptr
-                       ? fmt::format("{} of {} available", bytes(kDOQDiskUsageTotalDataAvailable),
-                                     bytes(kDOQDiskUsageTotalDiskCapacity))
-                       : "its usage is not known"});
-  lines.push_back({Health::Ok, "kind of device",
-                   TBIsInternalDevice() ? "internal: every key is reported" : "production"});
+  checks.push_back({disk != nullptr ? Health::Ok : Health::Missing, "disk",
+                    disk != nullptr
+                        ? fmt::format("{} of {} available", bytes(kDOQDiskUsageTotalDataAvailable),
+                                      bytes(kDOQDiskUsageTotalDiskCapacity))
+                        : "its usage is not known"});
+  checks.push_back({Health::Ok, "kind of device",
+                    TBIsInternalDevice() ? "internal: every key is reported" : "production"});
 }
 
-void examineUser(Lines& lines) {
-  const bool allowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
-  lines.push_back({allowed ? Health::Ok : Health::Missing, "submission",
-                   allowed ? "allowed" : "not allowed; no log is made"});
-  const auto languages = platform().locale->PreferredLanguages();
-  const auto region = platform().locale->CurrentRegionCode();
-  lines.push_back({languages.empty() ? Health::Missing : Health::Ok, "locale",
-                   fmt::format("{}{}", fmt::join(languages, ", "),
-                               languages.empty() ? "no preferred language" : "") +
-                       (region ? ", region " + *region : ", no region")});
+void examineUser(Platform& platform, HealthChecks& checks) {
+  const bool allowed = platform.crashReporting->isDiagnosticSubmissionEnabled();
+  checks.push_back({allowed ? Health::Ok : Health::Missing, "submission",
+                    allowed ? "allowed" : "not allowed; no log is made"});
+  const auto languages = platform.locale->PreferredLanguages();
+  const auto region = platform.locale->CurrentRegionCode();
+  checks.push_back({languages.empty() ? Health::Missing : Health::Ok, "locale",
+                    fmt::format("{}{}", fmt::join(languages, ", "),
+                                languages.empty() ? "no preferred language" : "") +
+                        (region ? ", region " + *region : ", no region")});
   std::uint64_t all = 0;
   std::uint64_t users = 0;
-  platform().appRegistry->enumerateBundles(kBundleKindApplication, [&](std::string_view type) {
+  platform.appRegistry->enumerateBundles(kBundleKindApplication, [&](std::string_view type) {
     ++all;
     if (type == UserAppType) ++users;
   });
-  lines.push_back({all > 0 ? Health::Ok : Health::Missing, "applications",
-                   fmt::format("{}, {} of them the user's", all, users)});
+  checks.push_back({all > 0 ? Health::Ok : Health::Missing, "applications",
+                    fmt::format("{}, {} of them the user's", all, users)});
 }
 
-void examineCrashSupport(Lines& lines) {
+void examineCrashSupport(Platform& platform, HealthChecks& checks) {
   constexpr const char* kSubject = "crash support";
-  CrashSupportLibrary& library = *platform().crashSupportLibrary;
+  CrashSupportLibrary& library = *platform.crashSupportLibrary;
   if (!library.open(kCrashSupportPath)) {
-    lines.push_back({Health::Missing, kSubject, "the library is not there"});
+    checks.push_back({Health::Missing, kSubject, "the library is not there"});
     return;
   }
   std::vector<std::string_view> missing;
   for (const std::string_view symbol : kCrashSupportSymbols) {
     if (!library.hasSymbol(symbol)) missing.push_back(symbol);
   }
-  lines.push_back(
+  checks.push_back(
       {missing.empty() ? Health::Ok : Health::Missing, kSubject,
        missing.empty() ? "complete" : fmt::format("lacks {}", fmt::join(missing, ", "))});
 }
 
-void examineKernel(Lines& lines) {
+void examineKernel(Platform& platform, HealthChecks& checks) {
   constexpr std::size_t kNamed = 3;
   std::vector<std::string> missing;
   const auto names = kernelValuesOfReport();
   for (const KernelValueName& value : names) {
     std::byte buffer[32];
     std::size_t length = value.width;
-    const int error = platform().kernelValues->readKernelValue(
+    const int error = platform.kernelValues->readKernelValue(
         value.name, {buffer, std::min(sizeof buffer, value.width)}, &length);
     if (error != 0) missing.push_back(value.name);
   }
@@ -146,33 +145,26 @@ void examineKernel(Lines& lines) {
   if (!missing.empty() && missing.size() <= kNamed) {
     text += fmt::format("; not {}", fmt::join(missing, ", "));
   }
-  lines.push_back({missing.empty() ? Health::Ok : Health::Missing, "kernel values", text});
-  const auto timebase = platform().kernelValues->TimebaseInfo();
+  checks.push_back({missing.empty() ? Health::Ok : Health::Missing, "kernel values", text});
+  const auto timebase = platform.kernelValues->TimebaseInfo();
   const bool counts = timebase && timebase->denominator != 0;
-  lines.push_back(
+  checks.push_back(
       {counts ? Health::Ok : Health::Wrong, "tick counter",
-       counts ? fmt::format("{} ticks since boot", platform().kernelValues->MonotonicTicks())
+       counts ? fmt::format("{} ticks since boot", platform.kernelValues->MonotonicTicks())
               : "its timebase cannot be read"});
 }
 
 }  // namespace
 
-void examineServices(const ToolContext& context, Lines& lines) {
-  examineClock(lines);
-  examineDay(context, lines);
-  examineLogging(lines);
-  examineIdentity(lines);
-  examineUser(lines);
-  examineCrashSupport(lines);
-  examineKernel(lines);
-}
-
-std::vector<HealthLine> examineDevice(const ToolContext& context) {
-  Lines lines;
-  examineFiles(context, lines);
-  examineServices(context, lines);
-  examineDrivers(lines);
-  return lines;
+void examineServices(const ToolContext& context, HealthChecks& checks) {
+  Platform& platform = *context.platform;
+  examineClock(platform, checks);
+  examineDay(context, checks);
+  examineLogging(checks);
+  examineIdentity(platform, checks);
+  examineUser(platform, checks);
+  examineCrashSupport(platform, checks);
+  examineKernel(platform, checks);
 }
 
 }  // namespace tally::tools

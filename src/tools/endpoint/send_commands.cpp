@@ -38,8 +38,8 @@ int sendLogging(const ToolContext& context, const SendArguments&) {
 }
 
 int sendDay(const ToolContext& context, const SendArguments& arguments) {
-  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
-  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const auto day = dayOf(context, arguments.day);
+  if (!day) return kBadUsage;
   const auto message = messageOf(kRunDay);
   message->set("value", KvNumber::int64(*day));
   return send(context, *message, fmt::format("the tasks of {}", dayName(*day)));

@@ -35,6 +35,7 @@ struct Line {
   std::size_t arguments = 0;            // of the command, already given
   bool onlyArguments = false;           // after --
   std::string root, domain;             // the values of --root and --domain
+  Platform* platform = nullptr;
 };
 
 const OptionHelp* findOption(const CommandHelp& help, std::string_view name) {
@@ -102,7 +103,7 @@ Candidates days(const Line& line) {
 }
 
 PropertyListPreferences preferencesOf(const Line& line) {
-  return {*userPreferencesFolder(line.root, kProgramUser), platform().log, 0600,
+  return {*userPreferencesFolder(line.root, kProgramUser), line.platform->log, 0600,
           PropertyListPreferences::Access::ReadOnly};
 }
 
@@ -179,7 +180,8 @@ int complete(const ToolContext& context, const CLI::App& app,
   Line line{.command = &app,
             .help = describe(app),
             .root = context.root,
-            .domain = std::string(kProgramDomain)};
+            .domain = std::string(kProgramDomain),
+            .platform = context.platform};
   for (std::size_t i = 0; i + 1 < words.size(); ++i) takeWord(line, words[i]);
   std::string begun = words.empty() ? "" : words.back(), before;
   if (const std::size_t equals = begun.find('=');

@@ -4,6 +4,7 @@
 #include <limits>
 
 #include "base/number_text.h"
+#include "tools/frame/output.h"
 
 namespace tally::tools {
 namespace {
@@ -34,6 +35,12 @@ std::optional<std::int32_t> parseDay(std::string_view text, std::int32_t today) 
     return std::nullopt;
   }
   return static_cast<std::int32_t>(*number);
+}
+
+std::optional<std::int32_t> dayOf(const ToolContext& context, std::string_view text) {
+  const auto day = parseDay(text, context.platform->metricsStore->TBDaysSince1970());
+  if (!day) complain(context, fmt::format("not a day: {}", text), kBadUsage);
+  return day;
 }
 
 }  // namespace tally::tools

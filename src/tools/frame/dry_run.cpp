@@ -66,8 +66,8 @@ class CountedCrashReporting final : public CrashReporting {
 
 }  // namespace
 
-Platform DryRun::platform() {
-  Platform variant = tally::platform();
+Platform DryRun::variantOf(const Platform& platform) {
+  Platform variant = platform;
   variant.preferences = std::make_shared<OverlayPreferences>(variant.preferences);
   variant.logSubmission = std::make_shared<KeptSubmission>(*this);
   variant.crashReporting = std::make_shared<CountedCrashReporting>(*this, variant.crashReporting);

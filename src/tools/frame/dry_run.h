@@ -19,9 +19,9 @@ struct DryRun {
   std::vector<Log> logs;
   std::size_t records = 0;  // of structured data
 
-  // The platform in force, with preferences that forget what is written to them and a submission
-  // and a structured-data log that keep it here. The run outlives the platform.
-  Platform platform();
+  // A variant of a platform whose preferences forget what is written to them, and whose log
+  // submission and structured-data log are kept here. The run outlives the variant.
+  Platform variantOf(const Platform& platform);
 };
 
 }  // namespace tally::tools

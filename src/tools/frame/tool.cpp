@@ -40,7 +40,9 @@ int runCommand(ToolContext& context, std::span<const char* const> arguments,
   } catch (const CLI::ParseError& error) {
     return complain(context, usageFault(app, arguments, error), kBadUsage);
   }
+  // The libraries hwreport and storage find the platform in force; the tool is handed it.
   const PlatformScope scope(makePlatform(context.root));
+  context.platform = &platform();
   return context.command();
 }
 

@@ -30,6 +30,8 @@ struct ToolContext {
   Terminal errors;    // what standard error can show
   std::FILE* out = stdout;
   std::FILE* err = stderr;
+  // The services of the device root, while a command runs; borrowed.
+  Platform* platform = nullptr;
   // What went wrong, for the error object of --json; borrowed.
   std::vector<std::string>* complaints = nullptr;
   // The command that the arguments chose, set by the callback of its CLI::App. It runs once the

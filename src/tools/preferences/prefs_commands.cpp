@@ -31,7 +31,7 @@ struct PrefsArguments {
 };
 
 PropertyListPreferences openPreferences(const ToolContext& context, Access access) {
-  return {*userPreferencesFolder(context.root, kProgramUser), platform().log, 0600, access};
+  return {*userPreferencesFolder(context.root, kProgramUser), context.platform->log, 0600, access};
 }
 
 bool isDomainName(const std::string& name) {

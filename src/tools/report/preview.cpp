@@ -7,10 +7,10 @@
 
 namespace tally::tools {
 
-Preview previewLog(std::int32_t day, KeyTrace* trace) {
+Preview previewLog(const Platform& platform, std::int32_t day, KeyTrace* trace) {
   DryRun run;
   {
-    const PlatformScope scope(run.platform());
+    const PlatformScope scope(run.variantOf(platform));
     TBReport report;
     if (trace != nullptr) report.follow(*trace);
     report.writeLogForYesterdayWithAppInfo(day, nullptr);

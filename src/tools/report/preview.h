@@ -5,6 +5,7 @@
 #include <string>
 
 #include "kv/value.h"
+#include "platform/platform.h"
 #include "report/report.h"
 
 namespace tally::tools {
@@ -17,6 +18,6 @@ struct Preview {
 
 // Builds the day's log by the very steps of the daily job, as a dry run. Follows a key when a trace
 // is given.
-Preview previewLog(std::int32_t day, KeyTrace* trace = nullptr);
+Preview previewLog(const Platform& platform, std::int32_t day, KeyTrace* trace = nullptr);
 
 }  // namespace tally::tools

@@ -66,9 +66,9 @@ int previewDiff(const ToolContext& context, const DailyLog& next) {
 }
 
 int preview(const ToolContext& context, const ReportArguments& arguments) {
-  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
-  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
-  const Preview made = previewLog(*day);
+  const auto day = dayOf(context, arguments.day);
+  if (!day) return kBadUsage;
+  const Preview made = previewLog(*context.platform, *day);
   const auto log = DailyLog::of(made.document);
   if (!log) {
     return complain(context,
@@ -77,7 +77,7 @@ int preview(const ToolContext& context, const ReportArguments& arguments) {
                                 dayName(*day)),
                     kWrong);
   }
-  const bool allowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
+  const bool allowed = context.platform->crashReporting->isDiagnosticSubmissionEnabled();
   if (!allowed) {
     print(context.err,
           "tallyctl: submission is not allowed on this device, so the daily job "

@@ -6,10 +6,10 @@
 namespace tally::tools {
 namespace {
 
-bool hasDriver() {
+bool hasDriver(Platform& platform) {
   const NandExporter* exporter = nullptr;
   const RegistryHandle service = findNandExporter(&exporter);
-  if (service != 0) platform().deviceRegistry->HandleRelease(service);
+  if (service != 0) platform.deviceRegistry->HandleRelease(service);
   return service != 0;
 }
 
@@ -18,7 +18,7 @@ bool hasDriver() {
 CLI::App* addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
                          const char* description, std::function<int()> run) {
   return addCommand(&nand, context, name, description, [&context, run = std::move(run)] {
-    if (hasDriver()) return run();
+    if (hasDriver(*context.platform)) return run();
     return complain(context, "this device has no driver that exports figures of its flash storage",
                     kWrong);
   });

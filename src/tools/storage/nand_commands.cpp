@@ -83,13 +83,13 @@ int runInfo(const ToolContext& context, const std::string& text) {
   return found ? kSuccess : complain(context, "no figure of that name: " + text, kWrong);
 }
 
-struct HealthLine {
+struct HealthFigure {
   const char* label;
   std::string_view key;  // in the summary
   const char* unit;
   std::int64_t doubtfulFrom, badFrom;  // the figure is shown in the ink of what it reached
 };
-constexpr HealthLine kHealthLines[] = {
+constexpr HealthFigure kHealthFigures[] = {
     {"Wear, most used part", kNANDInfoHealthMaxPercentageNANDUsedKey, " %", 80, 100},
     {"  user partition", "vellum.NANDInfo.UserPartitionPEPercentUsed", " %", 80, 100},
     {"  intermediate partition", "vellum.NANDInfo.IntermediatePartitionPEPercentUsed", " %", 80,
@@ -108,22 +108,22 @@ bool isExported(const KvDictionary& info, std::string_view key) {
   return std::ranges::any_of(counters, [&](std::string_view one) { return info.contains(one); });
 }
 
-Cell figureCell(const KvDictionary& info, const KvDictionary& health, const HealthLine& line) {
-  if (!isExported(info, line.key)) return {"not exported", Ink::Faint};
+Cell figureCell(const KvDictionary& info, const KvDictionary& health, const HealthFigure& figure) {
+  if (!isExported(info, figure.key)) return {"not exported", Ink::Faint};
   // The figures are counts of 32 bits, of which the upper half reads as negative.
-  const std::int64_t value = static_cast<std::uint32_t>(health.getInt64(line.key).value_or(0));
-  const Ink ink = value >= line.badFrom        ? Ink::Bad
-                  : value >= line.doubtfulFrom ? Ink::Doubtful
-                                               : Ink::Plain;
-  return {integerText(value) + line.unit, ink};
+  const std::int64_t value = static_cast<std::uint32_t>(health.getInt64(figure.key).value_or(0));
+  const Ink ink = value >= figure.badFrom        ? Ink::Bad
+                  : value >= figure.doubtfulFrom ? Ink::Doubtful
+                                                 : Ink::Plain;
+  return {integerText(value) + figure.unit, ink};
 }
 
 void printHealth(const ToolContext& context, const KvDictionary& info, const KvDictionary& health,
                  bool retirable, bool deletion) {
   printHeading(context, "Storage health");
   Table table({{""}, {"", Align::Right}});
-  for (const HealthLine& line : kHealthLines) {
-    table.add({line.label, figureCell(info, health, line)});
+  for (const HealthFigure& figure : kHealthFigures) {
+    table.add({figure.label, figureCell(info, health, figure)});
   }
   const auto spare = health.getInt64(kSpareKey).value_or(0);
   table.add({"Spare blocks left", info.contains(kSpareKey) ? Cell{integerText(spare) + " %",

@@ -41,8 +41,8 @@ class EventPreview final : public AnalyticsEvents {
   std::vector<ShownEvent> events_;
 };
 
-std::vector<ShownEvent> previewEvents() {
-  Platform services = platform();
+std::vector<ShownEvent> previewEvents(const Platform& platform) {
+  Platform services = platform;
   const auto preview = std::make_shared<EventPreview>(services.analyticsEvents);
   services.analyticsEvents = preview;
   const PlatformScope scope(std::move(services));
@@ -76,8 +76,8 @@ void printEvent(const ToolContext& context, const ShownEvent& event) {
 }
 
 int runEvents(const ToolContext& context, const std::string& text) {
-  const bool available = platform().analyticsEvents->isAvailable();
-  const auto events = previewEvents();
+  const bool available = context.platform->analyticsEvents->isAvailable();
+  const auto events = previewEvents(*context.platform);
   std::size_t wanted = 0, shown = 0;
   Json listed = Json::array();
   for (const ShownEvent& event : events) {

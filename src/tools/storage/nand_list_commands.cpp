@@ -160,14 +160,15 @@ struct LogPreview {
   DryRun run;
 };
 
-LogPreview previewStorageLog(std::FILE* notices) {
+LogPreview previewStorageLog(const Platform& platform, std::FILE* notices) {
   LogPreview preview;
   preview.threshold = writeAmplificationThreshold();
   preview.last = lastStorageLog();
-  preview.due = !preview.last || !(platform().clock->secondsSince1970() - *preview.last <
-                                   kSecondsBetweenStorageLogs);
-  const PlatformScope scope(preview.run.platform());
-  platform().preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr, kProgramDomain);
+  preview.due = !preview.last ||
+                !(platform.clock->secondsSince1970() - *preview.last < kSecondsBetweenStorageLogs);
+  Platform variant = preview.run.variantOf(platform);
+  variant.preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr, kProgramDomain);
+  const PlatformScope scope(std::move(variant));
   const std::uint8_t force = std::exchange(gForceCollectionSet, std::uint8_t{1});
   preview.complete = dumpStorageLists(false, notices);
   gForceCollectionSet = force;
@@ -180,7 +181,7 @@ std::string timeText(std::optional<double> seconds) {
 }
 
 int runStorageLog(const ToolContext& context) {
-  const LogPreview preview = previewStorageLog(context.err);
+  const LogPreview preview = previewStorageLog(*context.platform, context.err);
   const auto& logs = preview.run.logs;
   const bool made = !logs.empty();
   if (context.json) {

@@ -65,7 +65,7 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
     if (!isConfirmed(context, waiting)) return complain(context, "nothing was erased", kWrong);
   }
   // The platform of the tool only reads preferences.
-  const Platform writing = makeLinuxPlatform(root, {platform().log, false});
+  const Platform writing = makeLinuxPlatform(root, {context.platform->log, false});
   const RunTurn turn(*writing.runLock);
   if (!turn) return kWrong;  // the lock has said why
   const Status store = eraseStore(root);

@@ -51,7 +51,8 @@ int setScalar(const ToolContext& context, const StoreArguments& arguments) {
   const auto value = parseInt64(arguments.value);
   if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
   if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
-  const std::int32_t day = arguments.day.value_or(platform().metricsStore->TBDaysSince1970());
+  const std::int32_t day =
+      arguments.day.value_or(context.platform->metricsStore->TBDaysSince1970());
   const Status set = writeStore(
       context, [&](StoreWriter& writer) { return writer.setScalar(day, arguments.key, *value); });
   if (!set) return complain(context, set.error().message, kWrong);
@@ -71,7 +72,7 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
     values.push_back(*value);
   }
   if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
-  const double now = platform().clock->secondsSince1970();
+  const double now = context.platform->clock->secondsSince1970();
   const std::int32_t today = dayOfSeconds(now);
   const std::int32_t day = arguments.day.value_or(today);
   const std::uint32_t offset =
@@ -209,10 +210,10 @@ int listKeys(const ToolContext& context, const StoreArguments&) {
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
-// False when the day that was given is none.
-bool resolveDay(StoreArguments& arguments) {
+// False when what was given is not a day.
+bool resolveDay(const ToolContext& context, StoreArguments& arguments) {
   if (arguments.dayForm.empty()) return true;
-  arguments.day = parseDay(arguments.dayForm, platform().metricsStore->TBDaysSince1970());
+  arguments.day = dayOf(context, arguments.dayForm);
   return arguments.day.has_value();
 }
 
@@ -226,10 +227,7 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
     CLI::App* const command = store->add_subcommand(name, description);
     command->callback([&context, arguments, run] {
       context.command = [&context, arguments, run] {
-        if (!resolveDay(*arguments)) {
-          return complain(context, "not a day: " + arguments->dayForm, kBadUsage);
-        }
-        return run(context, *arguments);
+        return resolveDay(context, *arguments) ? run(context, *arguments) : kBadUsage;
       };
     });
     return command;

@@ -102,7 +102,7 @@ std::string taskingLine(const KvObject* id, const KvObject* digest, const KvObje
 int show(const ToolContext& context, const TaskingArguments&) {
   const TaskingInputs inputs = readTaskingInputs();
   const auto digest =
-      platform().preferences->SMAPreferencesGetValue("TaskingDigest", kProgramDomain);
+      context.platform->preferences->SMAPreferencesGetValue("TaskingDigest", kProgramDomain);
   const auto* const schedule = kvCast<KvDictionary>(inputs.schedule.get());
   const auto scheduled = [schedule](const char* key) {
     return schedule != nullptr ? schedule->get(key) : nullptr;
@@ -147,16 +147,17 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
     return complain(context, fmt::format("{}: no \"TaskingID\"", arguments.file), kWrong);
   }
   // The platform of the tool only reads preferences; this command is one of the few that write.
-  Platform variant = platform();
+  Platform variant = *context.platform;
   if (!arguments.dryRun) {
     Platform writing = makeLinuxPlatform(context.root, {variant.log, false});
     variant.preferences = writing.preferences;
     variant.systemConfiguration = writing.systemConfiguration;
     variant.servicesClient = writing.servicesClient;
   }
+  RunLock& runLock = *variant.runLock;
   const PlatformScope scope(std::move(variant));
   std::unique_ptr<RunTurn> turn;
-  if (!arguments.dryRun) turn = std::make_unique<RunTurn>(*platform().runLock);
+  if (!arguments.dryRun) turn = std::make_unique<RunTurn>(runLock);
   if (turn && !*turn) return kWrong;  // the lock has said so
   TaskingInputs inputs = readTaskingInputs();
   inputs.schedule = *std::move(schedule);

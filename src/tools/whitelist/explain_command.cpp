@@ -209,8 +209,8 @@ Json storyJson(const KeyStory& story) {
 }
 
 int explain(const ToolContext& context, const ExplainArguments& arguments) {
-  const auto day = parseDay(arguments.day, platform().metricsStore->TBDaysSince1970());
-  if (!day) return complain(context, "not a day: " + arguments.day, kBadUsage);
+  const auto day = dayOf(context, arguments.day);
+  if (!day) return kBadUsage;
   const KeyStory story = tellStory(context, arguments.key, *day);
   bool present = false;
   for (const KeyKind kind : story.kinds()) present = present || story.whyAbsent(kind).empty();

@@ -18,8 +18,8 @@ namespace {
 constexpr std::int32_t kBeforeAllDays = std::numeric_limits<std::int32_t>::min();
 constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
 
-void readRows(KeyStory& story) {
-  const auto history = platform().metricsStore->openHistory();
+void readRows(Platform& platform, KeyStory& story) {
+  const auto history = platform.metricsStore->openHistory();
   history->enumerateScalars(story.key, kBeforeAllDays, kLastDay,
                             [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
                               if (key == story.key) story.scalarRows.push_back({day, value});
@@ -107,14 +107,14 @@ KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_
   story.measured = isMeasuredByReport(key);
   story.scalar = story.judge.judge(key, KeyKind::Scalar);
   story.distribution = story.judge.judge(key, KeyKind::Distribution);
-  readRows(story);
+  readRows(*context.platform, story);
   if (!story.measured && story.scalarRows.empty() && story.distributionRows.empty()) {
     story.similar = similarKeys(context, story);
   }
   story.trace.key = key;
-  story.next = previewLog(day, &story.trace).document;
+  story.next = previewLog(*context.platform, day, &story.trace).document;
   story.submitted = SubmittedLogs(context).newest(day);
-  story.submissionAllowed = platform().crashReporting->isDiagnosticSubmissionEnabled();
+  story.submissionAllowed = context.platform->crashReporting->isDiagnosticSubmissionEnabled();
   return story;
 }
 

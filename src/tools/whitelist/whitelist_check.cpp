@@ -28,6 +28,7 @@ bool doSomething(const KvDictionary& options) {
 
 class Checker final : public WhitelistVisitor {
  public:
+  explicit Checker(Platform& platform) : platform_(platform) {}
   std::vector<Finding> findings;
 
   bool beginGroup(std::string_view name) override {
@@ -41,7 +42,7 @@ class Checker final : public WhitelistVisitor {
       add(Severity::Surprise, {name, {}, {}, {}},
           fmt::format("does not count here: it {}", whyNotInForce(state)));
     }
-    const auto value = platform().preferences->SMAPreferencesGetValue(name, kGroupSwitchDomain);
+    const auto value = platform_.preferences->SMAPreferencesGetValue(name, kGroupSwitchDomain);
     if (value && value->type() != KvType::Boolean && value->type() != KvType::Number) {
       add(Severity::Surprise, {name, {}, {}, {}},
           fmt::format("its switch in the preferences {} is no boolean and does nothing",
@@ -253,6 +254,7 @@ class Checker final : public WhitelistVisitor {
     return nullptr;
   }
 
+  Platform& platform_;
   std::optional<std::string> group_;
   std::size_t entriesOfGroup_ = 0;
   bool malformedOfGroup_ = false;
@@ -263,8 +265,8 @@ class Checker final : public WhitelistVisitor {
 
 }  // namespace
 
-std::vector<Finding> checkWhitelist(const KvDictionary& root) {
-  Checker checker;
+std::vector<Finding> checkWhitelist(Platform& platform, const KvDictionary& root) {
+  Checker checker(platform);
   visitWhitelist(root, checker);
   checker.finish();
   return std::move(checker.findings);

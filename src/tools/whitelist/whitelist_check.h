@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "config/whitelist_file.h"
+#include "platform/platform.h"
 
 namespace tally::tools {
 
@@ -19,7 +20,7 @@ struct Finding {
 };
 
 // In the file's order; faults and surprises mixed.
-std::vector<Finding> checkWhitelist(const KvDictionary& root);
+std::vector<Finding> checkWhitelist(Platform& platform, const KvDictionary& root);
 
 // "Radio, ScalarKeys, vellum.radio.calls, sig_fig".
 std::string placeText(const Finding& finding);

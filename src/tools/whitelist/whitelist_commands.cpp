@@ -106,7 +106,7 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
   const WhitelistFile file = load(arguments);
   std::vector<Finding> findings;
   if (file.root) {
-    findings = checkWhitelist(*file.root);
+    findings = checkWhitelist(*context.platform, *file.root);
   } else {
     findings.push_back({Severity::Fault, "", "", "", "",
                         "the file cannot be used, so nothing is reported: " + file.fault});

@@ -1,0 +1,22 @@
+// What `tallyctl doctor` finds out about one part of the device.
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace tally::tools {
+
+enum class Health {
+  Ok,
+  Missing,  // not there; the program does without
+  Wrong,    // there, and not as it should be
+};
+
+struct HealthCheck {
+  Health health;
+  std::string subject, text;
+  std::string repair = {};  // a command line for a shell; empty: none is known
+};
+using HealthChecks = std::vector<HealthCheck>;
+
+}  // namespace tally::tools
