@@ -8,7 +8,8 @@ using fuzz::require;
 
 namespace {
 
-constexpr std::uint32_t kStart = 0, kConfigure = 2, kUpdate = 3;
+constexpr std::uint32_t kStart = kHubOpen, kConfigure = kHubConfigureInterests,
+                        kUpdate = kHubUpdate;
 constexpr std::size_t kElement = 64;
 
 std::shared_ptr<const RegistrySource::Entries> takeDrivers(fuzz::Input& input) {

@@ -3,7 +3,7 @@
 
 #include "fakes/fake_storage.h"
 #include "fuzz.h"
-#include "storage/auxiliary_metrics.h"
+#include "storage/kcdata.h"
 
 using namespace tally;
 using fuzz::require;

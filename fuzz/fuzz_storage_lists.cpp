@@ -1,5 +1,6 @@
 // The validity list and the defects list: the same bytes as either.
-#include "storage/lists/storage_lists.h"
+#include "storage/lists/defects_list.h"
+#include "storage/lists/validity_list.h"
 
 #include "fuzz.h"
 

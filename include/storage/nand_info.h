@@ -65,7 +65,7 @@ TALLY_API extern double gCurrentUserWamp;
 TALLY_API extern double gCurrentSysWamp;
 
 // A fresh fetch, with the purgeable space added. Never null; a failure is in the dictionary: the
-// pair above, or the pair of the purgeable space (auxiliary_metrics.h), which leaves the rest.
+// pair above, or the pair of the purgeable space (reclaim.h), which leaves the rest.
 TALLY_API KvRef<KvDictionary> CopyNANDInfo();
 
 // On every other day of a boot session the figures belong to the analytics service: with this bit

@@ -139,7 +139,7 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
       hub.configure(interestList(5, {{5, 2, kState}, {5, 3, 1}, {5, 1, 0}, {5, 9, 1}, {6, 1, 1}})),
       0u);
   ASSERT_EQ(hub.map(), 0u);
-  ASSERT_EQ(hub.length, 3 * kElementSize);
+  ASSERT_EQ(hub.length, 3 * element::kSize);
   const struct {
     const char* name;
     std::uint64_t counter;
@@ -151,17 +151,17 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   for (const auto& refresh : refreshes) {
     SCOPED_TRACE(refresh.name);
     ASSERT_EQ(hub.update(), 0u);
-    EXPECT_EQ(hub.word(2 * kElementSize + ElementLayout::values), refresh.counter);
+    EXPECT_EQ(hub.word(2 * element::kSize + element::kSlots), refresh.counter);
   }
-  EXPECT_EQ(hub.word(ElementLayout::driver), 5u);
-  EXPECT_EQ(hub.word(ElementLayout::channel), 2u);
-  EXPECT_EQ(hub.word(ElementLayout::type), kState | std::uint64_t{2} << 32);
-  EXPECT_EQ(hub.word(ElementLayout::time), 8u);
-  EXPECT_EQ(hub.word(ElementLayout::values), 0x49444C45u);
-  EXPECT_EQ(hub.word(ElementLayout::values + 16), 99u);
-  EXPECT_EQ(hub.word(kElementSize + ElementLayout::values + 16), kMissingValue);
+  EXPECT_EQ(hub.word(element::kDriverID), 5u);
+  EXPECT_EQ(hub.word(element::kChannelID), 2u);
+  EXPECT_EQ(hub.word(element::kTypeWord), kState | std::uint64_t{2} << 32);
+  EXPECT_EQ(hub.word(element::kUpdateTime), 8u);
+  EXPECT_EQ(hub.word(element::kSlots), 0x49444C45u);
+  EXPECT_EQ(hub.word(element::kSlots + 16), 99u);
+  EXPECT_EQ(hub.word(element::kSize + element::kSlots + 16), element::kMissingValue);
   // The type that nobody stated is the legend's.
-  EXPECT_EQ(hub.word(2 * kElementSize + ElementLayout::type), 1 | std::uint64_t{1} << 32);
+  EXPECT_EQ(hub.word(2 * element::kSize + element::kTypeWord), 1 | std::uint64_t{1} << 32);
   EXPECT_EQ(hub.device.registry().ConnectionUnmapMemory(
                 hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),
             0u);
@@ -176,10 +176,10 @@ TEST(StatisticsHub, HasARunOfNobodysWhenNothingIsServed) {
   ASSERT_EQ(hub.configure(interestList(2, {{5, 9, 1}, {6, 1, 1}})), 0u);
   ASSERT_EQ(hub.map(), 0u);
   ASSERT_EQ(hub.update(), 0u);
-  EXPECT_EQ(hub.length, kElementSize);
-  EXPECT_EQ(hub.word(ElementLayout::driver), kMissingValue);
-  EXPECT_EQ(hub.word(ElementLayout::channel), kMissingValue);
-  EXPECT_EQ(hub.word(ElementLayout::type), std::uint64_t{1} << 32) << "not a run of no elements";
+  EXPECT_EQ(hub.length, element::kSize);
+  EXPECT_EQ(hub.word(element::kDriverID), element::kMissingValue);
+  EXPECT_EQ(hub.word(element::kChannelID), element::kMissingValue);
+  EXPECT_EQ(hub.word(element::kTypeWord), std::uint64_t{1} << 32) << "not a run of no elements";
 }
 
 TEST(StatisticsHub, ServesRawRegionsVerbatim) {

@@ -8,7 +8,9 @@
 #include <limits>
 
 #include "fakes/fake_storage.h"
+#include "storage/lists/defects_list.h"
 #include "storage/lists/storage_lists.h"
+#include "storage/lists/validity_list.h"
 #include "storage/lists/write_amplification.h"
 
 namespace tally {

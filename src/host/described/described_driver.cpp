@@ -4,19 +4,13 @@
 #include <cstring>
 #include <limits>
 
-#include "base/byte_reader.h"
 #include "host/described/injected_result.h"
+#include "platform/fetch_request.h"
 
 namespace tally {
 namespace {
 
-// The request that a driver's data calls take.
-constexpr std::size_t kRequestSize = 24;
-constexpr std::size_t kSelectorOffset = 0;
-constexpr std::size_t kFlagsOffset = 4;
-constexpr std::uint32_t kSizeQueryFlag = 1;
-
-// Who asks for what: a call without a request has no selector.
+// What a call asks for. Without a fetch request it has no selector.
 struct Request {
   std::uint32_t method = 0;
   std::optional<std::uint32_t> selector;
@@ -38,12 +32,11 @@ class DescribedDriver final : public UserClient {
   RegistryResult call(std::uint32_t method, MethodCall& call) override {
     Request request{method, std::nullopt, 0, false};
     if (!call.structInput.empty()) {
-      const ByteReader reader(call.structInput);
-      if (reader.size() != kRequestSize) return kRegistryBadArgument;
-      const std::uint32_t flags = *reader.read<std::uint32_t>(kFlagsOffset);
-      request.selector = reader.read<std::uint32_t>(kSelectorOffset);
-      request.flags = flags & ~kSizeQueryFlag;
-      request.isSizeQuery = (flags & kSizeQueryFlag) != 0;
+      const auto fetch = decodeFetchRequest(call.structInput);
+      if (!fetch) return kRegistryBadArgument;
+      request.selector = fetch->selector;
+      request.flags = fetch->flags & ~FetchRequest::kSizeQueryFlag;
+      request.isSizeQuery = (fetch->flags & FetchRequest::kSizeQueryFlag) != 0;
     }
     const KvDictionary* answer = findAnswer(request);
     if (answer == nullptr) return kRegistryUnsupported;

@@ -13,8 +13,13 @@ constexpr std::size_t kMostElements = std::numeric_limits<std::uint16_t>::max();
 constexpr struct {
   std::string_view key;
   std::size_t slot;
-} kSlotNames[] = {{"ID", 0},      {"InTransitions", 1}, {"Residency", 2}, {"Hits", 0},
-                  {"Minimum", 1}, {"Maximum", 2},       {"Sum", 3}};
+} kSlotNames[] = {{"ID", state_slot::kID},
+                  {"InTransitions", state_slot::kInTransitions},
+                  {"Residency", state_slot::kResidency},
+                  {"Hits", bucket_slot::kHits},
+                  {"Minimum", bucket_slot::kMinimum},
+                  {"Maximum", bucket_slot::kMaximum},
+                  {"Sum", bucket_slot::kSum}};
 
 // A slot holds signed values too; a real gives its whole part, as in a legend.
 std::uint64_t slotOf(const KvNumber& number) {
@@ -50,8 +55,9 @@ std::optional<std::vector<ElementValues>> parseElements(const KvArray& items) {
   std::size_t numbers = 0;
   for (const auto& item : items) {
     if (const auto* number = kvCast<KvNumber>(item.get())) {
-      if (numbers % 4 == 0) elements.emplace_back();
-      elements.back().slots[numbers++ % 4] = slotOf(*number);
+      const std::size_t slot = numbers++ % element::kSlotCount;
+      if (slot == 0) elements.emplace_back();
+      elements.back().slots[slot] = slotOf(*number);
     } else if (const auto* dictionary = kvCast<KvDictionary>(item.get())) {
       const auto element = parseElement(*dictionary);
       if (!element) return std::nullopt;
@@ -66,9 +72,9 @@ std::optional<std::vector<ElementValues>> parseElements(const KvArray& items) {
 
 std::optional<std::vector<ElementValues>> parseFrame(const KvObject& frame) {
   if (const auto* number = kvCast<KvNumber>(&frame)) {
-    ElementValues element;
-    element.slots[0] = slotOf(*number);
-    return std::vector{element};
+    ElementValues simple;
+    simple.slots[simple_slot::kValue] = slotOf(*number);
+    return std::vector{simple};
   }
   const auto* items = kvCast<KvArray>(&frame);
   return items != nullptr ? parseElements(*items) : std::nullopt;

@@ -6,19 +6,15 @@
 #include <vector>
 
 #include "kv/value.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
 
-// A raw element: who it belongs to, when it was updated, and four values.
-constexpr std::size_t kElementSize = 64;
-struct ElementLayout {
-  static constexpr std::size_t driver = 0, channel = 8, type = 16, time = 24, values = 32;
-};
-constexpr std::uint64_t kMissingValue = 0x8000000000000000;
-
+// When an element was updated, and its values.
 struct ElementValues {
   std::uint64_t time = 0;
-  std::uint64_t slots[4] = {kMissingValue, kMissingValue, kMissingValue, kMissingValue};
+  std::uint64_t slots[element::kSlotCount] = {element::kMissingValue, element::kMissingValue,
+                                              element::kMissingValue, element::kMissingValue};
 };
 
 // The elements of one channel, one frame for each refresh. What a shorter frame lacks are missing

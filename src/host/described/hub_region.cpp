@@ -10,16 +10,10 @@
 namespace tally {
 namespace {
 
-// An interest list: a count, a reserved word, then an entry a channel.
-constexpr std::size_t kInterestHeaderSize = 8;
-constexpr std::size_t kInterestSize = 24;
-constexpr std::uint32_t kMostInterests = 0x555554D;
-
-// Whoever asks for the same large channel again and again gets no more memory than this.
-constexpr std::size_t kMostRegionElements = (256u << 20) / kElementSize;
+// A client that asks for the same large channel again and again gets no more memory than this.
+constexpr std::size_t kMostRegionElements = (256u << 20) / element::kSize;
 
 constexpr ElementValues kMissingElement;
-constexpr std::uint64_t kElementCountMask = std::uint64_t{0xFFFF} << 32;
 
 template <class T>
 void put(std::span<std::byte> memory, std::size_t offset, T value) {
@@ -36,31 +30,31 @@ class ChannelRegion final : public HubRegion {
   explicit ChannelRegion(std::vector<Channel> channels) : channels_(std::move(channels)) {
     for (const Channel& channel : channels_) elements_ += channel.described->elementCount;
   }
-  std::size_t size() const override { return elements_ * kElementSize; }
+  std::size_t size() const override { return elements_ * element::kSize; }
 
   void writeFrame(std::size_t refresh, std::span<std::byte> memory) override {
     for (const Channel& channel : channels_) {
       const auto& frames = channel.described->frames;
       const auto& frame = frames[std::min(refresh, frames.size() - 1)];
       for (std::size_t i = 0; i < channel.described->elementCount; ++i) {
-        const ElementValues& element = i < frame.size() ? frame[i] : kMissingElement;
-        writeElement(channel, element, memory.first(kElementSize));
-        memory = memory.subspan(kElementSize);
+        const ElementValues& values = i < frame.size() ? frame[i] : kMissingElement;
+        writeElement(channel, values, memory.first(element::kSize));
+        memory = memory.subspan(element::kSize);
       }
     }
   }
 
  private:
-  static void writeElement(const Channel& channel, const ElementValues& element,
+  static void writeElement(const Channel& channel, const ElementValues& values,
                            std::span<std::byte> memory) {
-    const std::uint64_t type =
-        channel.interest.type != 0 ? channel.interest.type : channel.described->type;
-    const std::uint64_t count = channel.described->elementCount;
-    put(memory, ElementLayout::driver, channel.interest.driver);
-    put(memory, ElementLayout::channel, channel.interest.channel);
-    put(memory, ElementLayout::type, (type & ~kElementCountMask) | count << 32);
-    put(memory, ElementLayout::time, element.time);
-    std::memcpy(memory.data() + ElementLayout::values, element.slots, sizeof element.slots);
+    const TypeWord type{channel.interest.type != 0 ? channel.interest.type
+                                                   : channel.described->type};
+    const auto count = static_cast<std::uint16_t>(channel.described->elementCount);
+    put(memory, element::kDriverID, channel.interest.driver);
+    put(memory, element::kChannelID, channel.interest.channel);
+    put(memory, element::kTypeWord, type.withElementCount(count).bits);
+    put(memory, element::kUpdateTime, values.time);
+    std::memcpy(memory.data() + element::kSlots, values.slots, sizeof values.slots);
   }
 
   std::vector<Channel> channels_;
@@ -88,28 +82,29 @@ using ChannelsByID = std::unordered_map<std::uint64_t, std::shared_ptr<const Cha
 // The type word that a driver's legend gives a channel, by channel id.
 std::unordered_map<std::uint64_t, std::uint64_t> legendTypes(const RegistryEntry& driver) {
   std::unordered_map<std::uint64_t, std::uint64_t> types;
-  const auto* groups = driver.properties->getAs<KvArray>("HwReportLegend");
+  const auto* groups = driver.properties->getAs<KvArray>(kLegendProperty);
   if (groups == nullptr) return types;
   for (const auto& group : *groups) {
     const auto* dictionary = kvCast<KvDictionary>(group.get());
     const auto* channels =
-        dictionary != nullptr ? dictionary->getAs<KvArray>("HwReportChannels") : nullptr;
+        dictionary != nullptr ? dictionary->getAs<KvArray>(kLegendChannelsKey) : nullptr;
     if (channels == nullptr) continue;
     for (const auto& item : *channels) {
       const auto* line = kvCast<KvArray>(item.get());
-      const auto* id = line != nullptr ? line->getAs<KvNumber>(0) : nullptr;
-      const auto* type = line != nullptr ? line->getAs<KvNumber>(1) : nullptr;
+      const auto* id = line != nullptr ? line->getAs<KvNumber>(kLegendChannelID) : nullptr;
+      const auto* type = line != nullptr ? line->getAs<KvNumber>(kLegendTypeWord) : nullptr;
       if (id != nullptr && type != nullptr) types.try_emplace(id->asUInt64(), type->asUInt64());
     }
   }
   return types;
 }
 
-// Stands for no channel: a region cannot be empty, and a run of no elements in it would fail the
-// samples of those who only wanted a channel that is not served.
-Channel nobodysChannel() {
+// A channel that no client has. A region cannot be empty, and with a run of no elements in it, the
+// samples of clients that only want a channel that is not served would fail.
+Channel placeholderChannel() {
   ChannelFrames frames{0, {{kMissingElement}}, 1};
-  return {{kMissingValue, kMissingValue, 0}, std::make_shared<ChannelFrames>(std::move(frames))};
+  return {{element::kMissingValue, element::kMissingValue, 0},
+          std::make_shared<ChannelFrames>(std::move(frames))};
 }
 
 ChannelsByID describedChannels(const RegistryEntry& driver, DescribedFiles& files) {
@@ -171,7 +166,7 @@ std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& intere
     if (elements > kMostRegionElements) return nullptr;
     channels.push_back({interest, frames->second});
   }
-  if (channels.empty()) channels.push_back(nobodysChannel());
+  if (channels.empty()) channels.push_back(placeholderChannel());
   return std::make_unique<ChannelRegion>(std::move(channels));
 }
 

@@ -1,4 +1,4 @@
-// Where registry entries come from. Several sources can stand side by side.
+// Where registry entries come from. There can be several sources.
 #pragma once
 
 #include <cstddef>
@@ -10,16 +10,9 @@
 
 #include "kv/value.h"
 #include "platform/device_registry.h"
+#include "platform/registry_results.h"
 
 namespace tally {
-
-// What an operation on a driver can come to; the same values that callers know by their own names.
-constexpr RegistryResult kRegistrySuccess = 0;
-constexpr RegistryResult kRegistryBadArgument = 0xE00002C2;
-constexpr RegistryResult kRegistryNotOpen = 0xE00002CD;
-constexpr RegistryResult kRegistryUnsupported = 0xE00002C7;
-constexpr RegistryResult kRegistryNoMemory = 0xE00002BD;
-constexpr RegistryResult kRegistryNotFound = 0xE00002F0;
 
 struct RegistryEntry {
   std::string className;

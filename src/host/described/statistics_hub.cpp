@@ -9,13 +9,12 @@
 #include "host/described/hub_region.h"
 #include "host/described/injected_result.h"
 #include "host/described/shared_memory.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
 namespace {
 
-enum HubSelector : std::uint32_t { kStart = 0, kConfigureInterests = 2, kUpdateSamples = 3 };
-
-// Only one subscription lives on a connection; its memory type is the token.
+// A connection has one subscription only, whose memory type is the token.
 constexpr std::uint64_t kToken = 0x5442;
 
 class StatisticsHubClient final : public UserClient {
@@ -32,11 +31,11 @@ class StatisticsHubClient final : public UserClient {
 
   RegistryResult call(std::uint32_t selector, MethodCall& call) override {
     switch (selector) {
-      case kStart:
+      case kHubOpen:
         return start();
-      case kConfigureInterests:
+      case kHubConfigureInterests:
         return configure(call);
-      case kUpdateSamples:
+      case kHubUpdate:
         return update(call);
       default:
         return kRegistryUnsupported;

@@ -8,8 +8,6 @@
 
 namespace tally {
 
-constexpr std::string_view kStatisticsHubClass = "HwReportHub";
-
 // description is the hub entry's "Hub", null when it has none: failures to inject ("OpenStatus",
 // "StartStatus", "ConfigureStatus", "MapStatus", "UpdateStatus") and "RawFrames", regions served
 // verbatim. Otherwise the drivers among the entries give the values, in "HwReportValues".

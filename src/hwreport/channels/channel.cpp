@@ -1,8 +1,8 @@
 // What a channel's dictionary says about it.
 #include "hwreport/channel.h"
 
-#include "hwreport/channels/id_name.h"
 #include "hwreport/channels/keys.h"
+#include "hwreport/channels/naming.h"
 #include "hwreport/channels/type_word.h"
 
 namespace tally {

@@ -5,6 +5,7 @@
 #include "hwreport/channel.h"
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/type_word.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
 
@@ -25,7 +26,7 @@ std::int32_t InterestList::fill(KvDictionary* desired) {
     return HwIterContinue;
   });
   if (walkFailed(result)) return -1;
-  complete_ = complete_ && static_cast<std::size_t>(count) <= kMaximumInterests;
+  complete_ = complete_ && static_cast<std::size_t>(count) <= kMostInterests;
   words_[0] = static_cast<std::uint32_t>(count);
   return count;
 }

@@ -11,9 +11,6 @@
 
 namespace tally {
 
-// The hub's limit, which keeps the list's size within its 32 bits.
-constexpr std::size_t kMaximumInterests = 0x555554D;
-
 // Filled in one walk over the desired channels.
 class InterestList {
  public:

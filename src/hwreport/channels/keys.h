@@ -2,9 +2,8 @@
 // costs no memory for its keys and a look-up compares pointers.
 #pragma once
 
-#include <string_view>
-
 #include "kv/value.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
 
@@ -26,7 +25,7 @@ struct ChannelKeys {
   KvRef<KvString> channelConfig = KvString::create("HwReportChannelConfig");
   // A collection.
   KvRef<KvString> queryOptions = KvString::create("QueryOpts");
-  KvRef<KvString> channels = KvString::create("HwReportChannels");
+  KvRef<KvString> channels = KvString::create(kLegendChannelsKey);
   KvRef<KvString> drivers = KvString::create("HwReportDrivers");
   KvRef<KvString> channelGroups = KvString::create("HwReportChannelGroups");
 };
@@ -36,14 +35,5 @@ inline const ChannelKeys& keys() {
   static const ChannelKeys* const all = new ChannelKeys();
   return *all;
 }
-
-// What a legend channel array holds, by index.
-constexpr std::size_t kLegendChannelID = 0;
-constexpr std::size_t kLegendTypeWord = 1;
-constexpr std::size_t kLegendChannelName = 2;
-
-// A driver's own properties; the names that a legend group shares with a channel are above.
-constexpr std::string_view kLegendPublicProperty = "HwReportLegendPublic";
-constexpr std::string_view kLegendProperty = "HwReportLegend";
 
 }  // namespace tally

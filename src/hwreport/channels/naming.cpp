@@ -1,11 +1,12 @@
 // Names of drivers, of this process, and those that are packed into ids.
+#include "hwreport/channels/naming.h"
+
 #include <string>
 
 #include <fmt/format.h>
 
 #include "base/process.h"
 #include "hwreport/channels.h"
-#include "hwreport/channels/id_name.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/printf_hex.h"
 #include "platform/platform.h"

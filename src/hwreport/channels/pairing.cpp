@@ -1,8 +1,7 @@
 #include "hwreport/channels/pairing.h"
 
-#include <bit>
+#include <algorithm>
 
-#include "base/hash.h"
 #include "hwreport/channel.h"
 
 namespace tally {
@@ -24,10 +23,10 @@ std::optional<KvDictionary*> EarlierChannels::search(const Key& key, std::size_t
   if (!indexed_) buildIndex();
   while (!unreadable_.empty() && unreadable_.back() < from) unreadable_.pop_back();
   std::size_t found = channels_.size();
-  if (const std::uint32_t representative = slotOf(key); representative != 0) {
-    std::uint32_t& ahead = ahead_[representative - 1];
-    while (ahead != 0 && ahead - 1 < from) ahead = next_[ahead - 1];
-    if (ahead != 0) found = ahead - 1;
+  if (const std::uint32_t first = firstOf(key); first != HashIndex::kNone) {
+    std::uint32_t& ahead = ahead_[first];
+    while (ahead != HashIndex::kNone && ahead < from) ahead = next_[ahead];
+    if (ahead != HashIndex::kNone) found = ahead;
   }
   if (!unreadable_.empty() && unreadable_.back() < found) return std::nullopt;
   if (found == channels_.size()) return nullptr;
@@ -39,10 +38,11 @@ void EarlierChannels::buildIndex() {
   indexed_ = true;
   const std::size_t count = channels_.size();
   keys_.resize(count);
-  next_.resize(count);
+  next_.assign(count, HashIndex::kNone);
   ahead_.resize(count);
-  slots_.resize(std::bit_ceil(count * 2));
-  for (std::size_t i = count; i-- > 0;) {
+  firsts_.reserve(count);
+  std::vector<std::uint32_t> lasts(count);  // by first position
+  for (std::uint32_t i = 0; i < count; ++i) {
     const auto* const channel = channels_.getAs<KvDictionary>(i);
     const auto type = typeWordOf(channel);
     if (!type) {
@@ -50,18 +50,25 @@ void EarlierChannels::buildIndex() {
       continue;
     }
     keys_[i] = {HwReportChannelGetChannelID(channel), type->bits};
-    std::uint32_t& slot = slotOf(keys_[i]);
-    next_[i] = slot;
-    ahead_[i] = slot = static_cast<std::uint32_t>(i + 1);
+    const std::uint32_t first = firstOf(keys_[i]);
+    if (first == HashIndex::kNone) {
+      firsts_.add(hashOf(keys_[i]), i);
+      ahead_[i] = lasts[i] = i;
+    } else {
+      next_[lasts[first]] = i;
+      lasts[first] = i;
+    }
   }
+  std::ranges::reverse(unreadable_);
 }
 
-std::uint32_t& EarlierChannels::slotOf(const Key& key) {
+std::uint32_t EarlierChannels::firstOf(const Key& key) const {
+  return firsts_.find(hashOf(key), [&](std::uint32_t position) { return keys_[position] == key; });
+}
+
+std::uint32_t EarlierChannels::hashOf(const Key& key) {
   const std::uint64_t words[] = {key.channelID, key.typeBits};
-  const std::size_t mask = slots_.size() - 1;
-  std::size_t slot = hashWords(words) & mask;
-  while (slots_[slot] != 0 && keys_[slots_[slot] - 1] != key) slot = (slot + 1) & mask;
-  return slots_[slot];
+  return hashWords(words);
 }
 
 }  // namespace tally

@@ -5,6 +5,7 @@
 #include <optional>
 #include <vector>
 
+#include "base/hash.h"
 #include "hwreport/channels/type_word.h"
 #include "kv/value.h"
 
@@ -30,17 +31,18 @@ class EarlierChannels {
   };
   std::optional<KvDictionary*> search(const Key& key, std::size_t from);
   void buildIndex();
-  std::uint32_t& slotOf(const Key& key);
+  static std::uint32_t hashOf(const Key& key);
+  // The first channel with a key, by position; HashIndex::kNone when there is none.
+  std::uint32_t firstOf(const Key& key) const;
 
   const KvArray& channels_;
   std::optional<std::size_t> cursor_;
-  // The index, made at the first search; searches never start further back than the one before.
-  // Positions are held plus 1, so that 0 is none.
+  // The index, made at the first search. No search starts before the previous one.
   bool indexed_ = false;
+  HashIndex firsts_;                     // the first position of each key
   std::vector<Key> keys_;                // by position
   std::vector<std::uint32_t> next_;      // by position: the next one with the same key
-  std::vector<std::uint32_t> slots_;     // by hash: the first position with a key
-  std::vector<std::uint32_t> ahead_;     // by that position: the first one not yet passed
+  std::vector<std::uint32_t> ahead_;     // by first position: the first one not yet passed
   std::vector<std::size_t> unreadable_;  // descending
 };
 

@@ -1,4 +1,4 @@
-// Raw elements: 64 bytes each, a run of them for each channel. The one place that knows the layout.
+// Reads the raw elements of a channel.
 #pragma once
 
 #include <cstdint>
@@ -9,31 +9,11 @@
 #include "hwreport/channel.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/type_word.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
 
-// Offsets in an element. The first three are read from a run's first element.
-namespace element {
-constexpr std::size_t kSize = 64;
-constexpr std::size_t kDriverID = 0;
-constexpr std::size_t kChannelID = 8;
-constexpr std::size_t kTypeWord = 16;  // its element count is the run's
-constexpr std::size_t kUpdateTime = 24;
-constexpr std::size_t kSlots = 32;
-constexpr std::size_t kSlotCount = 4;
-constexpr std::size_t slot(std::size_t number) { return kSlots + number * 8; }
-}  // namespace element
-
-// What the value slots hold, by format.
-namespace simple_slot {
-constexpr std::size_t kValue = 0;
-}
-namespace state_slot {
-constexpr std::size_t kID = 0, kInTransitions = 1, kResidency = 2;
-}
-namespace bucket_slot {
-constexpr std::size_t kHits = 0, kMinimum = 1, kMaximum = 2, kSum = 3;
-}
+static_assert(element::kMissingValue == kHwReportInvalidValue);
 
 // The elements of one channel. Borrowed from its data.
 class ElementRun {

@@ -1,4 +1,4 @@
-// The type word of a channel, and reading 64-bit numbers of a channel.
+// Reads the type word and other 64-bit numbers of a channel.
 #pragma once
 
 #include <cstdint>
@@ -6,15 +6,9 @@
 
 #include "hwreport/channel.h"
 #include "hwreport/channels/keys.h"
+#include "platform/hub_protocol.h"
 
 namespace tally {
-
-struct TypeWord {
-  std::uint64_t bits = 0;
-  std::uint8_t format() const noexcept { return static_cast<std::uint8_t>(bits); }
-  std::uint16_t categories() const noexcept { return static_cast<std::uint16_t>(bits >> 16); }
-  std::uint16_t elementCount() const noexcept { return static_cast<std::uint16_t>(bits >> 32); }
-};
 
 // A value as 64 bits; the invalid marker when it is absent or not a number.
 inline std::uint64_t bitsOf(const KvObject* value) noexcept {

@@ -3,14 +3,13 @@
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/interest_list.h"
+#include "platform/hub_protocol.h"
 #include "platform/platform.h"
 
 namespace tally {
 namespace {
 
-constexpr std::string_view kHubClass = "HwReportHub";
 constexpr std::uint32_t kHubConnectionType = 0;
-enum HubSelector : std::uint32_t { kHubOpen = 0, kHubConfigureInterests = 2, kHubUpdate = 3 };
 
 }  // namespace
 
@@ -30,7 +29,8 @@ HwResult Subscription::connect(std::span<const std::byte> interests, KvRef<HwRep
 }
 
 HwResult Subscription::openHub(KvRef<HwReportError>* error) {
-  const RegistryHandle hub = registry_->RegistryFindService(ServiceMatchingByClass(kHubClass));
+  const RegistryHandle hub =
+      registry_->RegistryFindService(ServiceMatchingByClass(kStatisticsHubClass));
   if (hub == 0) return reportError(error, HwErrNotFound);
   ConnectionHandle connection = 0;
   const RegistryResult opened =

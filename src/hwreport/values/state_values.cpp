@@ -2,7 +2,7 @@
 
 #include <limits>
 
-#include "hwreport/channels/id_name.h"
+#include "hwreport/channels/naming.h"
 #include "hwreport/channels/raw_element.h"
 #include "hwreport/values.h"
 

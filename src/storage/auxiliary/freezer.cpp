@@ -1,7 +1,9 @@
 // What the memory freezer wrote, out of a stackshot.
+#include "storage/freezer.h"
+
 #include "base/byte_reader.h"
 #include "platform/platform.h"
-#include "storage/auxiliary_metrics.h"
+#include "storage/kcdata.h"
 #include "storage/nand_info/nand_info_failure.h"
 
 namespace tally {

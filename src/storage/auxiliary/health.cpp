@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <span>
 
-#include "storage/auxiliary_metrics.h"
+#include "storage/health.h"
 #include "storage/nand_info.h"
 
 namespace tally {

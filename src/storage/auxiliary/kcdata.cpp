@@ -1,12 +1,13 @@
 // The search for one thread's I/O statistics in kcdata: items in a row, some of which open and
 // close containers. One pass, whatever the nesting; the open containers are kept on a small stack.
+#include "storage/kcdata.h"
+
 #include <algorithm>
 #include <array>
 #include <optional>
 #include <string_view>
 
 #include "base/byte_reader.h"
-#include "storage/auxiliary_metrics.h"
 
 namespace tally {
 namespace {

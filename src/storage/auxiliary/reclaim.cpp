@@ -1,6 +1,7 @@
 // What the purgeable-space service knows of the user's volume.
+#include "storage/reclaim.h"
+
 #include "platform/platform.h"
-#include "storage/auxiliary_metrics.h"
 #include "storage/nand_info/nand_info_failure.h"
 
 namespace tally {

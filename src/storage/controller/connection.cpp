@@ -1,9 +1,10 @@
 // Connections to the storage driver: for the length of one query, and to keep open.
+#include "storage/controller/connection.h"
+
 #include <algorithm>
 #include <cstdio>
 
 #include "platform/platform.h"
-#include "storage/controller/driver_query.h"
 #include "storage/exporter.h"
 
 namespace tally {

@@ -2,8 +2,8 @@
 #include "storage/analytics_events.h"
 
 #include "platform/platform.h"
-#include "storage/auxiliary_metrics.h"
 #include "storage/events/event_payload.h"
+#include "storage/freezer.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info/nand_info_failure.h"
 

@@ -1,8 +1,8 @@
-// The defects list: how many defects the factory found, and each one found since.
+#include "storage/lists/defects_list.h"
+
 #include <cstdio>
 
 #include "base/byte_reader.h"
-#include "storage/lists/storage_lists.h"
 
 namespace tally {
 namespace {

@@ -3,9 +3,9 @@
 #include <cstdio>
 #include <vector>
 
-#include "base/byte_reader.h"
 #include "platform/platform.h"
-#include "storage/controller/driver_query.h"
+#include "storage/controller/connection.h"
+#include "storage/controller/driver_fetch.h"
 
 namespace tally {
 
@@ -26,39 +26,29 @@ std::uint32_t requestFlags(bool requestFlag, std::uint32_t mode) {
   return (requestFlag ? 1u << kRequestFlagBit : 0u) | (mode << kModeShift & kModeMask);
 }
 
-// What becomes of the result of the lists before.
+// False counts as a failure of the whole dump; a list that the driver refuses does not.
 bool fetchList(ConnectionHandle connection, const NandExporter& exporter,
                const KvObject* characteristics, const ListRequest& wanted, std::size_t position,
                bool requestFlag) {
   const std::uint32_t* const selectors = (exporter.*wanted.kind.selectors)();
   if (selectors == nullptr || selectors[0] == kSelectorUnavailable) return false;
 
-  const std::uint32_t flags = requestFlags(requestFlag, wanted.mode);
-  FetchRequest request = fetchRequest(selectors[0], flags | kSizeQueryFlag);
-  std::array<std::byte, sizeof(std::uint32_t)> sizeReply{};
-  const std::uint32_t status = callStructMethod(connection, exporter.sizeMethod,
-                                                std::as_bytes(std::span(request)), sizeReply)
-                                   .status;
-  if (status != 0) {
+  DriverFetch fetch(connection, exporter, selectors, requestFlags(requestFlag, wanted.mode));
+  if (const RegistryResult status = fetch.querySize()) {
     std::fprintf(stderr, "HwConnectCallStructMethod failed with status 0x%x on selector index %d\n",
                  status, static_cast<int>(position));
     return true;
   }
-  const std::size_t size = ByteReader(sizeReply).read<std::uint32_t>(0).value_or(0);
-  if (size == 0) return true;
-  const PageBuffer buffer(size);
-  if (!buffer.allocated()) {
-    std::fprintf(stderr, "Could not malloc %lld bytes", static_cast<long long>(size));
+  if (fetch.size() == 0) return true;
+  if (!fetch.allocate()) {
+    std::fprintf(stderr, "Could not malloc %lld bytes", static_cast<long long>(fetch.size()));
     return false;
   }
-  request = fetchRequest(selectors[1], flags);
-  const StructReply reply = callStructMethod(connection, exporter.dataMethod,
-                                             std::as_bytes(std::span(request)), buffer.bytes());
-  if (reply.status != 0) {
+  if (fetch.readData() != kRegistrySuccess) {
     std::fprintf(stderr, "Could not retrieve data from driver for selector %u\n", selectors[1]);
     return true;
   }
-  return wanted.handler({buffer.bytes().first(reply.length), characteristics, exporter.className});
+  return wanted.handler({fetch.data(), characteristics, exporter.className});
 }
 
 }  // namespace

@@ -1,12 +1,16 @@
 // The daily dump: from the write amplification to the handlers of the lists.
-#include "storage/storage_log.h"
+#include "storage/lists/storage_log.h"
 
 #include <cstdio>
 
 #include "platform/platform.h"
-#include "storage/exporter.h"
+#include "storage/controller/statistics_fetch.h"
+#include "storage/lists/defects_list.h"
 #include "storage/lists/storage_lists.h"
+#include "storage/lists/telemetry_list.h"
+#include "storage/lists/validity_list.h"
 #include "storage/lists/write_amplification.h"
+#include "storage/storage_log.h"
 
 namespace tally {
 
@@ -57,11 +61,9 @@ void CopyDictionary(const KvRef<KvString>& key, const KvRef<KvObject>& value,
 }
 
 void DumpNANDInfo(KvDictionary& target) {
-  SPXParseContext context;
-  const NandExporter* exporter = nullptr;
-  if (!loadNandStatistics(&exporter, &context)->value()) return;
-  const auto info = buildNandInfo(context, true);
-  if (exporter->releaseContext != nullptr) exporter->releaseContext(&context);
+  const LoadedStatistics statistics;
+  if (!statistics) return;
+  const auto info = buildNandInfo(statistics.context(), true);
   if (!info) return;
   for (const auto& [key, value] : *info) CopyDictionary(key, value, target);
 }

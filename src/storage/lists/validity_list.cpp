@@ -1,11 +1,11 @@
-// The validity list: values of up to sixteen lists, in one run of records.
+#include "storage/lists/validity_list.h"
+
 #include <array>
 #include <cstdio>
 #include <string>
 
 #include "base/byte_reader.h"
 #include "base/number_text.h"
-#include "storage/lists/storage_lists.h"
 #include "storage/storage_log.h"
 
 namespace tally {

@@ -3,7 +3,7 @@
 #include <cstdint>
 
 #include "platform/platform.h"
-#include "storage/exporter.h"
+#include "storage/controller/statistics_fetch.h"
 
 namespace tally {
 namespace {
@@ -40,12 +40,8 @@ WriteAmplification writeAmplificationOf(const SPXParseContext& context) {
 }
 
 WriteAmplification measureWriteAmplification() {
-  SPXParseContext context;
-  const NandExporter* exporter = nullptr;
-  if (!loadNandStatistics(&exporter, &context)->value()) return {};
-  const WriteAmplification measured = writeAmplificationOf(context);
-  if (exporter->releaseContext != nullptr) exporter->releaseContext(&context);
-  return measured;
+  const LoadedStatistics statistics;
+  return statistics ? writeAmplificationOf(statistics.context()) : WriteAmplification();
 }
 
 double writeAmplificationThreshold() {

@@ -3,8 +3,9 @@
 #include <algorithm>
 #include <unordered_map>
 
-#include "storage/auxiliary_metrics.h"
+#include "storage/freezer.h"
 #include "storage/nand_info.h"
+#include "storage/reclaim.h"
 #include "storage/statistics/key_map.h"
 
 namespace tally {

@@ -15,6 +15,7 @@
 #include <nlohmann/json.hpp>
 
 #include "hwreport/hwreport.h"
+#include "platform/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
 #include "tools/channels/channel_view.h"
 #include "tools/frame/output.h"
@@ -74,7 +75,7 @@ bool isWanted(KvDictionary* channel, const ChannelArguments& wanted) {
 bool addAllDrivers(const ToolContext& context, KvDictionary& channels) {
   DeviceRegistry& registry = *context.platform->deviceRegistry;
   RegistryHandle drivers = 0;
-  const auto published = KvDictionary::create({{"HwReportLegendPublic", KvBoolean::of(true)}});
+  const auto published = KvDictionary::create({{kLegendPublicProperty, KvBoolean::of(true)}});
   const RegistryResult result = registry.RegistryCopyMatchingServices(
       KvDictionary::create({{kMatchProperty, published}}), &drivers);
   if (result != 0) {

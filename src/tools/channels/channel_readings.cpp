@@ -8,6 +8,7 @@
 
 #include "hwreport/channel.h"
 #include "hwreport/values.h"
+#include "platform/hub_protocol.h"
 
 namespace tally::tools {
 namespace {
@@ -74,11 +75,10 @@ std::vector<BucketReading> readBuckets(KvDictionary& channel) {
 }
 
 std::vector<std::optional<std::int64_t>> readArray(const KvDictionary& channel) {
-  constexpr std::size_t kElementSize = 64, kValuesInElement = 4;
   std::vector<std::optional<std::int64_t>> values;
   const auto* raw = channel.getAs<KvData>("RawElements");
   const std::size_t count =
-      raw != nullptr ? raw->bytes().size() / kElementSize * kValuesInElement : 0;
+      raw != nullptr ? raw->bytes().size() / element::kSize * element::kSlotCount : 0;
   for (std::size_t i = 0; i < count; ++i) {
     values.push_back(present(HwReportArrayGetValueAtIndex(&channel, static_cast<std::int32_t>(i))));
   }

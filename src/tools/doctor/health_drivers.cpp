@@ -2,6 +2,7 @@
 #include "tools/doctor/health_drivers.h"
 
 #include "hwreport/channels.h"
+#include "platform/hub_protocol.h"
 #include "storage/exporter.h"
 #include "tools/frame/output.h"
 
@@ -31,7 +32,8 @@ void examineChannels(Platform& platform, HealthChecks& checks) {
   const auto channels = HwReportCopyAllChannels(0);
   const std::int32_t count = channels ? HwReportGetChannelCount(channels.get()) : 0;
   DeviceRegistry& registry = *platform.deviceRegistry;
-  const RegistryHandle hub = registry.RegistryFindService(ServiceMatchingByClass("HwReportHub"));
+  const RegistryHandle hub =
+      registry.RegistryFindService(ServiceMatchingByClass(kStatisticsHubClass));
   registry.HandleRelease(hub);
   const std::string published = counted(static_cast<std::uint64_t>(std::max(count, 0)), "channel");
   checks.push_back({count > 0 && hub != 0 ? Health::Ok : Health::Missing, "statistics",

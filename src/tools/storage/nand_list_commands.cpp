@@ -8,8 +8,12 @@
 
 #include "base/number_text.h"
 #include "base/time_text.h"
+#include "storage/lists/defects_list.h"
 #include "storage/lists/log_writer.h"
 #include "storage/lists/storage_lists.h"
+#include "storage/lists/storage_log.h"
+#include "storage/lists/telemetry_list.h"
+#include "storage/lists/validity_list.h"
 #include "storage/lists/write_amplification.h"
 #include "storage/storage_log.h"
 #include "tools/frame/dry_run.h"

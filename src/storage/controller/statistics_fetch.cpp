@@ -1,48 +1,40 @@
-// The two-call fetch of the statistics, and the content-deletion query.
+// The statistics fetch, and the content-deletion query.
+#include "storage/controller/statistics_fetch.h"
+
 #include <array>
 #include <cstdio>
 
 #include "base/byte_reader.h"
 #include "platform/platform.h"
-#include "storage/controller/driver_query.h"
-#include "storage/exporter.h"
+#include "storage/controller/connection.h"
+#include "storage/controller/driver_fetch.h"
 
 namespace tally {
 namespace {
 
 bool fetchAndParse(ConnectionHandle connection, const NandExporter& exporter,
                    SPXParseContext* context) {
-  FetchRequest request{};
-  std::span<const std::byte> input;  // without a selector the driver is asked with no input
   const std::uint32_t* selectors = nullptr;
   if (exporter.statsSelectors != nullptr) {
     selectors = exporter.statsSelectors();
     if (selectors == nullptr || selectors[0] == kSelectorUnavailable) return false;
-    request = fetchRequest(selectors[0], kSizeQueryFlag);
-    input = std::as_bytes(std::span(request));
   }
-  std::array<std::byte, sizeof(std::uint32_t)> sizeReply{};
-  const std::uint32_t status =
-      callStructMethod(connection, exporter.sizeMethod, input, sizeReply).status;
-  if (status != 0) {
+  DriverFetch fetch(connection, exporter, selectors, 0);
+  if (const RegistryResult status = fetch.querySize()) {
     std::fprintf(stderr, "HwConnectCallStructMethod: %d", static_cast<std::int32_t>(status));
     return false;
   }
-  const std::size_t size = ByteReader(sizeReply).read<std::uint32_t>(0).value_or(0);
-  const PageBuffer buffer(size);
-  if (!buffer.allocated()) {
-    std::fprintf(stderr, "Could not valloc %lld bytes", static_cast<long long>(size));
+  if (!fetch.allocate()) {
+    std::fprintf(stderr, "Could not valloc %lld bytes", static_cast<long long>(fetch.size()));
     return false;
   }
-  if (selectors != nullptr) request = fetchRequest(selectors[1], 0);
-  const StructReply reply =
-      callStructMethod(connection, exporter.dataMethod, input, buffer.bytes());
-  if (reply.status != 0) {
-    std::fprintf(stderr, "Could not retrieve data from driver for selector %x\n", request[0]);
+  if (fetch.readData() != kRegistrySuccess) {
+    std::fprintf(stderr, "Could not retrieve data from driver for selector %x\n",
+                 selectors != nullptr ? selectors[1] : 0);
     return false;
   }
-  if (exporter.parseBuffer(context, buffer.bytes().data(), reply.length) != 0) return true;
-  // What stands before a fault is no statistics: the caller gets its context back empty.
+  if (exporter.parseBuffer(context, fetch.data().data(), fetch.data().size()) != 0) return true;
+  // The records before a fault are discarded: the caller's context is empty again.
   SPXReleaseContext(context);
   return false;
 }

@@ -7,8 +7,13 @@
 #include <fmt/format.h>
 
 #include "hwreport/channels/error_maker.h"
+#include "platform/registry_results.h"
 
 namespace tally {
+
+// A registry's codes are passed on as errors of this library.
+static_assert(HwErrNoMemory == kRegistryNoMemory && HwErrBadArgument == kRegistryBadArgument &&
+              HwErrNotFound == kRegistryNotFound);
 
 void HwReportError::release() const noexcept {
   if (references_.fetch_sub(1, std::memory_order_acq_rel) == 1) delete this;
