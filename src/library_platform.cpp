@@ -2,13 +2,13 @@
 // that says on standard error what is wrong with it. It is made when it is first asked for.
 #include "library_platform.h"
 
-#include <cstdlib>
 #include <memory>
 #include <string>
 
 #include <fmt/format.h>
 
 #include "host/described/device_platform.h"
+#include "host/system/environment.h"
 #include "platform/platform.h"
 
 namespace tally {
@@ -29,14 +29,9 @@ Platform makePlatform(std::string_view root) {
   return services;
 }
 
-std::string_view rootOfEnvironment() {
-  const char* const root = std::getenv("TALLYRUN_ROOT");
-  return root != nullptr ? root : "/";
-}
-
 // Never destroyed: what a program still holds at its end may ask for it.
 Platform& libraryPlatform() {
-  static auto* const services = new Platform(makePlatform(rootOfEnvironment()));
+  static auto* const services = new Platform(makePlatform(deviceRootFromEnvironment()));
   return *services;
 }
 

@@ -12,7 +12,7 @@
 #include "driver/tasking.h"
 #include "driver/telemetry_sweep.h"
 #include "host/host_platform.h"
-#include "host/linux_platform.h"
+#include "host/system/environment.h"
 #include "platform/platform.h"
 
 int main(int count, char** arguments) {

@@ -3,6 +3,7 @@
 #include <string>
 
 #include "host/host_platform.h"
+#include "host/system/environment.h"
 #include "storage/device_root.h"
 
 namespace tally {

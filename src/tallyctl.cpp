@@ -3,7 +3,7 @@
 
 #include "base/process.h"
 #include "host/host_platform.h"
-#include "host/linux_platform.h"
+#include "host/system/environment.h"
 #include "host/system/standard_streams.h"
 #include "tools/frame/tool.h"
 #include "tools/frame/tool_log.h"

@@ -14,6 +14,7 @@
 #include "base/directory.h"
 #include "base/file.h"
 #include "base/retried.h"
+#include "base/text_lines.h"
 
 namespace tally {
 namespace {
@@ -114,9 +115,7 @@ std::optional<std::int64_t> lockHolder(std::string_view locks, std::uint64_t dev
   // "1: FLOCK  ADVISORY  WRITE 713 08:02:1234 0 EOF"; those that wait have an arrow before the
   // kind.
   while (!locks.empty()) {
-    const std::size_t end = std::min(locks.find('\n'), locks.size());
-    const std::string_view line = locks.substr(0, end);
-    locks.remove_prefix(std::min(end + 1, locks.size()));
+    const std::string_view line = takeLine(locks);
     std::size_t position = 0;
     (void)nextWord(line, position);
     if (nextWord(line, position) != "FLOCK") continue;

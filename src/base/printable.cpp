@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <iterator>
 
+#include "base/hex.h"
 #include "base/utf8.h"
 
 namespace tally {
@@ -43,11 +44,6 @@ std::size_t widthOf(std::uint32_t character) {
   return isIn(kWide, character) ? 2 : 1;
 }
 
-void appendHexadecimal(std::string& out, std::uint32_t value, int digits) {
-  constexpr char kDigits[] = "0123456789abcdef";
-  for (int shift = 4 * (digits - 1); shift >= 0; shift -= 4) out += kDigits[value >> shift & 15];
-}
-
 }  // namespace
 
 bool isControl(std::uint32_t character) {
@@ -69,7 +65,7 @@ std::string printable(std::string_view text) {
     } else if (isControl(character)) {
       const bool isShort = character < 0x100;
       out += isShort ? "\\x" : "\\u";
-      appendHexadecimal(out, character, isShort ? 2 : 4);
+      appendHex(out, character, isShort ? 2 : 4);
     } else {
       out.append(valid, begin, i - begin);
     }

@@ -33,7 +33,7 @@ void appendTimestamp(std::string& out, double secondsSince1970) {
                              : std::clamp(std::floor(secondsSince1970), kFirstSecond, kLastSecond);
   const auto seconds = static_cast<std::int64_t>(bounded);
   const std::int32_t day = dayOfSeconds(bounded);
-  const auto rest = static_cast<int>(seconds - std::int64_t{day} * 86400);
+  const auto rest = static_cast<int>(seconds - std::int64_t{day} * kSecondsPerDay);
   const auto date = dateOf(day);
   char text[40];
   const int length =
@@ -53,7 +53,7 @@ std::string dateAndTimeText(double secondsSince1970) {
 
 std::string dayText(std::int32_t day) {
   std::string text;
-  appendTimestamp(text, double{kSecondsPerDay} * day);
+  appendTimestamp(text, static_cast<double>(kSecondsPerDay * day));
   return text.substr(0, text.find('T'));
 }
 

@@ -6,7 +6,7 @@
 
 namespace tally {
 
-constexpr double kSecondsPerDay = 86400;
+constexpr std::int64_t kSecondsPerDay = 86400;
 
 // Whole days since 1970-01-01 of an instant; days before it are negative.
 std::int32_t dayOfSeconds(double secondsSince1970);

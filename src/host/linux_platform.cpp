@@ -1,7 +1,5 @@
 #include "host/linux_platform.h"
 
-#include <cstdlib>
-
 #include "host/bus/bus_endpoint.h"
 #include "host/bus/bus_notifications.h"
 #include "host/described/described_purgeable_space.h"
@@ -17,6 +15,7 @@
 #include "host/system/applications.h"
 #include "host/system/clock.h"
 #include "host/system/device_information.h"
+#include "host/system/environment.h"
 #include "host/system/event_loop.h"
 #include "host/system/files.h"
 #include "host/system/kernel_values.h"
@@ -28,18 +27,13 @@
 namespace tally {
 namespace {
 
-std::string variable(const char* name) {
-  const char* const value = std::getenv(name);
-  return value != nullptr ? value : "";
-}
-
 // The data folder of whoever runs the program, who is part of the device only when the device is
 // this machine.
 std::string userDataFolder(const DeviceRoot& root) {
   if (!root.prefix().empty()) return "";
-  const std::string data = variable("XDG_DATA_HOME");
+  const std::string data = environmentVariable("XDG_DATA_HOME");
   if (data.starts_with('/')) return data;
-  const std::string home = variable("HOME");
+  const std::string home = environmentVariable("HOME");
   return home.starts_with('/') ? home + "/.local/share" : "";
 }
 
@@ -89,11 +83,11 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.deviceInformation = std::make_shared<LinuxDeviceInformation>(root, description);
   services.appRegistry = std::make_shared<DesktopAppRegistry>(
       applicationFolders(root, userDataFolder(root)), description);
-  services.locale =
-      std::make_shared<LinuxLocale>(root,
-                                    LocaleEnvironment{variable("LANGUAGE"), variable("LC_ALL"),
-                                                      variable("LC_MESSAGES"), variable("LANG")},
-                                    description);
+  services.locale = std::make_shared<LinuxLocale>(
+      root,
+      LocaleEnvironment{environmentVariable("LANGUAGE"), environmentVariable("LC_ALL"),
+                        environmentVariable("LC_MESSAGES"), environmentVariable("LANG")},
+      description);
   services.kernelValues = std::make_shared<LinuxKernelValues>(description);
   services.stackshot = std::make_shared<DescribedStackshot>(described, description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
@@ -102,11 +96,6 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
       analyticsEventsFolder(root), log, clock, preferences, description, consent);
   return services;
-}
-
-std::string deviceRootFromEnvironment() {
-  const std::string root = variable("TALLYRUN_ROOT");
-  return root.empty() ? "/" : root;
 }
 
 }  // namespace tally

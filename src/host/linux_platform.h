@@ -2,7 +2,6 @@
 #pragma once
 
 #include <memory>
-#include <string>
 
 #include "host/described/device_description.h"
 #include "platform/platform.h"
@@ -18,8 +17,5 @@ struct LinuxPlatformOptions {
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
 // service is used.
 Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options = {});
-
-// TALLYRUN_ROOT; "/" when it is unset or empty.
-std::string deviceRootFromEnvironment();
 
 }  // namespace tally

@@ -3,17 +3,16 @@
 #include <cmath>
 #include <utility>
 
+#include "base/hex.h"
 #include "base/number_text.h"
 #include "base/time_text.h"
 #include "kv/base64.h"
+#include "kv/nesting.h"
 
 namespace tally {
 namespace {
 
-constexpr int kDeepest = 512;
-
 void appendString(std::string& out, std::string_view text) {
-  constexpr char kHexDigits[] = "0123456789abcdef";
   out += '"';
   for (const char c : text) {
     const auto code = static_cast<unsigned char>(c);
@@ -22,8 +21,7 @@ void appendString(std::string& out, std::string_view text) {
       out += c;
     } else if (code < 0x20 || code == 0x7F) {
       out += "\\u00";
-      out += kHexDigits[code >> 4];
-      out += kHexDigits[code & 0xF];
+      appendHex(out, code, 2);
     } else {
       out += c;
     }
@@ -72,7 +70,7 @@ void appendDictionary(std::string& out, const KvDictionary& dictionary, int dept
 }
 
 void appendValue(std::string& out, const KvObject& value, int depth) {
-  if (depth == kDeepest) {
+  if (depth == kMaximumDepth) {
     out += "null";
     return;
   }

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "base/byte_reader.h"
+#include "kv/nesting.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
@@ -162,8 +163,8 @@ class Guard {
     if (!checkExtent(object, parts * referenceWidth_)) return false;
     const auto index = static_cast<std::size_t>(number);
     if (open_[index]) return fail("a container contains itself");
-    if (levels_.size() == static_cast<std::size_t>(kPlistMaximumDepth)) {
-      return fail("nested deeper than 512 levels");
+    if (levels_.size() == static_cast<std::size_t>(kMaximumDepth)) {
+      return fail(kTooDeep);
     }
     open_[index] = true;
     const std::uint64_t keys = object.marker == kDictionary ? object.count : 0;

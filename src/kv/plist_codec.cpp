@@ -100,7 +100,7 @@ KvRef<KvObject> dictionaryOf(plist_t node) {
   }
 }
 
-// Null for a node without a value. At most kPlistMaximumDepth calls deep, since it was checked.
+// Null for a node without a value. At most kMaximumDepth calls deep, since it was checked.
 KvRef<KvObject> valueOf(plist_t node) {
   std::uint64_t length = 0;
   const auto size = [&length] { return static_cast<std::size_t>(length); };

@@ -13,7 +13,6 @@ namespace tally {
 // Bounds on what is accepted; more than any real document needs, little enough that a hostile one
 // can cost neither the stack nor the memory of a small device.
 constexpr std::size_t kPlistMaximumBytes = 64u << 20;
-constexpr int kPlistMaximumDepth = 512;
 constexpr std::size_t kPlistMaximumObjects = 4'000'000;
 
 // The document's root value. An error says what is wrong; nothing partial is ever returned. A
@@ -22,7 +21,7 @@ Result<KvRef<KvObject>> decodePlist(std::string_view document,
                                     std::size_t maximumBytes = kPlistMaximumBytes);
 
 // An XML property list, version 1.0, UTF-8, ending in a newline. Fails when the value is nested
-// deeper than kPlistMaximumDepth, which a reference cycle always is, or when the document would be
+// deeper than kMaximumDepth, which a reference cycle always is, or when the document would be
 // larger than maximumBytes and so could not be read again. Characters that XML 1.0 cannot
 // carry are written as U+FFFD. Reals read back equal.
 Result<std::string> encodeXmlPlist(const KvObject& root,

@@ -6,19 +6,14 @@
 #include <limits>
 
 #include "base/number_text.h"
+#include "base/text_lines.h"
+#include "base/time_text.h"
 #include "kv/base64.h"
 
 namespace tally {
 namespace {
 
 constexpr std::uint32_t kLastCodePoint = 0x10FFFF;
-
-std::string_view trimmed(std::string_view text) {
-  constexpr std::string_view blanks = " \t\r\n";
-  const std::size_t first = text.find_first_not_of(blanks);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(blanks) - first + 1);
-}
 
 // All of the text as an unsigned number; no sign, no blank.
 template <class T>
@@ -139,7 +134,7 @@ KvRef<KvDate> dateFromText(std::string_view text) {
   const unsigned hour = field(11, 2), minute = field(14, 2), second = field(17, 2);
   if (!date.ok() || hour > 23 || minute > 59 || second > 59) return nullptr;
   const auto day = static_cast<double>(std::chrono::sys_days(date).time_since_epoch().count());
-  return KvDate::create(day * 86400 + hour * 3600 + minute * 60 + second);
+  return KvDate::create(day * kSecondsPerDay + hour * 3600 + minute * 60 + second);
 }
 
 KvRef<KvData> dataFromText(std::string_view text) {

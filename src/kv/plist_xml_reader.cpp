@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "kv/nesting.h"
 #include "kv/plist_codec.h"
 #include "kv/plist_xml_leaf.h"
 
@@ -205,8 +206,8 @@ class Reader {
   }
 
   bool openContainer(const Tag& tag, Frame frame) {
-    if (stack_.size() == static_cast<std::size_t>(kPlistMaximumDepth)) {
-      return fail("nested deeper than 512 levels");
+    if (stack_.size() == static_cast<std::size_t>(kMaximumDepth)) {
+      return fail(kTooDeep);
     }
     // Refused now, although the value is added at the closing tag.
     if (!stack_.empty() && stack_.back().dictionary && !stack_.back().key) {

@@ -13,6 +13,7 @@
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "kv/base64.h"
+#include "kv/nesting.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
@@ -168,7 +169,7 @@ class Writer {
   }
 
   Status array(const KvArray& array, int depth) {
-    if (depth == kPlistMaximumDepth) return tooDeep();
+    if (depth == kMaximumDepth) return tooDeep();
     if (array.empty()) return out_ += "<array/>\n", Done{};
     out_ += "<array>\n";
     for (const auto& item : array) {
@@ -180,7 +181,7 @@ class Writer {
   }
 
   Status dictionary(const KvDictionary& dictionary, int depth) {
-    if (depth == kPlistMaximumDepth) return tooDeep();
+    if (depth == kMaximumDepth) return tooDeep();
     if (dictionary.empty()) return out_ += "<dict/>\n", Done{};
     out_ += "<dict>\n";
     for (const auto& [key, item] : dictionary) {
@@ -194,7 +195,7 @@ class Writer {
   }
 
   static Error tooDeep() {
-    return Error{"the value is nested deeper than 512 levels or contains itself"};
+    return Error{"the value is " + std::string(kTooDeep) + " or contains itself"};
   }
 
   std::size_t maximumBytes_;

@@ -2,14 +2,15 @@
 #include <algorithm>
 #include <cmath>
 
+#include "base/hex.h"
 #include "base/number_text.h"
 #include "base/time_text.h"
+#include "kv/nesting.h"
 #include "kv/value.h"
 
 namespace tally {
 namespace {
 
-constexpr int kMaximumDepth = 512;  // deeper is a cycle or not worth showing
 // A cycle that branches would otherwise be written out for ever.
 constexpr std::size_t kMaximumText = 16u << 20;
 
@@ -26,13 +27,8 @@ void appendNumber(std::string& out, const KvNumber& number) {
 }
 
 void appendData(std::string& out, const KvData& data) {
-  static constexpr char kDigits[] = "0123456789abcdef";
   out += '<';
-  for (const std::byte byte : data.bytes()) {
-    const auto value = std::to_integer<unsigned>(byte);
-    out += kDigits[value >> 4];
-    out += kDigits[value & 15];
-  }
+  for (const std::byte byte : data.bytes()) appendHex(out, std::to_integer<unsigned>(byte), 2);
   out += '>';
 }
 

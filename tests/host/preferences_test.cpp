@@ -2,6 +2,7 @@
 #include "host/preferences/property_list_preferences.h"
 
 #include "host/temporary_root.h"
+#include "kv/nesting.h"
 #include "kv/plist_codec.h"
 
 namespace tally {
@@ -150,7 +151,7 @@ TEST_F(PreferencesTest, AFailedWriteKeepsTheChangesForTheNextAttempt) {
 
 TEST_F(PreferencesTest, AValueThatNoFileHoldsFailsNoLaterWrite) {
   auto deep = KvArray::create();
-  for (int i = 0; i < kPlistMaximumDepth; ++i) deep = KvArray::create({deep});
+  for (int i = 0; i < kMaximumDepth; ++i) deep = KvArray::create({deep});
   auto preferences = open();
   preferences.SMAPreferencesSetValue("deep", deep, kDomain);
   preferences.SMAPreferencesSetValue("a", number(1), kDomain);

@@ -6,12 +6,12 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 
 #include "host/bus/bus_message.h"
 #include "host/bus/bus_policy.h"
 #include "host/preferences/property_list_preferences.h"
+#include "host/system/environment.h"
 
 namespace tally {
 namespace {
@@ -38,9 +38,8 @@ Status statusOf(std::string_view step, int result) {
 
 // By the bus or by the service manager: nobody starts the program like that but for a message.
 bool isStartedForAMessage() {
-  const char* const managed = std::getenv("SYSTEMD_EXEC_PID");
-  return std::getenv("DBUS_STARTER_ADDRESS") != nullptr ||
-         (managed != nullptr && managed == std::to_string(::getpid()));
+  return !environmentVariable("DBUS_STARTER_ADDRESS").empty() ||
+         environmentVariable("SYSTEMD_EXEC_PID") == std::to_string(::getpid());
 }
 
 }  // namespace

@@ -9,6 +9,7 @@
 #include <chrono>
 #include <cstring>
 
+#include "base/hex.h"
 #include "host/store/store_files.h"
 
 namespace tally {
@@ -32,10 +33,8 @@ std::string immutableUri(std::string_view path) {
   std::string uri = "file:";
   for (const char c : path) {
     if (c == '%' || c == '?' || c == '#') {
-      constexpr std::string_view kDigits = "0123456789ABCDEF";
       uri += '%';
-      uri += kDigits[static_cast<unsigned char>(c) >> 4];
-      uri += kDigits[static_cast<unsigned char>(c) & 15];
+      appendHex(uri, static_cast<unsigned char>(c), 2, kUpperHexDigits);
     } else {
       uri += c;
     }

@@ -4,7 +4,7 @@
 #include <cerrno>
 #include <set>
 
-#include "host/system/text_lines.h"
+#include "base/text_lines.h"
 
 namespace tally {
 namespace {

@@ -9,7 +9,7 @@
 
 #include "base/file.h"
 #include "base/number_text.h"
-#include "host/system/text_lines.h"
+#include "base/text_lines.h"
 
 namespace tally {
 namespace {

@@ -9,7 +9,7 @@
 
 #include "base/file.h"
 #include "base/printable.h"
-#include "host/system/text_lines.h"
+#include "base/text_lines.h"
 
 namespace tally {
 namespace {

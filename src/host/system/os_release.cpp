@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cctype>
 
-#include "host/system/text_lines.h"
+#include "base/text_lines.h"
 
 namespace tally {
 namespace {

@@ -8,12 +8,12 @@
 
 #include <array>
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 #include <mutex>
 
 #include "base/printable.h"
 #include "base/utf8.h"
+#include "host/system/environment.h"
 
 namespace tally {
 namespace {
@@ -105,14 +105,13 @@ SystemLogSettings systemLogSettings(const char* destination, const char* level) 
 }
 
 SystemLogEnvironment systemLogEnvironment() {
-  const char* const destination = std::getenv("TALLYRUN_LOG");
-  const char* const level = std::getenv("TALLYRUN_LOG_LEVEL");
-  SystemLogEnvironment found{systemLogSettings(destination, level), ""};
-  const auto isSet = [](const char* value) { return value != nullptr && *value != '\0'; };
-  if (isSet(destination) && !found.settings.forceStandardError) {
+  const std::string destination = environmentVariable("TALLYRUN_LOG");
+  const std::string level = environmentVariable("TALLYRUN_LOG_LEVEL");
+  SystemLogEnvironment found{systemLogSettings(destination.c_str(), level.c_str()), ""};
+  if (!destination.empty() && !found.settings.forceStandardError) {
     found.fault =
         fmt::format("TALLYRUN_LOG is neither empty nor stderr but {}", shortText(destination));
-  } else if (isSet(level) && levelText(found.settings.lowest) != level) {
+  } else if (!level.empty() && levelText(found.settings.lowest) != level) {
     found.fault = fmt::format("TALLYRUN_LOG_LEVEL is not debug, info, default or error but {}",
                               shortText(level));
   }

@@ -4,17 +4,12 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cstdlib>
 
 #include "base/number_text.h"
+#include "host/system/environment.h"
 
 namespace tally {
 namespace {
-
-std::string variable(const char* name) {
-  const char* const value = std::getenv(name);
-  return value != nullptr ? value : "";
-}
 
 // "de_CH.UTF-8", "C.utf8@x".
 bool namesUtf8(std::string locale) {
@@ -48,8 +43,9 @@ Terminal terminalOf(int descriptor) {
   winsize size{};
   const bool sized = interactive && ::ioctl(descriptor, TIOCGWINSZ, &size) == 0;
   return makeTerminal(interactive, sized ? size.ws_col : 0,
-                      {variable("COLUMNS"), variable("NO_COLOR"), variable("TERM"),
-                       variable("LC_ALL"), variable("LC_CTYPE"), variable("LANG")});
+                      {environmentVariable("COLUMNS"), environmentVariable("NO_COLOR"),
+                       environmentVariable("TERM"), environmentVariable("LC_ALL"),
+                       environmentVariable("LC_CTYPE"), environmentVariable("LANG")});
 }
 
 }  // namespace tally
