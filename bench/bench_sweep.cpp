@@ -21,7 +21,7 @@ using namespace tally;
 constexpr int kRuns = 15;
 constexpr int kScalars = 720;  // about what a sweep of the sample device sets
 
-void sweep() { runTelemetrySweep(programSweepCapabilities()); }
+void sweep() { runTelemetrySweep(platform()); }
 
 void writeScalars() {
   MetricsStore& store = *platform().metricsStore;

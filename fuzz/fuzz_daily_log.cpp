@@ -4,7 +4,7 @@
 #include "config/whitelist_file.h"
 #include "fakes/fake_platform.h"
 #include "fuzz_values.h"
-#include "report/report.h"
+#include "report/daily_report.h"
 
 using namespace tally;
 using fuzz::require;
@@ -71,7 +71,7 @@ FUZZ_TARGET(daily_log)(const std::uint8_t* data, std::size_t size) {
   // Keys as a reader of the file sees them.
   const auto read = decodePlist(*written);
   fake.files->contents[std::string(kWhitelistPath)] = *written;
-  TBReport().writeLogForYesterdayWithAppInfo(kDay, nullptr);
+  writeDailyLog(platform(), kDay, nullptr);
   for (const auto& log : fake.logSubmission->logs) {
     checkLog(log.body, *kvCast<KvDictionary>(read->get()));
   }

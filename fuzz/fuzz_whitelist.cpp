@@ -1,7 +1,7 @@
 // The whitelist: as a file of any bytes, or as a property list of any shape; then keys looked up.
 #include <string>
 
-#include "config/config.h"
+#include "config/whitelist.h"
 #include "fakes/fake_platform.h"
 #include "fuzz_values.h"
 
@@ -16,7 +16,8 @@ const KvString* longestPrefix(const KvDictionary& root, std::string_view section
   const KvString* longest = nullptr;
   for (const auto& group : root) {
     const auto* const sections = kvCast<KvDictionary>(group.value.get());
-    if (sections == nullptr || groupState(group.key->view()) != GroupState::InForce) continue;
+    if (sections == nullptr || groupState(platform(), group.key->view()) != GroupState::InForce)
+      continue;
     const auto* const entries = sections->getAs<KvDictionary>(sectionTitle);
     if (entries == nullptr) continue;
     for (const auto& entry : *entries) {
@@ -28,12 +29,12 @@ const KvString* longestPrefix(const KvDictionary& root, std::string_view section
   return longest;
 }
 
-void lookUp(const TBConfig& config, const KvDictionary& root, std::string_view key) {
+void lookUp(const Whitelist& config, const KvDictionary& root, std::string_view key) {
   const auto match = config.matchScalarKey(key);
-  require(config.configOptionsForScalarKey(key) == match.options, "both answers are the same");
+  require(config.scalarOptions(key) == match.options, "both answers are the same");
   require((match.kind == WhitelistMatchKind::None) == (match.options == nullptr),
           "a key that is admitted has options");
-  config.configOptionsForDistributionKey(key);
+  config.distributionOptions(key);
   if (match.kind == WhitelistMatchKind::Exact) {
     require(match.entry->key->view() == key, "an exact match is the key");
     return;
@@ -57,7 +58,7 @@ FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
     file.read = true;
     file.root = fuzz::ValueReader(input).takeDictionary();
   }
-  const auto config = TBConfig::initWithFile(file);
+  const auto config = Whitelist::fromFile(platform(), file);
   require((config != nullptr) == static_cast<bool>(file.root), "a file that is read is in force");
   if (config == nullptr) return 0;
   for (const auto& group : *file.root) {

@@ -1,4 +1,4 @@
-// tallyrun: the daily job. The one place where the platform is built and installed.
+// tallyrun: the daily job.
 #include <malloc.h>
 
 #include <cstdio>
@@ -7,10 +7,7 @@
 
 #include "base/process.h"
 #include "base/version.h"
-#include "driver/app_info_listener.h"
 #include "driver/daily_job.h"
-#include "driver/tasking.h"
-#include "driver/telemetry_sweep.h"
 #include "host/host_platform.h"
 #include "host/system/environment.h"
 #include "platform/platform.h"
@@ -23,18 +20,12 @@ int main(int count, char** arguments) {
                 tally::kProgramVersion.data());
     return std::fflush(stdout) == 0 ? 0 : 1;
   }
-  // A run is short: memory that it gave back to the kernel it would soon ask for again, at the
-  // price of a fault for each page.
+  // A run is short: memory that it returned to the kernel would soon be needed again, at the cost
+  // of a page fault for each page.
   constexpr int kKeptBytes = 64 << 20;
   ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
   ::mallopt(M_MMAP_THRESHOLD, kKeptBytes / 2);
+  // Installed for the two libraries; everything else is handed it.
   const tally::PlatformScope scope(tally::makeHostPlatform(tally::deviceRootFromEnvironment()));
-  tally::AppInfoListener listener;
-  tally::DailyJob job({
-      .startListener = [&listener](tally::DailyJob& self) { return listener.start(self); },
-      .stopListener = [&listener] { return listener.stop(); },
-      .runTelemetrySweep = [] { tally::runTelemetrySweep(tally::programSweepCapabilities()); },
-      .updateTaskingState = tally::updateTaskingState,
-  });
-  return job.run({arguments, static_cast<std::size_t>(count)});
+  return tally::runDailyJob(tally::platform(), {arguments, static_cast<std::size_t>(count)});
 }

@@ -4,8 +4,6 @@
 #include <utility>
 
 #include "driver/daily_job.h"
-#include "driver/tasking.h"
-#include "driver/telemetry_sweep.h"
 #include "host/host_platform.h"
 #include "host/linux_platform.h"
 #include "platform/platform.h"
@@ -43,11 +41,5 @@ int main(int count, char** arguments) {
   Platform services = makeHostPlatform(deviceRootFromEnvironment());
   services.deviceInformation = std::make_shared<ProductInformation>(services.deviceInformation);
   const PlatformScope scope(std::move(services));
-  DailyJob job({
-      .startListener = {},  // this product has no message bus
-      .stopListener = {},
-      .runTelemetrySweep = [] { runTelemetrySweep(programSweepCapabilities()); },
-      .updateTaskingState = updateTaskingState,
-  });
-  return job.run({arguments, static_cast<std::size_t>(count)});
+  return runDailyJob(platform(), {arguments, static_cast<std::size_t>(count)});
 }

@@ -1,13 +1,11 @@
 #include "config/internal_device.h"
 
-#include "platform/platform.h"
-
 namespace tally {
 
-bool TBIsInternalDevice() {
-  OnceBoolean& once = *platform().internalDevice;
-  std::call_once(once.asked, [&once] {
-    const auto answer = platform().deviceInformation->DeviceQuery("InternalBuild");
+bool isInternalDevice(Platform& platform) {
+  OnceBoolean& once = *platform.internalDevice;
+  std::call_once(once.asked, [&] {
+    const auto answer = platform.deviceInformation->DeviceQuery("InternalBuild");
     if (const auto* boolean = kvCast<KvBoolean>(answer.get())) {
       once.answer = boolean->value();
     } else if (const auto* number = kvCast<KvNumber>(answer.get())) {

@@ -8,7 +8,6 @@
 #include "config/internal_device.h"
 #include "config/scalar_options.h"
 #include "kv/plist_codec.h"
-#include "platform/platform.h"
 
 namespace tally {
 namespace {
@@ -64,8 +63,8 @@ void visitSection(const KvRef<KvString>& group, WhitelistSection section, const 
 
 }  // namespace
 
-WhitelistFile loadWhitelistFile() {
-  const auto bytes = platform().files->readFile(kWhitelistPath, kPlistMaximumBytes);
+WhitelistFile loadWhitelistFile(Platform& platform) {
+  const auto bytes = platform.files->readFile(kWhitelistPath, kPlistMaximumBytes);
   if (bytes) return parseWhitelistFile(*bytes);
   WhitelistFile file;
   file.fault = bytes.error().message;
@@ -119,11 +118,11 @@ void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor) {
   }
 }
 
-GroupState groupState(std::string_view group) {
-  if (TBIsInternalDevice()) return GroupState::InForce;
+GroupState groupState(Platform& platform, std::string_view group) {
+  if (isInternalDevice(platform)) return GroupState::InForce;
   if (group == kInternalTestingGroup) return GroupState::InternalOnly;
   bool exists = false;
-  Preferences& preferences = *platform().preferences;
+  Preferences& preferences = *platform.preferences;
   const bool enabled = preferences.SMAPreferencesGetBoolValue(group, kGroupSwitchDomain, &exists);
   if (exists) return enabled ? GroupState::InForce : GroupState::DisabledByTasking;
   return preferences.isReadable(kGroupSwitchDomain) ? GroupState::InForce

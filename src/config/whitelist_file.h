@@ -8,6 +8,7 @@
 
 #include "config/key_table.h"
 #include "kv/value.h"
+#include "platform/platform.h"
 
 namespace tally {
 
@@ -15,8 +16,6 @@ constexpr std::string_view kWhitelistPath =
     "/Library/Application Support/Tallybook/Whitelist_Nimbus.plist";
 // The group that exists on internal devices only.
 constexpr std::string_view kInternalTestingGroup = "InternalTesting";
-// Boolean preferences named like a group switch that group on or off in this domain.
-constexpr std::string_view kGroupSwitchDomain = "vellum.da";
 
 // A whitelist file as far as it could be loaded.
 struct WhitelistFile {
@@ -25,7 +24,7 @@ struct WhitelistFile {
   KvRef<KvDictionary> root;  // null when it could not be read or parsed
   std::string fault;         // why; empty when root is there
 };
-WhitelistFile loadWhitelistFile();
+WhitelistFile loadWhitelistFile(Platform& platform);
 WhitelistFile parseWhitelistFile(std::string_view bytes);
 
 enum class WhitelistSection {
@@ -77,7 +76,7 @@ enum class GroupState {
   DisabledByTasking,
   SwitchUnreadable,  // it may be switched off, so nothing of it leaves the device
 };
-GroupState groupState(std::string_view group);
+GroupState groupState(Platform& platform, std::string_view group);
 // What is to be said of the group: "is for internal devices only", "is disabled by tasking" and so
 // on; empty when it is in force.
 std::string_view whyNotInForce(GroupState state);

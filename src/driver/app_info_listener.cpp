@@ -7,7 +7,6 @@
 #include <string>
 
 #include "base/result.h"
-#include "platform/platform.h"
 
 namespace tally {
 namespace {
@@ -54,14 +53,9 @@ Result<KvRef<KvDictionary>> makeApplication(const KvObject* element) {
                                {"uuid", KvString::create(uuidText(uuid->bytes()))}});
 }
 
-void reportSkipped(std::string_view what) {
-  const std::string line = fmt::format("message skipped: {}", what);
-  logFault(line, "{}", line);
-}
-
 }  // namespace
 
-KvRef<KvArray> makeAppInformation(const KvArray& appData) {
+KvRef<KvArray> makeAppInformation(SystemLog& log, const KvArray& appData) {
   auto information = KvArray::create(appData.size());
   std::string firstFault;
   for (std::size_t i = 0; i < appData.size(); ++i) {
@@ -73,29 +67,34 @@ KvRef<KvArray> makeAppInformation(const KvArray& appData) {
     }
   }
   if (const auto skipped = appData.size() - information->size(); skipped > 0) {
-    logFault("app_data: lists with elements skipped", "app_data: {} of {} elements skipped; {}",
-             skipped, appData.size(), firstFault);
+    log.fault("app_data: lists with elements skipped", "app_data: {} of {} elements skipped; {}",
+              skipped, appData.size(), firstFault);
   }
   return information;
 }
 
-bool AppInfoListener::start(DailyJob& job) {
-  return platform().ipcEndpoint->listen(
-      kServiceName, [this, &job](const KvDictionary& message) { handleMessage(job, message); });
+bool AppInfoListener::start() {
+  return platform_.ipcEndpoint->listen(
+      kServiceName, [this](const KvDictionary& message) { handleMessage(message); });
 }
 
-bool AppInfoListener::stop() { return platform().ipcEndpoint->stopListening(); }
+bool AppInfoListener::stop() { return platform_.ipcEndpoint->stopListening(); }
 
-void AppInfoListener::handleMessage(DailyJob& job, const KvDictionary& message) {
+void AppInfoListener::reportSkipped(std::string_view what) {
+  const std::string line = fmt::format("message skipped: {}", what);
+  platform_.log->fault(line, "{}", line);
+}
+
+void AppInfoListener::handleMessage(const KvDictionary& message) {
   const KvNumber* const operation = int64Field(message, "operation");
   if (operation == nullptr) {
     reportSkipped("no 64-bit integer \"operation\"");
     return;
   }
-  // Only the low 32 bits tell.
+  // Only the low 32 bits count.
   const std::int32_t code = operation->asInt32();
   if (code == kAppData) {
-    receiveAppData(job, message);
+    receiveAppData(message);
     return;
   }
   const KvNumber* const value = int64Field(message, "value");
@@ -105,30 +104,31 @@ void AppInfoListener::handleMessage(DailyJob& job, const KvDictionary& message) 
   }
   if (acted_.test_and_set()) return;
   if (code == kRunDay) {
-    job.runDaily(value->asInt32(), nullptr);
+    tasks_.runDaily(value->asInt32(), nullptr);
   } else if (code == kLoggingStatus) {
-    job.appInfoRequested = true;
-    platform().notifications->postSystemNotification(kLoggingNotification);
-    logMessage(LogLevel::Default, "notified of logging status, waiting for activate app info");
+    isAppInfoRequested_ = true;
+    platform_.notifications->postSystemNotification(kLoggingNotification);
+    platform_.log->message(LogLevel::Default,
+                           "notified of logging status, waiting for activate app info");
   }
 }
 
-void AppInfoListener::receiveAppData(DailyJob& job, const KvDictionary& message) {
+void AppInfoListener::receiveAppData(const KvDictionary& message) {
   const auto* const appData = message.getAs<KvArray>("app_data");
   if (appData == nullptr) {
     reportSkipped("no array \"app_data\"");
     return;
   }
-  const auto information = makeAppInformation(*appData);
-  // The text of a long list is worth making only for somebody who reads it.
-  if (platform().log->enabled(LogLevel::Default)) {
-    logBounded(LogLevel::Default, "tallyrun got AAI", "tallyrun got {}AAI:\n{}",
-               job.appInfoRequested ? "requested" : "(unsolicited -- so ignoring) ",
-               kvText(information.get()));
+  const auto information = makeAppInformation(*platform_.log, *appData);
+  // The text of a long list is not made for nobody.
+  if (platform_.log->enabled(LogLevel::Default)) {
+    platform_.log->repeated(LogLevel::Default, "tallyrun got AAI", "tallyrun got {}AAI:\n{}",
+                            isAppInfoRequested_ ? "requested" : "(unsolicited -- so ignoring) ",
+                            kvText(information.get()));
   }
-  if (!job.appInfoRequested) return;
-  job.runIfNewDay(information.get());
-  job.appInfoRequested = false;
+  if (!isAppInfoRequested_) return;
+  tasks_.runIfNewDay(information.get());
+  isAppInfoRequested_ = false;
 }
 
 }  // namespace tally

@@ -6,40 +6,51 @@
 #include <cstdint>
 #include <string_view>
 
-#include "driver/daily_job.h"
+#include "driver/daily_tasks.h"
 #include "kv/value.h"
+#include "platform/platform.h"
 
 namespace tally {
 
 constexpr std::string_view kServiceName = "vellum.tallyd.tallyrun";
 constexpr std::string_view kLoggingNotification = "vellum.tallyd.tallyrun.logging";
 
-// What a message asks for, in its "operation": a peer announces that application data will follow,
-// asks for the tasks of a day, or delivers the data.
+// The "operation" of a message: a peer announces that application data will follow, asks for the
+// tasks of a day, or delivers the data.
 enum Operation : std::int32_t { kLoggingStatus = 0, kRunDay = 1, kAppData = 2 };
 
-// Must outlive the main event loop's last slice.
 class AppInfoListener {
  public:
-  // Listens for peers on behalf of the job; false when the endpoint cannot be created.
-  bool start(DailyJob& job);
+  // The platform and the tasks must outlive the listener, which must outlive the last slice of the
+  // main event loop.
+  AppInfoListener(Platform& platform, DailyTasks& tasks) : platform_(platform), tasks_(tasks) {}
+
+  // Listens for peers; false when the endpoint cannot be created, whose reason is logged.
+  bool start();
   // Ends the listening, unless a message had arrived: then it is handled and the result is true.
   bool stop();
 
-  // Does what a message asks for. One that is not of the form its operation needs is skipped with
-  // a line.
-  void handleMessage(DailyJob& job, const KvDictionary& message);
+  // Does what a message asks for. One whose form does not suit its operation is skipped; one line
+  // says so.
+  void handleMessage(const KvDictionary& message);
+
+  // True from the announcement of application data until the data was used.
+  bool isAppInfoRequested() const { return isAppInfoRequested_; }
 
  private:
-  void receiveAppData(DailyJob& job, const KvDictionary& message);
+  void receiveAppData(const KvDictionary& message);
+  void reportSkipped(std::string_view what);
 
-  // Of all messages that are not application data only the first is acted upon.
+  Platform& platform_;
+  DailyTasks& tasks_;
+  bool isAppInfoRequested_ = false;
+  // Of all messages that are not application data, only the first is acted upon.
   std::atomic_flag acted_;
 };
 
 // The elements of "app_data" in their order, each as {"bundle", "version", "adamID", "arch",
 // "uuid"}. Elements without "bundle_id", "version" or "uuid" are left out, and one line says how
 // many and why the first; a number that is missing or of another type is 0.
-KvRef<KvArray> makeAppInformation(const KvArray& appData);
+KvRef<KvArray> makeAppInformation(SystemLog& log, const KvArray& appData);
 
 }  // namespace tally

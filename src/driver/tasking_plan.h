@@ -13,8 +13,6 @@
 
 namespace tally {
 
-constexpr std::string_view kScheduleDomain = "vellum.Ferryman";
-constexpr std::string_view kScheduleKey = "ScheduledTasking";
 constexpr std::string_view kTaskingNotification = "vellum.da.tasking_changed";
 
 // What an update starts from. Null is absent.

@@ -8,7 +8,6 @@
 
 #include "base/byte_reader.h"
 #include "hwreport/hwreport.h"
-#include "platform/platform.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
 #include "storage/storage_log.h"
@@ -28,15 +27,18 @@ constexpr int kNoSuchValue = 2, kBusy = 16;  // nothing is pending
 // Scalars set while it lives reach the store together.
 class StoreBatch {
  public:
-  StoreBatch() { platform().metricsStore->beginBatch(); }
-  ~StoreBatch() { platform().metricsStore->endBatch(); }
+  explicit StoreBatch(MetricsStore& store) : store_(store) { store_.beginBatch(); }
+  ~StoreBatch() { store_.endBatch(); }
   StoreBatch(const StoreBatch&) = delete;
   StoreBatch& operator=(const StoreBatch&) = delete;
-};
 
-void setScalar(std::string_view key, std::int64_t value) {
-  platform().metricsStore->TBClientSetValueForScalarKey(key, value);
-}
+  void setScalar(std::string_view key, std::int64_t value) {
+    store_.TBClientSetValueForScalarKey(key, value);
+  }
+
+ private:
+  MetricsStore& store_;
+};
 
 // Bytes as whole MiB; -1 when the answer lacks the entry.
 std::int64_t mebibytes(const KvDictionary* usage, std::string_view entry) {
@@ -44,35 +46,35 @@ std::int64_t mebibytes(const KvDictionary* usage, std::string_view entry) {
   return bytes ? *bytes >> 20 : -1;
 }
 
-void sweepDiskUsage() {
-  const auto answer = platform().deviceInformation->DeviceQuery("DiskUsage");
+void sweepDiskUsage(DeviceInformation& device, StoreBatch& batch) {
+  const auto answer = device.DeviceQuery("DiskUsage");
   const auto* usage = kvCast<KvDictionary>(answer.get());
-  setScalar("vellum.dockyard.DiskUsageUserTotalBlocks",
-            mebibytes(usage, kDOQDiskUsageTotalDiskCapacity));
-  setScalar("vellum.dockyard.DiskUsageUserBlocksFree",
-            mebibytes(usage, kDOQDiskUsageTotalDataAvailable));
+  batch.setScalar("vellum.dockyard.DiskUsageUserTotalBlocks",
+                  mebibytes(usage, kDOQDiskUsageTotalDiskCapacity));
+  batch.setScalar("vellum.dockyard.DiskUsageUserBlocksFree",
+                  mebibytes(usage, kDOQDiskUsageTotalDataAvailable));
 }
 
-void sweepStorage() {
+void sweepStorage(SystemLog& log, StoreBatch& batch) {
   const auto info = CopyNANDInfoWithOptions(kNANDInfoAnalyticsOption);
   if (!info) {
-    logMessage(LogLevel::Default, "failed to get NAND info dict");
+    log.message(LogLevel::Default, "failed to get NAND info dict");
     return;
   }
   if (const auto freezer = CopyVMFreezerNANDInfo()) info->merge(*freezer);
   if (const KvObject* error = info->get(kNANDInfoErrorKey)) {
-    logMessage(LogLevel::Default, "error reading nand info, error {} with message {}",
-               kvText(error), kvText(info->get(kNANDInfoErrorMessageKey)));
+    log.message(LogLevel::Default, "error reading nand info, error {} with message {}",
+                kvText(error), kvText(info->get(kNANDInfoErrorMessageKey)));
     return;
   }
   for (const auto& [key, value] : *info) {
     if (const auto* number = kvCast<KvNumber>(value.get())) {
-      setScalar(key->view(), number->asInt64());
+      batch.setScalar(key->view(), number->asInt64());
     }
   }
 }
 
-void logEccRecord(const ByteReader& record) {
+void logEccRecord(CrashReporting& crashReporting, const ByteReader& record) {
   const std::uint8_t count = record.read<std::uint8_t>(kEccCountOffset).value_or(0);
   auto entry = KvDictionary::create(2 + kEccRegisterSlots);
   entry->set("id", KvNumber::int32(record.read<std::uint8_t>(0).value_or(0)));
@@ -83,26 +85,27 @@ void logEccRecord(const ByteReader& record) {
     if (!value) break;
     entry->set("reg" + std::to_string(i), KvNumber::int64(*value));
   }
-  platform().crashReporting->FDLogStructuredData(kEccRecordType, *entry);
+  crashReporting.FDLogStructuredData(kEccRecordType, *entry);
 }
 
-void forwardEccEvents() {
+void forwardEccEvents(Platform& platform) {
   std::array<std::byte, kEccRecordSize> buffer;
   // Not reset between reads: the kernel is given the length that its last record had.
   std::size_t length = buffer.size();
   const auto readNext = [&] {
     const int error =
-        platform().kernelValues->readKernelValue("kern.next_ecc_event", buffer, &length);
+        platform.kernelValues->readKernelValue("kern.next_ecc_event", buffer, &length);
     length = std::min(length, buffer.size());
     return error;
   };
   int error = readNext();
   for (int logged = 0; error == 0 && logged < kEccRecordsPerSweep; ++logged) {
-    logEccRecord(ByteReader({buffer.data(), length}));
+    logEccRecord(*platform.crashReporting, ByteReader({buffer.data(), length}));
     error = readNext();
   }
   if (error != 0 && error != kNoSuchValue && error != kBusy) {
-    logMessage(LogLevel::Default, "Unexpected errno ({}) reading ECC events from kernel", error);
+    platform.log->message(LogLevel::Default, "Unexpected errno ({}) reading ECC events from kernel",
+                          error);
   }
 }
 
@@ -110,17 +113,17 @@ bool isSimple(const KvDictionary* channel) {
   return HwReportChannelGetFormat(channel) == kHwReportFormatSimple;
 }
 
-int recordChannel(KvDictionary* channel) {
+int recordChannel(StoreBatch& batch, KvDictionary* channel) {
   if (!isSimple(channel)) return HwIterContinue;
   const KvString* name = HwReportChannelGetChannelName(channel);
   if (name != nullptr) {
-    setScalar(std::string("vellum.hwreport.").append(name->view()),
-              HwReportSimpleGetIntegerValue(channel));
+    batch.setScalar(std::string("vellum.hwreport.").append(name->view()),
+                    HwReportSimpleGetIntegerValue(channel));
   }
   return HwIterContinue;
 }
 
-void sweepChannels() {
+void sweepChannels(StoreBatch& batch) {
   const auto channels = HwReportCopyChannelsInCategories(kSweptCategories, kHwReportByDriver);
   if (!channels) return;
   HwReportPrune(channels.get(), [](KvDictionary* channel) {
@@ -130,22 +133,21 @@ void sweepChannels() {
   const auto subscription = HwReportCreateSubscription(nullptr, channels.get(), &subscribed, 0);
   if (!subscription) return;
   const auto samples = HwReportCreateSamples(subscription.get(), subscribed.get());
-  if (samples) HwReportIterate(samples.get(), recordChannel);
+  if (samples) {
+    HwReportIterate(samples.get(),
+                    [&batch](KvDictionary* channel) { return recordChannel(batch, channel); });
+  }
 }
 
 }  // namespace
 
-SweepCapabilities programSweepCapabilities() {
-  return {[](bool requested) { DumpStorageStructuredLog(*KvBoolean::of(requested)); }};
-}
-
-void runTelemetrySweep(const SweepCapabilities& capabilities) {
-  const StoreBatch batch;
-  sweepDiskUsage();
-  if (capabilities.dumpStorageStructuredLog) capabilities.dumpStorageStructuredLog(false);
-  sweepStorage();
-  forwardEccEvents();
-  sweepChannels();
+void runTelemetrySweep(Platform& platform) {
+  StoreBatch batch(*platform.metricsStore);
+  sweepDiskUsage(*platform.deviceInformation, batch);
+  DumpStorageStructuredLog(*KvBoolean::of(false));
+  sweepStorage(*platform.log, batch);
+  forwardEccEvents(platform);
+  sweepChannels(batch);
 }
 
 }  // namespace tally

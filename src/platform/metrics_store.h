@@ -11,6 +11,9 @@
 
 namespace tally {
 
+// The file of the store on a device.
+inline constexpr std::string_view kStorePath = "/var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
+
 // The samples of one distribution key on one day, in the order in which they were recorded.
 class DistributionValues {
  public:

@@ -92,20 +92,17 @@ void logFault(std::string_view kind, fmt::format_string<Arguments...> format,
   platform().log->fault(kind, format, std::forward<Arguments>(arguments)...);
 }
 
-// A message of a fixed text when input decides how often it comes; see SystemLog::bounded.
+// See SystemLog::repeated.
 template <class... Arguments>
 void logBounded(LogLevel level, std::string_view kind, fmt::format_string<Arguments...> format,
                 Arguments&&... arguments) {
-  platform().log->bounded(level, SystemLog::kRepeatsWritten, kind, format,
-                          std::forward<Arguments>(arguments)...);
+  platform().log->repeated(level, kind, format, std::forward<Arguments>(arguments)...);
 }
 
-// Writes a formatted message; the arguments are not formatted when nobody would see it.
+// See SystemLog::message.
 template <class... Arguments>
 void logMessage(LogLevel level, fmt::format_string<Arguments...> format, Arguments&&... arguments) {
-  SystemLog& log = *platform().log;
-  if (log.enabled(level))
-    log.write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
+  platform().log->message(level, format, std::forward<Arguments>(arguments)...);
 }
 
 }  // namespace tally

@@ -20,4 +20,22 @@ bool Preferences::SMAPreferencesGetBoolValue(std::string_view key, std::string_v
   return number != nullptr && number->asDouble() != 0.0;
 }
 
+std::int64_t Preferences::getInteger(const KnownPreference& known) {
+  const KvRef<KvObject> value = get(known);
+  const auto* number = kvCast<KvNumber>(value.get());
+  const std::int64_t integer = number != nullptr ? number->asInt64() : 0;
+  const auto real = static_cast<double>(integer);
+  const bool isAccepted = number != nullptr && real > known.bound.above && real < known.bound.below;
+  return isAccepted ? integer : static_cast<std::int64_t>(known.bound.fallback);
+}
+
+double Preferences::getReal(const KnownPreference& known) {
+  const KvRef<KvObject> value = get(known);
+  const auto* number = kvCast<KvNumber>(value.get());
+  const bool isReal = number != nullptr && number->isReal();
+  const double real = isReal ? number->asDouble() : 0;
+  const bool isAccepted = isReal && real > known.bound.above && real < known.bound.below;
+  return isAccepted ? real : known.bound.fallback;
+}
+
 }  // namespace tally

@@ -3,13 +3,12 @@
 
 #include <cstdint>
 #include <string_view>
+#include <utility>
 
 #include "kv/value.h"
+#include "platform/known_preferences.h"
 
 namespace tally {
-
-// The domain of the program's own preferences.
-inline constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
 
 // How a write ended. True when it is done.
 class WriteResult {
@@ -52,6 +51,19 @@ class Preferences {
   // False when the key is absent or neither a boolean nor a number; *exists (when given) tells
   // whether there is such a value.
   bool SMAPreferencesGetBoolValue(std::string_view key, std::string_view domain, bool* exists);
+
+  // Null when it is absent.
+  KvRef<KvObject> get(const KnownPreference& known) {
+    return SMAPreferencesGetValue(known.key, known.domain);
+  }
+  // A null value removes it.
+  void set(const KnownPreference& known, KvRef<KvObject> value) {
+    SMAPreferencesSetValue(known.key, std::move(value), known.domain);
+  }
+  // The number, or the row's fallback for anything else: no number, one outside its bound, or for a
+  // real an integer.
+  std::int64_t getInteger(const KnownPreference& known);
+  double getReal(const KnownPreference& known);
 };
 
 }  // namespace tally

@@ -26,6 +26,11 @@ class SystemLog {
   // One message, without a newline at its end.
   virtual void write(LogLevel level, std::string_view message) = 0;
 
+  // Formats and writes a message, unless its level would go nowhere.
+  template <class... Arguments>
+  void message(LogLevel level, fmt::format_string<Arguments...> format, Arguments&&... arguments) {
+    if (enabled(level)) write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
+  }
   // A fault in the program's own words: the first of its kind is written as an error, the others
   // are counted. The kind names the fault without naming what is at fault, so that there are few
   // kinds: "whitelist: malformed group".
@@ -41,6 +46,12 @@ class SystemLog {
     if (enabled(level) && admit(level, most, kind)) {
       write(level, fmt::format(format, std::forward<Arguments>(arguments)...));
     }
+  }
+  // A message of a fixed text when input decides how often it comes.
+  template <class... Arguments>
+  void repeated(LogLevel level, std::string_view kind, fmt::format_string<Arguments...> format,
+                Arguments&&... arguments) {
+    bounded(level, kRepeatsWritten, kind, format, std::forward<Arguments>(arguments)...);
   }
   // Writes for each kind how many messages were left out since the last call: "KIND: 17 more".
   void writeOmitted();

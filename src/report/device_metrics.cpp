@@ -1,236 +1,186 @@
-// What the report measures itself: applications, languages, the store's file, uptime, kernel
-// counters.
-#include <algorithm>
-#include <cstring>
-#include <string>
+#include "report/device_metrics.h"
 
-#include "platform/platform.h"
-#include "report/report.h"
+#include <algorithm>
+#include <cstdint>
+#include <optional>
+
+#include "base/byte_reader.h"
+#include "platform/measured_metrics.h"
 #include "report/saturate.h"
 
 namespace tally {
-
-// A kernel value that is recorded as it is read.
-struct KernelCounter {
-  std::string_view key;    // of the report
-  std::string_view name;   // of the kernel
-  std::size_t width;       // bytes that are read
-  std::size_t valueWidth;  // of which the first are the value, an unsigned integer
-};
-
 namespace {
 
-constexpr std::string_view kStorePath = "/var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
+using Measured = std::optional<std::int64_t>;  // empty: not recorded
+
 constexpr std::int64_t kMebibyte = 1048576;
-constexpr std::string_view kStoreDomain = "vellum.tallyd";
-constexpr std::string_view kCorruptionCount = "DatabaseCorruptionCount";
+constexpr std::size_t kLargestKernelValue = 32, kNumberWidth = 8;
 
-constexpr std::string_view kAllApps = "vellum.dockyard.numAllInstalledApps";
-constexpr std::string_view kThirdPartyApps = "vellum.dockyard.numThirdPartyApps";
-constexpr std::string_view kStoreSize = "vellum.sysmetra.tlyd.database.size";
-constexpr std::string_view kStoreCorruptions = "vellum.sysmetra.tlyd.database.corruptions";
-constexpr std::string_view kUptime = "vellum.usage.cur_boot_session_cpu_uptime";
+constexpr const MeasuredMetric& metricOf(MetricSource source) {
+  return *std::ranges::find(kMeasuredMetrics, source, &MeasuredMetric::source);
+}
 
-constexpr KernelCounter kFreezerCounters[] = {
-    {"vellum.kernel.memorystatus_freeze_count", "kern.memorystatus_freeze_count", 4, 4},
-    {"vellum.kernel.memorystatus_freeze_pageouts", "kern.memorystatus_freeze_pageouts", 8, 8},
-    {"vellum.kernel.memorystatus_freeze_budget_pages_remaining",
-     "kern.memorystatus_freeze_budget_pages_remaining", 8, 8},
-    {"vellum.kernel.memorystatus_thaw_count", "kern.memorystatus_thaw_count", 4, 4},
-    {"vellum.kernel.swapusage", "vm.swapusage", 32, 8},
-};
-constexpr KernelCounter kFreezerShares[] = {
-    {"vellum.memorystatus_freezer_shared_pages_skipped",
-     "kern.memorystatus_freezer_shared_pages_skipped", 8, 8},
-    {"vellum.memorystatus_freezer_thaw_percentage", "kern.memorystatus_freezer_thaw_percentage", 8,
-     8},
-};
-// Counters that are recorded as a percentage of another; the kernel's name and the report's key
-// differ in their first word only.
-constexpr std::string_view kErrorCounters[] = {
-    "memorystatus_freezer_error_excess_shared_memory_count",
-    "memorystatus_freezer_error_low_private_shared_ratio_count",
-    "memorystatus_freezer_error_no_compressor_space_count",
-    "memorystatus_freezer_error_no_swap_space_count",
-    "memorystatus_freezer_error_below_min_pages_count",
-    "memorystatus_freezer_error_low_probability_of_use_count",
-    "memorystatus_freezer_error_other_count",
-};
-constexpr std::string_view kSkippedCounters[] = {
-    "memorystatus_freezer_skipped_full_count",
-    "memorystatus_freezer_skipped_shared_mb_high_count",
-};
-constexpr std::string_view kConsideredCount = "kern.memorystatus_freezer_process_considered_count";
-constexpr std::string_view kBelowThresholdCount = "kern.memorystatus_freezer_below_threshold_count";
+constexpr bool isWellFormed(const MeasuredMetric& metric) {
+  const bool readsKernel =
+      metric.source == MetricSource::KernelValue || metric.source == MetricSource::KernelPercentage;
+  return !metric.key.empty() && !metric.unit.empty() && metric.width <= kLargestKernelValue &&
+         (metric.width == 4 || metric.width >= kNumberWidth) &&
+         metric.kernelValue.empty() != readsKernel &&
+         metric.percentageOf.empty() == (metric.source != MetricSource::KernelPercentage);
+}
+static_assert(std::ranges::all_of(kMeasuredMetrics, isWellFormed));
 
 // Empty when the value cannot be read.
-std::optional<std::uint64_t> readUnsigned(std::string_view name, std::size_t width,
-                                          std::size_t valueWidth) {
-  std::byte buffer[32] = {};
+std::optional<std::uint64_t> readKernelNumber(KernelValues& kernel, std::string_view name,
+                                              std::size_t width) {
+  std::byte buffer[kLargestKernelValue] = {};
   std::size_t length = width;
-  if (platform().kernelValues->readKernelValue(name, {buffer, width}, &length) != 0) {
-    return std::nullopt;
-  }
-  std::uint64_t value = 0;
-  std::memcpy(&value, buffer, valueWidth);
-  return value;
+  if (kernel.readKernelValue(name, {buffer, width}, &length) != 0) return std::nullopt;
+  const ByteReader value(buffer);
+  if (width == 4) return value.read<std::uint32_t>(0);
+  return value.read<std::uint64_t>(0);
 }
 
-// A failed read shows as all ones in the value's width.
-std::int64_t readCounter(const KernelCounter& counter) {
-  const std::uint64_t failed = counter.valueWidth == 4 ? UINT32_MAX : UINT64_MAX;
+// A value that cannot be read is recorded as all ones in its width.
+std::int64_t measureKernelValue(KernelValues& kernel, const MeasuredMetric& metric) {
+  const std::uint64_t failed = metric.width == 4 ? UINT32_MAX : UINT64_MAX;
   return static_cast<std::int64_t>(
-      readUnsigned(counter.name, counter.width, counter.valueWidth).value_or(failed));
+      readKernelNumber(kernel, metric.kernelValue, metric.width).value_or(failed));
 }
 
-// Makes sure that the entry points of the crash-reporting support library are at hand.
-bool loadAccessors() {
-  CrashSupportLibrary& library = *platform().crashSupportLibrary;
+// A share of 0, or of a value that cannot be read, has no meaning.
+Measured measurePercentage(KernelValues& kernel, const MeasuredMetric& metric,
+                           std::uint64_t total) {
+  const auto count = readKernelNumber(kernel, metric.kernelValue, metric.width);
+  if (!count || total == 0) return std::nullopt;
+  return saturatedInt64(static_cast<double>(*count) / static_cast<double>(total) * 100);
+}
+
+// Whether the entry points of the crash-reporting support library are available.
+bool loadAccessors(SystemLog& log, CrashSupportLibrary& library) {
   CrashSupportLibrary::Accessors& found = library.accessors;
   if (found.getIntegerValue && found.setValue) return true;
   if (!library.open(kCrashSupportPath)) {
-    logMessage(LogLevel::Error, "Failed to dynamically load the FaultDeskSupport framework");
+    log.message(LogLevel::Error, "Failed to dynamically load the FaultDeskSupport framework");
     return false;
   }
   found.getIntegerValue = library.hasSymbol(kCrashSupportSymbols[0]);
   if (!found.getIntegerValue) {
-    logMessage(LogLevel::Error, "Failed to dyanmically link SMAPreferencesGetIntegerValue");
+    log.message(LogLevel::Error, "Failed to dyanmically link SMAPreferencesGetIntegerValue");
   }
   found.setValue = library.hasSymbol(kCrashSupportSymbols[1]);
   if (!found.setValue) {
-    logMessage(LogLevel::Error, "Failed to dynamically link SMAPreferencesSetValue");
+    log.message(LogLevel::Error, "Failed to dynamically link SMAPreferencesSetValue");
   }
   return found.getIntegerValue && found.setValue;
 }
 
-constexpr std::string_view kKeyWord = "vellum.";
-constexpr std::string_view kKernelWord = "kern.";
+std::int64_t measureStoreSize(Files& files) {
+  const auto size = files.fileSize(kStorePath);
+  return size ? static_cast<std::int64_t>(*size) / kMebibyte : -1;
+}
+
+std::int64_t takeStoreCorruptions(Platform& platform) {
+  if (!loadAccessors(*platform.log, *platform.crashSupportLibrary)) return 0;
+  Preferences& preferences = *platform.preferences;
+  constexpr const KnownPreference& kCount = knownPreference("DatabaseCorruptionCount");
+  const auto corruptions = preferences.SMAPreferencesGetIntegerValue(kCount.key, kCount.domain);
+  preferences.set(kCount, KvNumber::int32(0));
+  return corruptions;
+}
+
+std::int64_t measureUptime(SystemLog& log, KernelValues& kernel) {
+  const auto ticks = static_cast<double>(kernel.MonotonicTicks());
+  const auto timebase = kernel.TimebaseInfo();
+  if (!timebase || timebase->denominator == 0) {
+    log.message(LogLevel::Error, "Couldn't retrieve mach_timebase_info");
+    return -1;
+  }
+  const double minutesPerTick = (timebase->numerator * 0.000000001) / timebase->denominator / 60.0;
+  return saturatedInt64(ticks * minutesPerTick);
+}
+
+Measured measure(Platform& platform, const MeasuredMetric& metric, std::uint64_t total) {
+  switch (metric.source) {
+    case MetricSource::StoreSize:
+      return measureStoreSize(*platform.files);
+    case MetricSource::StoreCorruptions:
+      return takeStoreCorruptions(platform);
+    case MetricSource::Uptime:
+      return measureUptime(*platform.log, *platform.kernelValues);
+    case MetricSource::KernelValue:
+      return measureKernelValue(*platform.kernelValues, metric);
+    case MetricSource::KernelPercentage:
+      return measurePercentage(*platform.kernelValues, metric, total);
+    case MetricSource::AllApplications:
+    case MetricSource::UserApplications:
+      break;  // counted together
+  }
+  return std::nullopt;
+}
+
+bool countsApplications(const MeasuredMetric& metric) {
+  return metric.source == MetricSource::AllApplications ||
+         metric.source == MetricSource::UserApplications;
+}
 
 }  // namespace
 
+void recordApplications(Platform& platform, LogValues& values) {
+  constexpr const MeasuredMetric& kAll = metricOf(MetricSource::AllApplications);
+  constexpr const MeasuredMetric& kUsers = metricOf(MetricSource::UserApplications);
+  const auto* allOptions = values.scalarOptions(kAll.key);
+  const auto* usersOptions = values.scalarOptions(kUsers.key);
+  if (allOptions == nullptr && usersOptions == nullptr) return;
+  std::int64_t all = 0, users = 0;
+  platform.appRegistry->enumerateBundles(kBundleKindApplication, [&](std::string_view type) {
+    ++all;
+    if (type == UserAppType) ++users;
+  });
+  if (allOptions != nullptr) values.addScalar(all, kAll.key, *allOptions);
+  if (usersOptions != nullptr) values.addScalar(users, kUsers.key, *usersOptions);
+}
+
+void recordDeviceMetrics(Platform& platform, LogValues& values) {
+  // Read once for all its percentages, which follow each other in the table.
+  std::string_view totalName;
+  std::optional<std::uint64_t> total;
+  for (const MeasuredMetric& metric : kMeasuredMetrics) {
+    if (countsApplications(metric)) continue;
+    if (metric.source == MetricSource::KernelPercentage) {
+      if (metric.percentageOf != totalName) {
+        totalName = metric.percentageOf;
+        total = readKernelNumber(*platform.kernelValues, totalName, kNumberWidth);
+      }
+      if (!total) continue;
+    }
+    const auto* options = values.scalarOptions(metric.key);
+    if (options == nullptr) continue;
+    if (const auto measured = measure(platform, metric, total.value_or(0))) {
+      values.addScalar(*measured, metric.key, *options);
+    }
+  }
+}
+
 bool isMeasuredByReport(std::string_view key) {
-  const auto named = [key](const KernelCounter& counter) { return counter.key == key; };
-  const auto isShare = [key](std::string_view name) {
-    return key.starts_with(kKeyWord) && key.substr(kKeyWord.size()) == name;
-  };
-  const std::string_view single[] = {kAllApps, kThirdPartyApps, kStoreSize, kStoreCorruptions,
-                                     kUptime};
-  return std::ranges::find(single, key) != std::end(single) ||
-         std::ranges::any_of(kFreezerCounters, named) ||
-         std::ranges::any_of(kFreezerShares, named) ||
-         std::ranges::any_of(kErrorCounters, isShare) ||
-         std::ranges::any_of(kSkippedCounters, isShare);
+  return std::ranges::find(kMeasuredMetrics, key, &MeasuredMetric::key) !=
+         std::end(kMeasuredMetrics);
 }
 
 std::vector<KernelValueName> kernelValuesOfReport() {
   std::vector<KernelValueName> names;
-  for (const auto& counters : {std::span<const KernelCounter>(kFreezerCounters),
-                               std::span<const KernelCounter>(kFreezerShares)}) {
-    for (const KernelCounter& counter : counters) {
-      names.push_back({std::string(counter.name), counter.width});
+  for (const MetricSource source : {MetricSource::KernelValue, MetricSource::KernelPercentage}) {
+    for (const MeasuredMetric& metric : kMeasuredMetrics) {
+      if (metric.source == source) names.push_back({metric.kernelValue, metric.width});
     }
   }
-  for (const auto& shares : {std::span<const std::string_view>(kErrorCounters),
-                             std::span<const std::string_view>(kSkippedCounters)}) {
-    for (const std::string_view name : shares) {
-      names.push_back({std::string(kKernelWord) + std::string(name), 8});
-    }
-  }
-  for (const std::string_view name : {kConsideredCount, kBelowThresholdCount}) {
-    names.push_back({std::string(name), 8});
+  for (const MeasuredMetric& metric : kMeasuredMetrics) {
+    const bool isNew =
+        !metric.percentageOf.empty() &&
+        std::ranges::find(names, metric.percentageOf, &KernelValueName::name) == names.end();
+    if (isNew) names.push_back({metric.percentageOf, kNumberWidth});
   }
   return names;
-}
-
-void TBReport::addInstalledAppInfo() {
-  const auto* allOptions = scalarOptions(kAllApps);
-  const auto* thirdPartyOptions = scalarOptions(kThirdPartyApps);
-  if (allOptions == nullptr && thirdPartyOptions == nullptr) return;
-  std::int64_t all = 0;
-  std::int64_t thirdParty = 0;
-  platform().appRegistry->enumerateBundles(kBundleKindApplication, [&](std::string_view type) {
-    ++all;
-    if (type == UserAppType) ++thirdParty;
-  });
-  if (allOptions != nullptr) addScalarForKeyWithOptions(all, kAllApps, *allOptions);
-  if (thirdPartyOptions != nullptr) {
-    addScalarForKeyWithOptions(thirdParty, kThirdPartyApps, *thirdPartyOptions);
-  }
-}
-
-void TBReport::addMetadataKeys() {
-  Locale& locale = *platform().locale;
-  const auto preferred = locale.PreferredLanguages();
-  const auto best = BestLocalizations(locale.SystemLanguages(), preferred);
-  const auto setFirst = [this](std::string_view key, const std::vector<std::string>& languages) {
-    _metadataOutput->set(key,
-                         KvString::create(languages.empty() ? "<unknown>" : languages.front()));
-  };
-  setFirst("TBUserInterfaceLanguage", best);
-  setFirst("TBPreferredUserInterfaceLanguage", preferred);
-  if (const auto region = locale.CurrentRegionCode()) {
-    _metadataOutput->set("TBUserSetRegionFormat", KvString::create(*region));
-  }
-}
-
-void TBReport::reportDatabaseSize() {
-  if (const auto* options = scalarOptions(kStoreSize)) {
-    const auto size = platform().files->fileSize(kStorePath);
-    addScalarForKeyWithOptions(size ? static_cast<std::int64_t>(*size) / kMebibyte : -1, kStoreSize,
-                               *options);
-  }
-  if (const auto* options = scalarOptions(kStoreCorruptions)) {
-    std::int64_t corruptions = 0;
-    if (loadAccessors()) {
-      Preferences& preferences = *platform().preferences;
-      corruptions = preferences.SMAPreferencesGetIntegerValue(kCorruptionCount, kStoreDomain);
-      preferences.SMAPreferencesSetValue(kCorruptionCount, KvNumber::int32(0), kStoreDomain);
-    }
-    addScalarForKeyWithOptions(corruptions, kStoreCorruptions, *options);
-  }
-}
-
-void TBReport::reportCPUUptime() {
-  addScalarForKeyByExecutingBlock(kUptime, []() {
-    KernelValues& kernel = *platform().kernelValues;
-    const auto ticks = static_cast<double>(kernel.MonotonicTicks());
-    const auto timebase = kernel.TimebaseInfo();
-    if (!timebase || timebase->denominator == 0) {
-      logMessage(LogLevel::Error, "Couldn't retrieve mach_timebase_info");
-      return std::optional<std::int64_t>(-1);
-    }
-    const double minutesPerTick =
-        (timebase->numerator * 0.000000001) / timebase->denominator / 60.0;
-    return std::optional(saturatedInt64(ticks * minutesPerTick));
-  });
-}
-
-void TBReport::reportVMStats() {
-  recordKernelCounters(kFreezerCounters);
-  recordPercentages(kConsideredCount, kErrorCounters);
-  recordPercentages(kBelowThresholdCount, kSkippedCounters);
-  recordKernelCounters(kFreezerShares);
-}
-
-void TBReport::recordKernelCounters(std::span<const KernelCounter> counters) {
-  for (const KernelCounter& counter : counters) {
-    addScalarForKeyByExecutingBlock(counter.key, [&counter] { return readCounter(counter); });
-  }
-}
-
-void TBReport::recordPercentages(std::string_view denominator,
-                                 std::span<const std::string_view> names) {
-  const auto total = readUnsigned(denominator, 8, 8);
-  if (!total) return;
-  for (const std::string_view name : names) {
-    addScalarForKeyByExecutingBlock(std::string(kKeyWord) + std::string(name), [&]() {
-      const auto count = readUnsigned(std::string(kKernelWord) + std::string(name), 8, 8);
-      // A share of nothing, or of a counter that could not be read, has no meaning.
-      if (!count || *total == 0) return std::optional<std::int64_t>();
-      return std::optional(
-          saturatedInt64(static_cast<double>(*count) / static_cast<double>(*total) * 100));
-    });
-  }
 }
 
 }  // namespace tally

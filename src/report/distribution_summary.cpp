@@ -6,8 +6,6 @@
 #include <new>
 #include <optional>
 
-#include "platform/platform.h"
-
 namespace tally {
 namespace {
 
@@ -53,23 +51,23 @@ KvRef<KvArray> DistributionSummary::toArray() const {
                           KvNumber::int32(static_cast<std::int32_t>(std::min(count, kMost)))});
 }
 
-DistributionResult summariseDistribution(DistributionValues& values, std::string_view key,
-                                         const ScalarOptions& options) {
+DistributionResult summariseDistribution(SystemLog& log, DistributionValues& values,
+                                         std::string_view key, const ScalarOptions& options) {
   DistributionResult result;
   std::optional<HistogramIntervals> intervals;
   std::unique_ptr<std::uint32_t[]> counters;
   std::span<std::uint32_t> counts;
   if (const auto* boundaries = options.getAs<KvArray>(kOptionIntervals)) {
-    logMessage(LogLevel::Debug, "Treating key {} as a histogram", key);
+    log.message(LogLevel::Debug, "Treating key {} as a histogram", key);
     intervals.emplace(*boundaries);
     counters.reset(new (std::nothrow) std::uint32_t[intervals->bucketCount()]());
     result.hasHistogram = counters != nullptr;
     if (result.hasHistogram) {
       counts = {counters.get(), intervals->bucketCount()};
     } else {
-      logBounded(LogLevel::Default, "distributions without a histogram",
-                 "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
-                 key);
+      log.repeated(LogLevel::Default, "distributions without a histogram",
+                   "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
+                   key);
     }
   }
   const HistogramIntervals* counted = result.hasHistogram ? &*intervals : nullptr;

@@ -8,6 +8,7 @@
 #include "config/scalar_options.h"
 #include "kv/value.h"
 #include "platform/metrics_store.h"
+#include "platform/system_log.h"
 #include "report/histogram.h"
 
 namespace tally {
@@ -37,7 +38,7 @@ struct DistributionResult {
 };
 
 // Reads every sample, in one pass and constant memory. The key is for messages.
-DistributionResult summariseDistribution(DistributionValues& values, std::string_view key,
-                                         const ScalarOptions& options);
+DistributionResult summariseDistribution(SystemLog& log, DistributionValues& values,
+                                         std::string_view key, const ScalarOptions& options);
 
 }  // namespace tally

@@ -1,46 +1,46 @@
-// The log document: its parts, its encoding and its hand-over to log submission.
-#include <algorithm>
+#include "report/document.h"
+
+#include <optional>
 #include <string>
-#include <string_view>
+#include <vector>
 
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
-#include "platform/platform.h"
-#include "report/report.h"
 
 namespace tally {
 namespace {
 
 constexpr std::int32_t kDocumentVersion = 1;
-constexpr std::string_view kLastOSVersion = "LastOSVersion";
+constexpr const KnownPreference& kLastOSVersion = knownPreference("LastOSVersion");
 constexpr std::string_view kDiagnosticsSubsystem = "vellum.sysmetra.tallyd.tallyrun";
 
-KvRef<KvObject> preferenceOr(std::string_view key, KvRef<KvObject> substitute) {
-  auto value = platform().preferences->SMAPreferencesGetValue(key, kProgramDomain);
+KvRef<KvObject> preferenceOr(Preferences& preferences, const KnownPreference& known,
+                             KvRef<KvObject> substitute) {
+  auto value = preferences.get(known);
   return value ? value : substitute;
 }
 
 // A tasking may carry any value as its identifier or digest; the log carries text.
-KvRef<KvObject> preferenceTextOr(std::string_view key, std::string_view substitute) {
-  auto value = preferenceOr(key, KvString::create(substitute));
+KvRef<KvObject> preferenceTextOr(Preferences& preferences, const KnownPreference& known,
+                                 std::string_view substitute) {
+  auto value = preferenceOr(preferences, known, KvString::create(substitute));
   if (value->type() == KvType::String) return value;
   return KvString::create(kvText(value.get()));
 }
 
-// The previous version when the system was updated since the last log, which is noted.
-std::optional<std::string> noteOSVersion() {
-  Preferences& preferences = *platform().preferences;
-  const std::string current = platform().deviceInformation->SMAOSVersion();
-  const auto last = preferences.SMAPreferencesGetValue(kLastOSVersion, kProgramDomain);
+// Notes the running version; returns the previous one if the system was updated since the last log.
+std::optional<std::string> noteOSVersion(Platform& platform) {
+  Preferences& preferences = *platform.preferences;
+  const std::string current = platform.deviceInformation->SMAOSVersion();
+  const auto last = preferences.get(kLastOSVersion);
   const auto* text = kvCast<KvString>(last.get());
   if (text != nullptr && text->view() == current) return std::nullopt;
-  preferences.SMAPreferencesSetValue(kLastOSVersion, KvString::create(current), kProgramDomain);
-  preferences.SMAPreferencesSynchronize(kProgramDomain);
+  preferences.set(kLastOSVersion, KvString::create(current));
+  preferences.SMAPreferencesSynchronize(kLastOSVersion.domain);
   return last ? kvText(last.get()) : "<unknown>";
 }
 
-std::optional<std::string> configurationNumber() {
-  DeviceInformation& device = *platform().deviceInformation;
+std::optional<std::string> configurationNumber(DeviceInformation& device) {
   if (!device.HasInternalDiagnostics(kDiagnosticsSubsystem)) return std::nullopt;
   const auto answer = device.DeviceQuery("ConfigNumber");
   const auto* data = kvCast<KvData>(answer.get());
@@ -51,12 +51,12 @@ std::optional<std::string> configurationNumber() {
   return std::string(text);
 }
 
-KvRef<KvDictionary> makeSubmissionOptions() {
+KvRef<KvDictionary> makeSubmissionOptions(Platform& platform) {
   auto options = KvDictionary::create();
-  if (const auto previous = noteOSVersion()) {
+  if (const auto previous = noteOSVersion(platform)) {
     options->set("previous_os_version", KvString::create(*previous));
   }
-  if (const auto number = configurationNumber()) {
+  if (const auto number = configurationNumber(*platform.deviceInformation)) {
     options->set("ConfigNumber", KvString::create(*number));
   }
   return options;
@@ -64,43 +64,39 @@ KvRef<KvDictionary> makeSubmissionOptions() {
 
 }  // namespace
 
-void TBReport::serializeWithDateAndAppInfo(std::int32_t day, const KvArray* appInfo) {
-  if (_scalarsOutput->empty() && _distributionsOutput->empty() && _histogramsOutput->empty()) {
-    return;
+KvRef<KvDictionary> makeMetadata(Locale& locale) {
+  auto metadata = KvDictionary::create();
+  const auto preferred = locale.PreferredLanguages();
+  const auto best = BestLocalizations(locale.SystemLanguages(), preferred);
+  const auto setFirst = [&](std::string_view key, const std::vector<std::string>& languages) {
+    metadata->set(key, KvString::create(languages.empty() ? "<unknown>" : languages.front()));
+  };
+  setFirst("TBUserInterfaceLanguage", best);
+  setFirst("TBPreferredUserInterfaceLanguage", preferred);
+  if (const auto region = locale.CurrentRegionCode()) {
+    metadata->set("TBUserSetRegionFormat", KvString::create(*region));
   }
-  addInstalledAppInfo();
-  addMetadataKeys();
-  reportDatabaseSize();
-  reportCPUUptime();
-  reportVMStats();
-
-  const auto encoded = encodeXmlPlist(*makeDocument(day, appInfo), kDailyLogMaximumBytes);
-  if (!encoded) {
-    logMessage(LogLevel::Error, "Could not create tallyd plist: {}", encoded.error().message);
-    return;
-  }
-  const auto options = makeSubmissionOptions();
-  const bool written = platform().logSubmission->SMAWriteLogForSubmission(
-      kDailyLogTypeCode, kDailyLogName, options->empty() ? nullptr : options.get(), nullptr,
-      [&encoded](LogFile& file) { file.write(*encoded); });
-  if (!written) logMessage(LogLevel::Error, "Failed to write tallyd log");
+  return metadata;
 }
 
-KvRef<KvDictionary> TBReport::makeDocument(std::int32_t day, const KvArray* appInfo) {
-  const std::string digest = _config ? _config->configFileDigest() : std::string();
-  _config.reset();
+KvRef<KvDictionary> makeDocument(Platform& platform, std::int32_t day, LogValues& values,
+                                 const KvRef<KvDictionary>& metadata, const KvArray* appInfo) {
+  const std::string digest = values.releaseWhitelist();
   // The tasking in force, read in one go so that the three belong together.
-  auto taskingID = preferenceTextOr("TaskingID", "(no tasking id)");
-  auto taskingDigest = preferenceTextOr("TaskingDigest", "(no tasking digest)");
-  auto taskingPayload = preferenceOr("TaskingPayload", KvArray::create());
+  Preferences& preferences = *platform.preferences;
+  auto taskingID = preferenceTextOr(preferences, knownPreference("TaskingID"), "(no tasking id)");
+  auto taskingDigest =
+      preferenceTextOr(preferences, knownPreference("TaskingDigest"), "(no tasking digest)");
+  auto taskingPayload =
+      preferenceOr(preferences, knownPreference("TaskingPayload"), KvArray::create());
   auto document = KvDictionary::create({
       {"TBCrashLogVersion", KvNumber::int32(kDocumentVersion)},
       {"TBStartDate", DayToDate(day)},
-      {"TBLogCreationDate", KvDate::create(platform().clock->secondsSince1970())},
-      {"TBMetadata", _metadataOutput},
-      {"TBScalars", _scalarsOutput},
-      {"TBDistributions", _distributionsOutput},
-      {"TBDistributionsHistogram", _histogramsOutput},
+      {"TBLogCreationDate", KvDate::create(platform.clock->secondsSince1970())},
+      {"TBMetadata", metadata},
+      {"TBScalars", values.scalars()},
+      {"TBDistributions", values.distributions()},
+      {"TBDistributionsHistogram", values.histograms()},
       {"TBTasking", std::move(taskingPayload)},
       {"TBTaskID", std::move(taskingID)},
       {"TBTaskDigest", std::move(taskingDigest)},
@@ -110,6 +106,20 @@ KvRef<KvDictionary> TBReport::makeDocument(std::int32_t day, const KvArray* appI
     document->set("TBActivatedAppInfo", KvRef<KvObject>::share(const_cast<KvArray*>(appInfo)));
   }
   return document;
+}
+
+void submitDocument(Platform& platform, const KvDictionary& document) {
+  const auto encoded = encodeXmlPlist(document, kDailyLogMaximumBytes);
+  if (!encoded) {
+    platform.log->message(LogLevel::Error, "Could not create tallyd plist: {}",
+                          encoded.error().message);
+    return;
+  }
+  const auto options = makeSubmissionOptions(platform);
+  const bool written = platform.logSubmission->SMAWriteLogForSubmission(
+      kDailyLogTypeCode, kDailyLogName, options->empty() ? nullptr : options.get(), nullptr,
+      [&encoded](LogFile& file) { file.write(*encoded); });
+  if (!written) platform.log->message(LogLevel::Error, "Failed to write tallyd log");
 }
 
 }  // namespace tally

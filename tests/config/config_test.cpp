@@ -1,5 +1,5 @@
 // The whitelist: what is admitted, by which entry, and what a damaged file costs.
-#include "config/config.h"
+#include "config/whitelist.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -35,16 +35,20 @@ std::string entry(std::string_view key, int figure) {
 
 class ConfigTest : public testing::Test {
  protected:
-  std::unique_ptr<TBConfig> load(const std::string& groups) {
+  // The whitelist keeps the log alone, so the platform may go.
+  std::unique_ptr<Whitelist> load() {
+    Platform platform = fake.services();
+    return Whitelist::load(platform);
+  }
+  std::unique_ptr<Whitelist> load(const std::string& groups) {
     fake.files->contents[std::string(kWhitelistPath)] = plist("<dict>" + groups + "</dict>");
-    return TBConfig::init();
+    return load();
   }
   static std::string figureOf(const ScalarOptions* options) {
     return options == nullptr ? kNotAdmitted : kvText(options->get("sig_fig"));
   }
 
   fakes::FakePlatform fake = fakes::makeFakePlatform();
-  std::unique_ptr<PlatformScope> scope = fake.install();
 };
 
 TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
@@ -73,8 +77,8 @@ TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
       {"net.wifi.rx\xC3\xA9", "3", "7"},
   };
   for (const auto& c : cases) {
-    EXPECT_EQ(figureOf(config->configOptionsForScalarKey(c.key)), c.scalar) << c.key;
-    EXPECT_EQ(figureOf(config->configOptionsForDistributionKey(c.key)), c.distribution) << c.key;
+    EXPECT_EQ(figureOf(config->scalarOptions(c.key)), c.scalar) << c.key;
+    EXPECT_EQ(figureOf(config->distributionOptions(c.key)), c.distribution) << c.key;
   }
   EXPECT_TRUE(fake.log->has(LogLevel::Debug, "prefix match net.wifi. for net.wifi.tx"));
 }
@@ -82,7 +86,7 @@ TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
 TEST_F(ConfigTest, TheLastGroupOfTheFileWins) {
   const auto config = load(group("Z", section("ScalarKeys", entry("k", 1))) +
                            group("A", section("ScalarKeys", entry("k", 2))));
-  EXPECT_EQ(figureOf(config->configOptionsForScalarKey("k")), "2");
+  EXPECT_EQ(figureOf(config->scalarOptions("k")), "2");
   EXPECT_EQ(config->matchScalarKey("k").entry->group->view(), "A");
 }
 
@@ -109,16 +113,14 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
-    scope.reset();
     fake = fakes::makeFakePlatform();
-    scope = fake.install();
     fake.deviceInformation->answers["InternalBuild"] = KvBoolean::of(c.internal);
     fake.preferences->put("Radio", c.radioSwitch, "vellum.da");
     if (c.unreadable) fake.preferences->unreadableDomain = "vellum.da";
     const auto config = load(groups);
-    EXPECT_EQ(figureOf(config->configOptionsForScalarKey("internal")), c.internalKey);
-    EXPECT_EQ(figureOf(config->configOptionsForScalarKey("radio")), c.radioKey);
-    EXPECT_EQ(figureOf(config->configOptionsForScalarKey("unlisted")), c.unlisted);
+    EXPECT_EQ(figureOf(config->scalarOptions("internal")), c.internalKey);
+    EXPECT_EQ(figureOf(config->scalarOptions("radio")), c.radioKey);
+    EXPECT_EQ(figureOf(config->scalarOptions("unlisted")), c.unlisted);
     EXPECT_EQ(fake.log->has(LogLevel::Default, "keyGroup Radio is disabled by tasking"),
               c.disabledLogged);
     EXPECT_EQ(
@@ -138,9 +140,9 @@ TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
                                  "<key>bucket_interval</key><integer>-5</integer></dict>"
                                  "<key>odd</key><dict><key>sig_fig</key><real>1.5</real></dict>")));
   ASSERT_TRUE(config);
-  EXPECT_EQ(figureOf(config->configOptionsForDistributionKey("good")), "1");
-  EXPECT_EQ(config->configOptionsForDistributionKey("bad"), nullptr);
-  const auto* half = config->configOptionsForDistributionKey("half");
+  EXPECT_EQ(figureOf(config->distributionOptions("good")), "1");
+  EXPECT_EQ(config->distributionOptions("bad"), nullptr);
+  const auto* half = config->distributionOptions("half");
   EXPECT_EQ(figureOf(half), "2");
   EXPECT_EQ(half->size(), 1u);
   EXPECT_THAT(
@@ -157,12 +159,12 @@ TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
 }
 
 TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {
-  EXPECT_EQ(TBConfig::init(), nullptr);
+  EXPECT_EQ(load(), nullptr);
   EXPECT_THAT(fake.log->texts(LogLevel::Error), ElementsAre("Couldn't load whitelist"));
   for (const std::string& text : {plist("<array/>"), std::string("garbage"), std::string()}) {
     fake.log->lines.clear();
     fake.files->contents[std::string(kWhitelistPath)] = text;
-    EXPECT_EQ(TBConfig::init(), nullptr) << text;
+    EXPECT_EQ(load(), nullptr) << text;
     EXPECT_THAT(
         fake.log->texts(LogLevel::Error),
         ElementsAre(testing::StartsWith("Couldn't parse the contents of the config file. Error: ")))
@@ -172,10 +174,10 @@ TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {
 
 TEST_F(ConfigTest, TheDigestIsOfTheBytesAsRead) {
   fake.files->contents[std::string(kWhitelistPath)] = "<plist version=\"1.0\"><dict/></plist>";
-  const auto config = TBConfig::init();
+  const auto config = load();
   ASSERT_TRUE(config);
-  EXPECT_EQ(config->configFileDigest(), "be5a5e8f37d7f11fc2c74e4372ebb8f0");
-  EXPECT_EQ(config->configOptionsForScalarKey("k"), nullptr);
+  EXPECT_EQ(config->fileDigest(), "be5a5e8f37d7f11fc2c74e4372ebb8f0");
+  EXPECT_EQ(config->scalarOptions("k"), nullptr);
   EXPECT_THAT(fake.log->lines, IsEmpty());
 }
 

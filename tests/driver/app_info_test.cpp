@@ -5,7 +5,6 @@
 #include <gtest/gtest.h>
 
 #include "fakes/fake_platform.h"
-#include "report/report.h"
 
 namespace tally {
 namespace {
@@ -48,10 +47,12 @@ class AppInfoTest : public testing::Test {
     fake.calls->clear();
     fake.log->lines.clear();
     fake.preferences->values.clear();
-    AppInfoListener listener;
-    DailyJob job({});
-    for (const auto& message : messages) listener.handleMessage(job, *message);
-    return job.appInfoRequested;
+    const auto nothing = [](Platform&) {};
+    Platform platform = fake.services();
+    DailyTasks tasks(platform, {.runTelemetrySweep = nothing, .updateTaskingState = nothing});
+    AppInfoListener listener(platform, tasks);
+    for (const auto& message : messages) listener.handleMessage(*message);
+    return listener.isAppInfoRequested();
   }
   // The days that were processed, and the notifications.
   std::vector<std::string> effects() {
@@ -67,7 +68,6 @@ class AppInfoTest : public testing::Test {
   std::size_t errors() { return fake.log->texts(LogLevel::Error).size(); }
 
   fakes::FakePlatform fake = fakes::makeFakePlatform();
-  std::unique_ptr<PlatformScope> scope = fake.install();
 };
 
 TEST_F(AppInfoTest, ConversationsByTheirMessages) {
@@ -122,7 +122,7 @@ TEST_F(AppInfoTest, TheListIsToldInItsTwoForms) {
 }
 
 TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
-  const auto good = makeAppInformation(*KvArray::create({application()}));
+  const auto good = makeAppInformation(*fake.log, *KvArray::create({application()}));
   const auto expected = KvDictionary::create({{"bundle", text("org.example.mail")},
                                               {"version", text("7.1")},
                                               {"adamID", KvNumber::int64(5'000'000'000)},
@@ -135,7 +135,7 @@ TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
   auto numberless = application();
   numberless->set("adam_id", nullptr);
   numberless->set("arch", text("arm"));
-  const auto zeros = makeAppInformation(*KvArray::create({numberless}));
+  const auto zeros = makeAppInformation(*fake.log, *KvArray::create({numberless}));
   ASSERT_EQ(zeros->size(), 1u);
   EXPECT_EQ(zeros->getAs<KvDictionary>(0)->getInt64("adamID"), 0);
   EXPECT_EQ(zeros->getAs<KvDictionary>(0)->getInt64("arch"), 0);
@@ -154,7 +154,7 @@ TEST_F(AppInfoTest, ElementsKeepTheirOrderAndBadOnesAreLeftOut) {
   auto last = application();
   last->set("bundle_id", text("last"));
   list->append(last);
-  const auto kept = makeAppInformation(*list);
+  const auto kept = makeAppInformation(*fake.log, *list);
   ASSERT_EQ(kept->size(), 1u);
   EXPECT_EQ(kept->getAs<KvDictionary>(0)->getString("bundle"), "last");
   EXPECT_THAT(fake.log->texts(LogLevel::Error),

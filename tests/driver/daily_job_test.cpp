@@ -4,8 +4,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "config/whitelist_file.h"
 #include "fakes/fake_platform.h"
-#include "report/report.h"
 
 namespace tally {
 namespace {
@@ -15,6 +15,26 @@ using testing::IsEmpty;
 
 constexpr std::int32_t kToday = 20000;
 constexpr const char* kLastDay = "LastCrashLogSerializationDateInDaysSince1970";
+
+struct FakeEndpoint final : IpcEndpoint {
+  explicit FakeEndpoint(std::shared_ptr<fakes::CallLog> log) : calls(std::move(log)) {}
+  std::shared_ptr<fakes::CallLog> calls;
+  KvRef<KvDictionary> atTheStart, atTheEnd;  // messages that arrive; null: none
+  MessageHandler take;
+
+  bool listen(std::string_view name, MessageHandler handler) override {
+    calls->push_back("listen " + std::string(name));
+    take = std::move(handler);
+    if (atTheStart) take(*atTheStart);
+    return true;
+  }
+  bool stopListening() override {
+    calls->push_back("stop listening");
+    const auto message = std::exchange(atTheEnd, nullptr);
+    if (message) take(*message);
+    return static_cast<bool>(message);
+  }
+};
 
 class DailyJobTest : public testing::Test {
  protected:
@@ -27,22 +47,16 @@ class DailyJobTest : public testing::Test {
       fake.metricsStore->putScalar(day, "a", day);
     }
   }
-  DailyCapabilities allCapabilities() {
-    return {[this](DailyJob&) {
-              fake.calls->push_back("listener");
-              return true;
-            },
-            [this] {
-              fake.calls->push_back("stop listening");
-              return std::exchange(arrivedAtTheEnd, false);
-            },
-            [this] { fake.calls->push_back("sweep"); },
-            [this] { fake.calls->push_back("tasking"); }};
-  }
-  int run(std::vector<const char*> arguments, DailyCapabilities capabilities = {}) {
+  int run(std::vector<const char*> arguments) {
     arguments.insert(arguments.begin(), "tallyrun");
-    DailyJob job(std::move(capabilities));
-    return job.run(arguments);
+    Platform platform = fake.services();
+    platform.ipcEndpoint = endpoint;
+    return runDailyJob(
+        platform, arguments,
+        {.runTelemetrySweep =
+             [](Platform& given) { given.notifications->postSystemNotification("sweep"); },
+         .updateTaskingState =
+             [](Platform& given) { given.notifications->postSystemNotification("tasking"); }});
   }
   // The days whose log was submitted, by the value that each day's row carries.
   std::vector<std::string> loggedDays() {
@@ -57,9 +71,8 @@ class DailyJobTest : public testing::Test {
     return kvText(fake.preferences->SMAPreferencesGetValue(kLastDay, kProgramDomain).get());
   }
 
-  bool arrivedAtTheEnd = false;  // a message, when the listening ends for the first time
   fakes::FakePlatform fake = fakes::makeFakePlatform();
-  std::unique_ptr<PlatformScope> scope = fake.install();
+  std::shared_ptr<FakeEndpoint> endpoint = std::make_shared<FakeEndpoint>(fake.calls);
 };
 
 TEST_F(DailyJobTest, SwitchesProcessTheirDay) {
@@ -97,11 +110,11 @@ TEST_F(DailyJobTest, SwitchesProcessTheirDay) {
 }
 
 TEST_F(DailyJobTest, TheSequenceOfADay) {
-  run({"-d"}, allCapabilities());
+  run({"-d"});
   EXPECT_THAT(*fake.calls,
               ElementsAre("lock", "TBClientCheckpoint", "isDiagnosticSubmissionEnabled",
-                          "submit 193 log-tallyd", "sweep", "FDDumpAllOldStructuredDataLogs",
-                          "tasking", "rollFixlineLogs",
+                          "submit 193 log-tallyd", "post sweep", "FDDumpAllOldStructuredDataLogs",
+                          "post tasking", "rollFixlineLogs",
                           "set vellum.tallyd.tallyrun " + std::string(kLastDay) + "=19999",
                           "synchronize vellum.tallyd.tallyrun", "unlock"));
   EXPECT_TRUE(fake.log->has(LogLevel::Default, "daily tasks for day 19999"));
@@ -109,17 +122,17 @@ TEST_F(DailyJobTest, TheSequenceOfADay) {
 
 TEST_F(DailyJobTest, WithoutTheUsersConsentNoWhitelistIsReadButTheRestRuns) {
   fake.crashReporting->submissionEnabled = false;
-  run({"-f"}, allCapabilities());
+  run({"-f"});
   EXPECT_THAT(fake.files->reads, IsEmpty());
   EXPECT_THAT(
       *fake.calls,
-      ElementsAre("lock", "TBClientCheckpoint", "isDiagnosticSubmissionEnabled", "sweep",
-                  "FDDumpAllOldStructuredDataLogs", "tasking", "rollFixlineLogs", "unlock"));
+      ElementsAre("lock", "TBClientCheckpoint", "isDiagnosticSubmissionEnabled", "post sweep",
+                  "FDDumpAllOldStructuredDataLogs", "post tasking", "rollFixlineLogs", "unlock"));
 }
 
 TEST_F(DailyJobTest, ADoneDayOpensNeitherStoreNorWhitelist) {
   fake.preferences->put(kLastDay, KvNumber::int32(kToday - 1), kProgramDomain);
-  run({"-d"}, allCapabilities());
+  run({"-d"});
   EXPECT_THAT(fake.files->reads, IsEmpty());
   EXPECT_EQ(fake.metricsStore->historiesOpened, 0);
   EXPECT_THAT(*fake.calls, ElementsAre("lock", "unlock"));
@@ -128,25 +141,24 @@ TEST_F(DailyJobTest, ADoneDayOpensNeitherStoreNorWhitelist) {
 TEST_F(DailyJobTest, TheScheduledModeWaitsOutAQuietSlice) {
   fake.eventLoop->results = {SliceResult::HandledEvent, SliceResult::Stopped,
                              SliceResult::HandledEvent, SliceResult::TimedOut};
-  EXPECT_EQ(run({}, allCapabilities()), 0);
+  EXPECT_EQ(run({}), 0);
   EXPECT_THAT(fake.eventLoop->slices, ElementsAre(10.0, 10.0, 10.0, 10.0));
-  EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening"));
+  EXPECT_THAT(*fake.calls, ElementsAre("listen vellum.tallyd.tallyrun", "stop listening"));
   EXPECT_THAT(fake.log->texts(LogLevel::Default),
               ElementsAre("tallyrun started", "tallyrun ended"));
 }
 
 TEST_F(DailyJobTest, AMessageAtTheEndGetsAQuietPeriodToo) {
-  arrivedAtTheEnd = true;
-  run({}, allCapabilities());
+  endpoint->atTheEnd = KvDictionary::create();
+  run({});
   EXPECT_EQ(fake.eventLoop->slices.size(), 2u);
-  EXPECT_THAT(*fake.calls, ElementsAre("listener", "stop listening", "stop listening"));
+  EXPECT_THAT(*fake.calls,
+              ElementsAre("listen vellum.tallyd.tallyrun", "stop listening", "stop listening"));
 }
 
 TEST_F(DailyJobTest, AnAppListThatNeverComesIsNotWaitedForLonger) {
-  run({}, {.startListener = [](DailyJob& job) { return job.appInfoRequested = true; },
-           .stopListener = {},
-           .runTelemetrySweep = {},
-           .updateTaskingState = {}});
+  endpoint->atTheStart = KvDictionary::create({{"operation", KvNumber::int64(0)}});
+  run({});
   EXPECT_TRUE(
       fake.log->has(LogLevel::Default, "never received requested AAI, so moving along without it"));
   EXPECT_EQ(loggedDays(), std::vector<std::string>{"19999"});

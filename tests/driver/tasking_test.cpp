@@ -10,7 +10,6 @@
 #include <set>
 
 #include "fakes/fake_platform.h"
-#include "report/report.h"
 
 namespace tally {
 namespace {
@@ -53,11 +52,12 @@ class TaskingTest : public testing::Test {
     put(std::move(scheduled));
     fake.calls->clear();
     fake.log->lines.clear();
-    updateTaskingState();
+    Platform platform = fake.services();
+    updateTaskingState(platform);
     return *fake.calls;
   }
   void put(KvRef<KvObject> scheduled) {
-    fake.systemConfiguration->values[{std::string(kScheduleDomain), std::string(kScheduleKey)}] =
+    fake.systemConfiguration->values[{std::string(kScheduleDomain), "ScheduledTasking"}] =
         std::move(scheduled);
   }
   std::string own(std::string_view key) {
@@ -65,7 +65,6 @@ class TaskingTest : public testing::Test {
   }
 
   fakes::FakePlatform fake = fakes::makeFakePlatform();
-  std::unique_ptr<PlatformScope> scope = fake.install();
 };
 
 TEST_F(TaskingTest, AppliesAndRollsBackInOrder) {
@@ -245,7 +244,7 @@ class FailingStores final : public Preferences,
     return WriteResult::Written;
   }
   KvRef<KvObject> getPreference(std::string_view key, std::string_view) override {
-    return key == kScheduleKey ? device_.scheduled : nullptr;
+    return key == "ScheduledTasking" ? device_.scheduled : nullptr;
   }
   WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
                             bool) override {
@@ -293,8 +292,7 @@ class FailingStoresTest : public TaskingTest {
     services.preferences = stores;
     services.systemConfiguration = stores;
     services.servicesClient = stores;
-    const PlatformScope inForce(std::move(services));
-    updateTaskingState();
+    updateTaskingState(services);
   }
   static std::map<std::string, std::string> everything(const Device& device) {
     auto all = device.own;

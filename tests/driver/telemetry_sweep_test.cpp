@@ -120,19 +120,26 @@ class TelemetrySweepTest : public testing::Test {
     storage.registry->classes.clear();
   }
   // Everything with an effect, in order.
-  const Lines& sweep(const SweepCapabilities& capabilities = {}) {
+  const Lines& sweep() {
     storage.platform.calls->clear();
     storage.platform.log->lines.clear();
     testing::internal::CaptureStderr();
-    runTelemetrySweep(capabilities);
+    runTelemetrySweep(platform());
     testing::internal::GetCapturedStderr();
     EXPECT_EQ(storage.platform.metricsStore->batchDepth, 0);
     return *storage.platform.calls;
   }
   Lines messages() { return storage.platform.log->texts(LogLevel::Default); }
+  // Figures for both of their readers: the structured log, whose lists end with the defects, and
+  // then the sweep.
   void serve(std::vector<fakes::Record> records) {
+    const Bytes figures = fakes::statisticsBuffer(std::move(records));
     storage.registry->classes = {"SPXStorage"};
-    storage.registry->serve(fakes::statisticsBuffer(std::move(records)));
+    storage.registry->properties["Device Characteristics"] = KvDictionary::create();
+    storage.registry->serve(figures);
+    for (int call = 0; call < 4; ++call) storage.registry->replies.push_back({{}, 1});
+    storage.registry->serveNext(Bytes(12));  // no defects
+    storage.registry->serveNext(figures);
   }
   Bytes eccRecord(std::uint8_t id, std::uint8_t count, std::size_t length = 72) {
     Bytes record;
@@ -182,13 +189,11 @@ TEST_F(TelemetrySweepTest, TheOrderOfASweep) {
                    {0x4144, typeWord(2, 0x100), "other format", 1},
                    {0x4145, typeWord(1, 0x300), nullptr, 8},
                    {0x01, typeWord(1, 0x100), nullptr, 9}};
-  const Lines calls = sweep({[&](bool requested) {
-    storage.platform.calls->push_back(requested ? "dump true" : "dump false");
-  }});
+  const Lines calls = sweep();
   ASSERT_GT(calls.size(), 10u);
   EXPECT_THAT(Lines(calls.begin(), calls.begin() + 4),
-              ElementsAre(std::string(kTotal) + "-1", std::string(kFree) + "-1", "dump false",
-                          "scalar vellum.NANDInfo.ExportVersion=1"));
+              ElementsAre(std::string(kTotal) + "-1", std::string(kFree) + "-1",
+                          "FDLogStructuredData 176", "scalar vellum.NANDInfo.ExportVersion=1"));
   // The string is passed over, the fraction cut off; a channel that has no name is left out.
   EXPECT_THAT(Lines(calls.end() - 6, calls.end()),
               ElementsAre("scalar vellum.NANDInfo.NodesTotal=0",
@@ -198,20 +203,6 @@ TEST_F(TelemetrySweepTest, TheOrderOfASweep) {
                           "scalar vellum.hwreport.AE=8"));
   EXPECT_EQ(hub->interests, 3u);
   EXPECT_THAT(messages(), IsEmpty());
-}
-
-// The lists of the driver come before its figures, and cost them nothing when they fail.
-TEST_F(TelemetrySweepTest, TheListsOfTheStorageDriver) {
-  const Bytes figures = fakes::statisticsBuffer({{53, {1}}});
-  serve({{53, {1}}});
-  for (int call = 0; call < 4; ++call) storage.registry->replies.push_back({{}, 1});
-  storage.registry->serveNext(Bytes(12));  // defects: none
-  storage.registry->serveNext(figures);
-  storage.registry->properties["Device Characteristics"] = KvDictionary::create();
-  const Lines calls = sweep(programSweepCapabilities());
-  ASSERT_GT(calls.size(), 4u);
-  EXPECT_EQ(calls[2], "FDLogStructuredData 176");
-  EXPECT_EQ(calls[3], "scalar vellum.NANDInfo.ExportVersion=1");
 }
 
 TEST_F(TelemetrySweepTest, WithoutStorageFigures) {

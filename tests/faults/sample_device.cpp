@@ -104,22 +104,18 @@ std::vector<std::string> dayCheck(const std::string& root) {
     services.analyticsEvents = std::make_shared<NotedEvents>(services.analyticsEvents);
     services.crashReporting = std::make_shared<NotedCrashReporting>(services.crashReporting);
     const PlatformScope scope(std::move(services));
-    DailyJob job({
-        .startListener = nullptr,
-        .stopListener = nullptr,
-        .runTelemetrySweep =
-            [] {
-              runTelemetrySweep(programSweepCapabilities());
-              acknowledged().swept = true;
-            },
-        .updateTaskingState =
-            [] {
-              updateTaskingState();
-              acknowledged().tasked = true;
-            },
-    });
     const char* const arguments[] = {"tallyrun", "-d"};
-    job.run(arguments);
+    runDailyJob(platform(), arguments,
+                {.runTelemetrySweep =
+                     [](Platform& given) {
+                       runTelemetrySweep(given);
+                       acknowledged().swept = true;
+                     },
+                 .updateTaskingState =
+                     [](Platform& given) {
+                       updateTaskingState(given);
+                       acknowledged().tasked = true;
+                     }});
   }
   return log->texts(LogLevel::Error);
 }

@@ -1,5 +1,5 @@
 // The daily log: what is in it, in which order things happen, and what failures cost.
-#include "report/report.h"
+#include "report/daily_report.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -44,8 +44,9 @@ class ReportTest : public testing::Test {
     setWhitelist(whitelist(scalars));
     fake.metricsStore->putScalar(kDay, scalars.begin()->first, 7);
   }
-  void writeLog(const KvArray* appInfo = nullptr) {
-    TBReport().writeLogForYesterdayWithAppInfo(kDay, appInfo);
+  void writeLog(const KvArray* appInfo = nullptr, std::int32_t day = kDay) {
+    Platform platform = fake.services();
+    writeDailyLog(platform, day, appInfo);
   }
   KvRef<KvDictionary> document() {
     if (fake.logSubmission->logs.empty()) return nullptr;
@@ -58,7 +59,6 @@ class ReportTest : public testing::Test {
   }
 
   fakes::FakePlatform fake = fakes::makeFakePlatform();
-  std::unique_ptr<PlatformScope> scope = fake.install();
 };
 
 std::vector<std::string> keysOf(const KvDictionary& dictionary) {
@@ -140,7 +140,7 @@ TEST_F(ReportTest, NothingWhitelistedMeansNoLogAndNoTrace) {
   writeLog();
   EXPECT_THAT(*fake.calls, IsEmpty());
   EXPECT_EQ(fake.appRegistry->enumerations, 0);
-  TBReport().writeLogForYesterdayWithAppInfo(std::numeric_limits<std::int32_t>::min(), nullptr);
+  writeLog(nullptr, std::numeric_limits<std::int32_t>::min());
   EXPECT_THAT(*fake.calls, IsEmpty());
   fake.files->contents.clear();
   writeLog();
@@ -255,9 +255,7 @@ TEST_F(ReportTest, TheCorruptionCountIsTakenAndReset) {
       {true, {"SMAPreferencesSetValue"}, {kNoWrite}, "0", "5"},
   };
   for (const auto& c : cases) {
-    scope.reset();
     fake = fakes::makeFakePlatform();
-    scope = fake.install();
     admit({{"a", ""}, {kKey, ""}});
     fake.preferences->put("DatabaseCorruptionCount", KvNumber::int32(5), "vellum.tallyd");
     fake.crashSupportLibrary->present = c.present;

@@ -1,5 +1,5 @@
 // tallyctl explain: each way in which a key reaches the log, or does not.
-#include "report/report.h"
+#include "report/daily_report.h"
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -77,8 +77,8 @@ TEST_F(ExplainCommand, TellsWhereAKeyStandsOrWhyNot) {
 TEST_F(ExplainCommand, ComparesWithWhatWasSubmitted) {
   {
     const PlatformScope scope(makeLinuxPlatform(at("device"), {log, false}));
-    TBReport().writeLogForYesterdayWithAppInfo(20000, nullptr);
-    TBReport().writeLogForYesterdayWithAppInfo(20003, nullptr);
+    writeDailyLog(platform(), 20000, nullptr);
+    writeDailyLog(platform(), 20003, nullptr);
   }
   EXPECT_THAT(run({"explain", "d", "--day", "20000"}).out, HasSubstr("the same distribution"));
   putWhitelist(dict("G", dict("ScalarKeys", dict("b", ""))));

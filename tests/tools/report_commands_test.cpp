@@ -1,6 +1,6 @@
 // tallyctl report: a preview is the log that follows, and leaves no trace.
 #include "kv/plist_codec.h"
-#include "report/report.h"
+#include "report/daily_report.h"
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -32,7 +32,7 @@ class ReportCommands : public ToolTest {
   // What the daily job would do for the day.
   void submit(std::int32_t day) {
     const PlatformScope scope(makeLinuxPlatform(at("device"), {log, false}));
-    TBReport().writeLogForYesterdayWithAppInfo(day, nullptr);
+    writeDailyLog(platform(), day, nullptr);
   }
   std::string body(int number) {
     return get(kSpool + fmt::format("{:010}-log-tallyd.log", number));

@@ -9,7 +9,7 @@
 #include "host/store/store_retention.h"
 #include "host/system/system_log.h"
 #include "platform/platform.h"
-#include "report/report.h"
+#include "report/device_metrics.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
@@ -37,7 +37,7 @@ void examineDay(const ToolContext& context, HealthChecks& checks) {
   constexpr const char* kSubject = "last day";
   const std::int32_t yesterday = context.platform->metricsStore->TBDaysSince1970() - 1;
   const std::int32_t last = context.platform->preferences->SMAPreferencesGetIntegerValue(
-      kLastProcessedDay, kProgramDomain);
+      kLastProcessedDay.key, kProgramDomain);
   if (last == 0) {
     checks.push_back({Health::Missing, kSubject, "tallyrun -d has processed no day yet"});
   } else if (last > yesterday) {
@@ -48,7 +48,7 @@ void examineDay(const ToolContext& context, HealthChecks& checks) {
          fmt::format("{} was processed, which is not over: no day is processed until then",
                      dayName(last)),
          clockIsSet ? fmt::format("tallyctl --root {} prefs set {} {}", shellWord(context.root),
-                                  kLastProcessedDay, yesterday - 1)
+                                  kLastProcessedDay.key, yesterday - 1)
                     : ""});
   } else {
     checks.push_back({last == yesterday ? Health::Ok : Health::Missing, kSubject,
@@ -90,7 +90,7 @@ void examineIdentity(Platform& platform, HealthChecks& checks) {
                                       bytes(kDOQDiskUsageTotalDiskCapacity))
                         : "its usage is not known"});
   checks.push_back({Health::Ok, "kind of device",
-                    TBIsInternalDevice() ? "internal: every key is reported" : "production"});
+                    isInternalDevice(platform) ? "internal: every key is reported" : "production"});
 }
 
 void examineUser(Platform& platform, HealthChecks& checks) {
@@ -138,7 +138,7 @@ void examineKernel(Platform& platform, HealthChecks& checks) {
     std::size_t length = value.width;
     const int error = platform.kernelValues->readKernelValue(
         value.name, {buffer, std::min(sizeof buffer, value.width)}, &length);
-    if (error != 0) missing.push_back(value.name);
+    if (error != 0) missing.emplace_back(value.name);
   }
   std::string text =
       fmt::format("{} of {} can be read", names.size() - missing.size(), names.size());

@@ -7,7 +7,7 @@
 #include "base/time_text.h"
 #include "host/linux_platform.h"
 #include "kv/plist_codec.h"
-#include "report/report.h"
+#include "report/document.h"
 
 namespace tally::tools {
 

@@ -3,18 +3,16 @@
 #include <utility>
 
 #include "kv/plist_codec.h"
+#include "report/daily_report.h"
+#include "report/document.h"
 #include "tools/frame/dry_run.h"
 
 namespace tally::tools {
 
 Preview previewLog(const Platform& platform, std::int32_t day, KeyTrace* trace) {
   DryRun run;
-  {
-    const PlatformScope scope(run.variantOf(platform));
-    TBReport report;
-    if (trace != nullptr) report.follow(*trace);
-    report.writeLogForYesterdayWithAppInfo(day, nullptr);
-  }
+  Platform variant = run.variantOf(platform);
+  writeDailyLog(variant, day, nullptr, trace);
   Preview preview;
   if (run.logs.empty()) return preview;
   preview.options = std::move(run.logs.front().options);

@@ -6,7 +6,7 @@
 
 #include "kv/value.h"
 #include "platform/platform.h"
-#include "report/report.h"
+#include "report/log_values.h"
 
 namespace tally::tools {
 

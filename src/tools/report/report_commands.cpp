@@ -9,7 +9,7 @@
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
 #include "platform/platform.h"
-#include "report/report.h"
+#include "report/document.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/standard_input.h"
 #include "tools/frame/table.h"

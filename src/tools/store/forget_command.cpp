@@ -8,7 +8,7 @@
 #include "host/linux_platform.h"
 #include "host/spool/waiting_logs.h"
 #include "host/store/store_schema.h"
-#include "report/report.h"
+#include "platform/known_preferences.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
@@ -16,7 +16,7 @@ namespace {
 
 // What the program remembers of days and systems that it has seen. The record of the tasking in
 // force is not among it: without it, its preferences could never be taken back.
-constexpr std::string_view kHistoryKeys[] = {kLastProcessedDay, "LastOSVersion", "LastOSUpdate",
+constexpr std::string_view kHistoryKeys[] = {kLastProcessedDay.key, "LastOSVersion", "LastOSUpdate",
                                              "SSLastLoggedAt"};
 
 struct ForgetArguments {

@@ -9,7 +9,7 @@
 #include "driver/tasking.h"
 #include "host/linux_platform.h"
 #include "kv/plist_codec.h"
-#include "report/report.h"
+#include "platform/known_preferences.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"
 
@@ -100,7 +100,7 @@ std::string taskingLine(const KvObject* id, const KvObject* digest, const KvObje
 }
 
 int show(const ToolContext& context, const TaskingArguments&) {
-  const TaskingInputs inputs = readTaskingInputs();
+  const TaskingInputs inputs = readTaskingInputs(platform());
   const auto digest =
       context.platform->preferences->SMAPreferencesGetValue("TaskingDigest", kProgramDomain);
   const auto* const schedule = kvCast<KvDictionary>(inputs.schedule.get());
@@ -159,7 +159,7 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   std::unique_ptr<RunTurn> turn;
   if (!arguments.dryRun) turn = std::make_unique<RunTurn>(runLock);
   if (turn && !*turn) return kWrong;  // the lock has said so
-  TaskingInputs inputs = readTaskingInputs();
+  TaskingInputs inputs = readTaskingInputs(platform());
   inputs.schedule = *std::move(schedule);
   const TaskingPlan plan = planTasking(inputs);
   const PlanView view(plan);
@@ -168,7 +168,7 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   } else {
     view.print(context);
   }
-  const bool done = arguments.dryRun || carryOut(plan);
+  const bool done = arguments.dryRun || carryOut(platform(), plan);
   return done && !view.hasFaults() ? kSuccess : kWrong;
 }
 

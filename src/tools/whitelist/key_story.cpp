@@ -9,6 +9,7 @@
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
 #include "platform/platform.h"
+#include "report/device_metrics.h"
 #include "tools/frame/spelling.h"
 #include "tools/report/preview.h"
 
@@ -30,7 +31,7 @@ void readRows(Platform& platform, KeyStory& story) {
       [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
         if (key != story.key) return;
         story.distributionRows.push_back(
-            {day, summariseDistribution(values, key, *noOptions).summary});
+            {day, summariseDistribution(*platform().log, values, key, *noOptions).summary});
       });
 }
 
@@ -101,7 +102,7 @@ std::string KeyStory::whyAbsent(KeyKind kind) const {
 }
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day) {
-  KeyStory story(loadWhitelistFile());
+  KeyStory story(loadWhitelistFile(platform()));
   story.key = key;
   story.day = day;
   story.measured = isMeasuredByReport(key);

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "report/distribution_summary.h"
-#include "report/report.h"
+#include "report/log_values.h"
 #include "tools/report/daily_log.h"
 #include "tools/whitelist/whitelist_verdict.h"
 

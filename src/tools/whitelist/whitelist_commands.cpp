@@ -21,7 +21,7 @@ struct WhitelistArguments {
 };
 
 WhitelistFile load(const WhitelistArguments& arguments) {
-  if (arguments.file.empty()) return loadWhitelistFile();
+  if (arguments.file.empty()) return loadWhitelistFile(platform());
   const auto bytes = readFile(arguments.file, kPlistMaximumBytes);
   if (bytes) return parseWhitelistFile(*bytes);
   WhitelistFile file;

@@ -12,7 +12,7 @@ class CandidateFinder final : public WhitelistVisitor {
   std::vector<KeyCandidate> found;
 
   bool beginGroup(std::string_view name) override {
-    state_ = groupState(name);
+    state_ = groupState(platform(), name);
     return true;
   }
   void entry(WhitelistSection section, WhitelistEntry entry) override {
@@ -69,7 +69,7 @@ std::string optionsText(const KvDictionary& options) {
 }
 
 WhitelistJudge::WhitelistJudge(WhitelistFile file)
-    : file_(std::move(file)), config_(TBConfig::initWithFile(file_)) {}
+    : file_(std::move(file)), config_(Whitelist::fromFile(platform(), file_)) {}
 
 KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
   KeyVerdict verdict;

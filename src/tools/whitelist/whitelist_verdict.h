@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "config/config.h"
+#include "config/whitelist.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
@@ -42,7 +42,7 @@ class WhitelistJudge {
 
  private:
   WhitelistFile file_;
-  std::unique_ptr<TBConfig> config_;  // null when the file cannot be used
+  std::unique_ptr<Whitelist> config_;  // null when the file cannot be used
 };
 
 Json jsonOf(const KeyVerdict& verdict);

@@ -1,0 +1,67 @@
+#include "driver/daily_tasks.h"
+
+#include <cerrno>
+
+#include "config/whitelist_file.h"
+#include "report/daily_report.h"
+
+namespace tally {
+namespace {
+
+// True when the device has no whitelist yet. One that exists but cannot be read or parsed is a
+// fault, which the report logs.
+bool whitelistIsMissing(Files& files) {
+  // A limit of nothing: a file that exists is rejected by its size, unread.
+  const auto bytes = files.readFile(kWhitelistPath, 0);
+  return !bytes && bytes.error().systemError == ENOENT;
+}
+
+}  // namespace
+
+void DailyTasks::runIfNewDay(const KvArray* appInfo) {
+  // The lock comes first: another run may be processing the very day.
+  const RunTurn turn(*platform_.runLock);
+  if (!turn) return;
+  SystemLog& log = *platform_.log;
+  const std::int32_t yesterday = platform_.metricsStore->TBDaysSince1970() - 1;
+  Preferences& preferences = *platform_.preferences;
+  const std::int32_t last =
+      preferences.SMAPreferencesGetIntegerValue(kLastProcessedDay.key, kLastProcessedDay.domain);
+  if (last >= yesterday) {
+    log.message(LogLevel::Default, "Day unchanged since last run");
+    if (last > yesterday) {
+      log.message(
+          LogLevel::Error,
+          "day {} counts as processed, but by the clock it is not over: no day is processed "
+          "until then; see tallyctl doctor",
+          last);
+    }
+    return;
+  }
+  // Asked before the day's work: a whitelist that arrives meanwhile has admitted nothing yet.
+  const bool nothingAdmits = whitelistIsMissing(*platform_.files);
+  runDaily(yesterday, appInfo);
+  if (nothingAdmits) {
+    log.message(LogLevel::Default,
+                "no whitelist is installed yet, so day {} stays unprocessed until there is one",
+                yesterday);
+    return;
+  }
+  preferences.set(kLastProcessedDay, KvNumber::int32(yesterday));
+  preferences.SMAPreferencesSynchronize(kLastProcessedDay.domain);
+}
+
+void DailyTasks::runDaily(std::int32_t day, const KvArray* appInfo) {
+  const RunTurn turn(*platform_.runLock);
+  if (!turn) return;
+  platform_.log->message(LogLevel::Default, "daily tasks for day {}", day);
+  platform_.metricsStore->TBClientCheckpoint();
+  CrashReporting& crashReporting = *platform_.crashReporting;
+  if (crashReporting.isDiagnosticSubmissionEnabled()) writeDailyLog(platform_, day, appInfo);
+  tasks_.runTelemetrySweep(platform_);
+  crashReporting.FDDumpAllOldStructuredDataLogs();
+  tasks_.updateTaskingState(platform_);
+  crashReporting.rollFixlineLogs();
+}
+
+}  // namespace tally

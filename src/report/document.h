@@ -1,0 +1,31 @@
+// The log document: its parts, its encoding and its submission.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
+#include "kv/value.h"
+#include "platform/platform.h"
+#include "report/log_values.h"
+
+namespace tally {
+
+// What log submission knows the daily log by.
+constexpr std::string_view kDailyLogTypeCode = "193";
+constexpr std::string_view kDailyLogName = "log-tallyd";
+// What a million keys with long names and their histograms need; what fewer may have is a matter of
+// the spool's bounds.
+constexpr std::size_t kDailyLogMaximumBytes = 256u << 20;
+
+// The languages and the region of the user.
+KvRef<KvDictionary> makeMetadata(Locale& locale);
+
+// The document of a day; appInfo may be null. The whitelist of the values is released.
+KvRef<KvDictionary> makeDocument(Platform& platform, std::int32_t day, LogValues& values,
+                                 const KvRef<KvDictionary>& metadata, const KvArray* appInfo);
+
+// Encodes and submits it. A failure is logged.
+void submitDocument(Platform& platform, const KvDictionary& document);
+
+}  // namespace tally

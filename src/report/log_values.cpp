@@ -1,0 +1,43 @@
+#include "report/log_values.h"
+
+#include "report/distribution_summary.h"
+
+namespace tally {
+
+const ScalarOptions* LogValues::scalarOptions(std::string_view key) const {
+  return whitelist_ ? whitelist_->scalarOptions(key) : nullptr;
+}
+
+const ScalarOptions* LogValues::distributionOptions(std::string_view key) const {
+  return whitelist_ ? whitelist_->distributionOptions(key) : nullptr;
+}
+
+void LogValues::addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options) {
+  std::vector<RoundingStep>* steps = nullptr;
+  if (trace_ != nullptr && trace_->key == key) {
+    trace_->scalarBefore = value;
+    trace_->steps.clear();
+    steps = &trace_->steps;
+  }
+  scalars_->set(key, KvNumber::int64(roundScalar(value, options, steps)));
+}
+
+void LogValues::addDistribution(DistributionValues& values, std::string_view key,
+                                const ScalarOptions& options) {
+  const DistributionResult result = summariseDistribution(log_, values, key, options);
+  // A histogram without samples removes that of an earlier row of the key.
+  if (result.hasHistogram) histograms_->set(key, result.histogram);
+  distributions_->set(key, result.summary.toArray());
+}
+
+bool LogValues::empty() const {
+  return scalars_->empty() && distributions_->empty() && histograms_->empty();
+}
+
+std::string LogValues::releaseWhitelist() {
+  std::string digest = whitelist_ ? whitelist_->fileDigest() : std::string();
+  whitelist_.reset();
+  return digest;
+}
+
+}  // namespace tally

@@ -1,0 +1,60 @@
+// The whitelisted values of one day, on their way into the daily log.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "config/whitelist.h"
+#include "kv/value.h"
+#include "platform/metrics_store.h"
+#include "report/scalar_rounding.h"
+
+namespace tally {
+
+// What became of one key on its way into a log.
+struct KeyTrace {
+  std::string key;
+  // The scalar as it was handed to the report, and each step of its rounding.
+  std::optional<std::int64_t> scalarBefore;
+  std::vector<RoundingStep> steps;
+};
+
+class LogValues {
+ public:
+  // Without a whitelist no key is admitted. The log and the trace, which may be null, must outlive
+  // this object.
+  LogValues(SystemLog& log, std::unique_ptr<Whitelist> whitelist, KeyTrace* trace)
+      : log_(log), whitelist_(std::move(whitelist)), trace_(trace) {}
+
+  // Null: the key must not be reported.
+  const ScalarOptions* scalarOptions(std::string_view key) const;
+  const ScalarOptions* distributionOptions(std::string_view key) const;
+
+  // Records the value as its options round it.
+  void addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options);
+  // Reads every sample; records the five statistics and, with "intervals", the histogram.
+  void addDistribution(DistributionValues& values, std::string_view key,
+                       const ScalarOptions& options);
+  bool empty() const;
+
+  // Frees the whitelist, after which no key is admitted; returns the digest of its file, which is
+  // empty without a whitelist.
+  std::string releaseWhitelist();
+  const KvRef<KvDictionary>& scalars() const { return scalars_; }
+  const KvRef<KvDictionary>& distributions() const { return distributions_; }
+  const KvRef<KvDictionary>& histograms() const { return histograms_; }
+
+ private:
+  SystemLog& log_;
+  std::unique_ptr<Whitelist> whitelist_;
+  KeyTrace* trace_;
+  KvRef<KvDictionary> scalars_ = KvDictionary::create();
+  KvRef<KvDictionary> distributions_ = KvDictionary::create();
+  KvRef<KvDictionary> histograms_ = KvDictionary::create();
+};
+
+}  // namespace tally
