@@ -1,9 +1,9 @@
 // One fault in one run: which call of those below a folder fails, or is the run's last.
 //
 // The calls are those of the program's own objects, which the linker leads here first
-// (file_calls.cpp), and SQLite's, by a file system that stands before its own (store_calls.cpp);
-// its allocations, and those of SQLite, are the test's (memory_calls.cpp). So the program is tested
-// as it is: it has no seam for this, and no call can be made around it.
+// (file_calls.cpp), and SQLite's, which is given functions to call (store_calls.cpp); its
+// allocations, and those of SQLite, are the test's (memory_calls.cpp). So the program is tested as
+// it is: it has no seam for this, and no call can be made around it.
 #pragma once
 
 #include <string>
@@ -63,5 +63,7 @@ void setClock(double secondsSince1970);
 
 // Makes SQLite's calls ask as well.
 void watchStore();
+// Of an open file; empty when it was not opened here.
+const std::string& pathOf(int descriptor);
 
 }  // namespace tally::faults

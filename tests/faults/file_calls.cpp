@@ -1,10 +1,12 @@
-// The calls of the program on files. The linker leads each to __wrap_NAME, and __real_NAME to the
-// system's (CMakeLists.txt lists them).
+// Calls on files. The linker leads each one of the program to __wrap_NAME, and __real_NAME to the
+// system's (CMakeLists.txt lists them); SQLite is given some of the same functions. Its syncs
+// cannot be replaced, but call what the program defines under these names.
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -17,6 +19,8 @@
 
 #include "faults/disk.h"
 #include "faults/fault.h"
+
+extern "C" long __real_syscall(long, ...);
 
 namespace tally::faults {
 namespace {
@@ -70,10 +74,10 @@ ssize_t writeJudged(const char* call, int file, size_t count, const Write& write
 }
 
 // A directory's contents are its names.
-int syncJudged(const char* call, int file, int (*sync)(int)) {
+int syncJudged(const char* call, int file, unsigned possible) {
   const std::string& path = openFile(file).path;
-  if (fails(call, path, kNoSpace | kInputOutput | kInterrupted | kLastCall)) return -1;
-  const int result = sync(file);
+  if (fails(call, path, kNoSpace | kInputOutput | kLastCall | possible)) return -1;
+  const auto result = static_cast<int>(__real_syscall(SYS_fsync, file));
   if (result == 0) {
     contentsSynced(path);
     namesSynced(path);
@@ -82,6 +86,8 @@ int syncJudged(const char* call, int file, int (*sync)(int)) {
 }
 
 }  // namespace
+
+const std::string& pathOf(int descriptor) { return openFile(descriptor).path; }
 
 void forgetDirectories() { entered.clear(); }
 
@@ -94,13 +100,11 @@ using namespace tally::faults;
 extern "C" {
 
 int __real_openat(int, const char*, int, ...);
-long __real_syscall(long, ...);
 int __real_close(int);
 ssize_t __real_read(int, void*, size_t);
+ssize_t __real_pread(int, void*, size_t, off_t);
 ssize_t __real_write(int, const void*, size_t);
 ssize_t __real_pwrite(int, const void*, size_t, off_t);
-int __real_fsync(int);
-int __real_fdatasync(int);
 int __real_ftruncate(int, off_t);
 int __real_flock(int, int);
 int __real_fstat(int, struct stat*);
@@ -157,6 +161,11 @@ ssize_t __wrap_read(int file, void* bytes, size_t count) {
   return __real_read(file, bytes, count);
 }
 
+ssize_t __wrap_pread(int file, void* bytes, size_t count, off_t offset) {
+  if (fails("pread", openFile(file).path, kInputOutput | kInterrupted)) return -1;
+  return __real_pread(file, bytes, count, offset);
+}
+
 ssize_t __wrap_write(int file, const void* bytes, size_t count) {
   return writeJudged("write", file, count,
                      [=](size_t part) { return __real_write(file, bytes, part); });
@@ -167,9 +176,16 @@ ssize_t __wrap_pwrite(int file, const void* bytes, size_t count, off_t offset) {
                      [=](size_t part) { return __real_pwrite(file, bytes, part, offset); });
 }
 
-int __wrap_fsync(int file) { return syncJudged("fsync", file, __real_fsync); }
+int __wrap_fsync(int file) { return syncJudged("fsync", file, kInterrupted); }
+int __wrap_fdatasync(int file) { return syncJudged("fdatasync", file, kInterrupted); }
 
-int __wrap_fdatasync(int file) { return syncJudged("fdatasync", file, __real_fdatasync); }
+// SQLite's, which does not try an interrupted one again.
+__attribute__((visibility("default"))) int fsync(int file) {
+  return syncJudged("store: fsync", file, 0);
+}
+__attribute__((visibility("default"))) int fdatasync(int file) {
+  return syncJudged("store: fdatasync", file, 0);
+}
 
 int __wrap_ftruncate(int file, off_t size) {
   if (fails("ftruncate", openFile(file).path, kInputOutput | kInterrupted | kLastCall)) return -1;
