@@ -108,68 +108,59 @@ TEST_F(StructuredDataTest, LogsRollThroughSevenGenerations) {
   EXPECT_EQ(get("logs/a.log.7"), "3") << "nothing had to go";
 }
 
-TEST_F(StructuredDataTest, SubmissionIsAllowedUnlessSomeoneSaysNo) {
-  const char* const kProgramFile = "var/mobile/Library/Preferences/vellum.tallyd.plist";
-  const std::string waiting = "var/mobile/Library/Logs/Submission/0000000001-a.log";
-  const auto enabled = [&] {
+// What waits is deleted or held back when the user forbids submission, and released again; nothing
+// is touched while it is not known what the user wants.
+TEST_F(StructuredDataTest, TheUsersWishDecidesAboutWhatWaits) {
+  const std::string home = "var/mobile/Library/", file = home + "Preferences/vellum.tallyd.plist";
+  const std::string waiting[] = {
+      "Submission/0000000001-a.log", "Submission/0000000001-a.info.plist",
+      "StructuredData/0000000002-172.plist", "AnalyticsEvents/0000000003-events.jsonl"};
+  const std::string pending = home + "Logs/StructuredData/0000000004-172.pending";
+  const auto putSwitch = [&](const std::string& path, const std::string& value) {
+    std::filesystem::remove(at(path));
+    putPlist(path, "<dict><key>DiagnosticSubmissionEnabled</key>" + value + "</dict>");
+  };
+  const auto hold = [&](const char* value) {
+    putPlist(home + "Preferences/vellum.tallyd.tallyrun.plist",
+             "<dict><key>WithdrawnLogs</key><string>" + std::string(value) + "</string></dict>");
+  };
+  const struct {
+    const char* name;
+    std::function<void()> change;
+    bool allowed;
+    std::size_t present, held;
+  } cases[] = {
+      {"nothing said", [] {}, true, 4, 0},
+      {"no switch at all", [&] { putSwitch(file, "<string>no</string>"); }, false, 4, 0},
+      {"a switch that cannot be read",
+       [&] {
+         std::filesystem::remove(at(file));
+         std::filesystem::create_symlink("vellum.tallyd.plist", at(file));  // to itself
+       },
+       false, 4, 0},
+      {"allowed", [&] { putSwitch(file, "<true/>"); }, true, 4, 0},
+      {"forbidden, to be held", [&] { hold("hold"), putSwitch(file, "<false/>"); }, false, 0, 4},
+      {"allowed again", [&] { putSwitch(file, "<true/>"); }, true, 4, 0},
+      {"forbidden", [&] { hold(""), put(pending, "x"), putSwitch(file, "<false/>"); }, false, 0, 0},
+      {"the description allows", [&] { putSwitch("device/device.plist", "<true/>"); }, true, 0, 0},
+  };
+  for (const std::string& name : waiting) put(home + "Logs/" + name, "x");
+  put(home + "Logs/Submission/notes.txt", "not ours");
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    c.change();
     const Platform device = makeLinuxPlatform(root, {log, false});
     device.crashReporting->FDDumpAllOldStructuredDataLogs();
-    return device.crashReporting->isDiagnosticSubmissionEnabled();
-  };
-  const auto putSwitch = [&](const std::string& file, const std::string& value) {
-    putPlist(file, "<dict><key>DiagnosticSubmissionEnabled</key>" + value + "</dict>");
-  };
-  put(waiting, "x");
-  EXPECT_TRUE(enabled());
-  // What may be a refusal lets nothing out, and deletes nothing.
-  putSwitch(kProgramFile, "<string>no</string>");
-  EXPECT_FALSE(enabled());
-  std::filesystem::remove(at(kProgramFile));
-  std::filesystem::create_symlink("vellum.tallyd.plist", at(kProgramFile));  // to itself
-  EXPECT_FALSE(enabled());
-  EXPECT_TRUE(exists(waiting));
-  std::filesystem::remove(at(kProgramFile));
-  putSwitch(kProgramFile, "<false/>");
-  EXPECT_FALSE(enabled());
-  EXPECT_FALSE(exists(waiting));
-  putSwitch("device/device.plist", "<true/>");
-  EXPECT_TRUE(enabled());
-}
-
-TEST_F(StructuredDataTest, WhatWaitsIsDeletedOrHeldWhenTheUserForbidsIt) {
-  const auto preferences = std::make_shared<fakes::FakePreferences>();
-  const std::string logs = "var/mobile/Library/Logs/";
-  const std::vector<std::string> waiting = {
-      "Submission/0000000001-a.log", "Submission/0000000001-a.info.plist",
-      "StructuredData/0000000002-172.pending", "AnalyticsEvents/0000000003-events.jsonl"};
-  const auto allow = [&](bool allowed) {
-    preferences->put("DiagnosticSubmissionEnabled", KvBoolean::of(allowed), "vellum.tallyd");
-    const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
-    SubmissionConsent consent(root, log, preferences, description);
-    EXPECT_EQ(consent.permits("x"), allowed);
-    consent.enforce();
-  };
-  const auto state = [&] {
+    EXPECT_EQ(device.crashReporting->isDiagnosticSubmissionEnabled(), c.allowed);
     std::size_t present = 0, held = 0;
     for (const std::string& name : waiting) {
-      present += exists(logs + name) ? 1 : 0;
-      held += exists(logs + name + ".held") ? 1 : 0;
+      present += exists(home + "Logs/" + name);
+      held += exists(home + "Logs/" + name + ".held");
     }
-    return std::pair(present, held);
-  };
-  for (const std::string& name : waiting) put(logs + name, "x");
-  put(logs + "Submission/notes.txt", "not ours");
-  allow(true);
-  EXPECT_EQ(state(), std::pair(std::size_t{4}, std::size_t{0}));
-  preferences->put("WithdrawnLogs", KvString::create("hold"), "vellum.tallyd.tallyrun");
-  allow(false);
-  EXPECT_EQ(state(), std::pair(std::size_t{0}, std::size_t{4}));
-  allow(true);
-  EXPECT_EQ(state(), std::pair(std::size_t{4}, std::size_t{0}));
-  preferences->put("WithdrawnLogs", nullptr, "vellum.tallyd.tallyrun");
-  allow(false);
-  EXPECT_EQ(state(), std::pair(std::size_t{0}, std::size_t{0}));
-  EXPECT_TRUE(exists(logs + "Submission/notes.txt"));
+    EXPECT_EQ(std::pair(present, held), std::pair(c.present, c.held));
+  }
+  EXPECT_FALSE(exists(pending));
+  EXPECT_TRUE(exists(home + "Logs/Submission/notes.txt"));
 }
 
 }  // namespace
