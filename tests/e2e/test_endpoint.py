@@ -80,14 +80,11 @@ def hostile_messages(test, device):
     nested = ["v"] * 20 + ["s", "deep"]
     cases = [  # fields, exit status of the client, what the line says if it is the first of its kind
         (1, ["operation", "s", "0"], 0, 'no 64-bit integer "operation"'),
-        (1, ["operation", "i", "0"], 0),
         (0, [], 0),
         (1, ["operation", "x", "1"], 0, 'no 64-bit integer "value"'),
         (1, ["operation", "x", "2"], 0, 'no array "app_data"'),
-        (2, ["operation", "x", "2", "app_data", "s", "x"], 0),
         (2, ["operation", "x", "2", "app_data", *two], 0, "1 of 2 elements skipped; element 1: "),
         (2, ["operation", "x", "2", "app_data", "av", "2", "s", "x", "(xx)", "1", "2"], 0),
-        (2, ["operation", "x", "2", "app_data", "a(ss)", "1", "a", "b"], 0),
         (2, ["operation", "x", "0", "x", *nested], 1, "nested too deeply"),
         (2, ["operation", "x", "0", "x", "as", "20001", *["y"] * 20_001], 1),
     ]
@@ -109,7 +106,7 @@ def hostile_messages(test, device):
         device.busctl("operation", "x", str(7 << 32 | 1), "value", "x", str(3 << 32 | TODAY - 2), count=2)
         device.until(device.log_files, 150, "the log of the day that was asked for")
     device.wait_for_end()
-    lines += ["elements skipped: 2 more", "above the limits: 2 more", '"operation": 2 more', '"app_data": 1 more']
+    lines += ["elements skipped: 1 more", "above the limits: 2 more", '"operation": 1 more']
     errors = device.error_texts()
     test.assertEqual(len(errors), len(lines), errors)
     for error, line in zip(errors, lines):

@@ -11,7 +11,6 @@ import unittest
 
 TOP = pathlib.Path(__file__).resolve().parent.parent.parent
 BUILD = pathlib.Path(os.environ["TALLYRUN_BIN"]).parent
-EXAMPLE = TOP / "examples/hwreport"
 
 SECONDS = 1 << 56
 REGISTRY = {"Entries": [
@@ -59,40 +58,35 @@ class Library(unittest.TestCase):
             raise AssertionError(f"{result.args}: {result.returncode}\n{result.stdout}{result.stderr}")
         return result.stdout
 
-    def test_example_by_cmake(self):
-        build = self.folder / "by-cmake"
-        self.check(run("cmake", "-S", EXAMPLE, "-B", build, f"-DCMAKE_PREFIX_PATH={self.prefix}"))
-        self.check(run("cmake", "--build", build))
-        self.assertEqual(self.check(run(build / "channels", TALLYRUN_ROOT=str(self.device))), EXPECTED)
-        self.assertEqual(self.check(run(build / "delta", TALLYRUN_ROOT=str(self.device))), "Turns 0\n")
-        self.assertEqual(run(build / "delta", TALLYRUN_ROOT=str(self.folder)).returncode, 1)
-        # A device without a hub or channels is an answer, not a crash.
-        self.assertEqual(run(build / "channels", TALLYRUN_ROOT=str(self.folder)).returncode, 0x11)
-
-    def test_example_by_pkg_config(self):
-        flags = self.check(run("pkg-config", "--cflags", "--libs", "hwreport",
+    def built(self, example, source, library):
+        """A folder of the example's programs as CMake builds them, and the one of a source by pkg-config."""
+        folder = self.folder / example
+        self.check(run("cmake", "-S", TOP / "examples" / example, "-B", folder,
+                       f"-DCMAKE_PREFIX_PATH={self.prefix}"))
+        self.check(run("cmake", "--build", folder))
+        flags = self.check(run("pkg-config", "--cflags", "--libs", library,
                                PKG_CONFIG_PATH=str(self.library / "pkgconfig"))).split()
-        program = self.folder / "by-pkg-config"
-        self.check(run("g++", "-std=c++20", EXAMPLE / "channels.cpp", "-o", program, *flags))
-        output = self.check(run(program, TALLYRUN_ROOT=str(self.device) + "/",
-                                LD_LIBRARY_PATH=str(self.library)))
-        self.assertEqual(output, EXPECTED)
+        program = folder / "by-pkg-config"
+        self.check(run("g++", "-std=c++20", TOP / "examples" / example / source, "-o", program, *flags))
+        return folder, program
+
+    def test_channels_example(self):
+        folder, program = self.built("hwreport", "channels.cpp", "hwreport")
+        for channels in (folder / "channels", program):
+            output = self.check(run(channels, TALLYRUN_ROOT=str(self.device) + "/", LD_LIBRARY_PATH=str(self.library)))
+            self.assertEqual(output, EXPECTED)
+        self.assertEqual(self.check(run(folder / "delta", TALLYRUN_ROOT=str(self.device))), "Turns 0\n")
+        self.assertEqual(run(folder / "delta", TALLYRUN_ROOT=str(self.folder)).returncode, 1)
+        # A device without a hub or channels is an answer, not a crash.
+        self.assertEqual(run(folder / "channels", TALLYRUN_ROOT=str(self.folder)).returncode, 0x11)
 
     def test_storage_example(self):
         device = self.folder / "storage-root"
         self.check(run(sys.executable, TOP / "examples/device/make-storage.py", device, "20514"))
-        build = self.folder / "storage-by-cmake"
-        self.check(run("cmake", "-S", TOP / "examples/storage", "-B", build,
-                       f"-DCMAKE_PREFIX_PATH={self.prefix}"))
-        self.check(run("cmake", "--build", build))
-        flags = self.check(run("pkg-config", "--cflags", "--libs", "tallystorage",
-                               PKG_CONFIG_PATH=str(self.library / "pkgconfig"))).split()
-        program = self.folder / "storage-by-pkg-config"
-        self.check(run("g++", "-std=c++20", TOP / "examples/storage/wear.cpp", "-o", program, *flags))
-        for example in (build / "wear", program):
+        folder, program = self.built("storage", "wear.cpp", "tallystorage")
+        for example in (folder / "wear", program):
             found = {"LD_LIBRARY_PATH": str(self.library)}
-            self.assertEqual(self.check(run(example, TALLYRUN_ROOT=str(device), **found)),
-                             "9 % used\n")
+            self.assertEqual(self.check(run(example, TALLYRUN_ROOT=str(device), **found)), "9 % used\n")
             result = run(example, TALLYRUN_ROOT=str(self.folder), **found)
             self.assertEqual(result.returncode, 1)
             self.assertIn("Unable to parse buffer", result.stderr)

@@ -27,16 +27,10 @@ TEST(KvDictionary, KeepsTheOrderOfInsertionAtEverySize) {
         EXPECT_EQ(dictionary->remove(key), place != expected.end());
         if (place != expected.end()) expected.erase(place);
       } else {
-        if (random() % 2 == 0) {
-          dictionary->set(key, KvNumber::int64(step));
-        } else {
-          dictionary->set(KvString::create(key), KvNumber::int64(step));
-        }
-        if (place != expected.end()) {
-          place->second = step;
-        } else {
-          expected.emplace_back(key, step);
-        }
+        const auto value = KvNumber::int64(step);
+        random() % 2 == 0 ? dictionary->set(key, value)
+                          : dictionary->set(KvString::create(key), value);
+        (place != expected.end() ? *place : expected.emplace_back(key, 0)).second = step;
       }
       if (step % 97 == 0) {
         const auto copy = dictionary->copy();
