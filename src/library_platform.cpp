@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "host/described/device_platform.h"
 #include "host/system/environment.h"

@@ -1,6 +1,6 @@
 #include "driver/tasking.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <map>

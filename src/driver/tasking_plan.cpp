@@ -1,6 +1,6 @@
 #include "driver/tasking_plan.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <map>
 #include <set>

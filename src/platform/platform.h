@@ -6,7 +6,7 @@
 #include <string_view>
 #include <utility>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "platform/analytics_events.h"
 #include "platform/applications.h"

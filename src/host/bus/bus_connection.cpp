@@ -1,6 +1,6 @@
 #include "host/bus/bus_connection.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <systemd/sd-bus.h>
 #include <unistd.h>
 

@@ -1,6 +1,6 @@
 #include "host/bus/bus_endpoint.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <pwd.h>
 #include <systemd/sd-bus.h>
 #include <unistd.h>

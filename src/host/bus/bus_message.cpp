@@ -1,6 +1,6 @@
 #include "host/bus/bus_message.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <systemd/sd-bus.h>
 
 #include <cstring>

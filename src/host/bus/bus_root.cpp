@@ -1,6 +1,6 @@
 #include "host/bus/bus_root.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/stat.h>
 #include <systemd/sd-bus.h>
 

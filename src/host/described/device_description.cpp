@@ -1,6 +1,6 @@
 #include "host/described/device_description.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cerrno>
 

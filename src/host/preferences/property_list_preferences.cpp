@@ -1,6 +1,6 @@
 #include "host/preferences/property_list_preferences.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cerrno>

@@ -1,6 +1,6 @@
 #include "host/spool/log_spool.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <algorithm>
 #include <cerrno>

@@ -1,6 +1,6 @@
 #include "host/spool/sequence_folder.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/stat.h>
 #include <unistd.h>
 

@@ -1,6 +1,6 @@
 #include "host/spool/submission_consent.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "host/spool/waiting_logs.h"
 

@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "base/time_text.h"
 #include "host/store/store_history.h"

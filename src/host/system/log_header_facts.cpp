@@ -1,7 +1,7 @@
 #include "host/system/log_header_facts.h"
 
 #include <errno.h>
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/utsname.h>
 #include <unistd.h>
 

@@ -1,6 +1,6 @@
 #include "host/system/run_lock.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <cerrno>
 

@@ -1,6 +1,6 @@
 #include "host/system/system_log.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 #include <sys/uio.h>
 #define SD_JOURNAL_SUPPRESS_LOCATION  // every message would name this file
 #include <systemd/sd-journal.h>

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <cstdio>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "hwreport/channels/error_maker.h"
 #include "platform/registry_results.h"

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "base/process.h"
 #include "hwreport/channels.h"

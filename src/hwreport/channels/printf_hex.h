@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 namespace tally {
 

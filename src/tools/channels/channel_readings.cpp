@@ -4,7 +4,7 @@
 #include <iterator>
 #include <limits>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "hwreport/channel.h"
 #include "hwreport/values.h"

@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <vector>
 
+#include <fmt/format.h>
+
 #include "base/time_text.h"
 #include "config/internal_device.h"
 #include "host/store/store_retention.h"

@@ -1,6 +1,6 @@
 #include "tools/endpoint/application_list.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <nlohmann/json.hpp>
 #include <optional>

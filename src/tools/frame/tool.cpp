@@ -1,6 +1,6 @@
 #include "tools/frame/tool.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>

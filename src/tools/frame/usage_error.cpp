@@ -1,6 +1,6 @@
 #include "tools/frame/usage_error.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include <CLI/CLI.hpp>
 #include <string_view>

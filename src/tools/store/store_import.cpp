@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <chrono>
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
 #include "host/store/store_importer.h"
 #include "tools/frame/record_reader.h"
