@@ -52,7 +52,8 @@ int passOverSamples(const char* root) {
   history->enumerateDistributions(
       "", std::numeric_limits<std::int32_t>::min(), std::numeric_limits<std::int32_t>::max(),
       [&](std::string_view key, std::int32_t, DistributionValues& values, bool&) {
-        keep = summariseDistribution(values, key, *options[number++ % 2]).summary.mean;
+        keep = summariseDistribution(*platform().log, values, key, *options[number++ % 2])
+                   .summary.mean;
       });
   return number > 0 ? 0 : 1;
 }

@@ -66,7 +66,8 @@ void checkRoundTrip(const KvDictionary& values) {
 void takeApplications(const KvDictionary& message) {
   const auto* const list = message.getAs<KvArray>("app_data");
   if (list == nullptr) return;
-  const auto applications = makeAppInformation(*list);
+  fakes::FakeSystemLog log;
+  const auto applications = makeAppInformation(log, *list);
   require(applications->size() <= list->size(), "no application is made up");
   for (const auto& application : *applications) {
     require(kvCast<KvDictionary>(application.get())->size() == 5, "an application is whole");

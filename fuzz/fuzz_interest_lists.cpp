@@ -1,6 +1,7 @@
 // Interest lists at the statistics hub: parsed, served from drivers of any values, and mapped.
 #include "described_folder.h"
 #include "host/described/statistics_hub.h"
+#include "platform/protocol/hub_protocol.h"
 
 using namespace tally;
 using fuzz::require;

@@ -6,6 +6,7 @@
 #include "driver/daily_job.h"
 #include "host/host_platform.h"
 #include "host/linux_platform.h"
+#include "host/system/environment.h"
 #include "platform/platform.h"
 
 namespace {

@@ -5,7 +5,7 @@
 #include <limits>
 
 #include "host/described/injected_result.h"
-#include "platform/fetch_request.h"
+#include "platform/protocol/fetch_request.h"
 
 namespace tally {
 namespace {

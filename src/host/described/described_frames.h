@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "kv/value.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 

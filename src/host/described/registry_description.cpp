@@ -5,7 +5,7 @@
 #include "host/described/described_driver.h"
 #include "host/described/statistics_hub.h"
 #include "kv/plist_codec.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 namespace {

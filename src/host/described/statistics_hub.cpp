@@ -9,7 +9,7 @@
 #include "host/described/hub_region.h"
 #include "host/described/injected_result.h"
 #include "host/described/shared_memory.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 namespace {

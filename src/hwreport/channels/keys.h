@@ -3,7 +3,7 @@
 #pragma once
 
 #include "kv/value.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 

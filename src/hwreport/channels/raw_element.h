@@ -9,7 +9,7 @@
 #include "hwreport/channel.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/type_word.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 

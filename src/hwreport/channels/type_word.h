@@ -6,7 +6,7 @@
 
 #include "hwreport/channel.h"
 #include "hwreport/channels/keys.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 

@@ -3,8 +3,8 @@
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/interest_list.h"
-#include "platform/hub_protocol.h"
 #include "platform/platform.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 namespace {

@@ -3,7 +3,7 @@
 #include <array>
 
 #include "base/byte_reader.h"
-#include "platform/fetch_request.h"
+#include "platform/protocol/fetch_request.h"
 #include "storage/controller/connection.h"
 
 namespace tally {

@@ -15,7 +15,7 @@
 #include <nlohmann/json.hpp>
 
 #include "hwreport/hwreport.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
 #include "tools/channels/channel_view.h"
 #include "tools/frame/output.h"

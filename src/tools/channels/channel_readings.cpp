@@ -8,7 +8,7 @@
 
 #include "hwreport/channel.h"
 #include "hwreport/values.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally::tools {
 namespace {

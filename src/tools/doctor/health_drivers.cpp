@@ -2,7 +2,7 @@
 #include "tools/doctor/health_drivers.h"
 
 #include "hwreport/channels.h"
-#include "platform/hub_protocol.h"
+#include "platform/protocol/hub_protocol.h"
 #include "storage/exporter.h"
 #include "tools/frame/output.h"
 

@@ -103,7 +103,7 @@ void examineDescription(const DeviceRoot& root, HealthChecks& checks) {
 
 void examineWhitelist(Platform& platform, HealthChecks& checks) {
   constexpr const char* kSubject = "whitelist";
-  const WhitelistFile file = loadWhitelistFile(platform());
+  const WhitelistFile file = loadWhitelistFile(platform);
   if (!file.root) {
     const bool there = platform.files->fileSize(kWhitelistPath).has_value();
     checks.push_back({there ? Health::Wrong : Health::Missing, kSubject,
@@ -118,7 +118,7 @@ void examineWhitelist(Platform& platform, HealthChecks& checks) {
                                 counted(findings.size() - faults, "surprise"),
                                 findings.empty() ? "" : "; see tallyctl whitelist check")});
   for (const auto& group : *file.root) {
-    const GroupState state = groupState(platform(), group.key->view());
+    const GroupState state = groupState(platform, group.key->view());
     if (state == GroupState::DisabledByTasking || state == GroupState::SwitchUnreadable) {
       checks.push_back({Health::Missing, kSubject,
                         fmt::format("the group {} {}", group.key->view(), whyNotInForce(state))});

@@ -31,7 +31,7 @@ void readRows(Platform& platform, KeyStory& story) {
       [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
         if (key != story.key) return;
         story.distributionRows.push_back(
-            {day, summariseDistribution(*platform().log, values, key, *noOptions).summary});
+            {day, summariseDistribution(*platform.log, values, key, *noOptions).summary});
       });
 }
 
