@@ -44,7 +44,7 @@ class TALLY_API HwReportError final {
   std::string description() const;
 
  private:
-  friend KvRef<HwReportError> createKvErr(HwResult code, const char* message);
+  friend KvRef<HwReportError> makeError(HwResult code, const char* message);
   HwReportError(HwResult code, KvRef<KvDictionary> userInfo) noexcept
       : code_(code), userInfo_(std::move(userInfo)) {}
   ~HwReportError() = default;

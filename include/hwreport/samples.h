@@ -10,7 +10,7 @@
 
 namespace tally {
 
-// A connection to the hub with its mapped memory; both are given back with the last reference.
+// A connection to the hub with its mapped memory; both are released with the last reference.
 class TALLY_API HwReportSubscription {
  public:
   static constexpr std::string_view kTypeName = "HwReportSubscription";

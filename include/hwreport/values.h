@@ -1,6 +1,6 @@
 // The values of a sampled channel, by its format.
 //
-// A value that cannot be read (no sample, another format, an index outside) is
+// A value that cannot be read (no sample, another format, an index out of range) is
 // kHwReportInvalidValue, unless said otherwise. Values are in the channel's unit.
 #pragma once
 

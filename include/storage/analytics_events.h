@@ -55,7 +55,7 @@ TALLY_API extern const std::string_view kEventPulseRefJson;
 // Each payload is written to the system log too.
 constexpr std::uint32_t kNANDInfoLogPayloadsOption = 2;
 
-// Sends the events. The result is empty, whatever was sent; without an analytics-event service it
+// Sends the events. The result is always empty; without an analytics-event service it
 // is the failure pair of nand_info.h. A figure that the driver does not export is sent as 0.
 TALLY_API KvRef<KvDictionary> LogtoEPNANDInfoWithOptions(std::uint32_t options);
 

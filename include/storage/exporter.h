@@ -1,4 +1,4 @@
-// The kinds of storage controller that are known, and the connection to their driver.
+// The known kinds of storage controller, and the connection to their driver.
 #pragma once
 
 #include <array>
@@ -15,8 +15,7 @@ namespace tally {
 using SelectorGetter = const std::uint32_t* (*)();
 constexpr std::uint32_t kSelectorUnavailable = 0xFFFFFFFF;
 
-// What is known of one kind of controller. A getter that is null: it cannot export that kind of
-// data.
+// One kind of controller. It cannot export the data whose getter is null.
 struct NandExporter {
   const char* className;           // the driver's class; null in the terminator
   const char* characteristicsKey;  // the registry property with the controller's characteristics
@@ -46,7 +45,7 @@ TALLY_API const std::uint32_t* SPXGetSnapshotSelectors();
 TALLY_API const std::uint32_t* SPXGetSnapshotHeaderSelectors();
 TALLY_API const std::uint32_t* SPXGetBandStatsSelectors();
 
-// Handles of the device registry: a service is given back with HandleRelease, a connection with
+// Handles of the device registry: release a service with HandleRelease, a connection with
 // FNDDisconnect; 0 is none. Every failure below is one line on standard error. Any thread may call;
 // a connection is used by one at a time.
 
@@ -68,11 +67,11 @@ struct SPXConnection {
 // 1 on success; 0 when there is no driver, no connection, or no statistics. *connection is then
 // closed.
 TALLY_API int openSPXConnection(SPXConnection* connection);
-// Gives back what is open and sets it to 0.
+// Releases what is open and sets it to 0.
 TALLY_API void closeSPXConnection(SPXConnection* connection);
 
 // Fetches the driver's statistics and hands them to the exporter's parser. *context must be empty
-// at the call. On true the caller gives it to the exporter's releaseContext, if there is one; on
+// at the call. On true the caller passes it to the exporter's releaseContext, if there is one; on
 // false it is empty.
 TALLY_API KvRef<KvBoolean> loadNandStatistics(const NandExporter** exporterOut,
                                               SPXParseContext* context);

@@ -20,7 +20,7 @@ constexpr std::string_view kNANDInfoHealthIsNANDRetirableKey =
 
 // The wear, end-to-end and host-read counters with the largest of each group; the extracts of it
 // for the repair service, the internal lab and the over-the-air update. A counter that the driver
-// does not export is 0. One that is no number is 0 too, and the error key is the number 1.
+// does not export is 0. One that is not a number is 0 too, and the error key is the number 1.
 TALLY_API KvRef<KvDictionary> CopyNANDHealthInfo();
 TALLY_API KvRef<KvDictionary> CopyFixlineNANDInfo();
 TALLY_API KvRef<KvDictionary> CopyInternalLabNANDInfo();

@@ -14,7 +14,7 @@ namespace tally {
 TALLY_API int getIOStatsWithThreadnameFromKCData(const std::byte* begin, const std::byte* end,
                                                  const char* threadName,
                                                  std::span<const std::byte>* ioStatsOut);
-// The same in the first container alone, whatever is nested in it included. *positionOut, when
+// The same in the first container alone, including all that is nested in it. *positionOut, when
 // given, is where the search stopped; null when the data ended first.
 TALLY_API int getIOStatsWithThreadnameFromKCDataHelper(const std::byte* begin, const std::byte* end,
                                                        const char* threadName,

@@ -10,12 +10,12 @@
 
 namespace tally {
 
-// A dictionary that reports a failure holds these two: the string "1", and what failed.
+// A dictionary that reports a failure has these two entries: the string "1", and what failed.
 constexpr std::string_view kNANDInfoErrorKey = "vellum.NANDInfo.Error";
 constexpr std::string_view kNANDInfoErrorMessageKey = "vellum.NANDInfo.ErrorMessage";
 constexpr std::string_view kNANDInfoTlydPlaceholder = "tlyd.key.placeholder";
 
-// Numbers; signed 64-bit where nothing else is said.
+// Numbers; signed 64-bit unless noted otherwise.
 constexpr std::string_view kNANDInfoExportVersionKey = "vellum.NANDInfo.ExportVersion";  // 32-bit
 constexpr std::string_view kNANDInfoDriverVersionKey = "vellum.NANDInfo.DriverVersion";  // 32-bit
 constexpr std::string_view kNANDInfoDemoModeKey = "vellum.NANDInfo.DemoMode";
@@ -34,7 +34,7 @@ constexpr std::string_view kNANDInfoNumPhysicalWritesKey = "vellum.NANDInfo.NumP
 constexpr std::string_view kNANDInfoNumPhysicalErasesKey = "vellum.NANDInfo.NumPhysicalErases";
 constexpr std::string_view kNANDInfoNumNodesFreeKey = "vellum.NANDInfo.NodesFree";
 constexpr std::string_view kNANDInfoNumNodesTotalKey = "vellum.NANDInfo.NodesTotal";
-// Whole weeks, whatever the key's name says: reports rely on the key.
+// Whole weeks, despite the key's name, on which reports rely.
 constexpr std::string_view kNANDInfoFormatWeeksSince2000Key = "vellum.NANDInfo.formatDaysSince2000";
 constexpr std::string_view kNANDInfoNumSleepOpsKey = "vellum.NANDInfo.NumSleepOps";
 constexpr std::string_view kNANDInfoHighEnduranceBlockEraseCountKey =

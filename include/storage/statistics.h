@@ -31,7 +31,7 @@ struct alignas(std::uint64_t) SPXCounterBlock {
 // The counter's name of that number; a zero byte follows. It lives as long as the program.
 TALLY_API std::string_view SPXCounterName(std::uint16_t number) noexcept;
 
-// What a parse leaves behind. The caller owns it, starts with an empty one ({}) and gives it to
+// The result of a parse. The caller owns it, starts with an empty one ({}) and passes it to
 // SPXReleaseContext at the end; a copy would own the same memory twice.
 struct SPXParseContext {
   std::uint32_t exportVersion = 0;  // 0 after a parse that failed
@@ -73,9 +73,9 @@ void SPXForEachCounter(const SPXParseContext& context, const Visit& visit) {
 }
 
 // Parses a statistics buffer: little-endian records of a 32-bit key, a 32-bit count and that many
-// 64-bit values, without gaps. Counters are appended to those that
-// are there, the other fields overwritten.
-// Returns 1, or 0 when the buffer holds no record, a key is out of range, a record runs past the
+// 64-bit values, without gaps. Counters are appended to those that are there,
+// the other fields overwritten.
+// Returns 1, or 0 when the buffer has no record, a key is out of range, a record runs past the
 // end, or memory runs out; exportVersion is then 0 (a buffer of less than 8 bytes leaves it alone)
 // and the counters before the fault stay.
 TALLY_API int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_t length);

@@ -11,7 +11,7 @@
 
 namespace tally {
 
-// Not 0: the validity list is collected whatever the write amplification.
+// Not 0: the validity list is collected at any write amplification.
 TALLY_API extern std::uint8_t gForceCollectionSet;
 // Whether the last dump wanted the validity list.
 TALLY_API extern std::uint8_t gNeedValidityList;

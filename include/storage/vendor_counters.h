@@ -23,7 +23,7 @@ TALLY_API void parseCounters1xSandisk(BusBlock busBlock, NandAlgoCounters& recor
 TALLY_API void parseCounters1xHynix(BusBlock busBlock, NandAlgoCounters& record);
 TALLY_API void parseCountersAlgoGeneric(BusBlock busBlock, NandAlgoCounters& record);
 TALLY_API void parseCountersAlgoGenericQ9(BusBlock busBlock, NandAlgoCounters& record);
-// The work of the former two; they return the last word that was copied.
+// What the two functions above call; they return the last word that was copied.
 TALLY_API std::uint32_t parseOnlyAlgoGenericCounters(BusBlock busBlock, NandAlgoCounters& record);
 TALLY_API std::uint32_t parseOnlyAlgoGenericCountersQ9(BusBlock busBlock, NandAlgoCounters& record);
 

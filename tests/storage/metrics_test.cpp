@@ -8,6 +8,7 @@
 
 #include "fakes/fake_storage.h"
 #include "fakes/kcdata.h"
+#include "storage/auxiliary/health.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info/figure_groups.h"
@@ -124,6 +125,10 @@ TEST_F(NandInfoTest, DerivedFigures) {
       {"MaintenanceRequestsFailedProg", {{290, {2, 5, 1, 9}}}, "3"},
       {"BandsPerInternalFlow3", {{114, {1, 2, 3, 4, 5}}}, "5"},
       {"ColdestCycle", {{124, {7}}}, "(null)"},
+      {"IntermediateColdestCycle", {{124, {7, 8}}}, "8"},
+      {"raidReconstructFailPartition", {{470, {3, 4}}}, "3"},
+      {"raidReconstructFailPartition1", {{470, {3, 4}}}, "4"},
+      {"padSectorsPerFlow4", {{120, {1, 2, 3, 4, 5, 6}}}, "5"},
       {"clogProgram", {{41, {1}}, {41, {~0ull}}}, "-1"},
   };
   for (const auto& c : cases) {
@@ -306,6 +311,74 @@ TEST(Kcdata, FindsTheThread) {
     EXPECT_EQ(search(c.data.bytes, c.wanted.c_str()), c.found);
   }
   EXPECT_EQ(search(cases[0].data.bytes, nullptr), "-");
+}
+
+KvRef<KvDictionary> nandInfo(
+    std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries) {
+  auto info = KvDictionary::create();
+  for (const auto& [name, value] : entries) info->set(std::string(kPrefix).append(name), value);
+  return info;
+}
+
+TEST(Health, SummaryAndExtracts) {
+  const auto info = nandInfo({{"fwUpdatesPercentUsed", KvNumber::int64(3)},
+                              {"UserPartitionPEPercentUsed", KvNumber::int64(41)},
+                              {"E2E_H2F_VL_UECC", KvNumber::int64(12)},
+                              {"E2E_F2H_SL_UECC", KvNumber::int64(0x100000002)},
+                              {"ueccReads", KvNumber::int64(5)},
+                              {"raidSmartErrors", KvNumber::int64(-1)},
+                              {"numGrownBad", KvNumber::int64(9)},
+                              {"spareAvailablePercent", KvNumber::int64(2)},
+                              {"other", KvNumber::int64(1)}});
+  const auto health = healthOfNandInfo(*info);
+  EXPECT_EQ(text(*health),
+            "fwUpdatesPercentUsed=3 IntermediatePartitionPEPercentUsed=0 "
+            "UserPartitionPEPercentUsed=41 Health.MaxPercentageNANDUsed=41 "
+            "E2E_H2F_VL_LBA=0L E2E_H2F_VL_Corr=0L E2E_H2F_VL_UECC=12L E2E_H2F_SL_LBA=0L "
+            "E2E_H2F_SL_Corr=0L E2E_H2F_SL_UECC=0L E2E_F2H_VL_LBA=0L E2E_F2H_VL_Corr=0L "
+            "E2E_F2H_VL_UECC=0L E2E_F2H_SL_LBA=0L E2E_F2H_SL_Corr=0L E2E_F2H_SL_UECC=2L "
+            "Health.MaxE2EErrors=12 ueccReads=5L raidSmartErrors=-1L Health.HostReadErrors=-1 "
+            "numGrownBad=9 spareAvailablePercent=2");
+  EXPECT_EQ(text(*fixlineExtract(*health)),
+            "Health.MaxPercentageNANDUsed=41 Health.HostReadErrors=-1 numGrownBad=9 "
+            "Health.MaxE2EErrors=12 Health.IsNANDRefurbishable=1");
+  EXPECT_EQ(text(*internalLabExtract(*health)),
+            "Health.MaxPercentageNANDUsed=41 Health.HostReadErrors=-1 numGrownBad=9 "
+            "Health.MaxE2EErrors=12 spareAvailablePercent=2 Health.IsNANDRetirable=1");
+  EXPECT_EQ(text(*otaExtract(*health)),
+            "Health.MaxPercentageNANDUsed=41 Health.HostReadErrors=-1 numGrownBad=9 "
+            "E2E_H2F_VL_LBA=0 E2E_H2F_VL_Corr=0 E2E_H2F_VL_UECC=12 E2E_H2F_SL_LBA=0 "
+            "E2E_H2F_SL_Corr=0 E2E_H2F_SL_UECC=0 E2E_F2H_VL_LBA=0 E2E_F2H_VL_Corr=0 "
+            "E2E_F2H_VL_UECC=0 E2E_F2H_SL_LBA=0 E2E_F2H_SL_Corr=0 E2E_F2H_SL_UECC=2");
+}
+
+TEST(Health, SparePercentageDecidesRetirement) {
+  const struct {
+    KvRef<KvObject> spare;
+    int retirable;
+  } cases[] = {
+      {nullptr, 1}, {KvNumber::int64(2), 1}, {KvNumber::int64(3), 0}, {KvNumber::int64(-1), 0}};
+  for (const auto& c : cases) {
+    const auto lab =
+        internalLabExtract(*healthOfNandInfo(*nandInfo({{"spareAvailablePercent", c.spare}})));
+    EXPECT_EQ(lab->getInt64("vellum.NANDInfo.Health.IsNANDRetirable"), c.retirable);
+  }
+}
+
+// A value that is not a number counts as 0 and is reported, in the summary and its extracts.
+TEST(Health, ValuesThatAreNotNumbers) {
+  for (const char* key : {"UserPartitionPEPercentUsed", "E2E_H2F_VL_LBA", "numGrownBad"}) {
+    SCOPED_TRACE(key);
+    const auto health = healthOfNandInfo(*nandInfo({{key, KvString::create("7")}}));
+    EXPECT_EQ(health->getInt64(std::string(kPrefix) + key), 0);
+    EXPECT_EQ(health->getInt64("vellum.NANDInfo.Error"), 1);
+    for (const auto& extract :
+         {fixlineExtract(*health), internalLabExtract(*health), otaExtract(*health)}) {
+      EXPECT_EQ(extract->getInt64("vellum.NANDInfo.Error"), 1);
+    }
+  }
+  const auto failed = nandInfo({{"Error", KvString::create("1")}});
+  EXPECT_FALSE(healthOfNandInfo(*failed)->contains("vellum.NANDInfo.Error"));
 }
 
 }  // namespace

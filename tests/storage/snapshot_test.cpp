@@ -1,4 +1,5 @@
-// Snapshots as text, against lines made with snprintf, at every capacity, and from blocks that lie.
+// Snapshots as text, against lines made with snprintf, at every capacity, and from malformed
+// blocks.
 #include "storage/snapshot.h"
 
 #include <gtest/gtest.h>
@@ -137,7 +138,7 @@ TEST(LabelFormat, PrintsNumbersAsPrintfDoes) {
   }
 }
 
-TEST(LabelFormat, RefusesWhatIsNoSingleConversion) {
+TEST(LabelFormat, RejectsAllButASingleConversion) {
   const char* refused[] = {
       "%n",    "%s",     "%hn",          "%p", "%c",  "%f",  "%a",   "%u%n", "%u %u", "%d%s",
       "%",     "x%",     "%5",           "%-", "%.",  "%l",  "%hhh", "%*u",  "%.*u",  "%1$u",
@@ -225,7 +226,7 @@ Rendered renderDescribed(const Bytes& records, const Bytes& block, std::uint32_t
   return r;
 }
 
-// From every cursor and at every capacity: whole lines only, and the cursor behind the line that
+// From every cursor and at every capacity: whole lines only, and the cursor after the line that
 // did not fit.
 TEST(Snapshot, DescribedLinesAtEveryCapacity) {
   const auto records = describedRecords();
@@ -262,7 +263,7 @@ TEST(Snapshot, DescribedLinesAtEveryCapacity) {
   }
 }
 
-TEST(Snapshot, CountsAndLengthsThatLieEndWithTheRecords) {
+TEST(Snapshot, WrongCountsAndLengthsEndWithTheRecords) {
   const struct {
     std::uint32_t count;
     std::size_t bytes, records;

@@ -162,28 +162,5 @@ TEST(KeyMap, EveryRowIsFoundByTheNameOfACounter) {
   EXPECT_TRUE(keyMap.data()[keyMap.size()].name.empty()) << "the end row";
 }
 
-TEST(KeyMap, ReportNames) {
-  std::map<std::string, std::string> keys;
-  for (const SPXKeyMapRow& row : keyMap) keys.emplace(row.name, row.key);
-  const struct {
-    const char *name, *report;
-  } cases[] = {{"numFlushes", "NumFlushes"},
-               {"clogProgram", "clogProgram"},
-               {"padSizes0", "PadSize1"},
-               {"padSizes3", "PadSize4"},
-               {"bandsPerSpecialFlow2", "BandsPerInternalFlow2"},
-               {"bandsPerSpecialFlow4", "BandsPerInternalFlow3"},
-               {"coldestCycle1", "IntermediateColdestCycle"},
-               {"E2EDPErrorCounters11", "E2E_F2H_SL_UECC"},
-               {"raidReconstructFailPartition0", "raidReconstructFailPartition"},
-               {"raidReconstructFailPartition1", "raidReconstructFailPartition1"},
-               {"CacheDepthVsThroughput255", "CacheDepthVsThroughput255"},
-               {"padSectorsPerFlow4", "padSectorsPerFlow4"}};
-  for (const auto& c : cases) EXPECT_EQ(keys[c.name], std::string("vellum.NANDInfo.") + c.report);
-  for (const char* const name : {"bandsPerSpecialFlow3", "coldestCycle", "padSizes", "version"}) {
-    EXPECT_FALSE(keys.contains(name)) << name;
-  }
-}
-
 }  // namespace
 }  // namespace tally

@@ -1,4 +1,4 @@
-// Telemetry lists: which layout and which names a controller gets, and lists that lie.
+// Telemetry lists: which layout and which names a controller gets, and malformed lists.
 #include <gtest/gtest.h>
 
 #include "fakes/fake_storage.h"
@@ -55,7 +55,7 @@ class TelemetryListTest : public testing::Test {
       storage.platform.crashReporting->records;
 };
 
-// Where the layouts differ: the words that are out of step with their neighbours.
+// The layouts differ in the words that are out of step with their neighbours.
 TEST_F(TelemetryListTest, EveryControllerHasItsLayoutAndItsNames) {
   const struct {
     const char *chip, *manufacturer;

@@ -8,7 +8,7 @@
 
 namespace tally {
 
-// description is the entry's "UserClient"; it and the files outlive nothing: both are shared.
+// description is the entry's "UserClient". It and the files are shared.
 std::unique_ptr<UserClient> openDescribedDriver(KvRef<KvDictionary> description,
                                                 std::shared_ptr<DescribedFiles> files,
                                                 RegistryResult* result);

@@ -1,4 +1,4 @@
-// The files that a device description names, below the folder it lies in.
+// The files that a device description names, in its own directory or below.
 #pragma once
 
 #include <cstddef>

@@ -21,7 +21,7 @@ constexpr struct {
                   {"Maximum", bucket_slot::kMaximum},
                   {"Sum", bucket_slot::kSum}};
 
-// A slot holds signed values too; a real gives its whole part, as in a legend.
+// A slot may be signed; a real gives its integer part, as in a legend.
 std::uint64_t slotOf(const KvNumber& number) {
   const bool isNegativeReal = number.isReal() && number.asDouble() < 0;
   return isNegativeReal ? static_cast<std::uint64_t>(number.asInt64()) : number.asUInt64();

@@ -17,8 +17,9 @@ struct ElementValues {
                                               element::kMissingValue, element::kMissingValue};
 };
 
-// The elements of one channel, one frame for each refresh. What a shorter frame lacks are missing
-// values; they are not held, since a long frame among many short ones would cost the product.
+// The elements of one channel, one frame for each refresh. The elements that a shorter frame
+// lacks are missing values; they are not stored, since a long frame among many short ones would
+// take the product of both.
 struct ChannelFrames {
   std::uint64_t type = 0;  // the type word; 0 when only the legend gives it
   std::vector<std::vector<ElementValues>> frames;

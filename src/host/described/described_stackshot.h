@@ -12,7 +12,7 @@ namespace tally {
 
 class DescribedStackshot final : public Stackshot {
  public:
-  // folder holds the files that the description names.
+  // folder has the files that the description names.
   DescribedStackshot(DeviceDirectory folder, std::shared_ptr<DeviceDescription> description)
       : folder_(std::move(folder)), description_(std::move(description)) {}
   std::unique_ptr<StackshotConfig> stackshotConfigCreate() override;

@@ -19,7 +19,7 @@ namespace tally {
 // an entry of the wrong type is named in one error line and counts as absent. Any thread may ask.
 class DeviceDescription {
  public:
-  // The directory holds device.plist and the files that it names.
+  // The directory of device.plist and of the files that it names.
   DeviceDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log)
       : folder_(std::move(folder)), log_(std::move(log)) {}
 

@@ -23,7 +23,7 @@ class HubRegion {
   virtual ~HubRegion() = default;
   // In bytes, never 0; the same for every frame.
   virtual std::size_t size() const = 0;
-  // Writes the region as it is after so many refreshes; the last frame stays.
+  // Writes the region as of that refresh; the last frame is repeated.
   virtual void writeFrame(std::size_t refresh, std::span<std::byte> memory) = 0;
 };
 
@@ -32,7 +32,7 @@ class HubRegion {
 std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& interests,
                                              const RegistrySource::Entries& drivers,
                                              DescribedFiles& files);
-// Frames that are served as they stand, whatever is wanted; null when there are no bytes.
+// Frames that are served unchanged, whatever is wanted; null when there are no bytes.
 std::unique_ptr<HubRegion> makeRawRegion(const KvArray& frames, DescribedFiles& files);
 
 }  // namespace tally

@@ -36,7 +36,7 @@ std::optional<std::vector<std::uint64_t>> parseParents(const KvDictionary& descr
   return parents;
 }
 
-// False when the key is there and its value is no dictionary.
+// False when the value of the key is not a dictionary.
 bool takeDictionary(const KvDictionary& description, std::string_view key,
                     KvRef<KvDictionary>* result) {
   KvObject* const value = description.get(key);

@@ -13,7 +13,7 @@ namespace tally {
 
 class RegistryDescription final : public RegistrySource {
  public:
-  // folder holds registry.plist and the files that it names. Nothing is read before it is asked
+  // folder has registry.plist and the files that it names. Nothing is read before it is asked
   // for; a changed file is read again.
   RegistryDescription(DeviceDirectory folder, std::shared_ptr<SystemLog> log);
 

@@ -1,4 +1,4 @@
-// Where registry entries come from. There can be several sources.
+// A source of registry entries. There can be several.
 #pragma once
 
 #include <cstddef>
@@ -39,7 +39,7 @@ class RegistrySource {
  public:
   virtual ~RegistrySource() = default;
   using Entries = std::vector<std::shared_ptr<const RegistryEntry>>;
-  // The entries as they are now. While nothing changed it is the same list.
+  // The current entries; the same list as long as nothing has changed.
   virtual std::shared_ptr<const Entries> entries() = 0;
   // Opens a client of one of the entries; null with *result set when the driver refuses.
   virtual std::unique_ptr<UserClient> open(const RegistryEntry& entry, std::uint32_t type,

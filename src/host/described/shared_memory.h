@@ -1,4 +1,4 @@
-// Memory that two sides share: the owner writes it, the others see it read-only.
+// Shared memory: the owner writes it, the others map it read-only.
 #pragma once
 
 #include <cstddef>
@@ -16,7 +16,7 @@ class SharedMemory {
   SharedMemory& operator=(const SharedMemory&) = delete;
 
   std::span<std::byte> writable() const { return {writable_, size_}; }
-  // A further mapping for reading; null when there is none. Ended by unmap() with its address.
+  // A further mapping for reading; null when there is none. Undone by unmap() with its address.
   const std::byte* map() const;
   void unmap(const std::byte* address) const;
 

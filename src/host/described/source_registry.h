@@ -12,7 +12,7 @@
 
 namespace tally {
 
-// Any thread may call. A connection's calls are not held up by those of another.
+// Any thread may call. A connection's calls do not wait for those of another.
 class SourceRegistry final : public DeviceRegistry {
  public:
   // Entries of earlier sources come first in every enumeration.
@@ -55,7 +55,7 @@ class SourceRegistry final : public DeviceRegistry {
     std::size_t source;
   };
   struct Iterator {
-    Lists seen;  // what the sources held when the iterator was made
+    Lists seen;  // the sources' lists when the iterator was made
     std::vector<Place> matches;
     std::size_t next = 0;
   };
@@ -73,7 +73,7 @@ class SourceRegistry final : public DeviceRegistry {
 
   mutable std::mutex mutex_;  // of all below, and of the sources
   std::vector<std::unique_ptr<RegistrySource>> sources_;
-  // Handles are never reused, so that one that was given back stays invalid.
+  // Handles are never reused, so that a released one stays invalid.
   RegistryHandle nextHandle_ = 0x1000;
   std::map<RegistryHandle, Slot> handles_;
   std::map<ConnectionHandle, std::shared_ptr<UserClient>> connections_;

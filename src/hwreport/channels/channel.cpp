@@ -1,4 +1,4 @@
-// What a channel's dictionary says about it.
+// Reads the dictionary of a channel.
 #include "hwreport/channel.h"
 
 #include "hwreport/channels/keys.h"
@@ -57,7 +57,7 @@ KvString* HwReportChannelGetChannelName(KvDictionary* channel) {
   const KvObject* const id = legendElement(channel, kLegendChannelID);
   if (!name && bitsOf(id) != kHwReportInvalidValue) name = nameOfID(bitsOf(id));
   if (name) channel->set(keys().channelName, name);
-  return name.get();  // the channel holds it
+  return name.get();  // the channel owns it
 }
 
 }  // namespace tally

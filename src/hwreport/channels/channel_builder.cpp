@@ -10,7 +10,7 @@
 namespace tally {
 namespace {
 
-// The dictionary under a key, made when absent; null when something else is there.
+// The dictionary under a key, made if absent; null when the value is of another type.
 KvDictionary* descend(KvDictionary* level, const KvRef<KvString>& key) {
   if (level == nullptr) return nullptr;
   if (KvObject* const held = level->get(*key)) return kvCast<KvDictionary>(held);
@@ -23,8 +23,8 @@ KvDictionary* descendNamed(KvDictionary* level, const KvRef<KvString>& key, KvSt
   return descend(descend(level, key), KvRef<KvString>::share(name));
 }
 
-// The level that the channel belongs to. Only what was there already can be in the way, so that a
-// failure has made nothing.
+// The level that the channel belongs to. Only existing values can be of the wrong type, so a
+// failure makes no level.
 KvDictionary* placeOf(KvDictionary* level, const KvDictionary& channel, std::int32_t options) {
   if ((options & kHwReportByDriver) != 0) {
     KvString* const driver = HwReportChannelGetDriverName(&channel);

@@ -1,4 +1,4 @@
-// Making channel dictionaries and putting them into collections.
+// Makes channel dictionaries and puts them into collections.
 #pragma once
 
 #include <cstdint>
@@ -29,9 +29,9 @@ bool isLegendChannel(const KvArray& legendChannel);
 KvRef<KvDictionary> makeChannel(const ChannelOwner& owner, const ChannelGroup& group,
                                 KvRef<KvArray> legendChannel, KvRef<HwReportError>* error);
 
-// Appends the channel at its place by the options word, making levels that are not there.
-// HwErrBadArgument when either is no dictionary, HwErrGeneral when the place cannot be reached;
-// the collection is then as it was.
+// Appends the channel at the place that the options word gives, and makes missing levels.
+// HwErrBadArgument when either is not a dictionary, HwErrGeneral when the place cannot be reached;
+// the collection is then unchanged.
 HwResult addChannel(KvObject* collection, KvObject* channel, std::int32_t options,
                     KvRef<HwReportError>* error);
 

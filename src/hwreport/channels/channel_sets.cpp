@@ -18,7 +18,7 @@ HwResult mergeDriver(KvDictionary& collection, KvDictionary& driverChannels,
   return walkFailed(HwReportMergeChannels(&collection, &driverChannels, error)) ? HwErrGeneral : 0;
 }
 
-// What a walk over drivers comes to. A failure that no step has explained is explained here.
+// The result of a walk over drivers. A failure that no step has reported is reported here.
 KvRef<KvDictionary> walked(HwResult result, bool explained, KvRef<KvDictionary> collection,
                            KvRef<HwReportError>* error) {
   if (result == 0) return collection;
@@ -54,7 +54,7 @@ KvRef<KvDictionary> copyChannelsWhere(std::int32_t options, KvRef<HwReportError>
 }  // namespace
 
 KvRef<KvDictionary> HwReportCopyAllChannels(std::int32_t options, KvRef<HwReportError>* error) {
-  // The presence of the property is enough, whatever it holds.
+  // The presence of the property is enough, whatever its value.
   const auto matching = KvDictionary::create(
       {{kMatchProperty, KvDictionary::create({{kLegendPublicProperty, KvBoolean::of(true)}})}});
   auto collection = HwReportCreateAggregate(options);
@@ -64,7 +64,7 @@ KvRef<KvDictionary> HwReportCopyAllChannels(std::int32_t options, KvRef<HwReport
     const auto channels = HwReportCopyChannelsForDriver(driver, options, &driverError);
     if (!channels) {
       if (options < 0) {
-        printKvErr(options, HwReportCopyDriverName(driver).get(), driverError.get());
+        printError(options, HwReportCopyDriverName(driver).get(), driverError.get());
       }
       return 0;
     }

@@ -1,4 +1,4 @@
-// One engine for the four modes, so that they cannot come to differ in order or failure.
+// One engine for the four modes, so that they agree about order and failures.
 #include "hwreport/channels/channel_walk.h"
 
 #include <vector>
@@ -99,9 +99,9 @@ int walkLevel(Mode& mode, KvDictionary* collection, const KvDictionary* other, i
   return result;
 }
 
-// Channels lie all over the memory of a large collection, and a walk would mostly wait for them. So
-// it asks early: for the dictionaries first, then, when they have come, for their values, and then
-// for the type word, beside which the id lies.
+// The channels of a large collection are scattered over memory, and a walk would mostly wait for
+// them. So it prefetches: first the dictionaries, then their values, then the type word, which is
+// next to the id.
 constexpr std::size_t kDictionariesAhead = 32;
 constexpr std::size_t kValuesAhead = 24;
 constexpr std::size_t kLegendAhead = 20;
@@ -151,8 +151,8 @@ class Prune final : public Mode {
  public:
   explicit Prune(const HwReportCallback& callback) : Mode({.prunes = true}), callback_(callback) {}
   int visit(KvArray& channels, const KvArray*, KvArray*) override {
-    // Dropped channels leave together, since closing the gap after each one would cost the square
-    // of their number.
+    // Dropped channels are removed in one pass: closing the gap after each would take quadratic
+    // time.
     std::vector<std::size_t> dropped;
     const int result = eachChannel(channels, [&](KvDictionary* channel, std::size_t i) {
       const int one = callback_(channel);
@@ -178,7 +178,7 @@ class Transform final : public Mode {
         const auto* const next = channels.getAs<KvDictionary>(i + kCallbackAhead);
         if (next != nullptr) ahead_(*next);
       }
-      auto copy = channel->copy(1, &arena_);  // room for the elements
+      auto copy = channel->copy(1, &arena_);  // space for the elements
       const int one = callback_(channel, copy.get());
       if (one == HwIterContinue) output->append(std::move(copy));
       return one;

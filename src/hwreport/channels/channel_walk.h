@@ -1,7 +1,7 @@
-// The walk over a collection, in its four modes.
+// Walks over a collection, in four modes.
 //
-// Visited are the channels of a level in array order, then the drivers' level, then the groups'
-// level. A callback's result with bit 0 set stops the whole walk at once and is its result; other
+// A walk visits the channels of a level in array order, then the drivers' level, then the groups'
+// level. A callback's result with bit 0 set stops the whole walk and is its result; other
 // results are combined by OR. A malformed collection gives HwIterFailed.
 #pragma once
 

@@ -25,8 +25,8 @@ class Handle {
   const RegistryHandle handle_;
 };
 
-// What a channel takes of its legend: the array itself, unless a sample will write the type into
-// it, which other readers of the registry's legend must not meet.
+// The legend array of a channel: the array itself, unless a sample will write the type into it,
+// which other readers of the registry's legend must not see.
 KvRef<KvArray> shareableLegend(KvArray& legendChannel) {
   const TypeWord type{bitsOf(legendChannel.get(kLegendTypeWord))};
   return type.format() != kHwReportFormatUnknown ? KvRef<KvArray>::share(&legendChannel)
@@ -49,7 +49,7 @@ bool readGroup(const KvArray& channels, const ChannelGroup& group, HwRegistryEnt
 
 bool readLegend(const KvArray& legend, HwRegistryEntry driver, std::int32_t options,
                 KvDictionary& collection) {
-  ChannelOwner owner;  // asked for when there is a channel to own
+  ChannelOwner owner;  // read with the first channel
   for (const auto& item : legend) {
     const auto* const entry = kvCast<KvDictionary>(item.get());
     if (entry == nullptr) return true;
@@ -70,7 +70,7 @@ HwResult walkDrivers(KvDictionary& matching,
                      const std::function<HwResult(HwRegistryEntry driver)>& step) {
   DeviceRegistry& registry = *platform().deviceRegistry;
   RegistryHandle found = 0;
-  // The call takes a reference of its own over.
+  // The call takes over a reference.
   const RegistryResult failure =
       registry.RegistryCopyMatchingServices(KvRef<KvDictionary>::share(&matching), &found);
   const Handle iterator(found);

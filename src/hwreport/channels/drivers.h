@@ -1,4 +1,4 @@
-// Reading drivers: which match, and what channels their legends describe.
+// Reads drivers: which match, and the channels that their legends describe.
 #pragma once
 
 #include <functional>
@@ -13,7 +13,7 @@ namespace tally {
 HwResult walkDrivers(KvDictionary& matching,
                      const std::function<HwResult(HwRegistryEntry driver)>& step);
 
-// Asks the registry for what the driver's channels share. Returns the registry's code on failure.
+// Reads what the driver's channels share. Returns the registry's code on failure.
 HwResult readOwner(HwRegistryEntry driver, ChannelOwner* owner, KvRef<HwReportError>* error);
 
 }  // namespace tally

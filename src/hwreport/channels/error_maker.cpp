@@ -27,7 +27,7 @@ std::string HwReportError::description() const {
   return fmt::format("{} {:#x}: {}", domain(), code_, failureReason());
 }
 
-KvRef<HwReportError> createKvErr(HwResult code, const char* message) {
+KvRef<HwReportError> makeError(HwResult code, const char* message) {
   const std::string_view text =
       message != nullptr ? message : "createKvErr() passed a NULL string!";
   const auto isAscii = [](char c) { return static_cast<unsigned char>(c) < 0x80; };
@@ -37,11 +37,11 @@ KvRef<HwReportError> createKvErr(HwResult code, const char* message) {
 }
 
 HwResult reportError(KvRef<HwReportError>* out, HwResult code, const char* message) {
-  if (out != nullptr) *out = createKvErr(code, message);
+  if (out != nullptr) *out = makeError(code, message);
   return code;
 }
 
-void printKvErr(std::int32_t options, const KvString* label, const HwReportError* error) {
+void printError(std::int32_t options, const KvString* label, const HwReportError* error) {
   if (options >= 0) return;
   std::string line(label != nullptr ? label->view() : "<unknown> function");
   line += ": ";

@@ -19,7 +19,7 @@ class InterestList {
   // True when every channel has a driver id, a channel id and a type word, and they are not too
   // many.
   bool complete() const noexcept { return complete_; }
-  // The list as the hub takes it, in walk order.
+  // The list as the hub expects it, in walk order.
   std::span<const std::byte> bytes() const noexcept { return std::as_bytes(std::span(words_)); }
 
  private:

@@ -1,5 +1,5 @@
 // The keys of channel dictionaries and collections. Each is one shared object, so that a channel
-// costs no memory for its keys and a look-up compares pointers.
+// takes no memory for its keys and a look-up compares pointers.
 #pragma once
 
 #include "kv/value.h"
@@ -30,7 +30,7 @@ struct ChannelKeys {
   KvRef<KvString> channelGroups = KvString::create("HwReportChannelGroups");
 };
 
-// Never freed, so that it outlives whatever a program still holds at its end.
+// Never freed, so that it outlives every object that a program still has at its end.
 inline const ChannelKeys& keys() {
   static const ChannelKeys* const all = new ChannelKeys();
   return *all;

@@ -1,4 +1,4 @@
-// Finding the earlier counterpart of a later channel.
+// Finds the earlier counterpart of a later channel.
 #pragma once
 
 #include <cstdint>
@@ -15,8 +15,8 @@ namespace tally {
 //
 // The counterpart is the earlier channel at the same index when driver, channel id and type word
 // are equal. Otherwise, if at least the driver is equal, it is the next one from a cursor on with
-// the same channel id and type word; the cursor starts behind the index and moves past what was
-// found. An earlier entry on the way that is no readable channel is a failure.
+// the same channel id and type word; the cursor starts after the index and moves past what was
+// found. An earlier entry on the way that is not a readable channel is a failure.
 class EarlierChannels {
  public:
   explicit EarlierChannels(const KvArray& channels) : channels_(channels) {}

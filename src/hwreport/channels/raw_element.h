@@ -20,7 +20,7 @@ class ElementRun {
  public:
   ElementRun() = default;
   explicit ElementRun(std::span<const std::byte> bytes) : bytes_(bytes) {}
-  // A run has no more elements than its 16-bit count can say.
+  // A run has at most as many elements as its 16-bit count can express.
   std::uint16_t count() const noexcept {
     return static_cast<std::uint16_t>(bytes_.size() / element::kSize);
   }

@@ -1,4 +1,4 @@
-// Cutting the channels' runs out of the hub's region.
+// Cuts the channels' runs out of the hub's region.
 #include "hwreport/samples.h"
 
 #include "hwreport/channel.h"
@@ -12,8 +12,8 @@
 namespace tally {
 namespace {
 
-// Tells a channel that was asked for by id alone what it is. The legend channel array is shared, so
-// that every copy of the channel learns it.
+// Writes the type of a channel that was requested by its id alone. The legend channel array is
+// shared, so every copy of the channel gets it.
 void learnType(const KvDictionary& channel, const ElementRun& run) {
   auto* const legend = channel.getAs<KvArray>(*keys().legendChannel);
   if (legend == nullptr) return;

@@ -1,4 +1,4 @@
-// The connection to the statistics hub behind a subscription.
+// A subscription's connection to the statistics hub.
 #pragma once
 
 #include <cstdint>
@@ -13,13 +13,13 @@ namespace tally {
 
 class Subscription final : public HwReportSubscription {
  public:
-  // Keeps the registry that its connection belongs to, so that it can always give it back.
+  // Keeps the registry that its connection belongs to, so that it can always close it.
   explicit Subscription(std::shared_ptr<DeviceRegistry> registry)
       : registry_(std::move(registry)) {}
   // Unmaps and closes what was set up.
   ~Subscription();
 
-  // Finds the hub, opens it, tells it the interests and maps its region.
+  // Finds the hub, opens it, configures the interests and maps its region.
   HwResult connect(std::span<const std::byte> interests, KvRef<HwReportError>* error);
   // Has the hub write the current elements into the region.
   HwResult update();

@@ -1,4 +1,6 @@
-// Subtracting samples.
+// Subtracts samples.
+#include "hwreport/samples.h"
+
 #include <cstring>
 #include <vector>
 
@@ -7,7 +9,6 @@
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/raw_element.h"
-#include "hwreport/samples.h"
 #include "hwreport/values.h"
 
 namespace tally {
@@ -17,7 +18,7 @@ constexpr HwResult kDeltaFailed = 1;
 
 constexpr bool isValid(std::uint64_t value) { return value != kHwReportInvalidValue; }
 
-// The elements that a result channel ends up with.
+// The elements of a result channel.
 class Elements {
  public:
   explicit Elements(std::span<const std::byte> basis) : bytes_(basis.begin(), basis.end()) {}
@@ -25,7 +26,7 @@ class Elements {
     std::memcpy(bytes_.data() + index * element::kSize + element::slot(number), &value,
                 sizeof(value));
   }
-  // All slots of all elements: a run may have more of them than a 16-bit count tells.
+  // All slots of all elements: a run may have more of them than its 16-bit count.
   void invalidate() {
     for (std::size_t index = 0; index < bytes_.size() / element::kSize; ++index) {
       for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
@@ -41,7 +42,7 @@ class Elements {
   std::vector<std::byte> bytes_;
 };
 
-// What is left in the value slots that a simple channel's difference does not fill.
+// The value of the slots that a simple channel's difference does not fill.
 enum class OtherSlots { KeepEarlier, Invalidate };
 
 struct Pair {
@@ -65,7 +66,7 @@ bool subtractSimple(const Pair& pair, OtherSlots others) {
   return true;
 }
 
-// The runs of a state or histogram pair, when everybody agrees on the number of elements.
+// The runs of a state or histogram pair whose runs and legends agree on the number of elements.
 bool readRuns(const Pair& pair, std::uint8_t format, ElementRun* earlier, ElementRun* later) {
   const auto earlierRun = runOfLegend(pair.earlier, format);
   const auto laterRun = runOfLegend(pair.later, format);
@@ -173,7 +174,7 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
       },
       &delta);
   if (!walkFailed(result)) return delta;
-  if (!explained) reportError(error, HwErrGeneral);  // the collections do not fit each other
+  if (!explained) reportError(error, HwErrGeneral);  // the collections differ in their levels
   return nullptr;
 }
 

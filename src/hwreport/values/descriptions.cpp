@@ -54,7 +54,7 @@ bool appendStates(const Sample& sample, std::string* out) {
   const auto total = totalResidency(sample.channel);
   const std::uint64_t unit = HwReportChannelGetUnit(sample.channel);
   const std::string name = rightAligned(sample.name, 20);
-  // Names that cannot be made are tried once, not for each state.
+  // Missing names are looked up once, not for each state.
   HwReportStateGetNameForIndex(sample.channel, 0);
   const bool named = sample.channel->get(*keys().stateNames) != nullptr;
   for (std::int32_t i = 0; i < sample.run.count(); ++i) {
@@ -108,7 +108,7 @@ bool appendElements(const Sample& sample, std::uint8_t format, std::string* out)
     case kHwReportFormatSimpleArray:
       return appendArrays(sample, out);
     default:
-      return sample.run.count() == 0;  // nothing of an unknown format to show
+      return sample.run.count() == 0;  // an unknown format has no text
   }
 }
 

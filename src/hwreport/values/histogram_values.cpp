@@ -1,8 +1,9 @@
 // Values and bounds of histogram channels.
+#include "hwreport/values.h"
+
 #include <algorithm>
 
 #include "hwreport/channels/raw_element.h"
-#include "hwreport/values.h"
 
 namespace tally {
 namespace {

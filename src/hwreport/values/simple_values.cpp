@@ -1,6 +1,7 @@
 // Values of simple and simple array channels.
-#include "hwreport/channels/raw_element.h"
 #include "hwreport/values.h"
+
+#include "hwreport/channels/raw_element.h"
 
 namespace tally {
 namespace {

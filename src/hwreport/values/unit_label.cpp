@@ -1,10 +1,11 @@
 // Labels of units: a prefix for the scale and a label for the quantity.
+#include "hwreport/descriptions.h"
+
 #include <string>
 #include <string_view>
 
 #include "hwreport/channel.h"
 #include "hwreport/channels/keys.h"
-#include "hwreport/descriptions.h"
 #include "hwreport/values/unit_word.h"
 
 namespace tally {
@@ -79,7 +80,7 @@ KvString* HwReportChannelGetUnitLabel(KvDictionary* channel) {
   if (unit == kHwReportInvalidValue) return nullptr;
   auto label = KvString::create(labelOf({unit}));
   channel->set(keys().unitLabel, label);
-  return label.get();  // the channel holds it
+  return label.get();  // the channel owns it
 }
 
 }  // namespace tally

@@ -1,7 +1,8 @@
-// Expressing a value in another unit.
+// Expresses a value in another unit.
+#include "hwreport/values.h"
+
 #include <limits>
 
-#include "hwreport/values.h"
 #include "hwreport/values/unit_word.h"
 
 namespace tally {
@@ -28,7 +29,7 @@ std::uint64_t shifted(std::uint64_t value, int bits) {
   return bits > 63 || value > kLargest >> bits ? kLargest : value << bits;
 }
 
-// Applies an exponent byte to whichever side its sign says.
+// Applies an exponent byte to the numerator or the denominator, by its sign.
 template <class Apply>
 void applyExponent(std::uint8_t byte, Ratio* ratio, Apply apply) {
   if (byte == 0) return;

@@ -1,4 +1,4 @@
-// What the memory freezer wrote, out of a stackshot.
+// Reads what the memory freezer wrote from a stackshot.
 #include "storage/freezer.h"
 
 #include "base/byte_reader.h"
@@ -31,7 +31,7 @@ bool measureFreezerWrites(std::uint64_t* result) {
     *result = 0;
     return true;
   }
-  // Statistics that end before the figure do not say that it is 0.
+  // Statistics that end before the figure do not mean that it is 0.
   const auto written = ByteReader(ioStats).read<std::uint64_t>(kDiskWritesSizeOffset);
   if (!written) return false;
   *result = *written;

@@ -1,4 +1,4 @@
-// The health summary out of the NAND info dictionary, and what of it each audience gets.
+// The health summary of the NAND info dictionary, and the extract for each audience.
 #include "storage/auxiliary/health.h"
 
 #include <algorithm>
@@ -45,10 +45,10 @@ constexpr HealthGroup kGroups[] = {
     {kHostReadKeys, kNANDInfoHealthHostReadErrorsKey, true},
 };
 
-// Reads and copies values, and remembers whether one of them was no number.
+// Reads and copies values, and remembers whether one of them was not a number.
 class HealthCopier {
  public:
-  // A source that was not wholly read itself makes no better copy.
+  // A source with a failure of its own gives a copy with one.
   explicit HealthCopier(const KvDictionary& from)
       : from_(from), failed_(kvCast<KvNumber>(from.get(kNANDInfoErrorKey)) != nullptr) {}
   std::int32_t read(std::string_view key) {

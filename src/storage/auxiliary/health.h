@@ -1,4 +1,4 @@
-// The health summary and its extracts, of a dictionary that is there already.
+// The health summary of a given dictionary, and its extracts.
 #pragma once
 
 #include <span>

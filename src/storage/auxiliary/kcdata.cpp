@@ -1,5 +1,5 @@
-// The search for one thread's I/O statistics in kcdata: items in a row, some of which open and
-// close containers. One pass, whatever the nesting; the open containers are kept on a small stack.
+// Searches kcdata, a sequence of items some of which open and close containers, for the I/O
+// statistics of a thread. One pass at any nesting; a small stack keeps the open containers.
 #include "storage/kcdata.h"
 
 #include <algorithm>
@@ -22,7 +22,7 @@ constexpr std::uint32_t kIoStatistics = 0x901;
 
 constexpr std::size_t kContainerPayload = 4;  // at least; less opens no container
 constexpr std::size_t kNameLength = 64;
-// A task holds threads: two levels. What nests deeper than this is made to hurt.
+// A task contains threads: two levels. Deeper nesting than this is an attack.
 constexpr std::size_t kDeepest = 64;
 
 struct Item {
@@ -38,7 +38,7 @@ struct Item {
 class ItemReader {
  public:
   explicit ItemReader(std::span<const std::byte> bytes) : reader_(bytes) {}
-  // Empty, without moving on, when the item does not lie wholly inside.
+  // Empty, at the same position, when the item is not wholly inside.
   std::optional<Item> next() {
     const auto type = reader_.read<std::uint32_t>(at_);
     const auto size = reader_.read<std::uint32_t>(at_ + kSizeOffset);

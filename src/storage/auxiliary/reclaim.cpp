@@ -1,4 +1,4 @@
-// What the purgeable-space service knows of the user's volume.
+// The purgeable space of the user's volume, from its service.
 #include "storage/reclaim.h"
 
 #include "platform/platform.h"

@@ -18,7 +18,7 @@ class PageBuffer {
   ~PageBuffer() { ::operator delete(memory_, kPage); }
   PageBuffer(const PageBuffer&) = delete;
   PageBuffer& operator=(const PageBuffer&) = delete;
-  // Once; false when there is no memory.
+  // At most once. False when there is no memory.
   bool allocate(std::size_t size) noexcept;
   std::span<std::byte> bytes() const noexcept { return {static_cast<std::byte*>(memory_), size_}; }
 

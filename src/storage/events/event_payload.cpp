@@ -11,7 +11,7 @@ struct FilledField {
   std::string_view event, name;
   KvRef<KvObject> (*value)(const EventFigures& figures);
 };
-// The two disk fields carry each other's figure: whoever reads the events knows them so.
+// The two disk fields carry each other's figure, as readers of the events expect.
 constexpr FilledField kFilledFields[] = {
     {"vellum.massstorage.NANDInfo", "Error",
      [](const EventFigures& figures) {
@@ -39,7 +39,7 @@ constexpr FilledField kFilledFields[] = {
 
 std::optional<EventReference> parseEventReference(std::string_view json) {
   const auto document = nlohmann::ordered_json::parse(json, nullptr, false);
-  if (!document.is_object()) return std::nullopt;  // nor is what could not be parsed
+  if (!document.is_object()) return std::nullopt;  // or not JSON
   EventReference reference;
   for (const auto& [event, fields] : document.items()) {
     if (!fields.is_object()) return std::nullopt;

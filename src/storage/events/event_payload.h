@@ -23,8 +23,8 @@ using EventReference = std::map<std::string, EventMapping, std::less<>>;  // by 
 // Empty unless the text is a JSON object of objects of strings.
 std::optional<EventReference> parseEventReference(std::string_view json);
 
-// What every payload of one call is made of. A figure that could not be measured keeps its value
-// here.
+// The figures of all payloads of one call. One that could not be measured keeps the value that it
+// has here.
 struct EventFigures {
   KvRef<KvDictionary> info;
   std::int64_t capacityMiB = -1;

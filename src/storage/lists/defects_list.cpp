@@ -22,7 +22,7 @@ struct DefectField {
 constexpr DefectField kDefectFields[] = {
     {"CAU", 4}, {"Block", 8}, {"Cycle", 12}, {"Reason", kReasonOffset}, {"Page", 20}};
 
-// On one of the controllers the reasons of a mode are told apart by their hundreds.
+// On one controller, the hundreds of a reason give the mode.
 constexpr std::string_view kPlainReasonsClass = "SPXStorage";
 constexpr std::uint32_t kReasonOfMode[] = {0, 200, 100};
 

@@ -16,7 +16,7 @@ namespace {
 constexpr std::string_view kLastLoggedKey = "SSLastLoggedAt";
 constexpr std::string_view kLogName = "StorageStatus";
 
-// A clock that was set back counts as too early, so that it cannot bring a second log.
+// Too early also when the clock was set back, so that there is no second log.
 bool isTooEarly(double now) {
   const auto last = lastStorageLog();
   if (!last || !(now - *last < kSecondsBetweenStorageLogs)) return false;
@@ -25,7 +25,7 @@ bool isTooEarly(double now) {
   return true;
 }
 
-// Booleans are numbers of their own kind.
+// Booleans are printed as numbers.
 bool isNumber(const KvObject* value) {
   return kvCast<KvNumber>(value) != nullptr || kvCast<KvBoolean>(value) != nullptr;
 }
@@ -38,7 +38,7 @@ std::string numberText(const KvObject* value) {
   return fmt::format("{:.2f}", number->asDouble());
 }
 
-// Empty for an array that holds no number.
+// Empty for an array without numbers.
 std::string arrayText(const KvArray& array) {
   std::string text;
   bool holdsNumber = false;
@@ -79,7 +79,7 @@ void writeLog(std::string_view logTypeCode, const KvDictionary* values) {
       facts.processIdentifier(), itemsOf(*values));
   platform().logSubmission->SMAWriteLogForSubmission(logTypeCode, kLogName, nullptr, nullptr,
                                                      [&text](LogFile& file) { file.write(text); });
-  // Whatever became of the log: a device that cannot submit must not try every day.
+  // Also after a failure: a device that cannot submit must not try every day.
   platform().preferences->SMAPreferencesSetValue(kLastLoggedKey, KvDate::create(now),
                                                  kProgramDomain);
   platform().preferences->SMAPreferencesSynchronize(kProgramDomain);

@@ -1,4 +1,4 @@
-// When the NAND log writer may write.
+// When the storage log may be written again.
 #pragma once
 
 #include <optional>

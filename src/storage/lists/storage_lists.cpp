@@ -65,7 +65,7 @@ bool fetchListsFrom(std::uint32_t connection, const NandExporter& exporter,
   for (const ListRequest& request : requests) {
     if (exporter.*request.kind.selectors != nullptr) {
       supported.push_back(&request);
-    } else if (refused != &request.kind) {  // said once for all modes of a list
+    } else if (refused != &request.kind) {  // once for all modes of a list
       refused = &request.kind;
       std::fputs(request.kind.unsupported, stderr);
     }

@@ -14,13 +14,13 @@
 namespace tally {
 namespace {
 
-constexpr std::size_t kBlockBytes = 4096;  // of a bus, all blocks first
-constexpr std::size_t kSummaryBytes = 32;  // of a bus, behind the blocks
-constexpr std::size_t kChipIdRoom = 64;    // with its terminator
-constexpr std::size_t kVendorDigits = 4;   // what follows them is the part code
+constexpr std::size_t kBlockBytes = 4096;    // of a bus, all blocks first
+constexpr std::size_t kSummaryBytes = 32;    // of a bus, after the blocks
+constexpr std::size_t kChipIdCapacity = 64;  // with its terminator
+constexpr std::size_t kVendorDigits = 4;     // what follows them is the part code
 constexpr std::size_t kMostHexDigits = 8;
 
-// The record type of structured data that storage lists give.
+// The structured-data record type of storage lists.
 constexpr std::uint32_t kStorageRecordType = 176;
 
 enum Generation : std::uint8_t { kGeneration0, kGeneration1, kGeneration2, kGenerations };
@@ -92,7 +92,7 @@ std::uint32_t hexNumber(std::string_view text, std::FILE* notices) {
   return value;
 }
 
-// The string, or nothing after a line that says what is wrong with it.
+// The string; empty after a line that says what is wrong with it.
 std::optional<std::string_view> stringOf(const KvDictionary& dictionary, const char* key) {
   const KvObject* const value = dictionary.get(key);
   const auto* const text = kvCast<KvString>(value);
@@ -109,11 +109,11 @@ std::optional<std::string_view> stringOf(const KvDictionary& dictionary, const c
 std::optional<Generation> generationOf(const KvDictionary& dictionary) {
   const auto chip = stringOf(dictionary, "chip-id");
   if (!chip) return std::nullopt;
-  if (chip->size() >= kChipIdRoom) {
+  if (chip->size() >= kChipIdCapacity) {
     std::fprintf(stderr,
                  "ERROR: Unable to obtain %s as conversion from the UniChar contents of KvString "
                  "failed, or the buffer of %d bytes is too small\n",
-                 "chip-id", static_cast<int>(kChipIdRoom));
+                 "chip-id", static_cast<int>(kChipIdCapacity));
     return std::nullopt;
   }
   const std::string_view name = chip->substr(0, chip->find('\0'));
@@ -158,7 +158,7 @@ std::optional<Characteristics> characteristicsOf(const KvObject* object, std::si
   return Characteristics{*generation, parser, static_cast<std::size_t>(count)};
 }
 
-// Where a reported element comes from; the names are made once for all buses.
+// The source of a reported element; the names are made once for all buses.
 struct Element {
   KvRef<KvString> name;
   std::size_t word;

@@ -11,8 +11,8 @@
 namespace tally {
 
 // Hands the record of each bus to the sink, bus after bus. False, with a line on standard error
-// before anything was handed over, when the characteristics or the list's length do not allow it.
-// A digit that is none is named in `notices`.
+// and no record at all, when the characteristics or the list's length do not allow it. Invalid
+// digits are reported in `notices`.
 using RecordSink = std::function<void(const KvDictionary&)>;
 bool readTelemetryList(std::span<const std::byte> list, const KvObject* characteristics,
                        std::FILE* notices, const RecordSink& sink);

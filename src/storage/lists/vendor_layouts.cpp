@@ -1,6 +1,7 @@
-// Where each layout keeps its counters.
-#include "base/byte_reader.h"
+// The places of the counters in each layout.
 #include "storage/vendor_counters.h"
+
+#include "base/byte_reader.h"
 
 namespace tally {
 namespace {

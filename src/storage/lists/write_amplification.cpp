@@ -16,7 +16,7 @@ float ratio(std::uint64_t written, std::uint64_t hostWrites) {
   return static_cast<float>(static_cast<double>(written) / static_cast<double>(hostWrites));
 }
 
-// Where a name occurs twice the last one holds.
+// If a name occurs twice, the last value applies.
 struct IntermediateBand {
   std::uint64_t pagesPerVirtualBlock = 0, erases = 0;
 };

@@ -1,4 +1,4 @@
-// How much the flash storage writes for what the host wrote, and what follows from it.
+// How much the flash storage writes for each byte of the host, and what follows from it.
 #pragma once
 
 #include "storage/statistics.h"

@@ -1,4 +1,4 @@
-// Whose day it is.
+// The days of the analytics service.
 #pragma once
 
 namespace tally {

@@ -1,10 +1,11 @@
 // From a parsed context to the NAND info dictionary.
+#include "storage/nand_info.h"
+
 #include <array>
 #include <optional>
 #include <string_view>
 
 #include "platform/platform.h"
-#include "storage/nand_info.h"
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
@@ -78,7 +79,7 @@ std::uint64_t weeksSince2000(std::uint64_t secondsSince1970) {
   return secondsSince1970 <= k2000 ? 0 : (secondsSince1970 - k2000) / kWeek;
 }
 
-// Durations that would tell devices apart are reported to three digits.
+// Durations that could identify a device are reported to three significant digits.
 std::uint32_t threeSignificantDigits(std::uint32_t value) {
   std::uint32_t step = 1;
   while (value / step >= 1000) step *= 10;
@@ -87,7 +88,7 @@ std::uint32_t threeSignificantDigits(std::uint32_t value) {
   return (kept + (step > 1 && rest >= step / 2 ? 1 : 0)) * step;
 }
 
-// Counters that are not reported themselves but go into a derived figure.
+// Counters that are not reported themselves but are part of a derived figure.
 enum class Role : std::uint8_t {
   None,
   UserPartitionStart,
@@ -119,7 +120,7 @@ constexpr RoleOfName kRoles[] = {
 
 constexpr std::string_view kRoundedDurations[] = {"maxMemLowDuration", "maxMemChokeDuration"};
 
-// What is done with the counter of each name number.
+// How the counter of each name number is treated.
 struct Treatment {
   Role role = Role::None;
   bool isRounded = false;

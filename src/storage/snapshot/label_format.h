@@ -1,5 +1,5 @@
-// Label formats that a buffer brings along. They are parsed here and printed by hand, and never
-// reach printf: whoever wrote the buffer must not choose what is read from the stack.
+// Label formats from a device's buffer. They are parsed here and printed by our own code, never by
+// printf: the writer of the buffer must not choose what is read from the stack.
 #pragma once
 
 #include <cstddef>
@@ -9,26 +9,26 @@
 
 namespace tally {
 
-// What stands in the place of the conversion.
+// What the conversion prints.
 enum class LabelArgument { Number, Letter };
 
-// A label format that can be honoured: a text with one conversion at most. For a number that is
+// A supported label format: a text with at most one conversion. For a number that is
 // d, i, u, o, x or X, with flags, width and precision; for a letter c or s. "%%" is a percent sign.
 class LabelFormat {
  public:
-  // Bytes that the text of one label needs at most.
+  // The longest text of a label, in bytes.
   static constexpr std::size_t kLongestWidth = 99;
   static constexpr std::size_t kLongestFormat = 16;
   static constexpr std::size_t kLongestText = kLongestFormat + kLongestWidth + 3;
 
   LabelFormat() = default;
-  // Empty when the format holds more than one conversion, one that is not of the argument's kind,
-  // one that ends early, or a width or precision above kLongestWidth or given by an argument. The
-  // format is borrowed. REQUIRES: at most kLongestFormat bytes.
+  // Empty when the format contains more than one conversion, one that is not of the argument's
+  // kind, one that ends early, or a width or precision above kLongestWidth or given by an argument.
+  // The format is borrowed. REQUIRES: at most kLongestFormat bytes.
   static std::optional<LabelFormat> parse(std::string_view format, LabelArgument argument);
 
   bool empty() const noexcept { return before_.empty() && conversion_ == '\0'; }
-  // Write the label at `to` and return the place behind. REQUIRES: room for kLongestText bytes.
+  // Write the label at `to` and return its end. REQUIRES: space for kLongestText bytes.
   char* appendNumber(char* to, std::uint32_t value) const;
   char* appendLetter(char* to, char letter) const;
 

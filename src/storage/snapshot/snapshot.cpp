@@ -1,5 +1,5 @@
 // Snapshots of the fixed layout. The columns are a table; a line is written straight into the text
-// while the longest one fits, and else beside it.
+// while the longest one fits, and otherwise into a buffer of its own.
 #include "storage/snapshot.h"
 
 #include <algorithm>
@@ -100,7 +100,7 @@ std::uint32_t shownFigure(std::uint32_t value, Figure figure) {
   return value;
 }
 
-// REQUIRES: a whole record, and room for the longest line.
+// REQUIRES: a whole record, and space for the longest line.
 char* appendLine(char* to, std::span<const std::byte> record) {
   const ByteReader reader(record);
   for (const Column& column : kLineColumns) {
@@ -112,7 +112,7 @@ char* appendLine(char* to, std::span<const std::byte> record) {
   return to;
 }
 
-// The text under the bound of its capacity, one byte of which is the zero at its end.
+// The text within its capacity, which includes the zero byte at its end.
 class BoundedText {
  public:
   BoundedText(char* text, std::uint32_t capacity) : text_(text), room_(capacity - 1u) {}
@@ -120,7 +120,7 @@ class BoundedText {
   std::size_t length() const { return length_; }
   char* end() { return text_ + length_; }
   void advance(std::size_t bytes) { length_ += bytes; }
-  // False when only the beginning fitted.
+  // False when the text was truncated.
   bool append(std::string_view piece) {
     const std::size_t taken = std::min(piece.size(), room());
     std::memcpy(end(), piece.data(), taken);

@@ -1,9 +1,10 @@
 // Snapshots whose fields a description block names.
+#include "storage/snapshot.h"
+
 #include <array>
 #include <cstring>
 
 #include "base/byte_reader.h"
-#include "storage/snapshot.h"
 #include "storage/snapshot/snapshot_description.h"
 #include "storage/snapshot/snapshot_text.h"
 
@@ -13,8 +14,9 @@ namespace {
 constexpr std::string_view kTitleBefore = "- SPX Snapshot - \n";
 constexpr std::uint32_t kPerMillisecond = 1000;
 
-// The text under its capacity. Lines are written behind what is committed, and count once they are
-// whole; a piece that reaches the capacity leaves no room for the zero byte and so does not fit.
+// The text within its capacity. Lines are written after what is committed, and are committed once
+// they are whole. A piece that reaches the capacity leaves no space for the zero byte: it does not
+// fit.
 class LineText {
  public:
   LineText(char* text, std::uint32_t capacity) : text_(text), capacity_(capacity) {}
@@ -25,7 +27,7 @@ class LineText {
     length_ += piece.size();
     return true;
   }
-  // Lets write(to) put at most so many bytes at `to` and return the place behind them.
+  // Lets write(to) put at most so many bytes at `to` and return their end.
   template <std::size_t Most, class Write>
   bool appendPiece(const Write& write) {
     if (capacity_ - length_ > Most) {

@@ -1,4 +1,4 @@
-// The description block of described snapshots: where each field lies, and how it is labelled.
+// The description block of described snapshots: the place of each field, and its label.
 #pragma once
 
 #include <array>
@@ -21,21 +21,21 @@ struct SnapshotField {
   LabelFormat label;
 };
 
-// A block that can be honoured in full. It borrows the block, and lives on the stack, which is why
-// the fields have a bound.
+// A block that is supported as a whole. It borrows the block, and is on the stack, so the number of
+// fields is bounded.
 class SnapshotDescription {
  public:
   static constexpr std::size_t kMostFields = 256;
 
-  // Why the block is refused; empty when it is not. The object is then ready.
+  // Why the block is rejected; empty when it is accepted. The object is then ready.
   std::string_view parse(std::span<const std::byte> block);
 
   std::uint32_t recordBytes() const noexcept { return recordBytes_; }
   // As the block says; the last one that it counts is never printed.
   std::uint32_t recordCount() const noexcept { return recordCount_; }
-  // The records that are whole among so many bytes and may be printed.
+  // The number of whole records in so many bytes that may be printed.
   std::uint32_t printableRecords(std::size_t bytes) const noexcept;
-  // Where a record holds 0 when it is empty.
+  // A record with 0 there is empty.
   std::uint32_t emptyMarkOffset() const noexcept { return emptyMarkOffset_; }
   std::span<const SnapshotField> fields() const noexcept { return {fields_.data(), fieldCount_}; }
   // False: the header is the key of all columns.

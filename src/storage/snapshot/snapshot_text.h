@@ -1,4 +1,4 @@
-// What both snapshot layouts share: their key, and numbers in columns.
+// Shared by both snapshot layouts: their key, and numbers in columns.
 #pragma once
 
 #include <charconv>
@@ -9,7 +9,7 @@
 
 namespace tally {
 
-// The lines of C and S have always run together; readers of these texts know them so.
+// The lines of C and S run together; readers of these texts rely on it.
 constexpr std::string_view kSnapshotKey =
     "Key: \n"
     "T   - Timestamp\n"
@@ -57,8 +57,8 @@ constexpr unsigned digitCount(std::uint32_t value) {
   return digits;
 }
 
-// Writes the number at `to`, filled up to the width on its left, and returns the place behind it.
-// REQUIRES: room for the width and for kLongestNumber bytes.
+// Writes the number at `to`, padded on its left to the width, and returns its end.
+// REQUIRES: space for the width and for kLongestNumber bytes.
 inline char* appendColumn(char* to, std::uint32_t value, unsigned width, char fill = ' ') {
   for (unsigned used = digitCount(value); used < width; ++used) *to++ = fill;
   return std::to_chars(to, to + kLongestNumber, value).ptr;

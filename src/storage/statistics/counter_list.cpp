@@ -7,7 +7,8 @@ namespace tally {
 namespace {
 
 constexpr std::size_t kCounterSize = sizeof(std::uint64_t) + sizeof(std::uint16_t);
-// Each block is twice the former, so that few counters cost little and many cost few blocks.
+// Each block is twice as large as the previous one, so that few counters take little memory and
+// many take few blocks.
 constexpr std::uint32_t kFirstCapacity = 400;
 constexpr std::uint32_t kLargestCapacity = 6400;
 

@@ -7,7 +7,7 @@
 
 namespace tally {
 
-// A block with room for more behind those that are there; false when memory runs out.
+// Appends a block with free capacity; false when memory runs out.
 bool addCounterBlock(SPXParseContext& context) noexcept;
 
 // False when memory runs out; then no counter was added.

@@ -1,4 +1,4 @@
-// Numbered names, put together at compile time.
+// Builds numbered names at compile time.
 #pragma once
 
 #include <cstddef>
@@ -12,7 +12,7 @@ constexpr std::size_t decimalDigits(unsigned value) {
   return digits;
 }
 
-// Both write at `to`, without a zero byte, and return the place behind.
+// Both write at `to`, without a zero byte, and return the end.
 constexpr char* appendText(char* to, std::string_view text) {
   for (const char letter : text) *to++ = letter;
   return to;

@@ -1,10 +1,11 @@
 // The statistics buffer: one pass over its records, which become fixed fields and counters.
+#include "storage/statistics.h"
+
 #include <algorithm>
 #include <array>
 #include <span>
 
 #include "base/byte_reader.h"
-#include "storage/statistics.h"
 #include "storage/statistics/counter_list.h"
 #include "storage/statistics/statistic_keys.h"
 
@@ -61,7 +62,7 @@ void storeField(SPXParseContext& context, std::uint32_t key, std::uint64_t value
   if (wide[key] != nullptr) context.*wide[key] = value;
 }
 
-// The values of one record, all of which lie in the buffer.
+// The values of one record, all of them inside the buffer.
 class Values {
  public:
   explicit Values(std::span<const std::byte> bytes) : reader_(bytes) {}
