@@ -54,7 +54,7 @@ class RawPeer:
         return self.socket
 
     def wait_for_answers(self, count):
-        """Reads until so many replies came; the number of bytes is all that matters of them."""
+        """Reads until so many replies have arrived, and ignores their content."""
         self.socket.settimeout(120)
         seen = 0
         buffer = b""

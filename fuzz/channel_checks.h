@@ -16,7 +16,7 @@ inline void askStates(KvDictionary* channel, std::int32_t index) {
   require(found < HwReportStateGetCount(channel) || found == -1, "a state's index is inside");
 }
 
-// Whose channel it is: what the library keeps in those that it made, others may have made up.
+// Who made the channel: the library's own invariants hold only for its own channels.
 enum class Maker { Library, Anybody };
 
 inline void askBuckets(KvDictionary* channel, std::int32_t index, Maker maker) {

@@ -7,7 +7,7 @@
 
 namespace tally::fuzz {
 
-// A log that counts as one that everything is written to.
+// A log that is enabled at every level and drops everything.
 struct UnreadLog final : SystemLog {
   bool enabled(LogLevel) const override { return true; }
   void write(LogLevel, std::string_view) override {}
@@ -16,7 +16,7 @@ struct UnreadLog final : SystemLog {
 class DescribedFolder : public TemporaryFolder {
  public:
   DescribedFolder() { put("File", "bytes of a file that a description names"); }
-  // The input as a file: a property list as it stands, or what a value is written as.
+  // The input as a file: a property list as it is, otherwise the value that it encodes, written.
   void putInput(std::string_view name, Input& input) const {
     if (isDocument(input.rest())) return put(name, input.rest());
     const auto written = encodeXmlPlist(*valueOf(input));

@@ -33,8 +33,8 @@ inline void require(bool holds, std::string_view invariant) {
   std::abort();
 }
 
-// The bytes of one run. Past their end there are zeros, so that a target need not ask for each
-// piece whether it is there.
+// The bytes of one run. Past their end there are zeros, so that a target need not check
+// each piece for its presence.
 class Input {
  public:
   Input(const std::uint8_t* data, std::size_t size) : left_(std::as_bytes(std::span(data, size))) {}

@@ -21,7 +21,7 @@ void askKernelValues(LinuxKernelValues& values) {
     for (const std::size_t room : {std::size_t{0}, std::size_t{8}, buffer.size()}) {
       std::size_t length = room;
       values.readKernelValue(name, std::span(buffer).first(room), &length);
-      require(length <= buffer.size(), "no more is delivered than there is room for");
+      require(length <= buffer.size(), "no more is delivered than fits");
     }
   }
   values.MonotonicTicks();

@@ -61,7 +61,7 @@ FUZZ_TARGET(legends)(const std::uint8_t* data, std::size_t size) {
     const auto group = KvString::create("");
     HwReportSelectChannelsInGroup(merged.get(), group.get(), nullptr);
 
-    // A collection that nobody made here may be anything.
+    // A collection made elsewhere may contain anything.
     const auto foreign = described->copy();
     HwReportIterate(foreign.get(), [](KvDictionary* channel) {
       fuzz::askChannel(channel, fuzz::Maker::Anybody);
@@ -70,6 +70,6 @@ FUZZ_TARGET(legends)(const std::uint8_t* data, std::size_t size) {
     const auto target = HwReportCreateAggregate(options);
     HwReportMergeChannels(target.get(), foreign.get());
   }
-  require(registry->openHandles() == 0, "every handle is given back");
+  require(registry->openHandles() == 0, "every handle is released");
   return 0;
 }

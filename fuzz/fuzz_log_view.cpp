@@ -8,7 +8,7 @@
 #include "tools/report/log_diff.h"
 #include "tools/report/log_view.h"
 
-// The tool's own is in the file of its command line, which takes longer to build than all the rest.
+// The tool's own is beside its command line, which takes longer to build than everything else.
 void tally::tools::print(std::FILE* file, std::string_view text) {
   std::fwrite(text.data(), 1, text.size(), file);
 }

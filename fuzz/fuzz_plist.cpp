@@ -10,8 +10,8 @@ using fuzz::require;
 
 namespace {
 
-// Writes the value in each form. The XML reads back as itself, but that keys which XML cannot carry
-// may have become one.
+// Writes the value in each form. The XML reads back as itself, except that keys which XML cannot
+// carry may have become one.
 void checkRoundTrip(const KvObject& value) {
   std::string json;
   appendJson(json, value);

@@ -20,7 +20,7 @@ void callMethods(DeviceRegistry& registry, ConnectionHandle connection) {
                       .structOutput = room};
       if (flags == 0 && method % 2 == 0) call.structInput = {};
       registry.ConnectionCallMethod(connection, method, call);
-      require(call.structOutputSize <= room.size(), "no more is written than there is room for");
+      require(call.structOutputSize <= room.size(), "no more is written than fits");
     }
   }
   const std::byte* address = nullptr;
@@ -71,6 +71,6 @@ FUZZ_TARGET(registry)(const std::uint8_t* data, std::size_t size) {
     }
     registry.HandleRelease(iterator);
   }
-  require(registry.openHandles() == 0, "every handle is given back");
+  require(registry.openHandles() == 0, "every handle is released");
   return 0;
 }

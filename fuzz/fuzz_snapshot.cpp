@@ -35,7 +35,7 @@ FUZZ_TARGET(snapshot)(const std::uint8_t* data, std::size_t size) {
   const auto longest = static_cast<std::uint32_t>(4096 + records.size() * 8);
   const Rendered whole = render(records, longest);
   require(whole.result == 1 && whole.size < longest && whole.text[whole.size] == '\0',
-          "with room enough the text is whole");
+          "with enough capacity the text is whole");
   const Rendered made = render(records, capacity);
   require(made.result == (whole.size < capacity ? 1 : 0), "the text is whole when it fits");
   require(made.size == (made.result != 0 ? whole.size : capacity), "the size says what there is");
@@ -46,6 +46,6 @@ FUZZ_TARGET(snapshot)(const std::uint8_t* data, std::size_t size) {
       "what does not fit is cut");
   require(std::all_of(made.text.begin() + static_cast<std::ptrdiff_t>(length) + 1, made.text.end(),
                       [](char c) { return c == kUntouched; }),
-          "nothing is written behind the text");
+          "nothing is written after the text");
   return 0;
 }

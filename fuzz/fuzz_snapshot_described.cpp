@@ -14,7 +14,7 @@ FUZZ_TARGET(snapshot_described)(const std::uint8_t* data, std::size_t size) {
   const auto records = input.takeRest();
   const bool refused = !SnapshotDescription().parse(description).empty();
 
-  // As a caller goes on who was told that the text is full, some texts far.
+  // Continues a few times, as a caller does after a full text.
   std::uint32_t cursor = first;
   for (int texts = 0; texts < 4; ++texts) {
     const std::uint32_t before = cursor;

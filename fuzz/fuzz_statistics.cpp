@@ -20,7 +20,7 @@ FUZZ_TARGET(statistics)(const std::uint8_t* data, std::size_t size) {
     ++counters;
     require(!name.empty() && name.data()[name.size()] == '\0', "a counter has a terminated name");
   });
-  require(counters * sizeof(std::uint64_t) <= buffer.size(), "no counter comes from nowhere");
+  require(counters * sizeof(std::uint64_t) <= buffer.size(), "each counter has its bytes");
   require(result == 1 || parsed.exportVersion == 0, "a parse that failed has no export version");
 
   fakes::FakeStorage storage;
@@ -40,6 +40,6 @@ FUZZ_TARGET(statistics)(const std::uint8_t* data, std::size_t size) {
   storage.registry->serve(buffer, announced);
   CopyNANDHealthInfo();
   require(storage.registry->services == 0 && storage.registry->connections == 0,
-          "every handle is given back");
+          "every handle is released");
   return 0;
 }

@@ -1,5 +1,5 @@
 // Property values out of a fuzz input: from a property list when the input is one, else from a
-// short form in which nearly every byte string is a value, so that mutations reach what lies behind
+// short form in which nearly every byte string is a value, so that mutations get past
 // the codec. fuzz/make-corpus writes the same form.
 #pragma once
 
@@ -54,7 +54,7 @@ class ValueReader {
 
   // Never null.
   KvRef<KvObject> take(int depth = 0) {
-    // Deep enough for every reader's own bound but the codec's.
+    // Deeper than the bound of every reader but the codec.
     constexpr int kDeepest = 48;
     switch (const auto kind = input_.take<std::uint8_t>() % 16; kind) {
       case 0:
@@ -123,8 +123,7 @@ class ValueReader {
   }
 
   Input& input_;
-  std::size_t longLettersLeft_ =
-      4096;  // else three bytes after the other would cost a run its time
+  std::size_t longLettersLeft_ = 4096;  // otherwise every three bytes could ask for long texts
 };
 
 inline bool isDocument(std::string_view bytes) {

@@ -1,5 +1,5 @@
-// Silences what the code under test prints: thousands of lines a second would only cost time. Crash
-// reports go past these streams.
+// Silences what the code under test prints: thousands of lines a second only take time. Crash
+// reports bypass these streams.
 #include <cstdint>
 #include <cstdio>
 

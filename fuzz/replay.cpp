@@ -1,6 +1,6 @@
 // Every fuzz target on its seeds and regressions, without a fuzzer: fuzz_replay FOLDER, where
-// corpus/ and regressions/ are. Names each input before it runs, so that the last one named is the
-// fault's.
+// corpus/ and regressions/ are. Names each input before it runs, so the last one named is the one
+// at fault.
 #include <cstdio>
 #include <filesystem>
 #include <fstream>

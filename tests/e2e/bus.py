@@ -100,8 +100,8 @@ class BusDevice(Device):
 
     @contextlib.contextmanager
     def kept_awake(self):
-        """A slow machine may take more than ten seconds for what comes next: the run gets messages meanwhile
-        that mean nothing to it."""
+        """Sends messages without effect meanwhile, since a slow machine may need more than the ten quiet seconds
+        after which the run ends."""
         done = threading.Event()
 
         def ping():
@@ -117,7 +117,7 @@ class BusDevice(Device):
 
     @contextlib.contextmanager
     def suspended(self):
-        """The running program, for as long as it takes to send what it must not see being sent."""
+        """Stops the running program, so that a sender is gone before its message is read."""
         process = int((self.folder / "pid").read_text())
         os.kill(process, signal.SIGSTOP)
         try:
@@ -149,7 +149,7 @@ class BusDevice(Device):
         return (result.stdout + result.stderr).decode()
 
     def monitor(self):
-        """Starts to write down the signals of the program's notifications."""
+        """Starts to record the signals of the program's notifications."""
         with open(self.folder / "signals", "wb") as output:
             process = subprocess.Popen(["dbus-monitor", "--address", self.address, "--profile",
                                         "type='signal',path='/vellum'"], stdout=output)

@@ -30,7 +30,7 @@ def group(scalars=None, distributions=None, **prefixes):
 
 
 class Device:
-    today = TODAY  # the day that its runs are thought to fall on
+    today = TODAY  # the day of its runs
 
     def __init__(self, root=None):
         """A fresh device, or the one whose root is given."""
@@ -51,10 +51,10 @@ class Device:
         self.write(WHITELIST, groups)
 
     def describe(self, **entries):
-        # A build that is not known is no update, which is a matter of its own.
+        # Without a known build there is no system update, which other tests cover.
         entries.setdefault("SystemVersion", {})
-        # The boot session and the day decide whether the storage figures go to analytics: here they
-        # never do on the device's own day, whatever machine and day the test runs on.
+        # The boot session and the day decide whether the storage figures are sent as events: here they
+        # never are on the device's own day, whatever the machine and the day of the test.
         entries.setdefault("KernelValues", {}).setdefault(
             "kern.bootsessionuuid", b"%d0000000" % ((self.today + 1) % 2))
         self.write("device/device.plist", entries)
@@ -78,8 +78,8 @@ class Device:
         # A preloaded library comes before the sanitizer's runtime, which is fine here.
         environment["ASAN_OPTIONS"] = environment.get("ASAN_OPTIONS", "") + ":verify_asan_link_order=0"
         if day is not None:
-            # Preloaded by hand: the faketime program leaves a semaphore of its process number behind
-            # when it is killed, and fails when that number comes up again.
+            # Preloaded by hand: a killed faketime program leaves a semaphore named after its process, and
+            # fails when that number is used again.
             moment = time.strftime("@%Y-%m-%d %H:%M:%S", time.gmtime(day * 86400 + seconds))
             environment.update(LD_PRELOAD=FAKETIME_LIBRARY, FAKETIME=moment, NO_FAKE_STAT="1",
                                DONT_FAKE_MONOTONIC="1")

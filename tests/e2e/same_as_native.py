@@ -21,7 +21,7 @@ COMMANDS = (
         "nand info --json", "nand health", "nand events", "channels sample --json",
         "nand snapshot DEVICE/snapshot.bin",
         "nand snapshot DEVICE/snapshot-described.bin --header DEVICE/snapshot-header.bin")))
-# What the machine and the moment would answer.
+# What depends on the machine and the time.
 PINNED = {"MonotonicTicks": 86_400_000_000_000, "Timebase": {"Numerator": 1, "Denominator": 1},
           "OSVersion": "5.1 (16S46)", "SystemID": "Vellum 5.1", "HardwareModel": "sample"}
 RANDOM = re.compile(rb"[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}|tallyrun\[\d+\]")  # of each storage log

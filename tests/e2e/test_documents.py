@@ -48,7 +48,7 @@ class Documents(unittest.TestCase):
             subprocess.run(command, check=True, capture_output=True, env=environment)
 
     def clone(self):
-        """A folder that looks like a clone after its demo; what is too large to run is written down."""
+        """A folder that looks like a clone after its demo; calls that are too large to run are recorded."""
         clone = pathlib.Path(tempfile.mkdtemp(dir=self.folder))
         (clone / "build").mkdir()
         shutil.copytree(self.demo, clone / "build/demo-root")

@@ -88,7 +88,7 @@ def hostile_messages(test, device):
         (2, ["operation", "x", "0", "x", *nested], 1, "nested too deeply"),
         (2, ["operation", "x", "0", "x", "as", "20001", *["y"] * 20_001], 1),
     ]
-    # Not a dictionary at all, and one of the wrong kind: taken, and ignored without a line.
+    # Not a dictionary, and one of the wrong type: accepted, and ignored without a log line.
     device.dbus_send("string:hello")
     device.dbus_send("dict:string:int64:operation,0")
     lines = []
@@ -102,7 +102,7 @@ def hostile_messages(test, device):
             output = device.busctl("operation", "x", "0", user="nobody", status=1)
             test.assertIn("Access denied", output)
             lines.append("is not accepted")
-        # After all that, the program is still there for whoever means well.
+        # After all that the program still serves well-formed messages.
         device.busctl("operation", "x", str(7 << 32 | 1), "value", "x", str(3 << 32 | TODAY - 2), count=2)
         device.until(device.log_files, 150, "the log of the day that was asked for")
     device.wait_for_end()
@@ -114,7 +114,7 @@ def hostile_messages(test, device):
     test.assertEqual(device.log()["TBScalars"]["a"], TODAY - 2)
 
 def sender_that_is_gone(test, device):
-    """Whether its message counts is the bus's policy's affair; a lost one has its line."""
+    """The bus's policy decides whether its message counts; a lost one is logged."""
     device.busctl("operation", "x", "0", waits=False)  # it is gone before there is a program to take this
     device.wait_for_end()
     test.assertIn("the message that started this run is lost", device.error_texts()[0])
@@ -131,7 +131,7 @@ def sender_that_is_gone(test, device):
         test.assertIn("its sender did not wait", device.error_texts()[1])
 
 def refused_messages(test, device):
-    """They do not keep the program, however many come."""
+    """They do not keep the program running, however many arrive."""
     if os.getuid() != 0:
         return
     device.dbus_send("string:hello")
@@ -182,7 +182,7 @@ class Endpoint(unittest.TestCase):
                     result.result()
 
     def sweep(self, found):
-        """What the telemetry sweep says, which is another test's matter."""
+        """What the telemetry sweep logs, which other tests check."""
         start = found.index(f"daily tasks for day {YESTERDAY}") + 1
         end = [text.startswith("OS change") for text in found].index(True)
         return found[start:end]

@@ -16,7 +16,7 @@ RUNS = 200
 HOME = "var/mobile"
 SECRET = b"<key>secret</key><string>only root reads this</string>"
 TRAPS = f"{HOME}/traps"
-# What is exchanged, for what: a link to something foreign, or a second name of a foreign file.
+# What is exchanged, and for what: a link to a foreign file or directory, or a second name of a foreign file.
 EXCHANGES = [
     (PREFERENCES, "symlink", "Library/Preferences"),
     (f"{PREFERENCES}/vellum.tallyd.tallyrun.plist", "symlink", "foreign/secret.plist"),

@@ -1,4 +1,4 @@
-"""The Debian package: installed into a clean root, used there, and gone again but for the data."""
+"""The Debian package: installed into a clean root, used, and removed again except for the data."""
 import os
 import pathlib
 import re
@@ -14,7 +14,7 @@ DATA = {"var", "Library"}  # what a device recorded stays
 TIMER_LINK = "etc/systemd/system/timers.target.wants/tallyrun-day.timer"
 LIBRARIES = {"libtallykv0": "libtallykv.so.0", "libhwreport0": "libhwreport.so.0",
              "libtallystorage0": "libtallystorage.so.0"}
-# What packages of the first release had elsewhere.
+# Files that packages of the first release had at other paths.
 FORMER_FILES = {"tallyrun": ["bin/tallyrun", "lib/systemd/system/timers.target.wants/tallyrun-day.timer"],
                 **{package: [f"lib/{name}", f"lib/{name}.1.0"] for package, name in LIBRARIES.items()},
                 "libtallykv-dev": ["lib/libtallykv.so", "lib/pkgconfig/tallykv.pc"]}

@@ -14,7 +14,7 @@ MAKE_STORAGE = pathlib.Path(__file__).resolve().parents[2] / "examples/device/ma
 BUFFER = "device/storage-statistics.bin"
 PREFIX = "vellum.NANDInfo."
 STRUCTURED_DATA = "var/mobile/Library/Logs/StructuredData"
-# Report names and where their values stand in the driver's buffer: key and element.
+# Report names and the places of their values in the driver's buffer: key and element.
 SPOTS = {"NumLogicalReads": (7, 0), "BytesPerPage": (49, 0), "BandsMaxTempHisto21": (327, 21),
          "CacheDepthVsThroughput255": (460, 255), "PadSize4": (121, 3), "E2E_F2H_SL_UECC": (280, 11),
          "spareAvailablePercent": (532, 0), "ReadsBeforeErasure50000": (265, 1)}
@@ -45,7 +45,7 @@ class Storage(DeviceTest):
         scalars = device.log()["TBScalars"]
         self.assertEqual({key: scalars.get(key) for key in expected}, expected)
         self.assertIn("98 %", device.tool("nand", "health"))
-        # A bad buffer costs the storage figures only.
+        # A malformed buffer affects only the storage figures.
         (device.root / BUFFER).write_bytes(buffer[:-8])
         device.run("-f", day=TODAY + 2)
         dump = device.tool("store", "dump", "--day", str(TODAY + 2))

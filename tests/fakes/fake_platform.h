@@ -1,5 +1,6 @@
-// A platform in memory for unit tests: every service records what was asked of it and answers what
-// the test put in. FakePlatform keeps each fake by its own type; install() puts it in force.
+// A platform in memory for unit tests: every service records its calls and answers with what the
+// test has set. FakePlatform keeps each fake by its own type; install() makes it the platform in
+// force.
 #pragma once
 
 #include <algorithm>
@@ -129,7 +130,7 @@ struct FakePreferences final : Preferences {
     return failingDomains.contains(std::string(domain)) ? WriteResult::Failed
                                                         : WriteResult::Written;
   }
-  // Sets a value without a record of it; null removes.
+  // Sets a value without recording the call; null removes it.
   void put(std::string_view key, KvRef<KvObject> value, std::string_view domain) {
     std::pair<std::string, std::string> place{domain, key};
     if (value) {
@@ -147,7 +148,7 @@ struct FakeNotifications final : Notifications {
   }
 };
 
-// Writes are recorded as "system DOMAIN KEY=VALUE" or "... removed", with " unsynced" behind.
+// Writes are recorded as "system DOMAIN KEY=VALUE" or "... removed", with " unsynced" at the end.
 struct FakeSystemConfiguration final : SMASystemConfiguration {
   std::shared_ptr<CallLog> calls;
   std::map<std::pair<std::string, std::string>, KvRef<KvObject>> values;  // by domain and key
@@ -197,7 +198,7 @@ struct FakeLogSubmission final : LogSubmission {
   std::shared_ptr<CallLog> calls;
   std::vector<Submitted> logs;
   bool failWrite = false;   // every write to the log's file fails
-  bool failSubmit = false;  // the log is written but not taken
+  bool failSubmit = false;  // the log is written but not accepted
 
   bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
                                 const KvDictionary* options, const KvObject* reserved,
@@ -305,7 +306,7 @@ struct FakeKernelValues final : KernelValues {
     std::vector<std::byte> bytes;
     int error = 0;
   };
-  // Successive reads of a name take successive answers; the last one stays.
+  // Successive reads of a name get successive answers; the last one is repeated.
   std::map<std::string, std::vector<Answer>, std::less<>> answers;
   std::vector<std::string> reads;
   std::uint64_t ticks = 0;
@@ -401,7 +402,7 @@ struct FakePlatform {
   }
 };
 
-// A platform whose clock stands at noon of day 20,000.
+// A platform whose clock shows noon of day 20,000.
 inline FakePlatform makeFakePlatform() {
   FakePlatform fake;
   fake.runLock->calls = fake.preferences->calls = fake.logSubmission->calls =

@@ -25,7 +25,7 @@ struct FakeRegistry final : DeviceRegistry {
   std::uint64_t token = 0x1'0000'0007;
   std::size_t tokensWritten = 1;
   std::vector<std::byte> region;     // mapped
-  std::vector<std::byte> structure;  // the last structure that came in
+  std::vector<std::byte> structure;  // the last structure input
   std::vector<std::uint64_t> scalars;
   std::vector<std::string> calls;  // operations on connections, in order
   std::map<RegistryHandle, int> handles;
@@ -118,7 +118,7 @@ struct FakeRegistry final : DeviceRegistry {
 
  private:
   static constexpr RegistryHandle kIterator = 1, kConnection = 2, kFirst = 16;
-  // Only the property part of a matching dictionary, where true stands for any value.
+  // Only the property part of a matching dictionary, where true matches any value.
   bool matches(const Entry& entry) const {
     const auto* wanted = matched->getAs<KvDictionary>(kMatchProperty);
     if (wanted == nullptr) return true;

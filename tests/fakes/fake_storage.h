@@ -1,6 +1,5 @@
-// A device with a storage driver, in memory: each call can be made to fail, and every call that is
-// made is remembered. With it the services that the storage
-// library asks besides.
+// A device with a storage driver, in memory: each call can be made to fail, and every call is
+// recorded. Also the other services that the storage library uses.
 #pragma once
 
 #include <algorithm>
@@ -26,7 +25,7 @@ struct FakeStorageRegistry : DeviceRegistry {
   std::map<std::string, KvRef<KvObject>, std::less<>> properties;  // of the service
   RegistryResult openStatus = 0, closeStatus = 0;
   std::vector<std::string> calls;
-  int services = 0, connections = 0;  // handed out and not given back
+  int services = 0, connections = 0;  // not yet released
 
   RegistryHandle RegistryFindService(KvRef<KvDictionary> matching) override {
     const std::string name(*matching->getString(kMatchClass));
@@ -64,7 +63,7 @@ struct FakeStorageRegistry : DeviceRegistry {
     replies.pop_front();
     const std::size_t count = std::min(reply.bytes.size(), call.structOutput.size());
     std::copy_n(reply.bytes.begin(), count, call.structOutput.begin());
-    call.structOutputSize = reply.bytes.size();  // may say more than there is room for
+    call.structOutputSize = reply.bytes.size();  // may exceed the capacity
     return reply.status;
   }
 

@@ -74,7 +74,7 @@ std::string arrived(const Contents& contents, Loss loss, Random& random) {
   return fate == 1 ? written : mixed(contents.synced, written, random);
 }
 
-// Whatever it fails on lies in a directory that is gone itself.
+// What fails is in a directory that is gone itself.
 void undo(const fs::path& directory, const Change& change) {
   std::error_code gone;
   switch (change.kind) {
@@ -141,7 +141,7 @@ void namesSynced(const std::string& directory) {
 }
 
 void cutPower(Loss loss, unsigned seed) {
-  const Disk left = *std::exchange(disk, nullptr);  // what is done here is no longer followed
+  const Disk left = *std::exchange(disk, nullptr);  // changes made here are no longer recorded
   Random random(seed);
   for (const auto& [inode, contents] : left.contents) {
     if (!contents.changed) continue;

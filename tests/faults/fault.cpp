@@ -13,7 +13,7 @@ const Fault* armed = nullptr;
 long wanted = 0, counted = 0;
 std::string watched;
 
-// Shared with the parent, who asks what became of its child.
+// Shared with the parent, which asks what became of its child.
 struct Notes {
   bool met = false;
   char call[256] = "";

@@ -1,13 +1,12 @@
-// Walks: each call of a daily run on a file or on the store fails once, or is the last of the run.
+// Walks: each call of a daily run on a file or the store fails once, or is the last of the run.
 //
-// What a run may leave behind, whatever happens to it:
+// What must be true after any run:
 // - Preference files, the store and the logs in the spool are whole at any moment.
 // - The day that is noted as processed is the former one or yesterday, and yesterday only when all
-//   of the day's tasks have been gone through. A task that failed by itself does not count: the day
-//   is noted all the same, and an error line says what it cost. A run that died before has not
-//   noted it, so that the next one does the day.
+//   of the day's tasks have been attempted. A task that fails does not prevent this: an error line
+//   says what is lost. A run that died earlier has not noted the day, so the next one does it.
 // - What a service has acknowledged survives a power cut, at once or later.
-// - The next run in which nothing fails ends with everything done, whatever is left over.
+// - The next run without a fault completes everything, whatever it finds.
 #include <gtest/gtest.h>
 
 #include <fmt/format.h>
@@ -34,7 +33,7 @@ namespace {
 namespace fs = std::filesystem;
 using Effect = Fault::Effect;
 
-// What lasts meets most calls many times, so that every third start will do.
+// A lasting fault meets most calls many times, so every third start is enough.
 const Fault kFaults[] = {
     {"NoSpace", Effect::Fail, kNoSpace, ENOSPC},
     {"NoSpaceFromThere", Effect::Fail, kNoSpace, ENOSPC, 3, true},
@@ -50,7 +49,7 @@ const Fault kFaults[] = {
     {"PowerCutAtRandom", Effect::PowerCut, kLastCall, 0, 1, false, Loss::AtRandom},
     {"Interrupted", Effect::Fail, kInterrupted, EINTR},
     {"HalfWritten", Effect::WriteHalf, kShortWrite},
-    // A run allocates some ten thousand times; a prime, so as not to keep step with any loop.
+    // A run allocates some ten thousand times; a prime, so that no loop keeps step with it.
     {"OutOfMemory", Effect::Fail, kNoMemory, ENOMEM, 311},
 };
 
@@ -66,7 +65,7 @@ const Scenario kScenarios[] = {
     {"a day of events", kDay + 1, "/var/mobile/Library/Logs/AnalyticsEvents"},
     {"a day without a store", kDay, "/var/mobile/Library/Tallybook", false},
 };
-// So few, and the calls of the whole day would not come here at all.
+// With fewer, the calls of the whole day would not be intercepted at all.
 constexpr long kFewestCalls = 20;
 
 // Of one day.
@@ -119,7 +118,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
       }
       const auto log = dictionaryIn(path);
       if (!log) {
-        ADD_FAILURE() << path << " is no whole log";
+        ADD_FAILURE() << path << " is not a whole log";
         continue;
       }
       const auto day =
@@ -385,7 +384,7 @@ INSTANTIATE_TEST_SUITE_P(, FaultWalk, testing::ValuesIn(kFaults),
 }  // namespace
 }  // namespace tally::faults
 
-// An exception ends a child as it ends the program, without anybody to catch it on its way.
+// An exception ends a child as it ends the program: nothing catches it on its way.
 int main(int count, char** arguments) {
   testing::InitGoogleTest(&count, arguments);
   GTEST_FLAG_SET(catch_exceptions, false);

@@ -25,7 +25,7 @@ extern "C" long __real_syscall(long, ...);
 namespace tally::faults {
 namespace {
 
-// The paths of what is open, by descriptor: calls that come without a path are on these.
+// The paths of open files, by descriptor, for calls without a path.
 struct OpenFile {
   std::string path;
   bool written = false;
@@ -135,7 +135,7 @@ int __wrap_openat(int directory, const char* name, int flags, ...) {
   return file;
 }
 
-// What the hardened headers make of it where it creates nothing.
+// The hardened headers call this where nothing is created.
 int __wrap___openat_2(int directory, const char* name, int flags) {
   return __wrap_openat(directory, name, flags);
 }
@@ -149,7 +149,7 @@ long __wrap_syscall(long number, int directory, const char* name, const void* ho
   return file;
 }
 
-// What is closed is closed, whatever the answer.
+// The file is closed whatever the result.
 int __wrap_close(int file) {
   const OpenFile closed = std::exchange(openFile(file), {});
   const int result = __real_close(file);

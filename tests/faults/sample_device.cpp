@@ -38,7 +38,7 @@ void require(bool done, const std::string& what) {
   std::abort();
 }
 
-// Where memory is a disk, the walks take a fraction of the time.
+// On a file system in memory the walks take a fraction of the time.
 fs::path placeForDevices() {
   return ::access("/dev/shm", W_OK) == 0 ? fs::path("/dev/shm") : fs::temp_directory_path();
 }
@@ -52,7 +52,7 @@ Acknowledged& acknowledged() {
   return *record;
 }
 
-// Services that note what the real ones acknowledge.
+// Services that record what the real ones acknowledge.
 
 struct NotedSubmission final : LogSubmission {
   explicit NotedSubmission(std::shared_ptr<LogSubmission> service) : real(std::move(service)) {}
@@ -131,7 +131,7 @@ SampleDevice::SampleDevice() {
   record({kDay - 35, kFormerRun - 1});
   fs::create_directories(at("/Library/Preferences"));
   schedule("former");
-  // A healthy run some days ago leaves what every later run finds.
+  // A run without faults some days ago leaves what every later run finds.
   const Ending former = run(kFormerRun);
   require(former.sound && former.errors.empty(),
           fmt::format("the former run: {}", fmt::join(former.errors, "; ")));

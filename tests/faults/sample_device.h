@@ -18,16 +18,16 @@ constexpr std::int32_t kDay = FAULT_DAY;
 // The day that was processed last, long enough ago that the storage log is due again.
 constexpr std::int32_t kFormerRun = kDay - 9;
 constexpr std::string_view kProgramDomain = "vellum.tallyd.tallyrun";
-// Of the structured data that a day has several records of.
+// The type of structured data of which a day has several records.
 constexpr std::uint32_t kStorageRecordType = 176;
 
-// What services told the run that they had done.
+// What the services reported as done.
 struct Acknowledged {
   int logs = 0, records = 0, events = 0;
   bool swept = false, tasked = false;
 };
 
-// How a run ended and what it complained of.
+// How a run ended, and its errors.
 struct Ending {
   bool met = false;     // the fault
   bool killed = false;  // by it
@@ -54,8 +54,8 @@ class SampleDevice {
   std::string at(std::string_view path) const;
   // The regular files below a folder, as paths; none when it is not there.
   std::vector<std::string> files(std::string_view folder) const;
-  // A copy of the store, since whoever opens a store that a killed run left repairs it; empty when
-  // there is none.
+  // A copy of the store, since opening a store after a killed run repairs it; empty when there is
+  // none.
   std::string copyOfStore() const;
 
  private:
@@ -65,7 +65,7 @@ class SampleDevice {
   std::filesystem::path folder_;
 };
 
-// Null when the file is no property list with a dictionary.
+// Null unless the file is a property list with a dictionary.
 KvRef<KvDictionary> dictionaryIn(const std::string& path);
 
 constexpr std::int64_t kSamples = 20;

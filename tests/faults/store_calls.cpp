@@ -1,5 +1,5 @@
-// SQLite's calls. The store opens and removes files with calls of the program's own; the others are
-// a library's, which takes functions in their place.
+// SQLite's calls. The program opens and removes the store's files itself; for its other calls,
+// SQLite is given functions.
 #include <fcntl.h>
 #include <sqlite3.h>
 
@@ -23,7 +23,7 @@ namespace {
 
 int lock(int file, int command, void* argument) {
   const bool takes = command == F_SETLK && static_cast<struct flock*>(argument)->l_type != F_UNLCK;
-  // Of its shared map SQLite takes any failure for a lock of somebody else, and waits.
+  // On the shared map SQLite treats any failure as a lock of another process, and waits.
   if (takes && !pathOf(file).ends_with("-shm") &&
       judge("lock", pathOf(file), kInputOutput) == Verdict::Fail) {
     errno = faultCode();

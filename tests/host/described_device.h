@@ -1,4 +1,4 @@
-// A device folder of a test's own, with the registry that it describes.
+// A device folder, with the registry that it describes.
 #pragma once
 
 #include <memory>

@@ -1,4 +1,4 @@
-// What faults and hostile files leave of the metrics store, and what they reach beside it.
+// What damage and hostile files do to the metrics store, and to other files through it.
 #include <sys/stat.h>
 #include <unistd.h>
 

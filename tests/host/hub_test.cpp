@@ -122,7 +122,7 @@ TEST(StatisticsHub, FailsWhereTheDescriptionSaysSo) {
 TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   Hub hub("");
   ASSERT_EQ(hub.start(), 0u);
-  // The second channel and the counter; a malformed one, an unknown one and a stranger's are not
+  // The second channel and the counter; malformed and unknown channels and other drivers are not
   // served.
   ASSERT_EQ(
       hub.configure(interestList(5, {{5, 2, kState}, {5, 3, 1}, {5, 1, 0}, {5, 9, 1}, {6, 1, 1}})),
@@ -142,7 +142,7 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   EXPECT_EQ(hub.word(element::kSlots), 0x49444C45u);
   EXPECT_EQ(hub.word(element::kSlots + 16), 99u);
   EXPECT_EQ(hub.word(element::kSize + element::kSlots + 16), element::kMissingValue);
-  // The type that nobody stated is the legend's.
+  // The type that is not given is the legend's.
   EXPECT_EQ(hub.word(2 * element::kSize + element::kTypeWord), 1 | std::uint64_t{1} << 32);
   EXPECT_EQ(hub.device.registry().ConnectionUnmapMemory(
                 hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),

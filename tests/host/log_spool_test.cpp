@@ -44,7 +44,7 @@ TEST_F(SpoolTest, KeepsBodyAndInformation) {
   const auto options = KvDictionary::create({{"previous_os_version", KvString::create("1.0")}});
   const std::string bytes("<plist>\0\xff\n", 10);
   ASSERT_TRUE(submit(bytes, "log-tallyd", options.get()));
-  clock->now = 10;  // the clock went back: age is the number's
+  clock->now = 10;  // the clock went back: the number decides the age
   ASSERT_TRUE(submit("", "empty"));
   EXPECT_EQ(names("spool"), (Names{"0000000001-log-tallyd.info.plist", "0000000001-log-tallyd.log",
                                    "0000000002-empty.info.plist", "0000000002-empty.log"}));

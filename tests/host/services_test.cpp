@@ -1,5 +1,5 @@
 // The smaller services on a device root: description, device, applications, kernel values, files,
-// turns, the event loop and the lines of the log.
+// the run lock, the event loop and the lines of the log.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <sys/epoll.h>
@@ -258,7 +258,8 @@ TEST_F(ServicesTest, TurnsNestAndEnd) {
   EXPECT_FALSE(held());
   put("file", "");
   FileRunLock impossible(folder("file"), log);
-  for (int i = 0; i < 2; ++i) EXPECT_TRUE(RunTurn(impossible)) << "no lock is no reason to stop";
+  for (int i = 0; i < 2; ++i)
+    EXPECT_TRUE(RunTurn(impossible)) << "a lock that cannot be made does not stop a run";
   EXPECT_EQ(errors().size(), 1u);
 
   const RunTurn turn(lock);
@@ -307,7 +308,7 @@ TEST_F(ServicesTest, WhatRootRecordsForAUserIsTheUsers) {
   services.crashReporting->FDLogStructuredData(172, *KvDictionary::create());
   services.preferences->SMAPreferencesSetValue("a", KvNumber::int32(1), "b");
   services.preferences->SMAPreferencesSynchronize("b");
-  int files = 0;  // those that the store has while it is open among them
+  int files = 0;  // including those that an open store has
   for (const auto& one : std::filesystem::recursive_directory_iterator(home)) {
     struct stat status {};
     ASSERT_EQ(::stat(one.path().c_str(), &status), 0);

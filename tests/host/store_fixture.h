@@ -98,7 +98,7 @@ class StoreTest : public TemporaryRoot {
     return rows;
   }
 
-  // Runs SQL behind the program's back; the first column of the last row.
+  // Runs SQL on the file directly; the first column of the last row.
   std::string sql(const char* text) const {
     sqlite3* handle = nullptr;
     EXPECT_EQ(::sqlite3_open(path.c_str(), &handle), SQLITE_OK);

@@ -1,4 +1,4 @@
-// A folder of its own for each test, used as a device root, and a log that remembers.
+// A device root in a temporary folder, and a log that keeps its lines.
 #pragma once
 
 #include <gtest/gtest.h>

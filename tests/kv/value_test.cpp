@@ -143,7 +143,7 @@ TEST(KvArray, RemovesAndReplacesByPlace) {
   for (int i = 0; i < 8; ++i) array->append(KvNumber::int64(i));
   array->append(nullptr);
   array->removeAt(8);
-  // Where sizes have 32 bits, room for so many pointers would wrap around to none.
+  // Where sizes have 32 bits, the size of so many pointers would wrap around.
   EXPECT_THROW(KvArray::create(SIZE_MAX / 4 + 1), std::bad_alloc);
   array->removeAt(std::vector<std::size_t>{0, 3, 4, 7});
   array->replaceAt(1, KvString::create("x"));
