@@ -59,7 +59,7 @@ class Package(unittest.TestCase):
         return {str(path.relative_to(root)) for path in root.rglob("*")
                 if not str(path.relative_to(root)).startswith("var/lib/dpkg")}
 
-    def test_installed_used_and_removed(self):
+    def test_installed_and_removed(self):
         root = self.clean_root()
         before = self.files(root)
         self.dpkg(root, "-i", str(self.package))
