@@ -60,6 +60,9 @@ TEST_F(StorageConnectionTest, Fetch) {
   Calls withoutData = kFetch, withoutRoom = kFetch;
   withoutData.erase(withoutData.begin() + 3);
   withoutRoom[3] = "call 8 in 24 13 room 0";
+  const std::string noSize = "HwConnectCallStructMethod: -536870206";
+  const std::string noData = "Could not retrieve data from driver for selector d\n";
+  const std::string notClosed = "Could not close connection to service\n";
   const struct {
     const char* name;
     std::deque<fakes::FakeStorageRegistry::Reply> replies;
@@ -74,26 +77,9 @@ TEST_F(StorageConnectionTest, Fetch) {
       {"says more than announced", {{size}, {longer}}, true, kFetch, 11},
       {"no size at all", {{Bytes{}}, {kBuffer}}, false, withoutRoom},
       {"no connection", {}, false, untilOpen, 0, "Could not get connection to service\n", 5},
-      {"size query",
-       {{size, 0xE00002C2}},
-       false,
-       withoutData,
-       0,
-       "HwConnectCallStructMethod: -536870206"},
-      {"data call",
-       {{size}, {kBuffer, 1}},
-       false,
-       kFetch,
-       0,
-       "Could not retrieve data from driver for selector d\n"},
-      {"close",
-       {{size}, {kBuffer}},
-       true,
-       kFetch,
-       11,
-       "Could not close connection to service\n",
-       0,
-       1},
+      {"size query", {{size, 0xE00002C2}}, false, withoutData, 0, noSize},
+      {"data call", {{size}, {kBuffer, 1}}, false, kFetch, 0, noData},
+      {"close", {{size}, {kBuffer}}, true, kFetch, 11, notClosed, 0, 1},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
