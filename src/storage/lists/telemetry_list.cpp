@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/byte_reader.h"
+#include "base/hex.h"
 #include "base/number_text.h"
 #include "platform/platform.h"
 #include "storage/vendor_counters.h"
@@ -70,9 +71,7 @@ struct Characteristics {
 };
 
 unsigned digitValue(char digit, std::FILE* notices) {
-  if (digit >= '0' && digit <= '9') return static_cast<unsigned>(digit - '0');
-  if (digit >= 'a' && digit <= 'f') return static_cast<unsigned>(digit - 'a' + 10);
-  if (digit >= 'A' && digit <= 'F') return static_cast<unsigned>(digit - 'A' + 10);
+  if (const auto value = hexDigitValue(digit)) return *value;
   std::fprintf(notices, "unrecognized hex character: %c", digit);
   return 0;
 }

@@ -5,6 +5,7 @@
 #include <optional>
 #include <string_view>
 
+#include "base/time_text.h"
 #include "platform/platform.h"
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
@@ -75,7 +76,8 @@ bool isDemoMode() {
 }
 
 std::uint64_t weeksSince2000(std::uint64_t secondsSince1970) {
-  constexpr std::uint64_t k2000 = 946'684'800, kWeek = 604'800;
+  constexpr std::uint64_t k2000 = 946'684'800;
+  constexpr auto kWeek = static_cast<std::uint64_t>(7 * kSecondsPerDay);
   return secondsSince1970 <= k2000 ? 0 : (secondsSince1970 - k2000) / kWeek;
 }
 
