@@ -83,6 +83,13 @@ TEST(Values, States) {
     EXPECT_EQ(HwReportStateGetResidency(states.get(), i), kInvalid);
   EXPECT_EQ(HwReportStateGetIndexForID(states.get(), 0x42), 2) << "the highest";
   EXPECT_EQ(HwReportStateGetIndexForID(states.get(), 0x43), -1);
+  EXPECT_EQ(HwReportStateGetDutyCycle(states.get(), 0), 0.25);
+  EXPECT_EQ(HwReportStateGetDutyCycle(states.get(), 1), 0.75);
+  EXPECT_TRUE(std::isnan(HwReportStateGetDutyCycle(states.get(), 3)));
+  for (const auto& unknown :
+       {sampled(2, {{{1, 1, 0}}}), sampled(2, {{{1, 1, 1}}, {{2, 1, kInvalid}}})}) {
+    EXPECT_TRUE(std::isnan(HwReportStateGetDutyCycle(unknown.get(), 0)));
+  }
   EXPECT_EQ(HwReportStateGetCurrent(states.get()), 1) << "of equal times the lower index";
   EXPECT_EQ(HwReportStateGetCurrent(sampled(2, {{{1}, 0}}).get()), -1);
   EXPECT_EQ(HwReportStateGetNameForIndex(states.get(), 2)->view(), "B");
@@ -92,19 +99,6 @@ TEST(Values, States) {
   EXPECT_FALSE(nameless->contains("StateNames"));
   states->set("StateNames", text("x"));
   EXPECT_EQ(HwReportStateGetNameForIndex(states.get(), 0), nullptr);
-}
-
-TEST(Values, DutyCycles) {
-  const auto duty = [](std::initializer_list<std::uint64_t> residencies, std::int32_t index) {
-    std::vector<Element> elements;
-    for (const auto residency : residencies) elements.push_back({{1, 1, residency}});
-    return HwReportStateGetDutyCycle(sampled(2, elements).get(), index);
-  };
-  EXPECT_EQ(duty({1, 3}, 0), 0.25);
-  EXPECT_EQ(duty({1, 3}, 1), 0.75);
-  EXPECT_TRUE(std::isnan(duty({0, 0}, 0)));
-  EXPECT_TRUE(std::isnan(duty({1, 3}, 2)));
-  EXPECT_TRUE(std::isnan(duty({1, kInvalid}, 0)));
 }
 
 TEST(Values, Histograms) {

@@ -93,18 +93,6 @@ TEST(Walk, ResultsInEveryMode) {
   }
 }
 
-TEST(Walk, PruningRemovesWhatEndsEmpty) {
-  const auto collection = nested();
-  EXPECT_EQ(HwReportPrune(collection.get(), [](KvDictionary*) { return HwIterDrop; }), HwIterDrop);
-  EXPECT_TRUE(collection->empty());
-  const auto driverLeft = nested();
-  HwReportPrune(driverLeft.get(),
-                [](KvDictionary* one) { return nameOf(one) == "d" ? HwIterContinue : HwIterDrop; });
-  EXPECT_EQ(driverLeft->size(), 1u);
-  EXPECT_EQ(driverLeft->getAs<KvDictionary>("HwReportDrivers")->getAs<KvDictionary>("D")->size(),
-            1u);
-}
-
 TEST(Walk, MalformedCollectionsFailInEveryMode) {
   const auto with = [](const char* key, KvRef<KvObject> value) {
     auto collection = nested();
