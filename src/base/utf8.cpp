@@ -29,6 +29,9 @@ std::size_t sequenceLength(std::string_view text, std::size_t position) {
   return 0;
 }
 
+constexpr bool isHighSurrogate(std::uint32_t unit) { return unit >> 10 == 0xD800 >> 10; }
+constexpr bool isLowSurrogate(std::uint32_t unit) { return unit >> 10 == 0xDC00 >> 10; }
+
 bool xmlCanCarry(std::string_view character) {
   if (character.size() == 1) {
     const auto byte = static_cast<std::uint8_t>(character[0]);
@@ -68,6 +71,47 @@ std::uint32_t takeCharacter(std::string_view text, std::size_t& position) {
     character = character << 6 | (static_cast<std::uint8_t>(text[position++]) & 0x3Fu);
   }
   return character;
+}
+
+void appendCharacter(std::string& out, std::uint32_t character) {
+  const auto continuation = [&](int shift) {
+    out += static_cast<char>(0x80 | (character >> shift & 0x3F));
+  };
+  if (character < 0x80) {
+    out += static_cast<char>(character);
+  } else if (character < 0x800) {
+    out += static_cast<char>(0xC0 | character >> 6);
+    continuation(0);
+  } else if (character < 0x10000) {
+    out += static_cast<char>(0xE0 | character >> 12);
+    continuation(6);
+    continuation(0);
+  } else {
+    out += static_cast<char>(0xF0 | character >> 18);
+    continuation(12);
+    continuation(6);
+    continuation(0);
+  }
+}
+
+bool appendUtf16(std::string& out, std::span<const std::byte> bytes, std::endian order) {
+  const auto unitAt = [&](std::size_t i) {
+    const auto first = std::to_integer<std::uint32_t>(bytes[i]);
+    const auto second = std::to_integer<std::uint32_t>(bytes[i + 1]);
+    return order == std::endian::big ? first << 8 | second : second << 8 | first;
+  };
+  std::size_t i = 0;
+  for (; i + 1 < bytes.size(); i += 2) {
+    std::uint32_t character = unitAt(i);
+    if (isLowSurrogate(character)) return false;
+    if (isHighSurrogate(character)) {
+      i += 2;
+      if (i + 1 >= bytes.size() || !isLowSurrogate(unitAt(i))) return false;
+      character = 0x10000 + ((character & 0x3FF) << 10) + (unitAt(i) & 0x3FF);
+    }
+    appendCharacter(out, character);
+  }
+  return i == bytes.size();
 }
 
 std::string repairUtf8(std::string_view text) {

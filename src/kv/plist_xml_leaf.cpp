@@ -8,6 +8,7 @@
 #include "base/number_text.h"
 #include "base/text_lines.h"
 #include "base/time_text.h"
+#include "base/utf8.h"
 #include "kv/base64.h"
 
 namespace tally {
@@ -31,28 +32,7 @@ bool takePrefix(std::string_view& text, std::string_view prefix) {
   return true;
 }
 
-void appendCodePoint(std::string& out, std::uint32_t point) {
-  const auto continuation = [&](int shift) {
-    out += static_cast<char>(0x80 | (point >> shift & 0x3F));
-  };
-  if (point < 0x80) {
-    out += static_cast<char>(point);
-  } else if (point < 0x800) {
-    out += static_cast<char>(0xC0 | point >> 6);
-    continuation(0);
-  } else if (point < 0x10000) {
-    out += static_cast<char>(0xE0 | point >> 12);
-    continuation(6);
-    continuation(0);
-  } else {
-    out += static_cast<char>(0xF0 | point >> 18);
-    continuation(12);
-    continuation(6);
-    continuation(0);
-  }
-}
-
-// What stands between '&' and ';'.
+// What is between '&' and ';'.
 bool appendReference(std::string& out, std::string_view name) {
   static constexpr std::pair<std::string_view, char> kPredefined[] = {
       {"amp", '&'}, {"lt", '<'}, {"gt", '>'}, {"quot", '"'}, {"apos", '\''}};
@@ -67,7 +47,7 @@ bool appendReference(std::string& out, std::string_view name) {
   const auto point = parseUnsigned<std::uint32_t>(name, base);
   if (!point || *point == 0 || *point > kLastCodePoint) return false;
   if (*point >= 0xD800 && *point <= 0xDFFF) return false;  // half of a surrogate pair
-  appendCodePoint(out, *point);
+  appendCharacter(out, *point);
   return true;
 }
 

@@ -4,19 +4,26 @@
 // without a value, a document that stops half-way.
 #include "kv/plist_xml_reader.h"
 
-#include <array>
+#include <algorithm>
+#include <bit>
 #include <cstring>
+#include <span>
 #include <string>
 #include <vector>
 
+#include "base/utf8.h"
+#include "kv/common_values.h"
 #include "kv/nesting.h"
 #include "kv/plist_codec.h"
 #include "kv/plist_xml_leaf.h"
+#include "kv/plist_xml_writer.h"
 
 namespace tally {
 namespace {
 
 constexpr auto kNone = std::string_view::npos;
+constexpr std::string_view kUtf8ByteOrderMark = "\xEF\xBB\xBF";
+constexpr std::string_view kBigEndianMark = "\xFE\xFF", kLittleEndianMark = "\xFF\xFE";
 
 bool isBlank(char character) {
   return character == ' ' || character == '\n' || character == '\t' || character == '\r';
@@ -35,15 +42,22 @@ struct Frame {
   KvRef<KvString> key;  // waits for its value
 };
 
+// A problem in the line that the text ends in.
+Error errorAfter(std::string_view text, const char* problem) {
+  const auto line = std::count(text.begin(), text.end(), '\n') + 1;
+  return Error{"line " + std::to_string(line) + ": " + problem};
+}
+
+enum class PlistEncoding { Utf8, Utf16 };
+
 class Reader {
  public:
-  explicit Reader(std::string_view document) : text_(document) {}
+  Reader(std::string_view document, PlistEncoding encoding)
+      : text_(document), encoding_(encoding) {}
 
   Result<KvRef<KvObject>> read() {
     if (prolog() && body() && epilog()) return std::move(root_);
-    std::size_t line = 1;
-    for (const char character : text_.substr(0, position_)) line += character == '\n';
-    return Error{"line " + std::to_string(line) + ": " + problem_};
+    return errorAfter(text_.substr(0, position_), problem_);
   }
 
  private:
@@ -86,7 +100,7 @@ class Reader {
 
   bool prolog() {
     if (text_.find('\0') != kNone) return fail("there are zero bytes in the document");
-    take("\xEF\xBB\xBF");
+    take(kUtf8ByteOrderMark);
     if (at("<?xml") && !checkEncoding()) return false;
     if (!skipBetween()) return false;
     if (take("<!DOCTYPE") && (!skipDocumentType() || !skipBetween())) return false;
@@ -108,6 +122,9 @@ class Reader {
     std::string name(declaration.substr(open + 1, close - open - 1));
     for (char& letter : name) {
       if (letter >= 'A' && letter <= 'Z') letter = static_cast<char>(letter - 'A' + 'a');
+    }
+    if (encoding_ == PlistEncoding::Utf16) {
+      return name == "utf-16" || fail("the encoding is not the declared one");
     }
     return name == "utf-8" || name == "utf8" || name == "us-ascii" ||
            fail("the encoding is not UTF-8");
@@ -193,7 +210,7 @@ class Reader {
     std::string_view content;
     if (!tag.empty && !readContent(tag.name, content)) return false;
     if (tag.name == "key") return addKey(content);
-    if (tag.name == "string") return addValue(stringOf(content));
+    if (tag.name == "string") return addValue(common_.string(content));
     if (tag.name == "integer") return addParsed(integerOf(content), "not an integer");
     if (tag.name == "true" || tag.name == "false") {
       if (!content.empty()) return fail("there is text in a boolean");
@@ -270,21 +287,6 @@ class Reader {
     return true;
   }
 
-  // Documents repeat a few short texts very often ("type", "scalar"): those share one object.
-  KvRef<KvString> stringOf(std::string_view content) {
-    constexpr std::size_t longestShared = 24;
-    if (content.empty() || content.size() > longestShared) return KvString::create(content);
-    const auto byte = [&](std::size_t i) {
-      return std::size_t{static_cast<unsigned char>(content[i])};
-    };
-    const std::size_t mixed = content.size() * 131 + byte(0) * 31 + byte(content.size() / 2) * 7 +
-                              byte(content.size() - 1);
-    KvRef<KvString>& slot = recent_[mixed % recent_.size()];
-    if (!slot || slot->view() != content) slot = KvString::create(content);
-    return slot;
-  }
-
-  // So do the numbers below 100, which most counts and settings are.
   KvRef<KvNumber> integerOf(std::string_view content) {
     std::size_t value = 0;
     for (const char character : content) {
@@ -292,15 +294,13 @@ class Reader {
       value = value * 10 + static_cast<std::size_t>(character - '0');
     }
     if (content.empty()) return nullptr;
-    KvRef<KvNumber>& slot = smallIntegers_[value];
-    if (!slot) slot = integerFromText(content);
-    return slot;
+    return common_.smallInteger(value);
   }
 
   bool addKey(std::string_view content) {
     if (stack_.empty() || !stack_.back().dictionary) return fail("a key outside of a dictionary");
     if (stack_.back().key) return fail("a key in a dictionary has no value");
-    stack_.back().key = stringOf(content);
+    stack_.back().key = common_.string(content);
     return true;
   }
 
@@ -326,6 +326,7 @@ class Reader {
   }
 
   const std::string_view text_;
+  const PlistEncoding encoding_;  // of the document; the text is UTF-8
   std::size_t position_ = 0;
   const char* problem_ = "";
   bool wrapped_ = false;  // in a plist element
@@ -333,12 +334,26 @@ class Reader {
   std::string content_;
   std::vector<Frame> stack_;
   KvRef<KvObject> root_;
-  std::array<KvRef<KvString>, 256> recent_;
-  std::array<KvRef<KvNumber>, 100> smallIntegers_;
+  CommonValues common_;
 };
 
 }  // namespace
 
-Result<KvRef<KvObject>> readXmlPlist(std::string_view document) { return Reader(document).read(); }
+bool isUtf16Plist(std::string_view document) {
+  return document.starts_with(kBigEndianMark) || document.starts_with(kLittleEndianMark);
+}
+
+Result<KvRef<KvObject>> readXmlPlist(std::string_view document, std::size_t maximumBytes) {
+  if (!isUtf16Plist(document)) return Reader(document, PlistEncoding::Utf8).read();
+  const auto order = document.starts_with(kBigEndianMark) ? std::endian::big : std::endian::little;
+  document.remove_prefix(kBigEndianMark.size());
+  std::string text;
+  text.reserve(document.size() / 2);
+  if (!appendUtf16(text, std::as_bytes(std::span(document)), order)) {
+    return errorAfter(text, "half of a UTF-16 character is missing");
+  }
+  if (text.size() > maximumBytes) return plistTooLarge(maximumBytes);
+  return Reader(text, PlistEncoding::Utf16).read();
+}
 
 }  // namespace tally

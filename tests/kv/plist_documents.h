@@ -41,6 +41,14 @@ inline std::string bigEndian(std::uint64_t value, std::size_t width) {
   return out;
 }
 
+// The ASCII text in UTF-16, without a byte order mark.
+inline std::string utf16(std::string_view text, std::endian order) {
+  std::string out;
+  for (const char c : text)
+    (out += order == std::endian::big ? '\0' : c) += order == std::endian::big ? c : '\0';
+  return out;
+}
+
 inline std::string bits(double value) { return bigEndian(std::bit_cast<std::uint64_t>(value), 8); }
 
 // An array or dictionary (keys first) with references of four bytes.

@@ -217,6 +217,46 @@ TEST(PlistCodec, RefusesDamagedXml) {
   EXPECT_THAT(canonical("<array>\n<true/>\n<foo/>"), HasSubstr("line 3"));
 }
 
+TEST(PlistCodec, ReadsUtf16InBothByteOrders) {
+  struct Case {
+    std::string before, units, after;  // the units, big-endian, are put into a string
+    std::string result;
+  };
+  const Case cases[] = {
+      {"<?xml version='1.0' encoding='utf-16'?>\n<string>a",
+       {"\xD8\x3D\xDE\x00\x20\xAC", 6},
+       "&lt;</string>",
+       plistOf("<string>a\xF0\x9F\x98\x80\xE2\x82\xAC&lt;</string>")},
+      {"<string>", "", "</string>", plistOf("<string></string>")},
+      {"<plist>\n<string>",
+       {"\xD8\x00", 2},
+       "</string></plist>",
+       "error: line 2: half of a UTF-16 character is missing"},
+      {"<string>",
+       {"\xDC\x00\xD8\x00", 4},
+       "</string>",
+       "error: line 1: half of a UTF-16 character is missing"},
+      {"<string>", "\xD8\x3D", "", "error: line 1: half of a UTF-16 character is missing"},
+      {"<string>", {"\0\0", 2}, "</string>", "error: line 1: there are zero bytes in the document"},
+      {"<?xml version='1.0' encoding='utf-8'?><true/>", "", "",
+       "error: line 1: the encoding is not the declared one"},
+      {"", "", "", "error: line 1: the document ends too early"},
+  };
+  for (const Case& c : cases) {
+    for (const std::endian order : {std::endian::big, std::endian::little}) {
+      std::string units = "\xFE\xFF" + c.units;
+      for (std::size_t i = 0; order == std::endian::little && i < units.size(); i += 2)
+        std::swap(units[i], units[i + 1]);
+      const std::string document =
+          units.substr(0, 2) + utf16(c.before, order) + units.substr(2) + utf16(c.after, order);
+      EXPECT_EQ(canonical(document), c.result) << c.before;
+    }
+  }
+  EXPECT_THAT(canonical("\xFE\xFF" + utf16("<true/>", std::endian::big).substr(1)),
+              HasSubstr("half of a UTF-16"));
+  EXPECT_THAT(canonical(utf16("<true/>", std::endian::little)), HasSubstr("zero bytes"));
+}
+
 TEST(PlistCodec, NestsAsDeepAsTheLimitAndNoDeeper) {
   struct Case {
     std::size_t depth;
@@ -281,7 +321,7 @@ TEST(PlistBinary, RefusesDamagedBinary) {
       {doubling, "4000000"},
       {copies, "64 MiB"},
       {nestedBinary(100'000), "512"},
-      {deep, "nested deeply"},
+      {deep, "64 MiB"},  // it can be read, but not written with the blanks of its lines
       {{{arrayOf({0})}}, "contains itself"},
       {{{arrayOf({1}), dictOf({2, 0}),
          "\x51"
