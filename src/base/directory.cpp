@@ -14,7 +14,6 @@
 #include <cstring>
 
 #include "base/file.h"
-#include "base/retried.h"
 
 namespace tally {
 namespace {
@@ -50,11 +49,6 @@ bool isEmptyDirectory(int directory) {
 }
 
 }  // namespace
-
-int Descriptor::close() {
-  const int descriptor = std::exchange(value_, -1);
-  return descriptor >= 0 ? ::close(descriptor) : 0;
-}
 
 Directory::Directory(Descriptor descriptor, std::string path, const Directory* root)
     : descriptor_(std::make_shared<Descriptor>(std::move(descriptor))), path_(std::move(path)) {

@@ -7,7 +7,6 @@
 
 #include <sys/types.h>
 
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -16,7 +15,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/descriptor.h"
+#include "base/file.h"
 #include "base/result.h"
 
 struct stat;
@@ -102,59 +101,5 @@ class Directory {
   uid_t owner_ = 0;
   gid_t group_ = 0;
 };
-
-// A file being written under a temporary name. Unless commit() succeeds the destructor removes it.
-class TemporaryFile {
- public:
-  // Makes a new file in the directory that will be called name.
-  static Result<TemporaryFile> create(const Directory& directory, std::string_view name,
-                                      unsigned mode = 0600);
-  TemporaryFile(TemporaryFile&& other) noexcept;
-  TemporaryFile& operator=(TemporaryFile&&) = delete;
-  ~TemporaryFile();
-  // Writes all bytes or fails.
-  Status write(std::string_view bytes);
-  // fsync, rename to the final name, fsync of the directory.
-  Status commit();
-
- private:
-  TemporaryFile(Directory directory, std::string name, std::string temporary, Descriptor file)
-      : directory_(std::move(directory)),
-        name_(std::move(name)),
-        temporary_(std::move(temporary)),
-        file_(std::move(file)) {}
-  Directory directory_;
-  std::string name_, temporary_;
-  Descriptor file_;
-};
-
-// Replaces a file so that, whenever the process or the machine dies, it is the old one or the new
-// one. Nothing is left over on failure.
-Status writeFileAtomically(const Directory& directory, std::string_view name,
-                           std::string_view contents, unsigned mode = 0600);
-
-// True for the names that TemporaryFile gives, so that what a killed run left can be removed.
-bool isTemporaryName(std::string_view name);
-
-// An exclusive lock on a file, released when the object or the process ends, however it ends.
-class FileLock {
- public:
-  // Makes the file if needed and waits for the lock, at most for the given time; then an error
-  // (EWOULDBLOCK) names the process that holds it.
-  static Result<FileLock> acquire(const Directory& directory, std::string_view name,
-                                  std::chrono::milliseconds patience);
-  // The same with what is left of the process's patience, one minute in all, so that whoever never
-  // releases one lock or many delays a run by no more than that.
-  static Result<FileLock> acquire(const Directory& directory, std::string_view name);
-
- private:
-  explicit FileLock(Descriptor file) : file_(std::move(file)) {}
-  Descriptor file_;
-};
-
-// The process that holds the lock on a file of this kind, from the text of /proc/locks; empty when
-// it does not say.
-std::optional<std::int64_t> lockHolder(std::string_view locks, std::uint64_t device,
-                                       std::uint64_t inode);
 
 }  // namespace tally

@@ -9,9 +9,6 @@
 #include <cstring>
 #include <vector>
 
-#include "base/descriptor.h"
-#include "base/retried.h"
-
 namespace tally {
 namespace {
 
@@ -20,6 +17,11 @@ Error tooLarge(const std::string& path, std::size_t limit) {
 }
 
 }  // namespace
+
+int Descriptor::close() {
+  const int descriptor = std::exchange(value_, -1);
+  return descriptor >= 0 ? ::close(descriptor) : 0;
+}
 
 Error systemError(std::string_view what, const std::string& path) {
   return systemError(what, path, errno);

@@ -1,16 +1,48 @@
-// Files that the caller names: those of the command line, and the kernel's own. Files of the device
-// are reached through directories (base/directory.h).
+// Open files, and files that the caller names: those of the command line, and the kernel's own.
+// Files of the device are reached through directories (base/directory.h).
 #pragma once
 
+#include <cerrno>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "base/result.h"
 
 namespace tally {
+
+// An owned file descriptor.
+class Descriptor {
+ public:
+  Descriptor() = default;
+  explicit Descriptor(int value) : value_(value) {}
+  Descriptor(Descriptor&& other) noexcept : value_(std::exchange(other.value_, -1)) {}
+  Descriptor& operator=(Descriptor&& other) noexcept {
+    std::swap(value_, other.value_);
+    return *this;
+  }
+  ~Descriptor() { (void)close(); }
+  int get() const { return value_; }
+  explicit operator bool() const { return value_ >= 0; }
+  // Leaves the descriptor to the caller.
+  int release() { return std::exchange(value_, -1); }
+  // What close(2) returned; 0 when nothing was open.
+  int close();
+
+ private:
+  int value_ = -1;
+};
+
+// Makes the call until it is not interrupted; what it answered, -1 with errno for a failure.
+template <class Call>
+auto retried(Call call) {
+  auto result = call();
+  while (result == -1 && errno == EINTR) result = call();
+  return result;
+}
 
 // That a system call failed on a path, with the reason that errno or the code given names.
 Error systemError(std::string_view what, const std::string& path);

@@ -1,4 +1,5 @@
-// Locks on files, which no process waits for without a bound.
+#include "base/file_lock.h"
+
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -11,9 +12,6 @@
 #include <cstring>
 #include <thread>
 
-#include "base/directory.h"
-#include "base/file.h"
-#include "base/retried.h"
 #include "base/text_lines.h"
 
 namespace tally {

@@ -1,13 +1,11 @@
-// Files that replace others as a whole.
+#include "base/temporary_file.h"
+
 #include <fcntl.h>
 #include <unistd.h>
 
 #include <atomic>
 #include <cerrno>
 #include <cstring>
-
-#include "base/directory.h"
-#include "base/retried.h"
 
 namespace tally {
 namespace {

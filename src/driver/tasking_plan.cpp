@@ -9,6 +9,7 @@
 #include "base/directory.h"
 #include "base/file.h"
 #include "base/result.h"
+#include "base/temporary_file.h"
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
 

@@ -14,6 +14,7 @@
 #include "host/store/store_schema.h"
 #include "host/system/applications.h"
 #include "host/system/clock.h"
+#include "host/system/crash_support_library.h"
 #include "host/system/device_information.h"
 #include "host/system/environment.h"
 #include "host/system/event_loop.h"

@@ -1,9 +1,10 @@
 // KvDictionary: a vector of entries in insertion order, with a hash index once it is large.
+#include "kv/value.h"
+
 #include <algorithm>
 
 #include "base/hash.h"
 #include "kv/maker.h"
-#include "kv/value.h"
 
 namespace tally {
 namespace {

@@ -1,4 +1,6 @@
 // Text form and equality of values.
+#include "kv/value.h"
+
 #include <algorithm>
 #include <cmath>
 
@@ -6,7 +8,6 @@
 #include "base/number_text.h"
 #include "base/time_text.h"
 #include "kv/nesting.h"
-#include "kv/value.h"
 
 namespace tally {
 namespace {

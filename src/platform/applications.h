@@ -1,11 +1,8 @@
-// Installed applications and the user's locale.
+// Installed applications.
 #pragma once
 
 #include <functional>
-#include <optional>
-#include <string>
 #include <string_view>
-#include <vector>
 
 namespace tally {
 
@@ -21,22 +18,5 @@ class AppRegistry {
   virtual void enumerateBundles(
       int kind, const std::function<void(std::string_view bundleType)>& handler) = 0;
 };
-
-class Locale {
- public:
-  virtual ~Locale() = default;
-  // The user's languages, most wanted first, as tags ("de-DE").
-  virtual std::vector<std::string> PreferredLanguages() = 0;
-  // The languages that the system can show.
-  virtual std::vector<std::string> SystemLanguages() = 0;
-  // "CH"; empty when there is no current locale or it names no region.
-  virtual std::optional<std::string> CurrentRegionCode() = 0;
-};
-
-// Those of available that serve the preferences, best first: for each preference the exact tag,
-// then the tag without its region, then any tag of the same language. When nothing serves, the
-// first available.
-std::vector<std::string> BestLocalizations(const std::vector<std::string>& available,
-                                           const std::vector<std::string>& preferred);
 
 }  // namespace tally

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string_view>
 
+#include "base/time_text.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -44,7 +45,9 @@ class HistoryStore {
 };
 
 // The instant at which a day begins (UTC).
-KvRef<KvDate> DayToDate(std::int32_t day);
+inline KvRef<KvDate> DayToDate(std::int32_t day) {
+  return KvDate::create(static_cast<double>(day) * kSecondsPerDay);
+}
 
 class MetricsStore {
  public:

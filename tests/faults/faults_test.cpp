@@ -19,6 +19,7 @@
 
 #include "base/directory.h"
 #include "base/file.h"
+#include "base/temporary_file.h"
 #include "faults/sample_device.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/structured_data.h"

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "base/file.h"
+#include "base/temporary_file.h"
 #include "kv/plist_codec.h"
 
 namespace tally {

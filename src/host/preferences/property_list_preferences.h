@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "base/device_root.h"
+#include "base/file_lock.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 

@@ -1,7 +1,5 @@
 #include "host/spool/crash_reporting.h"
 
-#include <algorithm>
-
 #include "host/spool/log_spool.h"
 #include "host/spool/waiting_logs.h"
 
@@ -45,22 +43,6 @@ void LinuxCrashReporting::rollFixlineLogs() {
 
 void LinuxCrashReporting::report(std::string_view what, const Error& error) const {
   log_->fault(faultKind(what, error), "{}: {}", what, error.message);
-}
-
-bool LinuxCrashSupportLibrary::open(std::string_view) {
-  const auto* described = description_->getAs<KvDictionary>(Described::CrashSupport);
-  return described == nullptr || !described->getBool("Absent").value_or(false);
-}
-
-bool LinuxCrashSupportLibrary::hasSymbol(std::string_view name) {
-  const auto* described = description_->getAs<KvDictionary>(Described::CrashSupport);
-  const auto* missing =
-      described != nullptr ? described->getAs<KvArray>("MissingSymbols") : nullptr;
-  return missing == nullptr ||
-         std::none_of(missing->begin(), missing->end(), [&](const auto& item) {
-           const auto* symbol = kvCast<KvString>(item.get());
-           return symbol != nullptr && symbol->view() == name;
-         });
 }
 
 }  // namespace tally

@@ -1,10 +1,9 @@
-// Crash-reporting services on files.
+// The crash-reporting service on files.
 #pragma once
 
 #include <memory>
 #include <string>
 
-#include "host/described/device_description.h"
 #include "host/spool/structured_data.h"
 #include "host/spool/submission_consent.h"
 #include "platform/crash_reporting.h"
@@ -31,19 +30,6 @@ class LinuxCrashReporting final : public CrashReporting {
   std::shared_ptr<Preferences> preferences_;
   std::shared_ptr<SubmissionConsent> consent_;
   StructuredDataFolder structuredData_;
-};
-
-// The support library is part of this platform, whatever the path, unless the device description
-// says otherwise: "CrashSupport" = { "Absent" = true, "MissingSymbols" = [names] }.
-class LinuxCrashSupportLibrary final : public CrashSupportLibrary {
- public:
-  explicit LinuxCrashSupportLibrary(std::shared_ptr<DeviceDescription> description)
-      : description_(std::move(description)) {}
-  bool open(std::string_view path) override;
-  bool hasSymbol(std::string_view name) override;
-
- private:
-  std::shared_ptr<DeviceDescription> description_;
 };
 
 }  // namespace tally

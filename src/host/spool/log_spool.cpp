@@ -6,6 +6,8 @@
 #include <cerrno>
 
 #include "base/file.h"
+#include "base/file_lock.h"
+#include "base/temporary_file.h"
 #include "host/spool/waiting_logs.h"
 #include "kv/plist_codec.h"
 

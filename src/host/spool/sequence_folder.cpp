@@ -9,8 +9,9 @@
 #include <cstring>
 #include <map>
 
+#include "base/file.h"
 #include "base/number_text.h"
-#include "base/retried.h"
+#include "base/temporary_file.h"
 
 namespace tally {
 namespace {

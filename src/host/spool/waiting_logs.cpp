@@ -3,6 +3,8 @@
 #include <cerrno>
 #include <optional>
 
+#include "base/file_lock.h"
+#include "base/temporary_file.h"
 #include "host/spool/sequence_folder.h"
 
 namespace tally {

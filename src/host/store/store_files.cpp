@@ -14,8 +14,8 @@
 #include <optional>
 #include <utility>
 
+#include "base/file.h"
 #include "base/number_text.h"
-#include "base/retried.h"
 
 namespace tally {
 namespace {

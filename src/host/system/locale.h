@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "host/described/device_description.h"
-#include "platform/applications.h"
+#include "platform/locale.h"
 
 namespace tally {
 

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "base/device_root.h"
+#include "base/file_lock.h"
 #include "platform/run_lock.h"
 #include "platform/system_log.h"
 

@@ -8,6 +8,7 @@
 
 #include "base/file.h"
 #include "base/number_text.h"
+#include "base/temporary_file.h"
 #include "base/utf8.h"
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"

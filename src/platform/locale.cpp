@@ -1,9 +1,9 @@
-// Choosing languages.
-#include "platform/applications.h"
+#include "platform/locale.h"
 
 #include <algorithm>
 #include <cctype>
 #include <cstddef>
+#include <string_view>
 
 namespace tally {
 namespace {

@@ -1,0 +1,37 @@
+// Locks on files, which no process waits for without a bound.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <optional>
+#include <string_view>
+#include <utility>
+
+#include "base/directory.h"
+#include "base/file.h"
+#include "base/result.h"
+
+namespace tally {
+
+// An exclusive lock on a file, released when the object or the process ends, however it ends.
+class FileLock {
+ public:
+  // Makes the file if needed and waits for the lock, at most for the given time; then an error
+  // (EWOULDBLOCK) names the process that holds it.
+  static Result<FileLock> acquire(const Directory& directory, std::string_view name,
+                                  std::chrono::milliseconds patience);
+  // The same with what is left of the process's patience, one minute in all, so that whoever never
+  // releases one lock or many delays a run by no more than that.
+  static Result<FileLock> acquire(const Directory& directory, std::string_view name);
+
+ private:
+  explicit FileLock(Descriptor file) : file_(std::move(file)) {}
+  Descriptor file_;
+};
+
+// The process that holds the lock on a file of this kind, from the text of /proc/locks; empty when
+// it does not say.
+std::optional<std::int64_t> lockHolder(std::string_view locks, std::uint64_t device,
+                                       std::uint64_t inode);
+
+}  // namespace tally
