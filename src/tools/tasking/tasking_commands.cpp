@@ -100,7 +100,7 @@ std::string taskingLine(const KvObject* id, const KvObject* digest, const KvObje
 }
 
 int show(const ToolContext& context, const TaskingArguments&) {
-  const TaskingInputs inputs = readTaskingInputs(platform());
+  const TaskingInputs inputs = readTaskingInputs(*context.platform);
   const auto digest =
       context.platform->preferences->SMAPreferencesGetValue("TaskingDigest", kProgramDomain);
   const auto* const schedule = kvCast<KvDictionary>(inputs.schedule.get());
@@ -154,12 +154,10 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
     variant.systemConfiguration = writing.systemConfiguration;
     variant.servicesClient = writing.servicesClient;
   }
-  RunLock& runLock = *variant.runLock;
-  const PlatformScope scope(std::move(variant));
   std::unique_ptr<RunTurn> turn;
-  if (!arguments.dryRun) turn = std::make_unique<RunTurn>(runLock);
+  if (!arguments.dryRun) turn = std::make_unique<RunTurn>(*variant.runLock);
   if (turn && !*turn) return kWrong;  // the lock has said so
-  TaskingInputs inputs = readTaskingInputs(platform());
+  TaskingInputs inputs = readTaskingInputs(variant);
   inputs.schedule = *std::move(schedule);
   const TaskingPlan plan = planTasking(inputs);
   const PlanView view(plan);
@@ -168,7 +166,7 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   } else {
     view.print(context);
   }
-  const bool done = arguments.dryRun || carryOut(platform(), plan);
+  const bool done = arguments.dryRun || carryOut(variant, plan);
   return done && !view.hasFaults() ? kSuccess : kWrong;
 }
 

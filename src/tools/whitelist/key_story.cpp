@@ -102,7 +102,7 @@ std::string KeyStory::whyAbsent(KeyKind kind) const {
 }
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day) {
-  KeyStory story(loadWhitelistFile(platform()));
+  KeyStory story(*context.platform);
   story.key = key;
   story.day = day;
   story.measured = isMeasuredByReport(key);

@@ -24,7 +24,7 @@ struct DistributionRow {
 };
 
 struct KeyStory {
-  explicit KeyStory(WhitelistFile file) : judge(std::move(file)) {}
+  explicit KeyStory(Platform& platform) : judge(platform, loadWhitelistFile(platform)) {}
   std::string key;
   std::int32_t day = 0;
   // Every row of the key that the store has, by day.

@@ -36,7 +36,7 @@ class Checker final : public WhitelistVisitor {
     group_ = name;
     entriesOfGroup_ = 0;
     malformedOfGroup_ = false;
-    const GroupState state = groupState(platform(), name);
+    const GroupState state = groupState(platform_, name);
     inForce_ = state == GroupState::InForce;
     if (state != GroupState::InForce) {
       add(Severity::Surprise, {name, {}, {}, {}},
@@ -96,7 +96,7 @@ class Checker final : public WhitelistVisitor {
       checkNesting(exact, inForceTable(exact), inForceTable(prefix));
       checkNesting(prefix, inForceTable(prefix), inForceTable(prefix));
     }
-    if (isInternalDevice(platform())) {
+    if (isInternalDevice(platform_)) {
       findings.push_back({Severity::Surprise, "", "", "", "",
                           "this is an internal device: every group is in force, and keys that are "
                           "not listed are reported unchanged"});

@@ -20,8 +20,8 @@ struct WhitelistArguments {
   std::vector<std::string> keys;
 };
 
-WhitelistFile load(const WhitelistArguments& arguments) {
-  if (arguments.file.empty()) return loadWhitelistFile(platform());
+WhitelistFile load(Platform& platform, const WhitelistArguments& arguments) {
+  if (arguments.file.empty()) return loadWhitelistFile(platform);
   const auto bytes = readFile(arguments.file, kPlistMaximumBytes);
   if (bytes) return parseWhitelistFile(*bytes);
   WhitelistFile file;
@@ -103,7 +103,7 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
 }
 
 int check(const ToolContext& context, const WhitelistArguments& arguments) {
-  const WhitelistFile file = load(arguments);
+  const WhitelistFile file = load(*context.platform, arguments);
   std::vector<Finding> findings;
   if (file.root) {
     findings = checkWhitelist(*context.platform, *file.root);
@@ -116,7 +116,7 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
 }
 
 int test(const ToolContext& context, const WhitelistArguments& arguments) {
-  const WhitelistJudge judge(load(arguments));
+  const WhitelistJudge judge(*context.platform, load(*context.platform, arguments));
   Json document = Json::array();
   bool allReported = true;
   for (const std::string& key : arguments.keys) {

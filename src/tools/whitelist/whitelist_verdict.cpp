@@ -8,11 +8,11 @@ namespace {
 
 class CandidateFinder final : public WhitelistVisitor {
  public:
-  explicit CandidateFinder(std::string_view key) : key_(key) {}
+  CandidateFinder(Platform& platform, std::string_view key) : platform_(platform), key_(key) {}
   std::vector<KeyCandidate> found;
 
   bool beginGroup(std::string_view name) override {
-    state_ = groupState(platform(), name);
+    state_ = groupState(platform_, name);
     return true;
   }
   void entry(WhitelistSection section, WhitelistEntry entry) override {
@@ -24,6 +24,7 @@ class CandidateFinder final : public WhitelistVisitor {
   void malformed(const WhitelistPlace&) override {}
 
  private:
+  Platform& platform_;
   std::string_view key_;
   GroupState state_ = GroupState::InForce;
 };
@@ -68,8 +69,8 @@ std::string optionsText(const KvDictionary& options) {
   return text;
 }
 
-WhitelistJudge::WhitelistJudge(WhitelistFile file)
-    : file_(std::move(file)), config_(Whitelist::fromFile(platform(), file_)) {}
+WhitelistJudge::WhitelistJudge(Platform& platform, WhitelistFile file)
+    : platform_(platform), file_(std::move(file)), config_(Whitelist::fromFile(platform, file_)) {}
 
 KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
   KeyVerdict verdict;
@@ -80,7 +81,7 @@ KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
   }
   verdict.match =
       kind == KeyKind::Scalar ? config_->matchScalarKey(key) : config_->matchDistributionKey(key);
-  CandidateFinder finder(key);
+  CandidateFinder finder(platform_, key);
   visitWhitelist(*file_.root, finder);
   switch (verdict.match.kind) {
     case WhitelistMatchKind::Exact:

@@ -35,12 +35,14 @@ struct KeyVerdict {
 // A whitelist with everything that its verdicts refer to.
 class WhitelistJudge {
  public:
-  explicit WhitelistJudge(WhitelistFile file);
+  // The platform must outlive the judge.
+  WhitelistJudge(Platform& platform, WhitelistFile file);
   const WhitelistFile& file() const { return file_; }
   // Valid as long as the judge.
   KeyVerdict judge(std::string_view key, KeyKind kind) const;
 
  private:
+  Platform& platform_;
   WhitelistFile file_;
   std::unique_ptr<Whitelist> config_;  // null when the file cannot be used
 };
