@@ -1,12 +1,14 @@
 // Writes a manual page from a template: the lines @OPTIONS@ and @COMMANDS@ become what the commands
-// of tallyctl say of themselves, @ENTRIES@ the entries of the device description. Runs when the
-// project is built, and is not installed.
+// of tallyctl say of themselves, @ENTRIES@ the entries of the device description, and
+// @WHITELIST_OPTIONS@ the options of the whitelist. Runs when the project is built, and is not
+// installed.
 #include <CLI/CLI.hpp>
 #include <cstdio>
 #include <fstream>
 #include <iostream>
 #include <string>
 
+#include "config/whitelist_options.h"
 #include "host/described/described_entries.h"
 #include "tools/frame/command_help.h"
 #include "tools/frame/output.h"
@@ -106,6 +108,15 @@ int main(int count, char** arguments) {
         std::erase(text, '`');
         out << ".TP\n\\fB" << roff(std::string(entry.name)) << "\\fR ("
             << tally::tools::typeName(entry.type) << ")\n"
+            << roff(sentence(text)) << '\n';
+      }
+    } else if (line == "@WHITELIST_OPTIONS@") {
+      for (const tally::WhitelistOption& option : tally::whitelistOptions()) {
+        const bool isNumber = option.value == tally::OptionValue::WholeNumber;
+        std::string text = std::string(isNumber ? "A whole number: " : "An array of numbers: ");
+        text += option.meaning;
+        std::erase(text, '`');
+        out << ".TP\n\\fB" << roff(std::string(option.name)) << "\\fR\n"
             << roff(sentence(text)) << '\n';
       }
     } else {

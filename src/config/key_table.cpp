@@ -6,7 +6,8 @@
 namespace tally {
 
 void KeyTable::reserve(std::size_t further) {
-  // A file of many small groups asks often: at least doubled, or each time would copy all entries.
+  // Called for every section: at least doubles, so that a file of many small groups does not copy
+  // all entries each time.
   const std::size_t wanted = entries_.size() + further;
   if (wanted > entries_.capacity()) entries_.reserve(std::max(wanted, entries_.capacity() * 2));
   positions_.reserve(wanted);
@@ -45,8 +46,8 @@ const WhitelistEntry* KeyTable::exact(std::string_view key) const {
 }
 
 const WhitelistEntry* KeyTable::longestPrefix(std::string_view key) const {
-  // Whatever sorts between a prefix of the key and the key begins with that prefix too, so the last
-  // entry that does not sort after the key is the longest match or leads to it through its parents.
+  // Every entry that sorts between a prefix of the key and the key itself begins with that prefix,
+  // so the last entry not after the key is the longest match, or one of its parents is.
   const auto after = std::upper_bound(sorted_.begin(), sorted_.end(), key,
                                       [this](std::string_view wanted, const auto& item) {
                                         return wanted < entries_[item.entry].key->view();

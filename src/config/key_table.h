@@ -18,17 +18,17 @@ struct WhitelistEntry {
 
 class KeyTable {
  public:
-  // Room for so many further entries.
+  // Reserves capacity for this many further entries.
   void reserve(std::size_t further);
-  // Replaces the entry of the same key that an earlier group put there.
+  // Adds an entry; it replaces one of the same key from an earlier group.
   void set(WhitelistEntry entry);
-  // Makes longestPrefix() usable; nothing may be set afterwards.
+  // Must be called before longestPrefix(), and after the last set().
   void buildPrefixIndex();
 
   // Null when there is none.
   const WhitelistEntry* exact(std::string_view key) const;
-  // The longest entry with which key begins. Costs the logarithm of the table's size, and a step
-  // for each further entry that nests inside it.
+  // The longest entry that is a prefix of the key; null when there is none. Takes logarithmic time,
+  // and a step for each further entry nested inside it.
   const WhitelistEntry* longestPrefix(std::string_view key) const;
   const std::vector<WhitelistEntry>& entries() const { return entries_; }
 

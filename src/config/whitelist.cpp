@@ -68,7 +68,7 @@ std::unique_ptr<Whitelist> Whitelist::fromFile(Platform& platform, const Whiteli
   SystemLog& log = *platform.log;
   if (!file.read) {
     log.message(LogLevel::Error, "Couldn't load whitelist");
-    // The fixed text does not say why, and an operator needs to know.
+    // The fixed text does not give the reason.
     log.message(LogLevel::Info, "whitelist: {}", file.fault);
     return nullptr;
   }

@@ -6,13 +6,13 @@
 #include <string_view>
 
 #include "config/key_table.h"
-#include "config/scalar_options.h"
 #include "config/whitelist_file.h"
+#include "config/whitelist_options.h"
 #include "kv/value.h"
 
 namespace tally {
 
-// How a key came to be admitted.
+// Why a key is admitted.
 enum class WhitelistMatchKind { None, Exact, Prefix, InternalDevice };
 struct WhitelistMatch {
   WhitelistMatchKind kind = WhitelistMatchKind::None;
@@ -23,7 +23,7 @@ struct WhitelistMatch {
 class Whitelist {
  public:
   // Reads the whitelist file. Null when it cannot be read or parsed; the reason is logged. A group,
-  // section or option that is malformed is left out with one error line that names it. The platform
+  // section or option that is malformed is skipped with one error line that names it. The platform
   // must outlive the whitelist.
   static std::unique_ptr<Whitelist> load(Platform& platform);
   // The same from a file that was loaded already.

@@ -6,8 +6,9 @@
 #include <iterator>
 
 #include "config/internal_device.h"
-#include "config/scalar_options.h"
+#include "config/whitelist_options.h"
 #include "kv/plist_codec.h"
+#include "platform/known_preferences.h"
 
 namespace tally {
 namespace {
@@ -26,7 +27,7 @@ std::string md5Text(std::string_view bytes) {
   return text;
 }
 
-// The options that can be used; the visitor is told of the others.
+// The well-formed options; the others are passed to the visitor.
 KvRef<KvDictionary> wellFormedOptions(KvDictionary& options, WhitelistPlace place,
                                       WhitelistVisitor& visitor) {
   const auto wellFormed = [](const KvDictionary::Entry& option) {

@@ -1,4 +1,4 @@
-// The whitelist file: how it is read, and what in it is well formed.
+// The whitelist file: reading it and checking its form.
 #pragma once
 
 #include <optional>
@@ -17,7 +17,7 @@ constexpr std::string_view kWhitelistPath =
 // The group that exists on internal devices only.
 constexpr std::string_view kInternalTestingGroup = "InternalTesting";
 
-// A whitelist file as far as it could be loaded.
+// A whitelist file, as far as it could be loaded.
 struct WhitelistFile {
   bool read = false;         // its bytes could be read
   std::string digest;        // MD5 of the bytes, 32 lowercase hexadecimal digits
@@ -37,7 +37,7 @@ constexpr int kWhitelistSections = 4;
 // The sections' names, in the order of WhitelistSection.
 std::span<const std::string_view> sectionNames();
 std::string_view sectionName(WhitelistSection section);
-// Empty when there is no section of that name.
+// Empty if no section has this name.
 std::optional<WhitelistSection> sectionOfName(std::string_view name);
 constexpr bool isPrefixSection(WhitelistSection section) {
   return section >= WhitelistSection::ScalarKeyPrefixes;
@@ -46,39 +46,39 @@ constexpr bool isScalarSection(WhitelistSection section) {
   return section == WhitelistSection::ScalarKeys || section == WhitelistSection::ScalarKeyPrefixes;
 }
 
-// Where in the file something stands; an inner level that does not apply is absent.
+// A place in the file; inner levels that do not apply are absent.
 struct WhitelistPlace {
   std::string_view group;
   std::optional<std::string_view> section, key, option;
 };
 
-// Takes a whitelist piece by piece, in the file's order.
+// Receives the parts of a whitelist, in the order of the file.
 class WhitelistVisitor {
  public:
   virtual ~WhitelistVisitor() = default;
-  // False: the group's content is passed over, well formed or not.
+  // False: the content of the group is skipped, well formed or not.
   virtual bool beginGroup(std::string_view name) = 0;
-  // So many entries of a section follow at most.
+  // At most this many entries of a section follow.
   virtual void beginSection(WhitelistSection, std::size_t) {}
   // An entry with those of its options that are well formed.
   virtual void entry(WhitelistSection section, WhitelistEntry entry) = 0;
-  // A piece of the wrong type, which is left out.
+  // A part of the wrong type, which is skipped.
   virtual void malformed(const WhitelistPlace& place) = 0;
-  // A section that nobody reads.
+  // A section of an unknown name.
   virtual void unknownSection(std::string_view, std::string_view) {}
 };
 void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
 
-// Whether a group of the file counts on this device.
+// Whether a group of the file applies on this device.
 enum class GroupState {
   InForce,
   InternalOnly,
   DisabledByTasking,
-  SwitchUnreadable,  // it may be switched off, so nothing of it leaves the device
+  SwitchUnreadable,  // it may be off, so nothing of the group leaves the device
 };
 GroupState groupState(Platform& platform, std::string_view group);
-// What is to be said of the group: "is for internal devices only", "is disabled by tasking" and so
-// on; empty when it is in force.
+// The state as a predicate: "is for internal devices only", "is disabled by tasking" and so on;
+// empty if the group is in force.
 std::string_view whyNotInForce(GroupState state);
 
 }  // namespace tally

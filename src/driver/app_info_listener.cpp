@@ -11,9 +11,7 @@
 namespace tally {
 namespace {
 
-constexpr std::size_t kUuidBytes = 16;
-
-// A signed 64-bit field; a number of another width is another type.
+// A signed 64-bit field. A number of another width is of another type.
 const KvNumber* int64Field(const KvDictionary& dictionary, std::string_view key) {
   const auto* const number = dictionary.getAs<KvNumber>(key);
   return number != nullptr && number->kind() == KvNumberKind::Int64 ? number : nullptr;
@@ -38,19 +36,29 @@ std::string uuidText(std::span<const std::byte> bytes) {
 Result<KvRef<KvDictionary>> makeApplication(const KvObject* element) {
   const auto* const fields = kvCast<KvDictionary>(element);
   if (fields == nullptr) return Error{"not a dictionary"};
-  auto* const bundle = fields->getAs<KvString>("bundle_id");
-  if (bundle == nullptr) return Error{"no text \"bundle_id\""};
-  auto* const version = fields->getAs<KvString>("version");
-  if (version == nullptr) return Error{"no text \"version\""};
-  const auto* const uuid = fields->getAs<KvData>("uuid");
-  if (uuid == nullptr || uuid->bytes().size() != kUuidBytes) {
-    return Error{"no \"uuid\" of 16 bytes"};
+  auto application = KvDictionary::create(std::size(kApplicationFields));
+  for (const auto& [sent, logged, kind] : kApplicationFields) {
+    switch (kind) {
+      case ApplicationFieldKind::Text: {
+        auto* const text = fields->getAs<KvString>(sent);
+        if (text == nullptr) return Error{fmt::format("no text \"{}\"", sent)};
+        application->set(logged, KvRef<KvString>::share(text));
+        break;
+      }
+      case ApplicationFieldKind::Number:
+        application->set(logged, KvNumber::int64(int64Or0(*fields, sent)));
+        break;
+      case ApplicationFieldKind::Uuid: {
+        const auto* const uuid = fields->getAs<KvData>(sent);
+        if (uuid == nullptr || uuid->bytes().size() != kUuidBytes) {
+          return Error{fmt::format("no \"{}\" of {} bytes", sent, kUuidBytes)};
+        }
+        application->set(logged, KvString::create(uuidText(uuid->bytes())));
+        break;
+      }
+    }
   }
-  return KvDictionary::create({{"bundle", KvRef<KvString>::share(bundle)},
-                               {"version", KvRef<KvString>::share(version)},
-                               {"adamID", KvNumber::int64(int64Or0(*fields, "adam_id"))},
-                               {"arch", KvNumber::int64(int64Or0(*fields, "arch"))},
-                               {"uuid", KvString::create(uuidText(uuid->bytes()))}});
+  return application;
 }
 
 }  // namespace
@@ -120,7 +128,7 @@ void AppInfoListener::receiveAppData(const KvDictionary& message) {
     return;
   }
   const auto information = makeAppInformation(*platform_.log, *appData);
-  // The text of a long list is not made for nobody.
+  // The text of a long list is made only if it is logged.
   if (platform_.log->enabled(LogLevel::Default)) {
     platform_.log->repeated(LogLevel::Default, "tallyrun got AAI", "tallyrun got {}AAI:\n{}",
                             isAppInfoRequested_ ? "requested" : "(unsolicited -- so ignoring) ",

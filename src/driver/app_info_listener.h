@@ -3,6 +3,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 
@@ -18,6 +19,21 @@ constexpr std::string_view kLoggingNotification = "vellum.tallyd.tallyrun.loggin
 // The "operation" of a message: a peer announces that application data will follow, asks for the
 // tasks of a day, or delivers the data.
 enum Operation : std::int32_t { kLoggingStatus = 0, kRunDay = 1, kAppData = 2 };
+
+// The fields of an application: as messages name them, and as the log does.
+enum class ApplicationFieldKind { Text, Number, Uuid };
+struct ApplicationField {
+  std::string_view sent, logged;
+  ApplicationFieldKind kind;
+};
+inline constexpr ApplicationField kApplicationFields[] = {
+    {"bundle_id", "bundle", ApplicationFieldKind::Text},
+    {"version", "version", ApplicationFieldKind::Text},
+    {"adam_id", "adamID", ApplicationFieldKind::Number},
+    {"arch", "arch", ApplicationFieldKind::Number},
+    {"uuid", "uuid", ApplicationFieldKind::Uuid},
+};
+constexpr std::size_t kUuidBytes = 16;
 
 class AppInfoListener {
  public:
@@ -48,9 +64,9 @@ class AppInfoListener {
   std::atomic_flag acted_;
 };
 
-// The elements of "app_data" in their order, each as {"bundle", "version", "adamID", "arch",
-// "uuid"}. Elements without "bundle_id", "version" or "uuid" are left out, and one line says how
-// many and why the first; a number that is missing or of another type is 0.
+// The elements of "app_data" in their order, as the log has them. Elements that lack a text or the
+// UUID are skipped, and one line says how many and why the first; a number that is missing or of
+// another type is 0.
 KvRef<KvArray> makeAppInformation(SystemLog& log, const KvArray& appData);
 
 }  // namespace tally

@@ -8,23 +8,23 @@
 namespace tally {
 namespace {
 
-// The scheduled mode ends when no event came for this long.
+// The scheduled mode ends after this long without an event.
 constexpr double kQuietSeconds = 10.0;
 
 void waitForQuiet(EventLoop& loop) {
   for (;;) {
     const SliceResult slice = loop.runMainLoopSlice(kQuietSeconds, true);
-    // A loop without sources will never deliver: starting it again at once would only spin.
+    // A loop without sources never delivers an event; restarting it would busy-wait.
     if (slice == SliceResult::TimedOut || slice == SliceResult::Finished) return;
   }
 }
 
 void runScheduled(Platform& platform, DailyTasks& tasks) {
   AppInfoListener listener(platform, tasks);
-  // Without a listener the loop still runs its time: a peer may only be late.
+  // The loop runs without a listener too, for the same time.
   (void)listener.start();
-  // A message that comes once the listening has ended starts a new process. One that came before
-  // gets a whole quiet period like any other, since its sender may be about to send the next.
+  // A message that arrives after the listening has ended starts a new process. One that arrived
+  // before is followed by a whole quiet period, since its sender may be about to send the next.
   do {
     waitForQuiet(*platform.eventLoop);
   } while (listener.stop());

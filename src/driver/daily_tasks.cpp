@@ -3,15 +3,16 @@
 #include <cerrno>
 
 #include "config/whitelist_file.h"
+#include "platform/known_preferences.h"
 #include "report/daily_report.h"
 
 namespace tally {
 namespace {
 
-// True when the device has no whitelist yet. One that exists but cannot be read or parsed is a
+// Whether the device has no whitelist yet. One that exists but cannot be read or parsed is a
 // fault, which the report logs.
 bool whitelistIsMissing(Files& files) {
-  // A limit of nothing: a file that exists is rejected by its size, unread.
+  // With the limit 0, a file that exists is rejected by its size without being read.
   const auto bytes = files.readFile(kWhitelistPath, 0);
   return !bytes && bytes.error().systemError == ENOENT;
 }

@@ -7,6 +7,8 @@
 #include <set>
 #include <utility>
 
+#include "platform/known_preferences.h"
+
 namespace tally {
 namespace {
 
@@ -55,7 +57,7 @@ Attempts attemptAll(Platform& platform, const std::vector<PreferenceWrite>& writ
   return attempts;
 }
 
-// The program's own domain is flushed with the record, which tells whether that was done.
+// The program's own domain is flushed with the record.
 void flushDomains(Preferences& preferences, std::initializer_list<Attempts*> all) {
   std::map<std::string, WriteResult> flushed{{std::string(kProgramDomain), WriteResult::Written}};
   for (Attempts* attempts : all) {
@@ -71,7 +73,7 @@ void flushDomains(Preferences& preferences, std::initializer_list<Attempts*> all
   }
 }
 
-// Those that the next run has to try again, and a line for each that was not done.
+// The writes that the next run has to retry. Logs one line for each that was not done.
 std::vector<PreferenceWrite> failuresOf(SystemLog& log, const Attempts& attempts,
                                         std::string_view what) {
   std::vector<PreferenceWrite> failures;
@@ -87,7 +89,7 @@ std::vector<PreferenceWrite> failuresOf(SystemLog& log, const Attempts& attempts
   return failures;
 }
 
-// Leaves in the change what remains to be done. True when a preference was set or removed.
+// Leaves in the change what remains to be done. True if a preference was set or removed.
 bool carryOutWrites(Platform& platform, TaskingChange& change) {
   Attempts removals = attemptAll(platform, change.removals, /*sync=*/false);
   Attempts writes = attemptAll(platform, change.writes, /*sync=*/true);
@@ -106,7 +108,7 @@ bool carryOutWrites(Platform& platform, TaskingChange& change) {
   return hasEffect;
 }
 
-// The record of what is in force is written in one file with the removal of the note, and last.
+// Writes the record of what is in force and removes the note, in one write of their file.
 void recordOutcome(Preferences& record, const TaskingChange& change, bool isFinished) {
   if (!isFinished) {
     record.set(kUnfinished, unfinishedRecord(change));
@@ -125,9 +127,9 @@ struct Outcome {
   bool isFinished, isNews;
 };
 
-// A run may die between any two steps. So all that is to be done is noted first, and a tasking that
-// is about to be rolled back is no longer recorded as the one in force. A later run that finds the
-// note carries out what it lists.
+// The process may be killed between any two steps. So everything that is to be done is noted first,
+// and a tasking that is about to be rolled back is no longer recorded as in force. A later run that
+// finds the note carries out what it lists.
 Outcome carryOutChange(Platform& platform, TaskingChange change, bool endsRecorded) {
   Preferences& record = *platform.preferences;
   record.set(kUnfinished, unfinishedRecord(change));

@@ -6,12 +6,13 @@
 
 namespace tally {
 
-// As they read now, with the schedule of the system configuration.
+// Reads the record from the preferences and the schedule from the system configuration.
 TaskingInputs readTaskingInputs(Platform& platform);
 
-// Does what a plan says, in its order, and posts the notification when something has changed. Each
-// preference that could not be written is logged and left to the next run, and no tasking counts as
-// in force before all of them are. False when something is left, or nothing could be recorded.
+// Carries out a plan in its order, and posts the notification if something has changed. Each
+// preference that could not be written is logged and retried by the next run; no tasking is in
+// force before all are written. False if something remains to be done, or nothing could be
+// recorded.
 bool carryOut(Platform& platform, const TaskingPlan& plan);
 
 // Both, as a step of the day's sequence.

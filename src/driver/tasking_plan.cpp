@@ -21,14 +21,14 @@ using Owner = PreferenceWrite::Owner;
 constexpr std::string_view kProgramUserName = "mobile";
 constexpr std::string_view kSystemUserName = "__sysmetra__";
 
-// Keys of the record of a change, beside those of a tasking in force.
+// Keys of the record of a change, in addition to those of a tasking in force.
 constexpr std::string_view kUnremoved = "Unremoved";  // entries without value
 constexpr std::string_view kUnwritten = "Unwritten";  // indexes of the payload
-// Containers around an entry in that record: domain, record, payload.
+// Nesting depth of an entry in that record: domain, record, payload.
 constexpr int kEntryLevel = 3;
 
-// The preference that an entry names. The same checks in both directions, so that what was not
-// written is not removed either.
+// The preference that an entry names. Setting and removing use the same checks, so that what was
+// never written is not removed.
 Result<PreferenceWrite> preferenceIn(const KvObject* entry) {
   const auto* const fields = kvCast<KvDictionary>(entry);
   if (fields == nullptr) return Error{"not a dictionary"};
@@ -41,7 +41,7 @@ Result<PreferenceWrite> preferenceIn(const KvObject* entry) {
   }
   const std::string_view domain = *fields->getString("Domain");
   const std::string_view user = *fields->getString("User");
-  // Both become names of files; a key is text inside of one.
+  // Both become file names; a key is text inside a file.
   for (const auto& [name, text] : {std::pair("Domain", domain), std::pair("User", user)}) {
     if (!isSafeFileName(text) || isTemporaryName(text)) {
       return Error{fmt::format("its \"{}\" cannot be a file's name: {}", name, text)};
@@ -58,7 +58,7 @@ bool isStorable(const KvRef<KvObject>& entry) {
   return kvIdentical(entry.get(), storedForm(entry, kEntryLevel).get());
 }
 
-// What is recorded was written to a file, where characters may have been replaced.
+// Whether a recorded value is this one. Writing it to a file may have replaced characters.
 bool isRecordOf(const KvObject* recorded, const KvRef<KvObject>& value) {
   if (!value || recorded == nullptr) return !value && recorded == nullptr;
   return kvIdentical(recorded, value.get()) || kvIdentical(recorded, storedForm(value).get());
@@ -88,7 +88,7 @@ class Planner {
   void updateTasking() {
     const auto* const schedule = scheduled();
     if (schedule == nullptr) {
-      // What was begun is finished: a tasking that is withdrawn stays in force as well.
+      // A change that was begun is finished, as a tasking in force outlives its schedule.
       if (isResumable()) resume();
       return;
     }
@@ -107,7 +107,7 @@ class Planner {
     startOver(*schedule, newID, payload);
   }
 
-  // Null when nothing is scheduled that could be applied.
+  // Null if nothing is scheduled that can be applied.
   const KvDictionary* scheduled() {
     const auto* const schedule = kvCast<KvDictionary>(inputs_.schedule.get());
     if (inputs_.schedule && schedule == nullptr) fault("the schedule is not a dictionary");
@@ -133,7 +133,8 @@ class Planner {
     plan_.isDue = true;
   }
 
-  // An unreadable list of what was not written means all of it: to write again does no harm.
+  // If the list of unwritten entries cannot be read, all are written: repeating a write is
+  // harmless.
   TaskingChange unfinishedChange() {
     const KvDictionary& record = *unfinished();
     TaskingChange change;
@@ -166,7 +167,7 @@ class Planner {
     plan_.endsRecorded = inputs_.recordedID && (oldPayload != nullptr || newPayload != nullptr);
     if (inputs_.unfinished) say("what an unfinished tasking update has written is removed");
     TaskingChange change{std::move(newID), inputs_.build, nullptr, nullptr, {}, {}};
-    // Earlier versions noted no more than what they were about to write.
+    // Earlier versions noted only the payload that they were about to write.
     const auto* const former = unfinished();
     change.removals =
         removalsOf({oldPayload, kvCast<KvArray>(inputs_.unfinished.get()),
@@ -192,8 +193,8 @@ class Planner {
     return payload;
   }
 
-  // The payload without the entries that are never written. The record must not hold those: read
-  // again, an entry that a file cannot hold as it is may name another preference.
+  // The payload without the entries that are never written. They must not be recorded: an entry
+  // that a file cannot represent may name another preference when it is read back.
   KvRef<KvArray> recordable(const KvArray& payload) {
     auto kept = KvArray::create();
     for (std::size_t i = 0; i < payload.size(); ++i) {
@@ -216,7 +217,7 @@ class Planner {
     for (std::size_t i = 0; i < payload.size(); ++i) {
       auto write = preferenceIn(payload.get(i));
       if (!write) continue;
-      // An entry without a value clears the preference.
+      // An entry without a value removes the preference.
       write->value = KvRef<KvObject>::share(kvCast<KvDictionary>(payload.get(i))->get("Value"));
       write->entry = i;
       last[write->name()] = i;

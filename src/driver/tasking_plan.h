@@ -1,4 +1,4 @@
-// What a tasking update would do, worked out before anything is done.
+// What a tasking update is to do, planned before anything is written.
 #pragma once
 
 #include <cstddef>
@@ -15,7 +15,7 @@ namespace tally {
 
 constexpr std::string_view kTaskingNotification = "vellum.da.tasking_changed";
 
-// What an update starts from. Null is absent.
+// What an update starts from. Null means absent.
 struct TaskingInputs {
   std::int32_t today = 0;
   KvRef<KvObject> build;       // of the running system
@@ -46,7 +46,7 @@ struct TaskingMessage {
   std::string text;
 };
 
-// What is still to be done until a tasking is in force, or none is.
+// What remains to be done until a tasking, or none, is in force.
 struct TaskingChange {
   KvRef<KvObject> id, system, digest;             // what is recorded in the end
   KvRef<KvArray> payload;                         // null: no tasking will be in force
@@ -55,20 +55,21 @@ struct TaskingChange {
 
 struct TaskingPlan {
   std::vector<TaskingMessage> messages;
-  KvRef<KvObject> lastUpdate;           // "LastOSUpdate" becomes this; null: it stays
+  KvRef<KvObject> lastUpdate;           // the new "LastOSUpdate"; null: unchanged
   std::optional<TaskingChange> change;  // of preferences and of the record
   bool endsRecorded = false;            // the change begins with the end of the tasking in force
   bool isDue = false;                   // false: what is scheduled is in force already
 };
 
-// Notes a change of the system's build; if the schedule is not the tasking in force under this
-// build, rolls that one back and applies the schedule's. Entries of a payload that can never be
-// written (a field is missing, a name could not be a file's, a property list cannot hold them as
-// they are) are left out, each with a fault. Of several entries for one preference the last counts.
+// Notes a change of the system's build. If the scheduled tasking is not in force under this build,
+// rolls back the one that is and applies the scheduled one. Entries of a payload that can never be
+// written (a field is missing, a name cannot be that of a file, a property list cannot represent
+// the value) are skipped, each with a fault. Of several entries for one preference the last
+// applies.
 //
-// A change that an earlier run has begun is resumed where it stands, also when the schedule has
-// been withdrawn meanwhile. If something else is scheduled, or the system has changed, all that it
-// may have written is removed.
+// A change that an earlier run has begun is resumed, even if the schedule has been withdrawn since.
+// If something else is scheduled, or the system has changed, everything that it may have written is
+// removed.
 TaskingPlan planTasking(const TaskingInputs& inputs);
 
 // The change as it is recorded ("TaskingUnfinished") while something of it remains to be done.

@@ -24,7 +24,7 @@ constexpr std::uint32_t kEccRecordType = 172;
 constexpr int kEccRecordsPerSweep = 10;
 constexpr int kNoSuchValue = 2, kBusy = 16;  // nothing is pending
 
-// Scalars set while it lives reach the store together.
+// The scalars that are set through it are one transaction of the store, which its end commits.
 class StoreBatch {
  public:
   explicit StoreBatch(MetricsStore& store) : store_(store) { store_.beginBatch(); }
@@ -40,7 +40,7 @@ class StoreBatch {
   MetricsStore& store_;
 };
 
-// Bytes as whole MiB; -1 when the answer lacks the entry.
+// Bytes as whole MiB; -1 if the answer lacks the entry.
 std::int64_t mebibytes(const KvDictionary* usage, std::string_view entry) {
   const auto bytes = usage != nullptr ? usage->getInt64(entry) : std::nullopt;
   return bytes ? *bytes >> 20 : -1;
@@ -79,7 +79,7 @@ void logEccRecord(CrashReporting& crashReporting, const ByteReader& record) {
   auto entry = KvDictionary::create(2 + kEccRegisterSlots);
   entry->set("id", KvNumber::int32(record.read<std::uint8_t>(0).value_or(0)));
   entry->set("count", KvNumber::int32(count));
-  // The count may promise more registers than the record has.
+  // The count may exceed the registers of the record.
   for (std::size_t i = 0; i < count; ++i) {
     const auto value = record.read<std::int64_t>(kEccRegistersOffset + 8 * i);
     if (!value) break;
@@ -90,7 +90,7 @@ void logEccRecord(CrashReporting& crashReporting, const ByteReader& record) {
 
 void forwardEccEvents(Platform& platform) {
   std::array<std::byte, kEccRecordSize> buffer;
-  // Not reset between reads: the kernel is given the length that its last record had.
+  // Not reset between reads: each passes the length of the last record to the kernel.
   std::size_t length = buffer.size();
   const auto readNext = [&] {
     const int error =

@@ -2,6 +2,7 @@
 // is, what it may be, and what applies without it.
 #pragma once
 
+#include <algorithm>
 #include <limits>
 #include <string_view>
 
@@ -90,11 +91,16 @@ inline constexpr KnownPreference kKnownPreferences[] = {
      "the user write amplification above which a storage log is written", "",
      NumberBound{.fallback = 2, .above = 0, .below = 10}},
     {"vellum.demo-settings", "StoreDemoMode", PreferenceType::Boolean,
-     "whether the device is on display in a shop, which the storage figures say", "false"},
+     "whether the device is in demonstration mode, which the storage figures report", "false"},
     {kGroupSwitchDomain, "", PreferenceType::Boolean, "switches the group on or off"},
     {kScheduleDomain, "ScheduledTasking", PreferenceType::Dictionary,
      "of the system's preferences: the tasking that the system schedules (below)"},
 };
+
+// The program's own domain is written to remove the history.
+static_assert(std::ranges::all_of(kKnownPreferences, [](const KnownPreference& known) {
+  return !known.isHistory || known.domain == kProgramDomain;
+}));
 
 // The row of a key. Does not compile if there is none.
 consteval const KnownPreference& knownPreference(std::string_view key) {

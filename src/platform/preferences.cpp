@@ -1,6 +1,10 @@
 // The typed reads that every preference store shares.
 #include "platform/preferences.h"
 
+#include <utility>
+
+#include "platform/known_preferences.h"
+
 namespace tally {
 
 std::int32_t Preferences::SMAPreferencesGetIntegerValue(std::string_view key,
@@ -18,6 +22,14 @@ bool Preferences::SMAPreferencesGetBoolValue(std::string_view key, std::string_v
   if (exists != nullptr) *exists = boolean != nullptr || number != nullptr;
   if (boolean != nullptr) return boolean->value();
   return number != nullptr && number->asDouble() != 0.0;
+}
+
+KvRef<KvObject> Preferences::get(const KnownPreference& known) {
+  return SMAPreferencesGetValue(known.key, known.domain);
+}
+
+void Preferences::set(const KnownPreference& known, KvRef<KvObject> value) {
+  SMAPreferencesSetValue(known.key, std::move(value), known.domain);
 }
 
 std::int64_t Preferences::getInteger(const KnownPreference& known) {

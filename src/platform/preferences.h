@@ -3,12 +3,12 @@
 
 #include <cstdint>
 #include <string_view>
-#include <utility>
 
 #include "kv/value.h"
-#include "platform/known_preferences.h"
 
 namespace tally {
+
+struct KnownPreference;  // platform/known_preferences.h, which few need
 
 // How a write ended. True when it is done.
 class WriteResult {
@@ -53,13 +53,9 @@ class Preferences {
   bool SMAPreferencesGetBoolValue(std::string_view key, std::string_view domain, bool* exists);
 
   // Null when it is absent.
-  KvRef<KvObject> get(const KnownPreference& known) {
-    return SMAPreferencesGetValue(known.key, known.domain);
-  }
+  KvRef<KvObject> get(const KnownPreference& known);
   // A null value removes it.
-  void set(const KnownPreference& known, KvRef<KvObject> value) {
-    SMAPreferencesSetValue(known.key, std::move(value), known.domain);
-  }
+  void set(const KnownPreference& known, KvRef<KvObject> value);
   // The number, or the row's fallback for anything else: no number, one outside its bound, or for a
   // real an integer.
   std::int64_t getInteger(const KnownPreference& known);

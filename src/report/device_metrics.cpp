@@ -5,8 +5,9 @@
 #include <optional>
 
 #include "base/byte_reader.h"
+#include "config/saturate.h"
+#include "platform/known_preferences.h"
 #include "platform/measured_metrics.h"
-#include "report/saturate.h"
 
 namespace tally {
 namespace {

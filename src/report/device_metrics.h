@@ -12,7 +12,8 @@ namespace tally {
 
 // The numbers of installed applications.
 void recordApplications(Platform& platform, LogValues& values);
-// All others. A value that cannot be measured is recorded as -1 or left out, by its source.
+// All others. A value that cannot be measured is recorded as -1 or omitted, depending on its
+// source.
 void recordDeviceMetrics(Platform& platform, LogValues& values);
 
 // True for the scalars that the report measures itself instead of reading them from the store.

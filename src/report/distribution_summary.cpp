@@ -17,7 +17,7 @@ DistributionSummary addSamples(DistributionSummary summary, std::span<const doub
                                const HistogramIntervals* intervals,
                                std::span<std::uint32_t> counts) {
   for (const double sample : samples) {
-    // The division is what each sample waits for; finding the bucket fits into that time.
+    // The latency of the division dominates; the bucket search runs in parallel with it.
     ++summary.count;
     const double delta = sample - summary.mean;
     summary.mean += delta / static_cast<double>(summary.count);

@@ -5,7 +5,7 @@
 #include <span>
 #include <string_view>
 
-#include "config/scalar_options.h"
+#include "config/whitelist_options.h"
 #include "kv/value.h"
 #include "platform/metrics_store.h"
 #include "platform/system_log.h"
@@ -21,8 +21,8 @@ struct DistributionSummary {
   double squaredDeviations = 0;  // sum over the samples, from the mean, not divided by the count
   std::int64_t count = 0;
 
-  // Takes further samples in the order in which they were recorded. With intervals, counts holds
-  // one counter per bucket and each sample adds 1 to its own.
+  // Adds further samples, in the order in which they were recorded. With intervals, counts has one
+  // counter per bucket, and each sample increments that of its bucket.
   void add(std::span<const double> samples, const HistogramIntervals* intervals,
            std::span<std::uint32_t> counts);
   // [minimum, maximum, mean, squared deviations, count]: four doubles and a signed 32-bit integer,
@@ -30,7 +30,7 @@ struct DistributionSummary {
   KvRef<KvArray> toArray() const;
 };
 
-// What a distribution comes to under its options.
+// A distribution as its options report it.
 struct DistributionResult {
   DistributionSummary summary;
   bool hasHistogram = false;      // "intervals" were given and their counters could be allocated

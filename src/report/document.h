@@ -11,11 +11,11 @@
 
 namespace tally {
 
-// What log submission knows the daily log by.
+// The type and name of the daily log in log submission.
 constexpr std::string_view kDailyLogTypeCode = "193";
 constexpr std::string_view kDailyLogName = "log-tallyd";
-// What a million keys with long names and their histograms need; what fewer may have is a matter of
-// the spool's bounds.
+// Enough for a million keys with long names and their histograms; the spool's bounds may allow
+// less.
 constexpr std::size_t kDailyLogMaximumBytes = 256u << 20;
 
 // The languages and the region of the user.

@@ -11,18 +11,18 @@
 
 namespace tally {
 
-// The boundaries b0 … b(n-1) of n + 1 buckets, in a form that is quick to search. Buckets are open
+// The boundaries b0 … b(n-1) of n + 1 buckets, in a form that is fast to search. Buckets are open
 // on the left and closed on the right; the last is open on both sides.
 class HistogramIntervals {
  public:
-  // boundaries holds numbers, in any order; they are borrowed and must outlive this object.
+  // The boundaries are numbers in any order; they are borrowed and must outlive this object.
   explicit HistogramIntervals(const KvArray& boundaries);
 
   std::size_t bucketCount() const { return boundaries_.size() + 1; }
   // The position of the first boundary, in array order, that is at or above the value; n when there
   // is none, as for a NaN.
   std::size_t bucketOf(double value) const {
-    // Without branches: samples fall where they like, so a branch would be mispredicted.
+    // Without branches, which random samples would make the processor mispredict.
     std::size_t passed = 0;
     for (std::size_t half = positions_.size() / 2; half > 0; half /= 2) {
       passed += static_cast<std::size_t>(!(steps_[passed + half - 1] >= value)) * half;
@@ -34,15 +34,15 @@ class HistogramIntervals {
 
  private:
   const KvArray& boundaries_;
-  // The boundaries that are above all before them: only these can be the first at or above a value.
+  // The boundaries that exceed all before them: only these can be the first at or above a value.
   // Padded with infinity to one less than a power of two.
   std::vector<double> steps_;
-  // The place in the array of each step, then n for every value that passes them all.
+  // The index of each step in the array, then n for every value above all of them.
   std::vector<std::uint32_t> positions_;
 };
 
 // The counters of the buckets that have samples, under their labels in bucket order; null when no
-// bucket has any. counts holds intervals.bucketCount() counters.
+// bucket has any. There must be intervals.bucketCount() counters.
 KvRef<KvDictionary> makeHistogramDictionary(const HistogramIntervals& intervals,
                                             std::span<const std::uint32_t> counts);
 

@@ -9,9 +9,9 @@
 #include <vector>
 
 #include "config/whitelist.h"
+#include "config/whitelist_options.h"
 #include "kv/value.h"
 #include "platform/metrics_store.h"
-#include "report/scalar_rounding.h"
 
 namespace tally {
 

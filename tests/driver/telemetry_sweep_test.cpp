@@ -1,9 +1,10 @@
-// The daily sweep: what it records, in which order, and what each failure costs.
+// The daily sweep: what it records, in which order, and that a failure stops nothing after it.
 #include "driver/telemetry_sweep.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "fakes/fake_registry.h"
 #include "fakes/fake_storage.h"
 #include "fakes/kcdata.h"
 
@@ -16,113 +17,24 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using Lines = std::vector<std::string>;
 
-// A storage driver, and beside it one driver whose statistics channels a hub serves.
-struct FakeHub final : fakes::FakeStorageRegistry {
-  static constexpr RegistryHandle kHub = 30, kIterator = 40, kDriver = 50;
-  static constexpr ConnectionHandle kHubConnection = 31;
-  struct Channel {
-    std::uint64_t id;
-    std::uint64_t type;  // format, categories << 16, elements << 32
-    const char* name;    // null: the id names it
-    std::int64_t value;
-  };
-  std::vector<Channel> channels;
-  RegistryResult subscribeStatus = 0, sampleStatus = 0;
-  bool visited = false;
-  Bytes elements;
-  std::size_t interests = 0;  // that were subscribed
-
-  RegistryHandle RegistryFindService(KvRef<KvDictionary> matching) override {
-    if (matching->getString(kMatchClass) == "HwReportHub") return kHub;
-    return FakeStorageRegistry::RegistryFindService(std::move(matching));
-  }
-  RegistryResult RegistryCopyMatchingServices(KvRef<KvDictionary>, RegistryHandle* found) override {
-    *found = kIterator;
-    visited = channels.empty();
-    return 0;
-  }
-  RegistryHandle RegistryIteratorNext(RegistryHandle) override {
-    return std::exchange(visited, true) ? 0 : kDriver;
-  }
-  bool RegistryIteratorIsValid(RegistryHandle) override { return true; }
-  void HandleRelease(RegistryHandle handle) override {
-    if (handle < kHub) FakeStorageRegistry::HandleRelease(handle);
-  }
-  KvRef<KvObject> RegistryCopyProperty(RegistryHandle, std::string_view key) override {
-    if (key == "HwReportLegendPublic") return KvBoolean::of(true);
-    auto legend = KvArray::create();
-    for (const Channel& channel : channels) {
-      auto entry = KvArray::create({KvNumber::uint64(channel.id), KvNumber::uint64(channel.type)});
-      if (channel.name != nullptr) entry->append(KvString::create(channel.name));
-      legend->append(std::move(entry));
-    }
-    return KvArray::create({KvDictionary::create({{"HwReportChannels", std::move(legend)}})});
-  }
-  RegistryResult RegistryGetEntryID(RegistryHandle, std::uint64_t* id) override {
-    *id = 500;
-    return 0;
-  }
-  RegistryResult RegistryGetName(RegistryHandle, std::string* name) override {
-    *name = "driver";
-    return 0;
-  }
-  RegistryResult ServiceOpenConnection(RegistryHandle service, std::uint32_t type,
-                                       ConnectionHandle* connection) override {
-    if (service != kHub) {
-      return FakeStorageRegistry::ServiceOpenConnection(service, type, connection);
-    }
-    *connection = kHubConnection;
-    return 0;
-  }
-  RegistryResult ServiceCloseConnection(ConnectionHandle connection) override {
-    return connection == kHubConnection ? 0
-                                        : FakeStorageRegistry::ServiceCloseConnection(connection);
-  }
-  RegistryResult ConnectionCallMethod(ConnectionHandle connection, std::uint32_t selector,
-                                      MethodCall& call) override {
-    if (connection != kHubConnection) {
-      return FakeStorageRegistry::ConnectionCallMethod(connection, selector, call);
-    }
-    if (selector == 2) {
-      interests = call.structInput.size() / 24;
-      call.scalarOutputCount = 1;
-      return subscribeStatus;
-    }
-    return selector == 3 ? sampleStatus : 0;
-  }
-  RegistryResult ConnectionMapMemory(ConnectionHandle, std::uint32_t, std::uint32_t,
-                                     const std::byte** address, std::size_t* length) override {
-    elements.clear();
-    for (const Channel& channel : channels) {
-      for (const std::uint64_t word : {std::uint64_t{500}, channel.id, channel.type,
-                                       std::uint64_t{0}, static_cast<std::uint64_t>(channel.value),
-                                       std::uint64_t{0}, std::uint64_t{0}, std::uint64_t{0}}) {
-        appendValue(elements, word);
-      }
-    }
-    *address = elements.data();
-    *length = elements.size();
-    return 0;
-  }
-  RegistryResult ConnectionUnmapMemory(ConnectionHandle, std::uint32_t, const std::byte*) override {
-    return 0;
-  }
-};
-
-constexpr std::uint64_t typeWord(std::uint64_t format, std::uint64_t categories) {
-  return format | categories << 16 | 1ull << 32;
-}
+const std::string kTotal = "scalar vellum.dockyard.DiskUsageUserTotalBlocks=";
+const std::string kFree = "scalar vellum.dockyard.DiskUsageUserBlocksFree=";
+const char* const kNoDriver =
+    "error reading nand info, error 1 with message Unable to parse buffer";
 
 class TelemetrySweepTest : public testing::Test {
  protected:
   TelemetrySweepTest() {
-    storage.platform.kernelValues->fail("kern.bootsessionuuid", 2);
+    kernel.fail("kern.bootsessionuuid", 2);
     storage.registry->classes.clear();
   }
-  // Everything with an effect, in order.
-  const Lines& sweep() {
+  // Everything with an effect, in order. The registry is that of the storage driver unless given.
+  const Lines& sweep(std::shared_ptr<DeviceRegistry> registry = nullptr) {
     storage.platform.calls->clear();
     storage.platform.log->lines.clear();
+    Platform services = storage.services();
+    if (registry) services.deviceRegistry = std::move(registry);
+    const PlatformScope scope(std::move(services));  // for the libraries
     testing::internal::CaptureStderr();
     runTelemetrySweep(platform());
     testing::internal::GetCapturedStderr();
@@ -150,30 +62,24 @@ class TelemetrySweepTest : public testing::Test {
     return record;
   }
 
-  std::shared_ptr<FakeHub> hub = std::make_shared<FakeHub>();
-  fakes::FakeStorage storage{hub};
+  fakes::FakeStorage storage;
+  fakes::FakeKernelValues& kernel = *storage.platform.kernelValues;
 };
-
-const char* const kTotal = "scalar vellum.dockyard.DiskUsageUserTotalBlocks=";
-const char* const kFree = "scalar vellum.dockyard.DiskUsageUserBlocksFree=";
 
 TEST_F(TelemetrySweepTest, DiskUsageInWholeMebibytes) {
   const auto usage = [](std::int64_t total, std::int64_t available) {
     return KvDictionary::create({{"TotalDiskCapacity", KvNumber::int64(total)},
                                  {"TotalDataAvailable", KvNumber::int64(available)}});
   };
-  const struct {
-    KvRef<KvObject> answer;
-    std::string total, free;
-  } cases[] = {
+  const std::tuple<KvRef<KvObject>, std::string, std::string> cases[] = {
       {usage(1'048'575, 1'048'576), "0", "1"},
       {usage(-1, INT64_MAX), "-1", "8796093022207"},
       {nullptr, "-1", "-1"},
       {KvDictionary::create({{"TotalDataAvailable", KvNumber::int64(1 << 22)}}), "-1", "4"},
   };
-  for (const auto& c : cases) {
-    storage.platform.deviceInformation->answers["DiskUsage"] = c.answer;
-    EXPECT_THAT(sweep(), ElementsAre(kTotal + c.total, kFree + c.free));
+  for (const auto& [answer, total, available] : cases) {
+    storage.platform.deviceInformation->answers["DiskUsage"] = answer;
+    EXPECT_THAT(sweep(), ElementsAre(kTotal + total, kFree + available));
   }
 }
 
@@ -182,34 +88,25 @@ TEST_F(TelemetrySweepTest, TheOrderOfASweep) {
   storage.purgeableSpace->answer =
       KvDictionary::create({{"RECLAIM_TOTAL_AVAILABLE", KvNumber::float64(5.9)},
                             {"RECLAIM_NONPURGEABLE_AMOUNT", KvString::create("6")}});
-  storage.platform.kernelValues->answers["kern.next_ecc_event"] = {{eccRecord(1, 0), 0}, {{}, 2}};
+  kernel.answers["kern.next_ecc_event"] = {{eccRecord(1, 0), 0}, {{}, 2}};
   storage.stackshot->buffer = fakes::Kcdata().thread(1, "VM_swapout", 77).bytes;
-  hub->channels = {{0x4142, typeWord(1, 0x100), "named", -7},
-                   {0x4143, typeWord(1, 0x0FF), "other category", 1},
-                   {0x4144, typeWord(2, 0x100), "other format", 1},
-                   {0x4145, typeWord(1, 0x300), nullptr, 8},
-                   {0x01, typeWord(1, 0x100), nullptr, 9}};
   const Lines calls = sweep();
   ASSERT_GT(calls.size(), 10u);
+  // The structured log comes before the figures. A text is skipped, and a fraction truncated.
   EXPECT_THAT(Lines(calls.begin(), calls.begin() + 4),
-              ElementsAre(std::string(kTotal) + "-1", std::string(kFree) + "-1",
-                          "FDLogStructuredData 176", "scalar vellum.NANDInfo.ExportVersion=1"));
-  // The string is passed over, the fraction cut off; a channel that has no name is left out.
-  EXPECT_THAT(Lines(calls.end() - 6, calls.end()),
+              ElementsAre(kTotal + "-1", kFree + "-1", "FDLogStructuredData 176",
+                          "scalar vellum.NANDInfo.ExportVersion=1"));
+  EXPECT_THAT(Lines(calls.end() - 4, calls.end()),
               ElementsAre("scalar vellum.NANDInfo.NodesTotal=0",
                           "scalar vellum.NANDInfo.Reclaim.TotalPurgeableBytes=5",
                           "scalar vellum.NANDInfo.VMFreezer.NumPhysicalWrites=77",
-                          "FDLogStructuredData 172", "scalar vellum.hwreport.named=-7",
-                          "scalar vellum.hwreport.AE=8"));
-  EXPECT_EQ(hub->interests, 3u);
+                          "FDLogStructuredData 172"));
   EXPECT_THAT(messages(), IsEmpty());
 }
 
 TEST_F(TelemetrySweepTest, WithoutStorageFigures) {
-  const std::string noDriver =
-      "error reading nand info, error 1 with message Unable to parse buffer";
   sweep();
-  EXPECT_THAT(messages(), ElementsAre(noDriver));
+  EXPECT_THAT(messages(), ElementsAre(kNoDriver));
   EXPECT_EQ(storage.platform.calls->size(), 2u);  // nothing of the freezer either
 
   serve({{53, {0}}});
@@ -217,50 +114,41 @@ TEST_F(TelemetrySweepTest, WithoutStorageFigures) {
   EXPECT_THAT(messages(), ElementsAre("error reading nand info, error 1 with message Unsupported "
                                       "export version"));
 
-  storage.platform.kernelValues->answers["kern.bootsessionuuid"] = {{{std::byte{'0'}}, 0}};
+  kernel.answers["kern.bootsessionuuid"] = {{{std::byte{'0'}}, 0}};
   storage.stackshot->buffer = fakes::Kcdata().thread(1, "VM_swapout", 77).bytes;
-  // The day is even: the driver's figures go out as events, the freezer's stays a scalar.
-  EXPECT_THAT(sweep(), ElementsAre(std::string(kTotal) + "-1", std::string(kFree) + "-1",
+  // The day is even: the driver's figures are sent as events, that of the freezer stays a scalar.
+  EXPECT_THAT(sweep(), ElementsAre(kTotal + "-1", kFree + "-1",
                                    "scalar vellum.NANDInfo.VMFreezer.NumPhysicalWrites=77"));
-  EXPECT_THAT(messages(), ElementsAre());
+  EXPECT_THAT(messages(), IsEmpty());
 }
 
-TEST_F(TelemetrySweepTest, EccEvents) {
+TEST_F(TelemetrySweepTest, EccEventsUntilAnError) {
+  const std::string unexpected = "Unexpected errno (5) reading ECC events from kernel";
   const struct {
     const char* name;
     std::vector<fakes::FakeKernelValues::Answer> answers;
-    std::size_t records, reads;
-    const char* message;  // null: none
+    std::size_t records;
+    std::ptrdiff_t reads;
+    Lines messages;
   } cases[] = {
-      {"busy", {{eccRecord(1, 1), 0}, {{}, 16}}, 1, 2, nullptr},
-      {"another error",
-       {{eccRecord(1, 1), 0}, {{}, 5}},
-       1,
-       2,
-       "Unexpected errno (5) reading ECC events from kernel"},
-      {"without end", {{eccRecord(1, 1), 0}}, 10, 11, nullptr},
+      {"busy", {{eccRecord(1, 1), 0}, {{}, 16}}, 1, 2, {kNoDriver}},
+      {"another error", {{eccRecord(1, 1), 0}, {{}, 5}}, 1, 2, {kNoDriver, unexpected}},
+      {"without end", {{eccRecord(1, 1), 0}}, 10, 11, {kNoDriver}},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
-    auto& kernel = *storage.platform.kernelValues;
     kernel.answers["kern.next_ecc_event"] = c.answers;
     kernel.reads.clear();
     storage.platform.crashReporting->records.clear();
     sweep();
     EXPECT_EQ(storage.platform.crashReporting->records.size(), c.records);
-    EXPECT_EQ(std::count(kernel.reads.begin(), kernel.reads.end(), "kern.next_ecc_event"),
-              static_cast<std::ptrdiff_t>(c.reads));
-    Lines expected{"error reading nand info, error 1 with message Unable to parse buffer"};
-    if (c.message != nullptr) expected.push_back(c.message);
-    EXPECT_EQ(messages(), expected);
+    EXPECT_EQ(std::ranges::count(kernel.reads, "kern.next_ecc_event"), c.reads);
+    EXPECT_EQ(messages(), c.messages);
   }
 }
 
 TEST_F(TelemetrySweepTest, EccRegistersStayInsideTheirRecord) {
-  const struct {
-    Bytes record;
-    std::string entries;
-  } cases[] = {
+  const std::pair<Bytes, std::string> cases[] = {
       {eccRecord(200, 0), "id=200 count=0 "},
       {eccRecord(1, 2), "id=1 count=2 reg0=0 reg1=-1 "},
       {eccRecord(1, 255),
@@ -268,8 +156,8 @@ TEST_F(TelemetrySweepTest, EccRegistersStayInsideTheirRecord) {
       {eccRecord(1, 3, 16), "id=1 count=3 reg0=0 "},
       {{}, "id=0 count=0 "},
   };
-  for (const auto& c : cases) {
-    storage.platform.kernelValues->answers["kern.next_ecc_event"] = {{c.record, 0}, {{}, 2}};
+  for (const auto& [record, expected] : cases) {
+    kernel.answers["kern.next_ecc_event"] = {{record, 0}, {{}, 2}};
     storage.platform.crashReporting->records.clear();
     sweep();
     ASSERT_EQ(storage.platform.crashReporting->records.size(), 1u);
@@ -277,19 +165,43 @@ TEST_F(TelemetrySweepTest, EccRegistersStayInsideTheirRecord) {
     for (const auto& [key, value] : *storage.platform.crashReporting->records[0].second) {
       entries.append(key->view()).append("=").append(kvText(value.get())).append(" ");
     }
-    EXPECT_EQ(entries, c.entries);
+    EXPECT_EQ(entries, expected);
   }
 }
 
-TEST_F(TelemetrySweepTest, ChannelsThatCannotBeRead) {
-  hub->channels = {{0x4142, typeWord(1, 0x100), "c", 7}};
-  for (const auto& [subscribe, sample] : {std::pair{1u, 0u}, std::pair{0u, 1u}}) {
-    hub->subscribeStatus = subscribe;
-    hub->sampleStatus = sample;
-    EXPECT_THAT(sweep(), ElementsAre(std::string(kTotal) + "-1", std::string(kFree) + "-1"));
+TEST_F(TelemetrySweepTest, ChannelsOfTheHub) {
+  const auto hub = std::make_shared<fakes::FakeRegistry>();
+  auto channels = KvArray::create();
+  const auto serveChannel = [&](std::uint64_t id, std::uint64_t format, std::uint64_t categories,
+                                const char* name, std::int64_t value) {
+    const std::uint64_t type = format | categories << 16 | 1ull << 32;
+    auto entry = KvArray::create({KvNumber::uint64(id), KvNumber::uint64(type)});
+    if (name != nullptr) entry->append(KvString::create(name));
+    channels->append(std::move(entry));
+    const auto word = static_cast<std::uint64_t>(value);
+    for (const std::uint64_t field : {std::uint64_t{500}, id, type, std::uint64_t{0}, word,
+                                      std::uint64_t{0}, std::uint64_t{0}, std::uint64_t{0}}) {
+      appendValue(hub->region, field);
+    }
+  };
+  serveChannel(0x4142, 1, 0x100, "named", -7);
+  serveChannel(0x4143, 1, 0x0FF, "other category", 1);
+  serveChannel(0x4144, 2, 0x100, "other format", 1);
+  serveChannel(0x4145, 1, 0x300, nullptr, 8);  // named by its id
+  serveChannel(0x01, 1, 0x100, nullptr, 9);    // which is not a name
+  hub->entries.push_back({.className = "HwReportHub", .name = "hub"});
+  hub->entries.push_back({.className = "Driver", .name = "driver", .id = 500});
+  hub->entries.back().properties = KvDictionary::create(
+      {{"HwReportLegendPublic", KvBoolean::of(true)},
+       {"HwReportLegend",
+        KvArray::create({KvDictionary::create({{"HwReportChannels", std::move(channels)}})})}});
+  EXPECT_THAT(sweep(hub),
+              ElementsAre(kTotal + "-1", kFree + "-1", "scalar vellum.hwreport.named=-7",
+                          "scalar vellum.hwreport.AE=8"));
+  for (const std::uint32_t selector : {2u, 3u}) {  // to subscribe, to sample
+    hub->callResults = {{selector, 1}};
+    EXPECT_THAT(sweep(hub), ElementsAre(kTotal + "-1", kFree + "-1"));
   }
-  hub->subscribeStatus = hub->sampleStatus = 0;
-  EXPECT_EQ(sweep().back(), "scalar vellum.hwreport.c=7");
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
-// The daily log: what is in it, in which order things happen, and what failures cost.
+// The daily log: what is in it, in which order things happen, and what happens on failures.
+#include "platform/known_preferences.h"
 #include "report/daily_report.h"
 
 #include <gmock/gmock.h>
@@ -172,34 +173,24 @@ TEST_F(ReportTest, TheConfigurationNumberIsForInternalDiagnosticsOnly) {
   };
   using namespace std::string_view_literals;
   const struct {
-    bool internal;
+    const char* subsystem;
     KvRef<KvObject> answer;
     const char* expected;
   } cases[] = {
-      {true, nullptr, "(null)"},
-      {true, data("R1\0rest"sv), "{\n    ConfigNumber = R1;\n}"},
-      {true, data("\xFF\0"sv), "(null)"},
+      {"vellum.sysmetra.tallyd.tallyrun", nullptr, "(null)"},
+      {"vellum.sysmetra.tallyd.tallyrun", data("R1\0rest"sv), "{\n    ConfigNumber = R1;\n}"},
+      {"vellum.sysmetra.tallyd.tallyrun", data("\xFF\0"sv), "(null)"},
+      {"another", data("R1\0"sv), "(null)"},
   };
   for (const auto& c : cases) {
-    fake.deviceInformation->internalSubsystems.clear();
-    if (c.internal) {
-      fake.deviceInformation->internalSubsystems.insert("vellum.sysmetra.tallyd.tallyrun");
-    }
+    fake.deviceInformation->internalSubsystems = {c.subsystem};
     fake.deviceInformation->answers["ConfigNumber"] = c.answer;
     writeLog();
     EXPECT_EQ(kvText(fake.logSubmission->logs.back().options.get()), c.expected);
   }
 }
 
-TEST_F(ReportTest, AFailedSubmissionIsSaidAndKeepsTheNotedVersion) {
-  admit({{"a", ""}});
-  fake.logSubmission->failWrite = true;
-  writeLog();
-  EXPECT_THAT(fake.log->texts(LogLevel::Error), ElementsAre("Failed to write tallyd log"));
-  EXPECT_TRUE(fake.preferences->SMAPreferencesGetValue("LastOSVersion", kProgramDomain));
-}
-
-TEST_F(ReportTest, ADocumentThatCannotBeEncodedChangesNoPreference) {
+TEST_F(ReportTest, ADocumentThatCannotBeEncodedOrSubmittedIsAnError) {
   admit({{"a", ""}});
   const auto cycle = KvArray::create();
   cycle->append(cycle);
@@ -207,140 +198,130 @@ TEST_F(ReportTest, ADocumentThatCannotBeEncodedChangesNoPreference) {
   writeLog();
   EXPECT_THAT(fake.log->texts(LogLevel::Error),
               ElementsAre(testing::StartsWith("Could not create tallyd plist: ")));
-  EXPECT_THAT(*fake.calls, IsEmpty());
+  EXPECT_THAT(*fake.calls, IsEmpty()) << "no preference changes";
   cycle->removeAt(0);
-}
-
-TEST_F(ReportTest, ApplicationsAreCountedOnlyForThoseWhoAsk) {
-  fake.appRegistry->bundleTypes = {"User", "System", "User"};
-  admit({{"a", ""}, {"vellum.dockyard.numThirdPartyApps", ""}});
+  fake.log->lines.clear();
+  fake.logSubmission->failWrite = true;
   writeLog();
-  EXPECT_EQ(scalar("vellum.dockyard.numThirdPartyApps"), "2");
-  EXPECT_EQ(scalar("vellum.dockyard.numAllInstalledApps"), "(null)");
-  admit({{"a", ""}});
-  writeLog();
-  EXPECT_EQ(fake.appRegistry->enumerations, 1);
-}
-
-TEST_F(ReportTest, TheStoresFileIsMeasuredInWholeMebibytes) {
-  constexpr std::string_view kKey = "vellum.sysmetra.tlyd.database.size";
-  admit({{"a", ""}, {kKey, ""}});
-  auto& sizes = fake.files->sizes;
-  constexpr const char* kPath = "/var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
-  writeLog();
-  EXPECT_EQ(scalar(kKey), "-1");
-  sizes[kPath] = 1048575;
-  writeLog();
-  EXPECT_EQ(scalar(kKey), "0");
-  sizes[kPath] = 1048576 * 3 + 5;
-  writeLog();
-  EXPECT_EQ(scalar(kKey), "3");
+  EXPECT_THAT(fake.log->texts(LogLevel::Error), ElementsAre("Failed to write tallyd log"));
+  EXPECT_TRUE(fake.preferences->SMAPreferencesGetValue("LastOSVersion", kProgramDomain));
 }
 
 TEST_F(ReportTest, TheCorruptionCountIsTakenAndReset) {
   constexpr std::string_view kKey = "vellum.sysmetra.tlyd.database.corruptions";
-  constexpr const char* kNoLibrary = "Failed to dynamically load the FaultDeskSupport framework";
-  constexpr const char* kNoRead = "Failed to dyanmically link SMAPreferencesGetIntegerValue";
-  constexpr const char* kNoWrite = "Failed to dynamically link SMAPreferencesSetValue";
+  constexpr const KnownPreference& kCount = knownPreference("DatabaseCorruptionCount");
   const struct {
-    bool present;
-    std::set<std::string> missing;
-    std::vector<std::string> errors;
-    const char* recorded;
-    const char* left;
+    bool isPresent;
+    const char *missing, *error, *recorded, *left;
   } cases[] = {
-      {true, {}, {}, "5", "0"},
-      {false, {}, {kNoLibrary}, "0", "5"},
-      {true, {"SMAPreferencesGetIntegerValue"}, {kNoRead}, "0", "5"},
-      {true, {"SMAPreferencesSetValue"}, {kNoWrite}, "0", "5"},
+      {true, "", "", "5", "0"},
+      {false, "", "Failed to dynamically load the FaultDeskSupport framework", "0", "5"},
+      {true, "SMAPreferencesGetIntegerValue",
+       "Failed to dyanmically link SMAPreferencesGetIntegerValue", "0", "5"},
+      {true, "SMAPreferencesSetValue", "Failed to dynamically link SMAPreferencesSetValue", "0",
+       "5"},
   };
   for (const auto& c : cases) {
     fake = fakes::makeFakePlatform();
     admit({{"a", ""}, {kKey, ""}});
-    fake.preferences->put("DatabaseCorruptionCount", KvNumber::int32(5), "vellum.tallyd");
-    fake.crashSupportLibrary->present = c.present;
-    fake.crashSupportLibrary->missingSymbols = c.missing;
+    fake.preferences->put(kCount.key, KvNumber::int32(5), kCount.domain);
+    fake.crashSupportLibrary->present = c.isPresent;
+    fake.crashSupportLibrary->missingSymbols = {c.missing};
     writeLog();
-    EXPECT_EQ(fake.log->texts(LogLevel::Error), c.errors);
+    const bool isSound = *c.error == '\0';
+    EXPECT_EQ(testing::PrintToString(fake.log->texts(LogLevel::Error)),
+              isSound ? "{}" : "{ \"" + std::string(c.error) + "\" }");
     EXPECT_EQ(scalar(kKey), c.recorded);
-    EXPECT_EQ(
-        kvText(fake.preferences->SMAPreferencesGetValue("DatabaseCorruptionCount", "vellum.tallyd")
-                   .get()),
-        c.left);
+    EXPECT_EQ(kvText(fake.preferences->get(kCount).get()), c.left);
     // A second report tries again only while something is missing.
     writeLog();
-    EXPECT_EQ(fake.crashSupportLibrary->opened.size(), c.errors.empty() ? 1u : 2u);
-    for (const std::string& call : *fake.calls) EXPECT_NE(call, "synchronize vellum.tallyd");
+    EXPECT_EQ(fake.crashSupportLibrary->opened.size(), isSound ? 1u : 2u);
+    EXPECT_THAT(*fake.calls, testing::Not(testing::Contains("synchronize vellum.tallyd")));
   }
 }
 
-TEST_F(ReportTest, UptimeIsWholeMinutes) {
-  constexpr std::string_view kKey = "vellum.usage.cur_boot_session_cpu_uptime";
-  admit({{"a", ""}, {kKey, ""}});
+TEST_F(ReportTest, WhatTheReportMeasuresItself) {
+  const std::string apps = "vellum.dockyard.numThirdPartyApps";
+  const std::string size = "vellum.sysmetra.tlyd.database.size";
+  const std::string uptime = "vellum.usage.cur_boot_session_cpu_uptime";
+  const std::string other = "vellum.memorystatus_freezer_error_other_count";
+  const std::string full = "vellum.memorystatus_freezer_skipped_full_count";
+  const auto bytes = [](std::uint64_t count) {
+    return [=](fakes::FakePlatform& given) { given.files->sizes[std::string(kStorePath)] = count; };
+  };
+  const auto ticks = [](std::uint64_t count, std::optional<Timebase> timebase) {
+    return [=](fakes::FakePlatform& given) {
+      given.kernelValues->ticks = count;
+      given.kernelValues->timebase = timebase;
+    };
+  };
+  const auto kernel = [](std::string name, auto value) {
+    return [=](fakes::FakePlatform& given) { given.kernelValues->put("kern." + name, value); };
+  };
+  const auto share = [](std::optional<std::uint64_t> count, std::optional<std::uint64_t> total) {
+    return [=](fakes::FakePlatform& given) {
+      auto& values = *given.kernelValues;
+      for (const char* name : {"error_other", "skipped_full"}) {
+        if (count) values.put(fmt::format("kern.memorystatus_freezer_{}_count", name), *count);
+      }
+      for (const char* name : {"process_considered", "below_threshold"}) {
+        if (total) values.put(fmt::format("kern.memorystatus_freezer_{}_count", name), *total);
+      }
+    };
+  };
   const struct {
-    std::uint64_t ticks;
-    std::optional<Timebase> timebase;
+    std::string key;
+    std::function<void(fakes::FakePlatform&)> device;
     const char* expected;
-    bool error;
   } cases[] = {
-      {119'000'000'000, Timebase{1, 1}, "1", false},
-      {24'000'000 * 600ULL, Timebase{125, 3}, "10", false},
-      {5, std::nullopt, "-1", true},
-      {UINT64_MAX, Timebase{UINT32_MAX, 1}, "1320469374930293248", false},
+      {apps,
+       [](auto& given) {
+         given.appRegistry->bundleTypes = {"User", "System", "User"};
+       },
+       "2"},
+      {"vellum.dockyard.numAllInstalledApps",
+       [](auto& given) {
+         given.appRegistry->bundleTypes = {"User", "System", "User"};
+       },
+       "3"},
+      {size, [](auto&) {}, "-1"},
+      {size, bytes(1048575), "0"},
+      {size, bytes(1048576 * 3 + 5), "3"},
+      {uptime, ticks(119'000'000'000, Timebase{1, 1}), "1"},
+      {uptime, ticks(24'000'000 * 600ULL, Timebase{125, 3}), "10"},
+      {uptime, ticks(UINT64_MAX, Timebase{UINT32_MAX, 1}), "1320469374930293248"},
+      {uptime, ticks(5, std::nullopt), "-1"},
+      {"vellum.kernel.memorystatus_freeze_count",
+       kernel("memorystatus_freeze_count", std::uint32_t{4000000000}), "4000000000"},
+      {"vellum.kernel.memorystatus_thaw_count", [](auto&) {}, "4294967295"},
+      {"vellum.kernel.memorystatus_freeze_pageouts", [](auto&) {}, "-1"},
+      {"vellum.kernel.swapusage",
+       [](auto& given) {
+         given.kernelValues->put("vm.swapusage", std::array<std::uint64_t, 4>{77, 1, 2, 3});
+       },
+       "77"},
+      {"vellum.memorystatus_freezer_thaw_percentage",
+       kernel("memorystatus_freezer_thaw_percentage", std::uint64_t{12}), "12"},
+      {other, share(2, 3), "66"},
+      {full, share(2, 8), "25"},
+      {full, share(2, 0), "(null)"},
+      {other, share({}, 3), "(null)"},
+      {other, share(3, {}), "(null)"},
+      {other, share(std::uint64_t{1} << 63, 3), "9223372036854775807"},
   };
   for (const auto& c : cases) {
-    fake.log->lines.clear();
-    fake.kernelValues->ticks = c.ticks;
-    fake.kernelValues->timebase = c.timebase;
+    fake = fakes::makeFakePlatform();
+    admit({{"a", ""}, {c.key, ""}});
+    c.device(fake);
     writeLog();
-    EXPECT_EQ(scalar(kKey), c.expected);
-    EXPECT_EQ(fake.log->has(LogLevel::Error, "Couldn't retrieve mach_timebase_info"), c.error);
+    EXPECT_EQ(scalar(c.key), c.expected) << c.key;
+    const bool isWithoutTimebase = c.key == uptime && !fake.kernelValues->timebase;
+    EXPECT_EQ(fake.log->has(LogLevel::Error, "Couldn't retrieve mach_timebase_info"),
+              isWithoutTimebase);
+    // What is not whitelisted is not read, but for the two denominators.
+    EXPECT_LE(fake.kernelValues->reads.size(), 3u);
+    EXPECT_EQ(fake.appRegistry->enumerations, c.key.starts_with("vellum.dockyard") ? 1 : 0);
   }
-}
-
-TEST_F(ReportTest, KernelCountersAndPercentages) {
-  constexpr std::string_view kOther = "vellum.memorystatus_freezer_error_other_count";
-  constexpr std::string_view kFull = "vellum.memorystatus_freezer_skipped_full_count";
-  admit({{"a", ""},
-         {"vellum.kernel.memorystatus_freeze_count", ""},
-         {"vellum.kernel.memorystatus_thaw_count", ""},
-         {"vellum.kernel.memorystatus_freeze_pageouts", ""},
-         {"vellum.kernel.swapusage", ""},
-         {"vellum.memorystatus_freezer_thaw_percentage", ""},
-         {kOther, ""},
-         {kFull, ""}});
-  {
-    auto& kernel = *fake.kernelValues;
-    kernel.put("kern.memorystatus_freeze_count", std::uint32_t{4000000000});
-    kernel.fail("kern.memorystatus_thaw_count", 2);
-    kernel.put("vm.swapusage", std::array<std::uint64_t, 4>{77, 1, 2, 3});
-    kernel.put("kern.memorystatus_freezer_thaw_percentage", std::uint64_t{12});
-    kernel.put("kern.memorystatus_freezer_process_considered_count", std::uint64_t{3});
-    kernel.put("kern.memorystatus_freezer_error_other_count", std::uint64_t{2});
-    kernel.put("kern.memorystatus_freezer_below_threshold_count", std::uint64_t{0});
-    kernel.put("kern.memorystatus_freezer_skipped_full_count", std::uint64_t{2});
-  }
-  writeLog();
-  EXPECT_EQ(scalar("vellum.kernel.memorystatus_freeze_count"), "4000000000");
-  EXPECT_EQ(scalar("vellum.kernel.memorystatus_thaw_count"), "4294967295");
-  EXPECT_EQ(scalar("vellum.kernel.memorystatus_freeze_pageouts"), "-1");
-  EXPECT_EQ(scalar("vellum.kernel.swapusage"), "77");
-  EXPECT_EQ(scalar("vellum.memorystatus_freezer_thaw_percentage"), "12");
-  EXPECT_EQ(scalar(kOther), "66");
-  EXPECT_EQ(scalar(kFull), "(null)") << "a share of nothing is not recorded";
-  // What is not whitelisted is not read, but for the two denominators.
-  const auto& reads = fake.kernelValues->reads;
-  EXPECT_EQ(reads.size(), 9u) << testing::PrintToString(reads);
-
-  fake.kernelValues->fail("kern.memorystatus_freezer_error_other_count", 5);
-  writeLog();
-  EXPECT_EQ(scalar(kOther), "(null)") << "its own counter could not be read";
-  fake.kernelValues->put("kern.memorystatus_freezer_error_other_count", std::uint64_t{1} << 63);
-  writeLog();
-  EXPECT_EQ(scalar(kOther), "9223372036854775807");
-  fake.kernelValues->fail("kern.memorystatus_freezer_process_considered_count", 2);
-  writeLog();
-  EXPECT_EQ(scalar(kOther), "(null)") << "the denominator could not be read";
 }
 
 }  // namespace

@@ -10,6 +10,7 @@
 #include "base/temporary_file.h"
 #include "host/spool/waiting_logs.h"
 #include "kv/plist_codec.h"
+#include "platform/known_preferences.h"
 
 namespace tally {
 namespace {
@@ -19,12 +20,6 @@ constexpr std::string_view kInfoSuffix = ".info.plist";
 constexpr std::size_t kLargestInfo = 1u << 20;
 // Space for the number, the longer suffix and a temporary file's mark in a file's name.
 constexpr std::size_t kLongestLogName = 180;
-
-std::uint64_t boundOr(std::uint64_t fallback, Preferences& preferences, std::string_view key) {
-  const auto value = preferences.SMAPreferencesGetValue(key, kProgramDomain);
-  const auto* number = kvCast<KvNumber>(value.get());
-  return number != nullptr && number->asInt64() > 0 ? number->asUInt64() : fallback;
-}
 
 // Counts what the writer writes against the bounds, before it reaches the disk.
 class SpoolFile final : public LogFile {
@@ -78,10 +73,8 @@ void sweepLeftOvers(const Directory& folder) {
 }  // namespace
 
 FolderBounds folderBounds(Preferences& preferences) {
-  FolderBounds bounds;
-  bounds.maximumLogs = boundOr(bounds.maximumLogs, preferences, "SpoolMaximumLogs");
-  bounds.maximumBytes = boundOr(bounds.maximumBytes, preferences, "SpoolMaximumBytes");
-  return bounds;
+  return {static_cast<std::uint64_t>(preferences.getInteger(kMaximumLogs)),
+          static_cast<std::uint64_t>(preferences.getInteger(kMaximumBytes))};
 }
 
 bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,

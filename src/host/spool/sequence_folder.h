@@ -8,13 +8,17 @@
 #include <vector>
 
 #include "base/device_root.h"
+#include "platform/known_preferences.h"
 #include "platform/system_log.h"
 
 namespace tally {
 
+// What a folder may have; by default what applies without preferences.
+inline constexpr const KnownPreference& kMaximumLogs = knownPreference("SpoolMaximumLogs");
+inline constexpr const KnownPreference& kMaximumBytes = knownPreference("SpoolMaximumBytes");
 struct FolderBounds {
-  std::uint64_t maximumLogs = 500;
-  std::uint64_t maximumBytes = 50u << 20;
+  std::uint64_t maximumLogs = static_cast<std::uint64_t>(kMaximumLogs.bound.fallback);
+  std::uint64_t maximumBytes = static_cast<std::uint64_t>(kMaximumBytes.bound.fallback);
 };
 
 // Space that logs leave free on their volume.

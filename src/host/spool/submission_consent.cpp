@@ -3,16 +3,15 @@
 #include <fmt/core.h>
 
 #include "host/spool/waiting_logs.h"
+#include "platform/known_preferences.h"
 
 namespace tally {
 namespace {
 
-constexpr std::string_view kSwitch = "DiagnosticSubmissionEnabled";
-constexpr std::string_view kSwitchDomain = "vellum.tallyd";
-constexpr std::string_view kWithdrawn = "WithdrawnLogs";
+constexpr const KnownPreference& kSwitch = knownPreference("DiagnosticSubmissionEnabled");
 
 bool holds(Preferences& preferences) {
-  const auto value = preferences.SMAPreferencesGetValue(kWithdrawn, kProgramDomain);
+  const auto value = preferences.get(knownPreference("WithdrawnLogs"));
   const auto* const text = kvCast<KvString>(value.get());
   return text != nullptr && text->view() == "hold";
 }
@@ -25,10 +24,10 @@ SubmissionConsent::Wish SubmissionConsent::wish() const {
     return described->value() ? Wish::Allowed : Wish::Forbidden;
   }
   bool isSwitch = false;
-  const bool enabled = preferences_->SMAPreferencesGetBoolValue(kSwitch, kSwitchDomain, &isSwitch);
+  const bool enabled =
+      preferences_->SMAPreferencesGetBoolValue(kSwitch.key, kSwitch.domain, &isSwitch);
   if (isSwitch) return enabled ? Wish::Allowed : Wish::Forbidden;
-  const bool isAbsent = !preferences_->SMAPreferencesGetValue(kSwitch, kSwitchDomain) &&
-                        preferences_->isReadable(kSwitchDomain);
+  const bool isAbsent = !preferences_->get(kSwitch) && preferences_->isReadable(kSwitch.domain);
   return isAbsent ? Wish::Allowed : Wish::Unknown;
 }
 

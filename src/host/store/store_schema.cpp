@@ -10,6 +10,7 @@
 #include <iterator>
 
 #include "base/utf8.h"
+#include "platform/metrics_store.h"
 
 namespace tally {
 namespace {
@@ -145,7 +146,9 @@ Status makeTables(Database& database) {
 }  // namespace
 
 StoreFile metricsStoreFile(const DeviceRoot& root) {
-  return {DeviceDirectory(root, "/var/mobile/Library/Tallybook"), "TBDataStore.sqlitedb"};
+  constexpr std::size_t kNameStart = kStorePath.rfind('/') + 1;
+  return {DeviceDirectory(root, std::string(kStorePath.substr(0, kNameStart - 1))),
+          std::string(kStorePath.substr(kNameStart))};
 }
 
 bool isStoreKey(std::string_view key) {

@@ -9,12 +9,14 @@
 #include <cstring>
 #include <thread>
 
+#include "base/time_text.h"
+
 namespace tally {
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-constexpr double kLongestSlice = 86400.0 * 365;
+constexpr double kLongestSlice = 365.0 * kSecondsPerDay;
 
 int requestStop(sd_event_source*, const signalfd_siginfo*, void* stopRequested) {
   *static_cast<bool*>(stopRequested) = true;

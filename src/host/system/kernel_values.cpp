@@ -10,29 +10,19 @@
 #include "base/file.h"
 #include "base/number_text.h"
 #include "base/text_lines.h"
+#include "platform/measured_metrics.h"
 
 namespace tally {
 namespace {
 
 constexpr std::size_t kLargestProcFile = 1u << 20;
 
-// Values whose width is not that of a 64-bit counter.
-struct Width {
-  std::string_view name;
-  std::size_t bytes;
-};
-constexpr Width kWidths[] = {
-    {"kern.memorystatus_freeze_count", 4},
-    {"kern.memorystatus_thaw_count", 4},
-    {"vm.swapusage", sizeof(SwapUsage)},
-};
-constexpr std::size_t kCounterWidth = 8;
-
-std::size_t widthOf(std::string_view name) {
-  const auto* found = std::find_if(std::begin(kWidths), std::end(kWidths),
-                                   [name](const Width& width) { return width.name == name; });
-  return found == std::end(kWidths) ? kCounterWidth : found->bytes;
+constexpr std::size_t widthOf(std::string_view name) {
+  constexpr std::size_t kCounterWidth = 8;
+  const auto* const known = std::ranges::find(kMeasuredMetrics, name, &MeasuredMetric::kernelValue);
+  return known == std::end(kMeasuredMetrics) ? kCounterWidth : known->width;
 }
+static_assert(widthOf("vm.swapusage") == sizeof(SwapUsage));
 
 template <class T>
 std::vector<std::byte> bytesOf(const T& value) {

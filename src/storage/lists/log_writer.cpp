@@ -7,13 +7,14 @@
 #include <string>
 
 #include "base/time_text.h"
+#include "platform/known_preferences.h"
 #include "platform/platform.h"
 #include "storage/storage_log.h"
 
 namespace tally {
 namespace {
 
-constexpr std::string_view kLastLoggedKey = "SSLastLoggedAt";
+constexpr const KnownPreference& kLastLogged = knownPreference("SSLastLoggedAt");
 constexpr std::string_view kLogName = "StorageStatus";
 
 // Too early also when the clock was set back, so that there is no second log.
@@ -80,15 +81,14 @@ void writeLog(std::string_view logTypeCode, const KvDictionary* values) {
   platform().logSubmission->SMAWriteLogForSubmission(logTypeCode, kLogName, nullptr, nullptr,
                                                      [&text](LogFile& file) { file.write(text); });
   // Also after a failure: a device that cannot submit must not try every day.
-  platform().preferences->SMAPreferencesSetValue(kLastLoggedKey, KvDate::create(now),
-                                                 kProgramDomain);
-  platform().preferences->SMAPreferencesSynchronize(kProgramDomain);
+  platform().preferences->set(kLastLogged, KvDate::create(now));
+  platform().preferences->SMAPreferencesSynchronize(kLastLogged.domain);
 }
 
 }  // namespace
 
 std::optional<double> lastStorageLog() {
-  const auto value = platform().preferences->SMAPreferencesGetValue(kLastLoggedKey, kProgramDomain);
+  const auto value = platform().preferences->get(kLastLogged);
   const auto* const date = kvCast<KvDate>(value.get());
   if (date == nullptr) return std::nullopt;
   return date->secondsSince1970();

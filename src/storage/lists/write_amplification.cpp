@@ -2,6 +2,7 @@
 
 #include <cstdint>
 
+#include "platform/known_preferences.h"
 #include "platform/platform.h"
 #include "storage/controller/statistics_fetch.h"
 
@@ -9,7 +10,6 @@ namespace tally {
 namespace {
 
 constexpr unsigned kHostUnitShift = 12;  // the host's writes are counted in units of 4 KiB
-constexpr double kUsualThreshold = 2.0, kThresholdLimit = 10.0;
 
 float ratio(std::uint64_t written, std::uint64_t hostWrites) {
   if (hostWrites == 0) return 0;
@@ -45,11 +45,7 @@ WriteAmplification measureWriteAmplification() {
 }
 
 double writeAmplificationThreshold() {
-  const auto preference =
-      platform().preferences->SMAPreferencesGetValue("userWAmp", "vellum.NANDInfo");
-  const auto* const number = kvCast<KvNumber>(preference.get());
-  const double threshold = number != nullptr && number->isReal() ? number->asDouble() : 0;
-  return threshold > 0 && threshold < kThresholdLimit ? threshold : kUsualThreshold;
+  return platform().preferences->getReal(knownPreference("userWAmp"));
 }
 
 }  // namespace tally

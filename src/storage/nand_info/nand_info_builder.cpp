@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "base/time_text.h"
+#include "platform/known_preferences.h"
 #include "platform/platform.h"
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
@@ -70,8 +71,9 @@ void addFields(KvDictionary& info, const SPXParseContext& context, const Keys& k
 
 bool isDemoMode() {
   bool exists = false;
-  const bool demo = platform().preferences->SMAPreferencesGetBoolValue(
-      "StoreDemoMode", "vellum.demo-settings", &exists);
+  constexpr const KnownPreference& kDemo = knownPreference("StoreDemoMode");
+  const bool demo =
+      platform().preferences->SMAPreferencesGetBoolValue(kDemo.key, kDemo.domain, &exists);
   return exists && demo;
 }
 

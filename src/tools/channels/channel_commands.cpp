@@ -14,6 +14,7 @@
 #include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
 
+#include "base/time_text.h"
 #include "hwreport/hwreport.h"
 #include "platform/protocol/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
@@ -26,7 +27,7 @@ namespace {
 using std::chrono::steady_clock;
 using Seconds = std::chrono::duration<double>;
 
-constexpr double kLongestWait = 86400;
+constexpr double kLongestWait = kSecondsPerDay;
 
 struct ChannelArguments {
   std::string driver, group, subgroup, format, unit;

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/file.h"
+#include "driver/app_info_listener.h"
 #include "kv/plist_codec.h"
 #include "tools/frame/standard_input.h"
 
@@ -63,29 +64,44 @@ KvRef<KvArray> arrayOfJson(std::string_view document) {
   return list;
 }
 
+// The value of a field as a message carries it.
+Result<KvRef<KvObject>> fieldOf(const KvDictionary& fields, std::string_view key,
+                                ApplicationFieldKind kind) {
+  switch (kind) {
+    case ApplicationFieldKind::Text:
+      if (auto* const text = fields.getAs<KvString>(key)) return KvRef<KvObject>::share(text);
+      return Error{fmt::format("no text \"{}\"", key)};
+    case ApplicationFieldKind::Number: {
+      const auto* const number = fields.getAs<KvNumber>(key);
+      if (number == nullptr || number->isReal()) {
+        return Error{fmt::format("no integer \"{}\"", key)};
+      }
+      if (number->isUnsigned() && number->asInt64() < 0) {
+        return Error{fmt::format("\"{}\" does not fit in a signed 64-bit integer", key)};
+      }
+      return KvRef<KvObject>(KvNumber::int64(number->asInt64()));
+    }
+    case ApplicationFieldKind::Uuid:
+      break;
+  }
+  const auto text = fields.getString(key);
+  auto uuid = text ? uuidOf(*text) : KvRef<KvObject>::share(fields.getAs<KvData>(key));
+  const auto* const bytes = kvCast<KvData>(uuid.get());
+  if (bytes == nullptr || bytes->bytes().size() != kUuidBytes) {
+    return Error{fmt::format("no \"{}\" of {} bytes", key, kUuidBytes)};
+  }
+  return uuid;
+}
+
 Result<KvRef<KvDictionary>> makeElement(const KvObject* value) {
   const auto* const fields = kvCast<KvDictionary>(value);
   if (fields == nullptr) return Error{"not an object"};
   auto element = KvDictionary::create();
-  for (const char* key : {"bundle_id", "version"}) {
-    auto* const text = fields->getAs<KvString>(key);
-    if (text == nullptr) return Error{fmt::format("no text \"{}\"", key)};
-    element->set(key, KvRef<KvString>::share(text));
+  for (const auto& [key, logged, kind] : kApplicationFields) {
+    auto field = fieldOf(*fields, key, kind);
+    if (!field) return field.error();
+    element->set(key, *std::move(field));
   }
-  for (const char* key : {"adam_id", "arch"}) {
-    const auto* const number = fields->getAs<KvNumber>(key);
-    if (number == nullptr || number->isReal()) return Error{fmt::format("no integer \"{}\"", key)};
-    if (number->isUnsigned() && number->asInt64() < 0) {
-      return Error{fmt::format("\"{}\" does not fit in a signed 64-bit integer", key)};
-    }
-    element->set(key, KvNumber::int64(number->asInt64()));
-  }
-  auto* const data = fields->getAs<KvData>("uuid");
-  const auto text = fields->getString("uuid");
-  auto uuid = text ? uuidOf(*text) : KvRef<KvObject>::share(data);
-  const auto* const bytes = kvCast<KvData>(uuid.get());
-  if (bytes == nullptr || bytes->bytes().size() != 16) return Error{"no \"uuid\" of 16 bytes"};
-  element->set("uuid", std::move(uuid));
   return element;
 }
 

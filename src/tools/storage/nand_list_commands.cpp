@@ -8,6 +8,7 @@
 
 #include "base/number_text.h"
 #include "base/time_text.h"
+#include "platform/known_preferences.h"
 #include "storage/lists/defects_list.h"
 #include "storage/lists/log_writer.h"
 #include "storage/lists/storage_lists.h"
@@ -171,7 +172,7 @@ LogPreview previewStorageLog(const Platform& platform, std::FILE* notices) {
   preview.due = !preview.last ||
                 !(platform.clock->secondsSince1970() - *preview.last < kSecondsBetweenStorageLogs);
   Platform variant = preview.run.variantOf(platform);
-  variant.preferences->SMAPreferencesSetValue("SSLastLoggedAt", nullptr, kProgramDomain);
+  variant.preferences->set(knownPreference("SSLastLoggedAt"), nullptr);
   const PlatformScope scope(std::move(variant));
   const std::uint8_t force = std::exchange(gForceCollectionSet, std::uint8_t{1});
   preview.complete = dumpStorageLists(false, notices);

@@ -14,11 +14,6 @@
 namespace tally::tools {
 namespace {
 
-// What the program remembers of days and systems that it has seen. The record of the tasking in
-// force is not among it: without it, its preferences could never be taken back.
-constexpr std::string_view kHistoryKeys[] = {kLastProcessedDay.key, "LastOSVersion", "LastOSUpdate",
-                                             "SSLastLoggedAt"};
-
 struct ForgetArguments {
   bool yes = false;
 };
@@ -48,8 +43,8 @@ Status eraseStore(const DeviceRoot& root) {
 }
 
 Status eraseHistory(Preferences& preferences) {
-  for (const std::string_view key : kHistoryKeys) {
-    preferences.SMAPreferencesSetValue(key, nullptr, kProgramDomain);
+  for (const KnownPreference& known : kKnownPreferences) {
+    if (known.isHistory) preferences.set(known, nullptr);
   }
   if (preferences.SMAPreferencesSynchronize(kProgramDomain)) return Done{};
   return Error{"the preferences could not be written"};

@@ -75,8 +75,8 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
   const double now = context.platform->clock->secondsSince1970();
   const std::int32_t today = dayOfSeconds(now);
   const std::int32_t day = arguments.day.value_or(today);
-  const std::uint32_t offset =
-      arguments.offset.value_or(static_cast<std::uint32_t>(now - kSecondsPerDay * today));
+  const std::uint32_t offset = arguments.offset.value_or(
+      static_cast<std::uint32_t>(now - static_cast<double>(today) * kSecondsPerDay));
   const std::vector<std::uint32_t> offsets(values.size(), offset);
   const Status pushed = writeStore(context, [&](StoreWriter& writer) {
     return writer.pushSamples(day, arguments.key, values, offsets);

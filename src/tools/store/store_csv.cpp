@@ -3,13 +3,13 @@
 #include <limits>
 
 #include "base/number_text.h"
+#include "base/time_text.h"
 #include "host/store/store_schema.h"
 
 namespace tally::tools {
 namespace {
 
 constexpr std::string_view kByteOrderMark = "\xef\xbb\xbf";
-constexpr std::int64_t kSecondsOfDay = 86400;
 
 }  // namespace
 
@@ -68,7 +68,7 @@ std::string_view StoreCsvParser::parse(std::string_view record, StoreRow& row) {
     row.scalar = *number;
   } else {
     const auto seconds = parseInt64(offset);
-    if (!seconds || *seconds < 0 || *seconds >= kSecondsOfDay) {
+    if (!seconds || *seconds < 0 || *seconds >= kSecondsPerDay) {
       return "the offset is not a second of the day (0 to 86399)";
     }
     const auto number = parseDouble(value);

@@ -101,8 +101,7 @@ std::string taskingLine(const KvObject* id, const KvObject* digest, const KvObje
 
 int show(const ToolContext& context, const TaskingArguments&) {
   const TaskingInputs inputs = readTaskingInputs(*context.platform);
-  const auto digest =
-      context.platform->preferences->SMAPreferencesGetValue("TaskingDigest", kProgramDomain);
+  const auto digest = context.platform->preferences->get(knownPreference("TaskingDigest"));
   const auto* const schedule = kvCast<KvDictionary>(inputs.schedule.get());
   const auto scheduled = [schedule](const char* key) {
     return schedule != nullptr ? schedule->get(key) : nullptr;

@@ -1,12 +1,14 @@
 #include "tools/whitelist/whitelist_check.h"
 
+#include <fmt/format.h>
 #include <algorithm>
 #include <cmath>
 #include <map>
 
 #include "config/internal_device.h"
-#include "config/scalar_options.h"
+#include "config/whitelist_options.h"
 #include "host/store/store_schema.h"
+#include "platform/known_preferences.h"
 #include "platform/platform.h"
 #include "tools/frame/spelling.h"
 #include "tools/whitelist/whitelist_verdict.h"
@@ -14,16 +16,10 @@
 namespace tally::tools {
 namespace {
 
-constexpr std::string_view kOptionNames[] = {kOptionSignificantFigures, kOptionBucketInterval,
-                                             kOptionIntervals};
-// No signed 64-bit integer has more digits.
-constexpr std::uint32_t kMostDigits = 19;
-
-// Whether options make a difference to some value.
-bool doSomething(const KvDictionary& options) {
-  return unsignedOption(options, kOptionBucketInterval).value_or(0) > 1 ||
-         unsignedOption(options, kOptionSignificantFigures).value_or(kMostDigits) < kMostDigits ||
-         options.contains(kOptionIntervals);
+std::vector<std::string_view> optionNames() {
+  std::vector<std::string_view> names;
+  for (const WhitelistOption& option : whitelistOptions()) names.push_back(option.name);
+  return names;
 }
 
 class Checker final : public WhitelistVisitor {
@@ -55,7 +51,7 @@ class Checker final : public WhitelistVisitor {
     malformedOfGroup_ = true;
     if (place.option) {
       add(Severity::Fault, place,
-          *place.option == kOptionIntervals
+          whitelistOption(*place.option)->value == OptionValue::Numbers
               ? "not an array of numbers; the option is left out"
               : "not a whole number from 0 to 4294967295; the option is left out");
     } else if (place.key) {
@@ -140,13 +136,15 @@ class Checker final : public WhitelistVisitor {
     const bool scalar = isScalarSection(section);
     for (const auto& option : options) {
       place.option = option.key->view();
-      if (std::ranges::find(kOptionNames, *place.option) == std::end(kOptionNames)) {
-        const auto meant = nearestWord(*place.option, kOptionNames);
+      const WhitelistOption* const known = whitelistOption(*place.option);
+      if (known == nullptr) {
+        const auto names = optionNames();
+        const auto meant = nearestWord(*place.option, names);
         add(meant ? Severity::Fault : Severity::Surprise, place,
             meant ? fmt::format("no option has this name and it does nothing; {} may be meant",
                                 *meant)
                   : "no option has this name; it does nothing");
-      } else if (scalar != (*place.option != kOptionIntervals)) {
+      } else if (scalar != known->effect.isForScalars()) {
         add(Severity::Surprise, place,
             scalar ? "scalars have no histogram; the option does nothing"
                    : "distributions are not rounded; the option does nothing");
@@ -158,26 +156,23 @@ class Checker final : public WhitelistVisitor {
   }
 
   void checkRounding(WhitelistPlace place, const KvDictionary& options) {
-    const auto interval = unsignedOption(options, kOptionBucketInterval);
-    const auto figures = unsignedOption(options, kOptionSignificantFigures);
-    place.option = kOptionBucketInterval;
-    if (interval == 0u) {
-      add(Severity::Fault, place, "a step of 0 rounds nothing; values leave as they are");
-    } else if (interval == 1u) {
-      add(Severity::Surprise, place, "a step of 1 rounds nothing");
+    std::vector<std::string_view> steps;
+    for (const WhitelistOption& option : whitelistOptions()) {
+      if (!option.effect.isForScalars()) continue;
+      const auto setting = unsignedOption(options, option.name);
+      if (!setting) continue;
+      steps.push_back(option.name);
+      place.option = option.name;
+      if (const auto remark = option.effect.rounding().remark(*setting)) {
+        add(remark->isFault ? Severity::Fault : Severity::Surprise, place,
+            std::string(remark->text));
+      }
     }
-    place.option = kOptionSignificantFigures;
-    if (figures == 0u) {
-      add(Severity::Surprise, place,
-          "no figure is kept: every value becomes 0, 1 or a power of ten");
-    } else if (figures && *figures >= kMostDigits) {
-      add(Severity::Surprise, place,
-          fmt::format("no value has more than {} digits, so nothing is rounded", kMostDigits));
-    }
-    if (interval && figures) {
+    if (steps.size() > 1) {
       place.option.reset();
       add(Severity::Surprise, place,
-          "has both bucket_interval and sig_fig: it is rounded twice, to the interval first");
+          fmt::format("has both {}: it is rounded twice, to the interval first",
+                      fmt::join(steps, " and ")));
     }
   }
 
@@ -237,7 +232,7 @@ class Checker final : public WhitelistVisitor {
         add(Severity::Surprise, place,
             fmt::format("says the same as the prefix {} of the group {}", around->key->view(),
                         around->group->view()));
-      } else if (entry.options->empty() && doSomething(*around->options)) {
+      } else if (entry.options->empty() && haveEffect(*around->options)) {
         add(Severity::Surprise, place,
             fmt::format("reported without options, though the prefix {} around it has {}",
                         around->key->view(), optionsText(*around->options)));

@@ -1,4 +1,4 @@
-// Rounding, bucketing and summarising, at their borders.
+// Bucketing and summarising, at their limits.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -7,52 +7,11 @@
 
 #include "report/distribution_summary.h"
 #include "report/histogram.h"
-#include "report/scalar_rounding.h"
 
 namespace tally {
 namespace {
 
-constexpr std::int64_t kMaximum = std::numeric_limits<std::int64_t>::max();
-constexpr std::int64_t kMinimum = std::numeric_limits<std::int64_t>::min();
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
-
-TEST(ScalarRounding, Table) {
-  constexpr std::int64_t kAbsent = -1;
-  const struct {
-    std::int64_t value, bucketInterval, significantFigures, expected;
-  } cases[] = {
-      {123456, kAbsent, 2, 120000},
-      {-1550, kAbsent, 2, -1600},
-      {95, kAbsent, 1, 100},
-      {1, kAbsent, 0, 1},
-      {100, kAbsent, 1, 100},
-      {105, kAbsent, 2, 110},
-      {123, kAbsent, 4294967295, 123},
-      {14, 10, kAbsent, 10},
-      {15, 10, kAbsent, 20},
-      {-15, 10, kAbsent, -10},
-      {7, 0, kAbsent, 7},
-      {5, 3, kAbsent, 6},
-      {123, 10, 2, 120},
-      // The ends of the range saturate instead of wrapping.
-      {kMaximum, 10, kAbsent, 9223372036854775800},
-      {kMinimum, 10, kAbsent, -9223372036854775800},
-      {kMinimum, 4294967295, kAbsent, -9223372034707292160},
-      {kMaximum, kAbsent, 0, kMaximum},
-      {kMinimum, kAbsent, 1, -9000000000000000000},
-  };
-  for (const auto& c : cases) {
-    auto options = KvDictionary::create();
-    if (c.bucketInterval != kAbsent) {
-      options->set("bucket_interval", KvNumber::int64(c.bucketInterval));
-    }
-    if (c.significantFigures != kAbsent) {
-      options->set("sig_fig", KvNumber::int64(c.significantFigures));
-    }
-    EXPECT_EQ(roundScalar(c.value, *options), c.expected)
-        << c.value << " bucket " << c.bucketInterval << " figures " << c.significantFigures;
-  }
-}
 
 KvRef<KvArray> boundaries(const std::vector<double>& values) {
   auto array = KvArray::create();

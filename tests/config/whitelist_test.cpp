@@ -1,4 +1,4 @@
-// The whitelist: what is admitted, by which entry, and what a damaged file costs.
+// The whitelist: what is admitted, by which entry, and what a damaged file still admits.
 #include "config/whitelist.h"
 
 #include <gmock/gmock.h>
@@ -27,13 +27,13 @@ std::string section(std::string_view name, std::string_view keys) {
   return "<key>" + std::string(name) + "</key><dict>" + std::string(keys) + "</dict>";
 }
 
-// A key whose options carry a figure by which a test can tell which entry answered.
+// A key whose options have a figure, which identifies the entry that answered.
 std::string entry(std::string_view key, int figure) {
   return "<key>" + std::string(key) + "</key><dict><key>sig_fig</key><integer>" +
          std::to_string(figure) + "</integer></dict>";
 }
 
-class ConfigTest : public testing::Test {
+class WhitelistTest : public testing::Test {
  protected:
   // The whitelist keeps the log alone, so the platform may go.
   std::unique_ptr<Whitelist> load() {
@@ -51,7 +51,7 @@ class ConfigTest : public testing::Test {
   fakes::FakePlatform fake = fakes::makeFakePlatform();
 };
 
-TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
+TEST_F(WhitelistTest, TheMostSpecificEntryAnswers) {
   const auto config = load(
       group("A", section("ScalarKeys", entry("net.wifi.rx", 1) + "<key>net.bare</key><dict/>") +
                      section("ScalarKeyPrefixes", entry("net.", 2) + entry("net.wifi.", 3))) +
@@ -83,14 +83,14 @@ TEST_F(ConfigTest, TheMostSpecificEntryAnswers) {
   EXPECT_TRUE(fake.log->has(LogLevel::Debug, "prefix match net.wifi. for net.wifi.tx"));
 }
 
-TEST_F(ConfigTest, TheLastGroupOfTheFileWins) {
+TEST_F(WhitelistTest, TheLastGroupOfTheFileWins) {
   const auto config = load(group("Z", section("ScalarKeys", entry("k", 1))) +
                            group("A", section("ScalarKeys", entry("k", 2))));
   EXPECT_EQ(figureOf(config->scalarOptions("k")), "2");
   EXPECT_EQ(config->matchScalarKey("k").entry->group->view(), "A");
 }
 
-TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
+TEST_F(WhitelistTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
   const std::string groups = group("InternalTesting", section("ScalarKeys", entry("internal", 1))) +
                              group("Radio", section("ScalarKeys", entry("radio", 2)));
   const struct {
@@ -106,7 +106,7 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
       {"production", false, nullptr, "-", "2", "-", false},
       {"switched off", false, KvBoolean::of(false), "-", "-", "-", true},
       {"switched off by a number", false, KvNumber::int32(0), "-", "-", "-", true},
-      {"a switch that is no boolean", false, KvString::create("no"), "-", "2", "-", false},
+      {"a switch that is not a boolean", false, KvString::create("no"), "-", "2", "-", false},
       {"switches that cannot be read", false, nullptr, "-", "-", "-", false, true},
       {"internal", true, nullptr, "1", "2", "(null)", false},
       {"internal, switched off", true, KvBoolean::of(false), "1", "2", "(null)", false},
@@ -129,7 +129,7 @@ TEST_F(ConfigTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {
   }
 }
 
-TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
+TEST_F(WhitelistTest, AMalformedPartIsSkippedAlone) {
   const auto config = load(
       "<key>NoDictionary</key><array/>" +
       group("G", "<key>ScalarKeys</key><string>x</string><key>Comment</key><string>y</string>" +
@@ -158,7 +158,7 @@ TEST_F(ConfigTest, AMalformedPieceCostsOnlyItself) {
           "whitelist: group G, DistributionKeys, key odd: malformed option sig_fig skipped"));
 }
 
-TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {
+TEST_F(WhitelistTest, WhatCannotBeLoadedAdmitsNothing) {
   EXPECT_EQ(load(), nullptr);
   EXPECT_THAT(fake.log->texts(LogLevel::Error), ElementsAre("Couldn't load whitelist"));
   for (const std::string& text : {plist("<array/>"), std::string("garbage"), std::string()}) {
@@ -172,13 +172,54 @@ TEST_F(ConfigTest, WhatCannotBeLoadedAdmitsNothing) {
   }
 }
 
-TEST_F(ConfigTest, TheDigestIsOfTheBytesAsRead) {
+TEST_F(WhitelistTest, TheDigestIsOfTheBytesAsRead) {
   fake.files->contents[std::string(kWhitelistPath)] = "<plist version=\"1.0\"><dict/></plist>";
   const auto config = load();
   ASSERT_TRUE(config);
   EXPECT_EQ(config->fileDigest(), "be5a5e8f37d7f11fc2c74e4372ebb8f0");
   EXPECT_EQ(config->scalarOptions("k"), nullptr);
   EXPECT_THAT(fake.log->lines, IsEmpty());
+}
+
+TEST(WhitelistOptions, RoundingOfScalars) {
+  constexpr std::int64_t kMaximum = INT64_MAX, kMinimum = INT64_MIN;
+  const struct {
+    std::int64_t value;
+    std::optional<std::int64_t> interval, figures;
+    std::int64_t expected;
+    bool haveEffect = true;
+  } cases[] = {
+      {123456, {}, 2, 120000},
+      {-1550, {}, 2, -1600},
+      {95, {}, 1, 100},
+      {1, {}, 0, 1},
+      {100, {}, 1, 100},
+      {105, {}, 2, 110},
+      {123, {}, 4294967295, 123, false},
+      {123, {}, 18, 123},
+      {123, {}, 19, 123, false},
+      {14, 10, {}, 10},
+      {15, 10, {}, 20},
+      {-15, 10, {}, -10},
+      {7, 0, {}, 7, false},
+      {7, 1, {}, 7, false},
+      {5, 3, {}, 6},
+      {123, 10, 2, 120},
+      {7, {}, {}, 7, false},
+      // The ends of the range saturate instead of wrapping.
+      {kMaximum, 10, {}, 9223372036854775800},
+      {kMinimum, 10, {}, -9223372036854775800},
+      {kMinimum, 4294967295, {}, -9223372034707292160},
+      {kMaximum, {}, 0, kMaximum},
+      {kMinimum, {}, 1, -9000000000000000000},
+  };
+  for (const auto& c : cases) {
+    auto options = KvDictionary::create();
+    if (c.interval) options->set("bucket_interval", KvNumber::int64(*c.interval));
+    if (c.figures) options->set("sig_fig", KvNumber::int64(*c.figures));
+    EXPECT_EQ(roundScalar(c.value, *options), c.expected) << c.value << kvText(options.get());
+    EXPECT_EQ(haveEffect(*options), c.haveEffect) << kvText(options.get());
+  }
 }
 
 }  // namespace

@@ -1,0 +1,86 @@
+// The options of whitelisted keys: one table says of each what it may be, which keys it is for, and
+// what it does. Checks, documents and the report itself read it.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string_view>
+#include <vector>
+
+#include "kv/value.h"
+
+namespace tally {
+
+// Options of one whitelisted key; an empty dictionary reports the key unchanged.
+using ScalarOptions = KvDictionary;
+
+constexpr std::string_view kOptionIntervals = "intervals";
+
+enum class OptionValue {
+  WholeNumber,  // not negative, of 32 bits; a real without fraction counts
+  Numbers,      // an array of numbers
+};
+
+// What a setting of a rounding option does that its author probably did not intend.
+struct SettingRemark {
+  bool isFault;
+  bool isIdle;  // nothing is rounded
+  std::string_view text;
+};
+
+// A step of the rounding of scalars. The remark is empty for an ordinary setting.
+struct ScalarRounding {
+  std::int64_t (*round)(std::int64_t value, std::uint32_t setting);
+  std::optional<SettingRemark> (*remark)(std::uint32_t setting);
+};
+
+// What an option does. Has no default, so that a row without an effect does not compile.
+class OptionEffect {
+ public:
+  constexpr OptionEffect(ScalarRounding rounding) : rounding_(rounding) {}
+  // Its effect on distributions is in the report's summary.
+  static constexpr OptionEffect onDistributions() { return OptionEffect(ScalarRounding{}); }
+
+  constexpr bool isForScalars() const { return rounding_.round != nullptr; }
+  constexpr const ScalarRounding& rounding() const { return rounding_; }
+
+ private:
+  ScalarRounding rounding_;
+};
+
+struct WhitelistOption {
+  std::string_view name;
+  OptionValue value;
+  OptionEffect effect;
+  std::string_view meaning;  // as the documents say it
+};
+
+// All options; those for scalars in the order in which they are applied.
+std::span<const WhitelistOption> whitelistOptions();
+// Null when no option has this name.
+const WhitelistOption* whitelistOption(std::string_view name);
+
+// The whole number of an option; empty when the option is missing or anything else.
+std::optional<std::uint32_t> unsignedOption(const ScalarOptions& options, std::string_view name);
+
+// Whether the value is one that the option accepts. An unknown name may have any value.
+bool isWellFormedOption(std::string_view name, const KvObject& value);
+
+// Whether options change some value of a key.
+bool haveEffect(const ScalarOptions& options);
+
+// One step of a rounding.
+struct RoundingStep {
+  std::string_view option;
+  std::uint32_t setting = 0;
+  std::int64_t before = 0;
+  std::int64_t after = 0;
+};
+
+// The value as its options round it, step by step; results outside 64 bits saturate. Steps that
+// were applied are added to steps when it is given.
+std::int64_t roundScalar(std::int64_t value, const ScalarOptions& options,
+                         std::vector<RoundingStep>* steps = nullptr);
+
+}  // namespace tally
