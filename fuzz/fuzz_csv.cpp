@@ -5,7 +5,7 @@
 #include <string>
 
 #include "fuzz.h"
-#include "tools/frame/record_reader.h"
+#include "tools/store/record_reader.h"
 #include "tools/store/store_csv.h"
 
 using namespace tally::tools;

@@ -1,8 +1,6 @@
 // Writes a manual page from a template: the lines @OPTIONS@ and @COMMANDS@ become what the commands
-// of tallyctl say of themselves, @ENTRIES@ the entries of the device description, and
-// @WHITELIST_OPTIONS@ the options of the whitelist. Runs when the project is built, and is not
-// installed.
-#include <CLI/CLI.hpp>
+// of tallyctl declare, @ENTRIES@ the entries of the device description, and @WHITELIST_OPTIONS@ the
+// options of the whitelist. Runs when the project is built, and is not installed.
 #include <cstdio>
 #include <fstream>
 #include <iostream>
@@ -11,6 +9,7 @@
 #include "config/whitelist_options.h"
 #include "host/described/described_entries.h"
 #include "tools/frame/command_help.h"
+#include "tools/frame/command_line.h"
 #include "tools/frame/output.h"
 #include "tools/frame/tool.h"
 
@@ -53,14 +52,15 @@ void writeOption(std::ostream& out, const OptionHelp& option) {
   out << ".TP\n" << names << '\n' << roff(sentence(option.description)) << '\n';
 }
 
-void writeCommand(std::ostream& out, const CLI::App& app) {
-  const CommandHelp help = tally::tools::describe(app);
+void writeCommand(std::ostream& out, const CommandHelp& help, bool isTop) {
+  if (isTop) out << ".SS " << roff(help.path.substr(help.path.rfind(' ') + 1)) << '\n';
   if (!help.commands.empty()) {
-    out << ".SS " << roff(app.get_name()) << '\n' << roff(sentence(help.description)) << '\n';
-    for (const CLI::App* command : help.commands) writeCommand(out, *command);
+    out << roff(sentence(help.description)) << '\n';
+    for (const auto& command : help.commands) {
+      writeCommand(out, tally::tools::describe(*command.app), false);
+    }
     return;
   }
-  if (app.get_parent()->get_parent() == nullptr) out << ".SS " << roff(app.get_name()) << '\n';
   out << ".TP\n\\fB" << roff(help.path) << "\\fR";
   for (const OptionHelp& argument : help.arguments) {
     const std::string form =
@@ -75,7 +75,7 @@ void writeCommand(std::ostream& out, const CLI::App& app) {
   }
   out << '\n' << roff(sentence(help.description)) << '\n';
   const bool hasOwn = !help.arguments.empty() || !help.options.front().common;
-  if (!hasOwn) return;  // an empty block is a fault to who checks pages
+  if (!hasOwn) return;  // checkers of manual pages complain about an empty block
   out << ".RS\n";
   for (const OptionHelp& argument : help.arguments) writeOption(out, argument);
   for (const OptionHelp& option : help.options) {
@@ -92,35 +92,36 @@ int main(int count, char** arguments) {
     return 2;
   }
   tally::tools::ToolContext context;
-  CLI::App app;
-  addAllCommands(app, context);
+  const tally::tools::CommandLine line(context);
+  const CommandHelp help = tally::tools::describe(line.app());
   std::ifstream in(arguments[1]);
   std::ofstream out(arguments[2]);
-  for (std::string line; std::getline(in, line);) {
-    const CommandHelp help = tally::tools::describe(app);
-    if (line == "@OPTIONS@") {
+  for (std::string text; std::getline(in, text);) {
+    if (text == "@OPTIONS@") {
       for (const OptionHelp& option : help.options) writeOption(out, option);
-    } else if (line == "@COMMANDS@") {
-      for (const CLI::App* command : help.commands) writeCommand(out, *command);
-    } else if (line == "@ENTRIES@") {
+    } else if (text == "@COMMANDS@") {
+      for (const auto& command : help.commands) {
+        writeCommand(out, tally::tools::describe(*command.app), true);
+      }
+    } else if (text == "@ENTRIES@") {
       for (const tally::DescribedEntry& entry : tally::kDescribedEntries) {
-        std::string text(entry.answers);
-        std::erase(text, '`');
+        std::string answers(entry.answers);
+        std::erase(answers, '`');
         out << ".TP\n\\fB" << roff(std::string(entry.name)) << "\\fR ("
             << tally::tools::typeName(entry.type) << ")\n"
-            << roff(sentence(text)) << '\n';
+            << roff(sentence(answers)) << '\n';
       }
-    } else if (line == "@WHITELIST_OPTIONS@") {
+    } else if (text == "@WHITELIST_OPTIONS@") {
       for (const tally::WhitelistOption& option : tally::whitelistOptions()) {
         const bool isNumber = option.value == tally::OptionValue::WholeNumber;
-        std::string text = std::string(isNumber ? "A whole number: " : "An array of numbers: ");
-        text += option.meaning;
-        std::erase(text, '`');
+        std::string meaning = std::string(isNumber ? "A whole number: " : "An array of numbers: ");
+        meaning += option.meaning;
+        std::erase(meaning, '`');
         out << ".TP\n\\fB" << roff(std::string(option.name)) << "\\fR\n"
-            << roff(sentence(text)) << '\n';
+            << roff(sentence(meaning)) << '\n';
       }
     } else {
-      out << line << '\n';
+      out << text << '\n';
     }
   }
   out.close();

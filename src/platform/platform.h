@@ -81,6 +81,7 @@ class PlatformScope {
   ~PlatformScope();
   PlatformScope(const PlatformScope&) = delete;
   PlatformScope& operator=(const PlatformScope&) = delete;
+  Platform& services() { return services_; }
 
  private:
   Platform services_;

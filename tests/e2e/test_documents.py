@@ -126,6 +126,21 @@ class Documents(unittest.TestCase):
         self.assertEqual(read, shown)
 
     @unittest.skipUnless(shutil.which("man"), "man is missing")
+    def test_every_command_of_the_tool_is_documented(self):
+        def rows(*words):
+            out = subprocess.run([BIN / "tallyctl", *words, "--help"], capture_output=True, text=True,
+                                 check=True).stdout
+            description, usage = (" ".join(part.split()) for part in out.split("\n\n")[:2])
+            commands = out.partition("\nCommands:\n")[2].partition("\n\n")[0]
+            names = re.findall(r"^  (\S+)", commands, re.MULTILINE)
+            if not names:
+                form = usage.removeprefix("Usage: tallyctl ").removesuffix(" [OPTION...]")
+                return [f"| `{form}` | {description.removesuffix('.')} |"]
+            return [row for name in names for row in rows(*words, name)]
+        expected = "\n".join(["| command | effect |", "|---|---|", *rows()]) + "\n\n"
+        documented = (TOP / "docs/commands.md").read_text().split("## tallyctl\n\n")[1]
+        self.assertTrue(documented.startswith(expected), f"docs/commands.md needs this table:\n{expected}")
+
     def test_manual_pages_are_sound(self):
         pages = [path for path in (TOP / "packaging/man").iterdir() if path.suffix != ".in"]
         pages += [path for path in (BIN.parent / "packaging/man").glob("*.[1-8]")]

@@ -14,10 +14,9 @@ using testing::Not;
 class CommandLine : public ToolTest {
  protected:
   // The first words of the lines that complete what the last word begins.
-  std::vector<std::string> completed(std::vector<std::string> words) {
-    words.insert(words.begin(), {"complete", "--"});
+  std::vector<std::string> completed(const std::vector<std::string>& words) {
     std::vector<std::string> found;
-    std::istringstream lines(run(words).out);
+    std::istringstream lines(runUnder({"complete", "--"}, words).out);
     for (std::string line; std::getline(lines, line);) {
       found.push_back(line.substr(0, line.find('\t')));
     }
@@ -48,9 +47,7 @@ TEST_F(CommandLine, WhatIsRefusedIsNamedWithWhatMayBeMeant) {
     EXPECT_THAT(outcome.err, HasSubstr(c.says));
     EXPECT_THAT(outcome.err, Not(HasSubstr("\x1b")));
     EXPECT_EQ(outcome.out, "") << c.says;
-    std::vector<std::string> asJson = c.arguments;
-    asJson.emplace_back("--json");
-    const auto error = nlohmann::json::parse(run(asJson).err)["error"];
+    const auto error = nlohmann::json::parse(runUnder({"--json"}, c.arguments).err)["error"];
     EXPECT_EQ(error["status"], kBadUsage) << c.says;
   }
 }
@@ -84,33 +81,6 @@ TEST_F(CommandLine, EveryFailureUnderJsonIsOneObject) {
   }
 }
 
-TEST_F(CommandLine, TheDeviceAndTheFormMayBeGivenAnywhere) {
-  putRows("scalar,a,20000,,1\n");
-  const std::string device = at("device");
-  for (const std::vector<const char*>& arguments : std::vector<std::vector<const char*>>{
-           {"tallyctl", "--root", device.c_str(), "--json", "store", "keys"},
-           {"tallyctl", "store", "--json", "--root", device.c_str(), "keys"},
-           {"tallyctl", "store", "keys", "--json", "--root", device.c_str()}}) {
-    ToolContext context;
-    context.out = std::fopen(at("out").c_str(), "w");
-    const int status = runTool(context, arguments, [this](const std::string& folder) {
-      return makePlatform(folder, stderr);
-    });
-    std::fclose(context.out);
-    EXPECT_EQ(status, kSuccess);
-    EXPECT_EQ(nlohmann::json::parse(get("out"))[0]["key"], "a");
-  }
-  for (const std::vector<std::string>& command :
-       std::vector<std::vector<std::string>>{{}, {"store"}, {"store", "set"}, {"doctor"}}) {
-    std::vector<std::string> arguments = command;
-    arguments.emplace_back("--help");
-    const Outcome help = run(arguments);
-    EXPECT_EQ(help.status, kSuccess);
-    EXPECT_THAT(help.out, HasSubstr("--root DIR"));
-    EXPECT_THAT(help.out, HasSubstr("--json"));
-  }
-}
-
 TEST_F(CommandLine, CompletionKnowsWhatTheDeviceHolds) {
   putRows(
       "scalar,bus10,20000,,1\nscalar,bus2,19999,,1\ndistribution,d,20000,1,1\n"
@@ -124,6 +94,7 @@ TEST_F(CommandLine, CompletionKnowsWhatTheDeviceHolds) {
   EXPECT_THAT(completed({"store", "dump", "--day", "20"}), ElementsAre("2024-10-04", "2024-10-03"));
   EXPECT_THAT(completed({"store", "dump", "--day=y"}), ElementsAre("--day=yesterday"));
   EXPECT_THAT(completed({"store", "keys", "--j"}), ElementsAre("--json"));
+  EXPECT_THAT(completed({"store", "keys", "--root", ""}), ElementsAre(":dir"));
   EXPECT_THAT(completed({"prefs", "list", "--domain", ""}), ElementsAre("vellum.da"));
   EXPECT_THAT(completed({"prefs", "get", "--domain", "vellum.da", ""}), ElementsAre("G"));
   EXPECT_THAT(completed({"prefs", "set", "--type", ""}),

@@ -1,12 +1,32 @@
-// tallyctl nand: what it shows of a driver's figures, and its exit statuses.
-#include "tools/nand_tool.h"
+// tallyctl nand: what it shows of a driver's figures, lists and snapshots, and its exit statuses.
+#include <algorithm>
+
+#include "fakes/fake_storage.h"
+#include "tools/tool_fixture.h"
 
 namespace tally::tools {
 namespace {
 
+using fakes::appendValue;
+using fakes::Bytes;
 using fakes::Record;
 using testing::HasSubstr;
 using testing::Not;
+
+// On a storage driver in memory.
+class NandToolTest : public ToolTest {
+ protected:
+  Platform makePlatform(const std::string&, std::FILE*) override { return storage.services(); }
+  Outcome nand(const std::vector<std::string>& arguments) {
+    testing::internal::CaptureStderr();
+    testing::internal::CaptureStdout();
+    const Outcome outcome = runUnder({"nand"}, arguments);
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), "") << "the library's notices spoil JSON";
+    testing::internal::GetCapturedStderr();
+    return outcome;
+  }
+  fakes::FakeStorage storage;
+};
 
 class NandCommands : public NandToolTest {
  protected:
@@ -87,6 +107,147 @@ TEST_F(NandCommands, EventsAreShownAndNotSent) {
   storage.analyticsEvents->offered.clear();
   EXPECT_EQ(nand({"events"}).status, kWrong);
   EXPECT_TRUE(storage.analyticsEvents->offered.empty());
+}
+
+Bytes listOf(const std::vector<std::uint32_t>& words) {
+  Bytes bytes;
+  for (const std::uint32_t word : words) appendValue(bytes, word);
+  return bytes;
+}
+
+class NandListCommandsTest : public NandToolTest {
+ protected:
+  NandListCommandsTest() {
+    storage.registry->properties["Device Characteristics"] =
+        KvDictionary::create({{"chip-id", KvString::create("Q7M")},
+                              {"manufacturer-id", KvString::create("x")},
+                              {"num-bus", KvNumber::int32(2)}});
+  }
+  void serveTelemetry(std::size_t modes, std::size_t bytes = 2 * 4128) {
+    for (std::size_t mode = 0; mode < modes; ++mode) {
+      Bytes list(bytes);
+      list[4] = std::byte{42};  // the second counter of the first bus
+      storage.registry->serveNext(list);
+    }
+  }
+  const Bytes statistics =
+      fakes::statisticsBuffer({{53, {1}}, {20, {180}}, {50, {256}}, {49, {16384}}, {4, {102400}}});
+  const Bytes validity = listOf({2, 0, 0, 3, 70, 0, 0, 0, 3, 71, 0, 0, 0});
+  const Bytes defects = listOf({0, 41, 1, 0x20001, 3, 4, 5, 6, 7, 30, 0});
+};
+
+TEST_F(NandListCommandsTest, ListsForPeopleAndForPrograms) {
+  serveTelemetry(3);
+  const Outcome telemetry = nand({"telemetry"});
+  EXPECT_EQ(telemetry.status, kSuccess);
+  for (const char* part : {"Mode 2, bus 1", "readStage[0-22]", "0 42 0"}) {
+    EXPECT_THAT(telemetry.out, HasSubstr(part));
+  }
+  serveTelemetry(1);
+  const Outcome one = nand({"telemetry", "--mode", "1", "--json"});
+  const nlohmann::json modes = one.json();  // an invalid digit would not be valid JSON
+  ASSERT_EQ(modes.size(), 1u);
+  EXPECT_EQ(modes[0]["mode"], 1);
+  EXPECT_EQ(modes[0]["buses"].size(), 2u);
+  EXPECT_EQ(modes[0]["buses"][0]["readStage"][1], 42);
+  EXPECT_EQ(nand({"telemetry", "--mode", "3"}).status, kBadUsage);
+
+  storage.registry->serve(validity);
+  EXPECT_THAT(nand({"validity"}).out, HasSubstr("70 71"));
+  storage.registry->serve(validity);
+  EXPECT_EQ(nand({"validity", "--json"}).json(), nlohmann::json({{"ValidityList[3]", {70, 71}}}));
+
+  storage.registry->serve(defects);
+  EXPECT_THAT(nand({"defects"}).out, HasSubstr("41 of the factory, 1 found since"));
+  storage.registry->serve(defects);
+  const nlohmann::json found = nand({"defects", "--json"}).json();
+  EXPECT_EQ(found["summary"]["Factory Count"], 41);
+  EXPECT_EQ(found["defects"][0]["CE"], 2);
+}
+
+TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
+  const struct {
+    double sinceLast, threshold;
+    bool written;
+  } cases[] = {{700000, 1.5, true}, {600000, 1.5, false}, {700000, 5, false}};
+  for (const auto& c : cases) {
+    const auto serve = [this] {
+      storage.registry->replies.clear();
+      for (const Bytes& list : {statistics, validity, statistics}) {
+        storage.registry->serveNext(list);
+      }
+      serveTelemetry(3);
+      storage.registry->serveNext(defects);
+    };
+    auto& preferences = *storage.platform.preferences;
+    preferences.put("SSLastLoggedAt", KvDate::create(storage.platform.clock->now - c.sinceLast),
+                    "vellum.tallyd.tallyrun");
+    preferences.put("userWAmp", KvNumber::float64(c.threshold), "vellum.NANDInfo");
+    const auto before = preferences.values;
+    storage.platform.calls->clear();
+    serve();
+    const Outcome text = nand({"storage-log", "--preview"});
+    EXPECT_THAT(text.out, HasSubstr("UserWamp:1.80;"));
+    EXPECT_EQ(text.out.find("Next one from") != std::string::npos, c.sinceLast < 604800);
+    serve();
+    const nlohmann::json preview = nand({"storage-log", "--preview", "--json"}).json();
+    EXPECT_EQ(preview["wouldBeWritten"], c.written);
+    EXPECT_EQ(preview["structuredRecords"], 3 * 2 + 2);
+    EXPECT_THAT(preview["text"].get<std::string>(), HasSubstr("ValidityList[3]:70,71\n"));
+    EXPECT_TRUE(storage.platform.calls->empty());
+    EXPECT_TRUE(std::equal(preferences.values.begin(), preferences.values.end(), before.begin(),
+                           before.end(), [](const auto& now, const auto& then) {
+                             return now.first == then.first &&
+                                    kvEqual(now.second.get(), then.second.get());
+                           }));
+    EXPECT_TRUE(storage.platform.logSubmission->logs.empty());
+  }
+}
+
+class SnapshotCommand : public ToolTest {
+ protected:
+  std::string file(const char* name, const std::string& bytes) const {
+    put(name, bytes);
+    return at(name);
+  }
+  Outcome show(const std::vector<std::string>& arguments) {
+    return runUnder({"nand", "snapshot"}, arguments);
+  }
+};
+
+TEST_F(SnapshotCommand, ShowsRecordsOfBothLayouts) {
+  const std::string record = "\x07" + std::string(251, '\0');
+  std::string many;  // more text than the first try has space for
+  for (int i = 0; i < 9000; ++i) many += record;
+  const Outcome fixed = show({file("fixed", many)});
+  EXPECT_EQ(fixed.status, kSuccess);
+  EXPECT_TRUE(fixed.out.starts_with("Key: \nT   - Timestamp\n"));
+  EXPECT_EQ(std::count(fixed.out.begin(), fixed.out.end(), '\n'), 27 + 9000 + 1);
+  const Outcome cut = show({file("cut", record + "x")});
+  EXPECT_EQ(cut.status, kSuccess);
+  EXPECT_THAT(cut.err, HasSubstr("does not end with a whole record"));
+
+  const auto word = [](std::uint32_t value) {
+    return std::string(reinterpret_cast<const char*>(&value), sizeof value);
+  };
+  const auto block = [&](const std::string& label) {
+    std::string bytes = word(0) + word(6) + word(4) + word(3) + word(0) + word(0) + word(36) +
+                        word(0) + std::string("\x1b]\0\0", 4) + word(1) + word(0) + word(0) +
+                        word(0) + word(4) + label;
+    bytes.resize(36 + 8 + 28);
+    return bytes;
+  };
+  const std::string records = file("records", word(5) + word(77));
+  const std::string good = file("good", block("T=%04u")), bad = file("bad", block("T=%n"));
+  const Outcome described = show({records, "--header", good});
+  EXPECT_EQ(described.status, kSuccess);
+  EXPECT_EQ(described.out, "- SPX Snapshot - \n\\x1b]\nT=0005\nT=0077\n");
+  const Outcome json = show({records, "--header", good, "--json"});
+  EXPECT_EQ(json.json()["lines"][3], "T=0077");
+  const Outcome refused = show({records, "--header", bad});
+  EXPECT_EQ(refused.status, kWrong);
+  EXPECT_THAT(refused.err, HasSubstr("a label format holds anything but one integer"));
+  EXPECT_EQ(show({"/nowhere"}).status, kWrong);
 }
 
 }  // namespace

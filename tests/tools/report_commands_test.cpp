@@ -203,7 +203,7 @@ TEST_F(ReportCommands, LogsAreListedAndFound) {
   const std::string path = at(kSpool + std::string("0000000001-log-tallyd.log"));
   EXPECT_EQ(run({"report", "show", path, "--json"}).json()["document"]["TBScalars"]["a"], 20);
   EXPECT_THAT(run({"report", "show", "3"}).out, HasSubstr("worn: no\nname: \\x1b[31m\n"));
-  // A file is shown by what it holds.
+  // The content of a file decides how it is shown.
   putPlist("records", "<dict><key>RecordType</key><integer>172</integer></dict>");
   putPlist("other", "<dict/>");
   put("text", "worn: no\n");

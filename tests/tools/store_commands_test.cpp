@@ -140,9 +140,7 @@ TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
   };
   for (const auto& c : cases) {
     forget();
-    std::vector<std::string> arguments{"store"};
-    arguments.insert(arguments.end(), c.arguments.begin(), c.arguments.end());
-    const Outcome outcome = run(arguments);
+    const Outcome outcome = runUnder({"store"}, c.arguments);
     EXPECT_EQ(outcome.status, c.status) << testing::PrintToString(c.arguments);
     EXPECT_EQ(outcome.err.empty(), c.status == kSuccess) << outcome.err;
     EXPECT_EQ(dump(), "kind,key,day,offset,value\n" + c.row);

@@ -44,6 +44,11 @@ class ToolTest : public TemporaryRoot {
     outcome.err = get("err");
     return outcome;
   }
+  // The same with words before the arguments.
+  Outcome runUnder(std::vector<std::string> words, const std::vector<std::string>& arguments) {
+    words.insert(words.end(), arguments.begin(), arguments.end());
+    return run(std::move(words));
+  }
   virtual Platform makePlatform(const std::string& folder, std::FILE* err) {
     return makeHostPlatform(folder, {makeToolLog(err), /*readOnlyPreferences=*/true});
   }

@@ -1,4 +1,5 @@
-// tallyctl whitelist: what is found in a file, and what is said of a key.
+// tallyctl whitelist and explain: what is found in a file, and what is said of a key.
+#include "report/daily_report.h"
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -86,12 +87,12 @@ TEST_F(WhitelistCommands, CheckFindsFaultsAndSurprises) {
       // Groups.
       {dict("G", ""), {"surprise /G: the group admits no key"}},
       {dict("InternalTesting", dict("ScalarKeyPrefixes", dict("", ""))) + scalar(""),
-       {"surprise /InternalTesting: does not count here: it is for internal devices only",
+       {"surprise /InternalTesting: not in force here: it is for internal devices only",
         "surprise /InternalTesting/ScalarKeyPrefixes: the empty prefix"}},
       {dict("Off", dict("ScalarKeys", dict("k", ""))),
-       {"surprise /Off: does not count here: it is disabled by tasking"}},
+       {"surprise /Off: not in force here: it is disabled by tasking"}},
       {dict("Odd", dict("ScalarKeys", dict("k", ""))),
-       {"surprise /Odd: its switch in the preferences vellum.da is no boolean"}},
+       {"surprise /Odd: its switch in the preferences vellum.da is not a boolean"}},
   };
   putPlist("device/var/mobile/Library/Preferences/vellum.da.plist",
            "<dict><key>Off</key><false/><key>Odd</key><string>no</string></dict>");
@@ -110,18 +111,6 @@ TEST_F(WhitelistCommands, AFileThatCannotBeUsedIsAFault) {
   EXPECT_THAT(findings(), testing::ElementsAre(HasSubstr("the file cannot be used")));
   putWhitelist(scalar(""));
   EXPECT_EQ(run({"whitelist", "check", at("nowhere")}).status, kWrong);
-}
-
-TEST_F(WhitelistCommands, ControlsOfAFileNeverReachTheTerminal) {
-  // A property list in XML cannot carry most of them, but U+009B and U+202E are characters to it.
-  putWhitelist(
-      dict("a\xc2\x9b"
-           "31m\xe2\x80\xae",
-           ""));
-  const Outcome outcome = run({"whitelist", "check"});
-  EXPECT_THAT(outcome.out, HasSubstr("a\\x9b31m\\u202e"));
-  EXPECT_EQ(outcome.out.find("\xc2\x9b"), std::string::npos);
-  EXPECT_THAT(run({"whitelist", "test", "\x1b]0;x\x07"}).out, HasSubstr("\\x1b]0;x\\x07"));
 }
 
 TEST_F(WhitelistCommands, TestNamesTheEntryThatDecides) {
@@ -155,6 +144,92 @@ TEST_F(WhitelistCommands, TestNamesTheEntryThatDecides) {
     EXPECT_EQ(outcome.status, c.scalar || c.distribution ? kSuccess : kWrong);
   }
   EXPECT_EQ(run({"whitelist", "test", "n.x", "N.x"}).status, kWrong);
+}
+
+class ExplainCommand : public ToolTest {
+ protected:
+  void SetUp() override {
+    putPlist("device/device/device.plist",
+             "<dict>" +
+                 dict("KernelValues",
+                      integer("kern.memorystatus_thaw_count", "31") +
+                          integer("kern.memorystatus_freezer_process_considered_count", "0") +
+                          integer("kern.memorystatus_freezer_error_other_count", "2")) +
+                 "</dict>");
+    putWhitelist(
+        dict("G", dict("ScalarKeys",
+                       dict("a", integer("bucket_interval", "10") + integer("sig_fig", "2")) +
+                           dict("empty", "") + dict("vellum.kernel.memorystatus_thaw_count", "") +
+                           dict("vellum.memorystatus_freezer_error_other_count", "")) +
+                      dict("DistributionKeys", dict("d", intervals({"2"})))) +
+        dict("Off", dict("ScalarKeyPrefixes", dict("off.", ""))) +
+        dict("InternalTesting", dict("ScalarKeys", dict("secret", ""))));
+    putPlist("device/var/mobile/Library/Preferences/vellum.da.plist",
+             "<dict><key>Off</key><false/></dict>");
+    putRows(
+        "scalar,a,19999,,7\nscalar,a,20000,,1236\nscalar,ab,20000,,1\nscalar,off.x,20000,,1\n"
+        "scalar,secret,20000,,1\nscalar,both,20000,,1\nscalar,d,20001,,1\n"
+        "distribution,d,20000,1,1\ndistribution,d,20000,2,3\ndistribution,both,20000,1,1\n"
+        "scalar,a,20003,,5\n");
+  }
+};
+
+TEST_F(ExplainCommand, TellsWhereAKeyStandsOrWhyNot) {
+  const struct {
+    const char* key;
+    int status;
+    std::vector<std::string> parts;  // of the text, in any order
+    const char* day = "20000";
+  } cases[] = {
+      {"a",
+       kSuccess,
+       {"2024-10-03       7\n", "2024-10-04   1,236\n", "bucket_interval 10: 1,236 becomes 1,240",
+        "sig_fig 2: 1,240 becomes 1,200", "made now\n  scalar 1,200\n",
+        "no log of that day was submitted"}},
+      {"d",
+       kSuccess,
+       {"admitted  as a distribution: the group G lists it", "options: intervals of 1 number",
+        "distribution of 2 samples: min 1, mean 2, std dev 1, max 3", "(-inf, 2]", "(2, inf)",
+        "absent as a scalar: the store has no such row"}},
+      {"ab", kWrong, {"refused  as a scalar: it is not listed", "whitelist refuses it"}},
+      {"secret", kWrong, {"InternalTesting, which is for internal devices only"}},
+      {"empty", kWrong, {"no rows of this key", "the store has no such row on that day"}},
+      {"vellum.kernel.memorystatus_thaw_count",
+       kSuccess,
+       {"the report measures this key itself", "measured now  31", "scalar 31"}},
+      {"vellum.kernel.memorystatus_thaw_count",
+       kWrong,
+       {"no log is made and nothing is measured"},
+       "20002"},
+      {"vellum.memorystatus_freezer_error_other_count",
+       kWrong,
+       {"it cannot be measured: a count that it needs cannot be read, or is 0"}},
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(std::string(c.key) + " on " + c.day);
+    const Outcome outcome = run({"explain", c.key, "--day", c.day});
+    EXPECT_EQ(outcome.status, c.status);
+    for (const std::string& part : c.parts) EXPECT_THAT(outcome.out, HasSubstr(part));
+  }
+}
+
+TEST_F(ExplainCommand, ComparesWithWhatWasSubmitted) {
+  {
+    const PlatformScope scope(makeLinuxPlatform(at("device"), {log, false}));
+    writeDailyLog(platform(), 20000, nullptr);
+    writeDailyLog(platform(), 20003, nullptr);
+  }
+  EXPECT_THAT(run({"explain", "d", "--day", "20000"}).out, HasSubstr("the same distribution"));
+  putWhitelist(dict("G", dict("ScalarKeys", dict("b", ""))));
+  const Outcome outcome = run({"explain", "a", "--day", "20000"});
+  EXPECT_EQ(outcome.status, kWrong);
+  EXPECT_THAT(outcome.out, HasSubstr("0000000001-log-tallyd.log\n  scalar 1,200\n"));
+  EXPECT_THAT(outcome.out, HasSubstr("it was made with another whitelist"));
+  const auto json = run({"explain", "a", "--day", "20000", "--json"}).json();
+  EXPECT_EQ(json["submittedLog"]["scalar"], 1200);
+  EXPECT_EQ(json["nextLog"], nullptr);
+  EXPECT_EQ(json["scalarRows"][1]["value"], 1236);
+  EXPECT_EQ(json["whyAbsent"]["scalar"], "the whitelist refuses it");
 }
 
 }  // namespace

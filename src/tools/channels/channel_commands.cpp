@@ -11,7 +11,6 @@
 #include <vector>
 
 #include <fmt/core.h>
-#include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
 
 #include "base/time_text.h"
@@ -19,6 +18,7 @@
 #include "platform/protocol/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
 #include "tools/channels/channel_view.h"
+#include "tools/frame/command.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
@@ -71,8 +71,8 @@ bool isWanted(KvDictionary* channel, const ChannelArguments& wanted) {
          hasUnit(channel, wanted.unit);
 }
 
-// Adds the channels of every driver that publishes some. One that cannot be read is named and
-// passed over; false then.
+// Adds the channels of every driver that publishes some. Names and skips a driver that cannot be
+// read; false then.
 bool addAllDrivers(const ToolContext& context, KvDictionary& channels) {
   DeviceRegistry& registry = *context.platform->deviceRegistry;
   RegistryHandle drivers = 0;
@@ -107,7 +107,7 @@ bool addAllDrivers(const ToolContext& context, KvDictionary& channels) {
   return complete;
 }
 
-// The wanted channels of all drivers; null, after a word about it, when there are none.
+// The wanted channels of all drivers; null, after a complaint, if there are none.
 KvRef<KvDictionary> chooseChannels(const ToolContext& context, const ChannelArguments& wanted,
                                    bool* complete) {
   auto channels = HwReportCreateAggregate(kHwReportByDriver | kHwReportByGroup);
@@ -157,7 +157,7 @@ int list(const ToolContext& context, const ChannelArguments& wanted) {
   return channels && complete ? kSuccess : kWrong;
 }
 
-// Waits, and on a terminal says for how much longer.
+// Waits, and shows the remaining time on a terminal.
 void wait(const ToolContext& context, double seconds) {
   const auto end =
       steady_clock::now() + std::chrono::duration_cast<steady_clock::duration>(Seconds(seconds));
@@ -182,7 +182,7 @@ struct Sample {
   std::int32_t missing = 0;           // channels that were wanted and are not served
 };
 
-// False, after a word about it, when there is no sample.
+// False, after a complaint, if there is no sample.
 bool takeSample(const ToolContext& context, const ChannelArguments& wanted, KvDictionary& channels,
                 Sample* sample) {
   KvRef<HwReportError> error;
@@ -208,7 +208,7 @@ bool takeSample(const ToolContext& context, const ChannelArguments& wanted, KvDi
   return true;
 }
 
-// The differences channel by channel, so that one that cannot be subtracted costs no other.
+// The differences channel by channel, so that one that cannot be subtracted does not affect others.
 std::vector<KvRef<KvDictionary>> differences(const ToolContext& context, const Sample& sample,
                                              bool* complete) {
   std::map<std::tuple<std::uint64_t, std::uint64_t>, KvDictionary*> earlier;
@@ -272,42 +272,37 @@ int sample(const ToolContext& context, const ChannelArguments& wanted) {
   return complete ? kSuccess : kWrong;
 }
 
-void addFilters(CLI::App* command, ChannelArguments& wanted) {
-  command->add_option("--driver", wanted.driver, "Only drivers whose name or id contains it")
-      ->type_name("TEXT");
-  command->add_option("--group", wanted.group, "Only this group")->type_name("NAME");
-  command->add_option("--subgroup", wanted.subgroup, "Only this subgroup")->type_name("NAME");
-  command->add_option("--category", wanted.categories, "Only these category bits (0x100)")
-      ->type_name("BITS")
-      ->check(CLI::Range(0x1, 0xFFFF));
+void addFilters(Command command, ChannelArguments& wanted) {
+  command.option("--driver", kTextValue, &wanted.driver,
+                 "Only drivers whose name or id contains it");
+  command.option("--group", {"NAME", ValueKind::Text}, &wanted.group, "Only this group");
+  command.option("--subgroup", {"NAME", ValueKind::Text}, &wanted.subgroup, "Only this subgroup");
   command
-      ->add_option("--format", wanted.format, "Only this format: simple, state, histogram or array")
-      ->type_name("FORMAT")
-      ->check(CLI::IsMember({"simple", "state", "histogram", "array"}));
-  command->add_option("--unit", wanted.unit, "Only this unit: its label, or its word (0x...)")
-      ->type_name("UNIT");
+      .option("--category", {"BITS", ValueKind::Number}, &wanted.categories,
+              "Only these category bits (0x100)")
+      .within(0x1, 0xFFFF);
+  command
+      .option("--format", {"FORMAT", ValueKind::Text}, &wanted.format,
+              "Only this format: simple, state, histogram or array")
+      .oneOf({"simple", "state", "histogram", "array"});
+  command.option("--unit", {"UNIT", ValueKind::Text}, &wanted.unit,
+                 "Only this unit: its label, or its word (0x...)");
 }
 
 }  // namespace
 
 void addChannelCommands(CLI::App& app, ToolContext& context) {
-  const auto wanted = std::make_shared<ChannelArguments>();
-  CLI::App* const channels =
-      app.add_subcommand("channels", "The statistics channels that drivers publish");
-  channels->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    CLI::App* const command = channels->add_subcommand(name, description);
-    command->callback([&context, wanted, run] {
-      context.command = [&context, wanted, run] { return run(context, *wanted); };
-    });
-    addFilters(command, *wanted);
-    return command;
-  };
-  add("list", "List the channels", list);
-  add("sample", "Print their values; exit status 1 if one is not served", sample)
-      ->add_option("--delta", wanted->delta, "Show what changes in this many seconds")
-      ->type_name("SECONDS")
-      ->check(CLI::Range(0.001, kLongestWait));
+  CommandGroup<ChannelArguments> channels(
+      addFamily(app, "channels", "Show the statistics channels that drivers publish"), context);
+  ChannelArguments& wanted = channels.arguments();
+  addFilters(channels.add("list", "List the statistics channels", list), wanted);
+  Command command = channels.add(
+      "sample", "Print the values of channels; exit status 1 if one is not served", sample);
+  addFilters(command, wanted);
+  command
+      .option("--delta", {"SECONDS", ValueKind::Number}, &wanted.delta,
+              "Show what changes in this many seconds")
+      .within(0.001, kLongestWait);
 }
 
 }  // namespace tally::tools

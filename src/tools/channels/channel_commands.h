@@ -1,4 +1,4 @@
-// tallyctl channels: the statistics channels that drivers publish, and what they hold.
+// tallyctl channels: the statistics channels that drivers publish, and their values.
 #pragma once
 
 #include "tools/frame/tool.h"

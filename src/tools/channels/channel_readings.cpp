@@ -31,7 +31,7 @@ std::vector<StateReading> readStates(KvDictionary& channel) {
   std::vector<StateReading> states;
   const std::int32_t count = HwReportStateGetCount(&channel);
   const std::int32_t current = HwReportStateGetCurrent(&channel);
-  // All states have names or none has, and every attempt to make them goes through all states.
+  // Either all states have names or none has, and each attempt to make a name visits all states.
   const bool named = HwReportStateGetNameForIndex(&channel, 0) != nullptr;
   double total = 0;
   for (std::int32_t i = 0; i < count; ++i) {

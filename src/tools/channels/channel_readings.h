@@ -1,4 +1,4 @@
-// What a sampled statistics channel holds, read once for every form of output.
+// The values of a sampled statistics channel, read once for every form of output.
 #pragma once
 
 #include <cstdint>
@@ -10,7 +10,7 @@
 
 namespace tally::tools {
 
-// Nothing stands for a value that is missing.
+// A missing value is empty.
 struct StateReading {
   std::string name;  // else its id in hexadecimal
   std::uint64_t id = 0;
@@ -28,7 +28,7 @@ struct BucketReading {
 std::optional<std::int64_t> readSimple(const KvDictionary& channel);
 std::vector<StateReading> readStates(KvDictionary& channel);
 std::vector<BucketReading> readBuckets(KvDictionary& channel);
-// The values of an array up to the last one that is there.
+// The values of an array up to the last one that is present.
 std::vector<std::optional<std::int64_t>> readArray(const KvDictionary& channel);
 
 // The channel's name, else its id in hexadecimal.

@@ -39,7 +39,7 @@ Cell countCell(std::optional<std::uint64_t> value) {
   return value ? Cell(countText(*value)) : Cell(kMissing, Ink::Doubtful);
 }
 
-// In seconds when the unit is a time.
+// In seconds if the unit is a time.
 Cell residencyCell(const StateReading& state, KvDictionary& channel) {
   if (!state.residency) return Cell(kMissing, Ink::Doubtful);
   const std::uint64_t unit = HwReportChannelGetUnit(&channel);
@@ -137,7 +137,7 @@ void ChannelPrinter::printStates(KvDictionary& channel) {
   printTable(table);
 }
 
-// Empty buckets before the first and behind the last that has hits say nothing.
+// Leaves out empty buckets before the first and after the last that has hits.
 void ChannelPrinter::printBuckets(KvDictionary& channel) {
   printTitle(channel);
   const auto buckets = readBuckets(channel);

@@ -13,7 +13,7 @@ namespace tally::tools {
 // Prints sampled channels one after another, with a heading for each driver and each group.
 class ChannelPrinter {
  public:
-  // seconds: what lies between the two samples whose difference is shown; empty for one sample.
+  // seconds: between the two samples whose difference is shown; empty for a single sample.
   ChannelPrinter(const ToolContext& context, std::optional<double> seconds);
   ~ChannelPrinter() { printValues(); }
   ChannelPrinter(const ChannelPrinter&) = delete;
@@ -35,10 +35,10 @@ class ChannelPrinter {
   const ToolContext& context_;
   const std::optional<double> seconds_;
   std::optional<std::string> driver_, group_;  // of the last channel
-  Table values_;                               // simple channels that stand together
+  Table values_;                               // consecutive simple channels
 };
 
-// What the channel says of itself: "driver", "driverID", "name", "id", "format", "categories",
+// The description of a channel: "driver", "driverID", "name", "id", "format", "categories",
 // "group", "subgroup", "unit", "unitLabel". 64-bit words are hexadecimal strings, what is missing
 // is null.
 Json jsonOfChannel(KvDictionary& channel);

@@ -7,6 +7,7 @@
 #include "tools/doctor/health_drivers.h"
 #include "tools/doctor/health_files.h"
 #include "tools/doctor/health_services.h"
+#include "tools/frame/command.h"
 #include "tools/frame/table.h"
 
 namespace tally::tools {
@@ -68,7 +69,7 @@ int examine(const ToolContext& context) {
 }  // namespace
 
 void addDoctorCommand(CLI::App& app, ToolContext& context) {
-  addCommand(&app, context, "doctor",
+  addCommand(app, context, "doctor",
              "Check which parts of this device respond, and what is missing",
              [&context] { return examine(context); });
 }

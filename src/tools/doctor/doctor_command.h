@@ -1,4 +1,4 @@
-// tallyctl doctor: what of this device the program can reach, and what is missing.
+// tallyctl doctor: which parts of this device respond, and what is missing.
 #pragma once
 
 #include "tools/frame/tool.h"

@@ -1,4 +1,4 @@
-// What `tallyctl doctor` finds out about one part of the device.
+// What `tallyctl doctor` finds for one part of the device.
 #pragma once
 
 #include <string>
@@ -8,8 +8,8 @@ namespace tally::tools {
 
 enum class Health {
   Ok,
-  Missing,  // not there; the program does without
-  Wrong,    // there, and not as it should be
+  Missing,  // absent; the program works without it
+  Wrong,    // present, but not as it should be
 };
 
 struct HealthCheck {

@@ -21,7 +21,7 @@
 namespace tally::tools {
 namespace {
 
-// Keeps the errors that a check provokes, so that they stand in its own lines.
+// Keeps the errors that a check provokes, so that they appear among its findings.
 class ErrorCollector final : public SystemLog {
  public:
   ErrorCollector() : SystemLog(Repeats::All) {}

@@ -120,7 +120,7 @@ void examineCrashSupport(Platform& platform, HealthChecks& checks) {
   constexpr const char* kSubject = "crash support";
   CrashSupportLibrary& library = *platform.crashSupportLibrary;
   if (!library.open(kCrashSupportPath)) {
-    checks.push_back({Health::Missing, kSubject, "the library is not there"});
+    checks.push_back({Health::Missing, kSubject, "the library is missing"});
     return;
   }
   std::vector<std::string_view> missing;

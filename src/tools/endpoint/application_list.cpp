@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/file.h"
+#include "base/hex.h"
 #include "driver/app_info_listener.h"
 #include "kv/plist_codec.h"
 #include "tools/frame/standard_input.h"
@@ -17,14 +18,7 @@ namespace {
 // More than any message can carry.
 constexpr std::size_t kLargestFile = 64u << 20;
 
-std::optional<unsigned> hexadecimalDigit(char digit) {
-  if (digit >= '0' && digit <= '9') return static_cast<unsigned>(digit - '0');
-  const char lower = static_cast<char>(digit | 0x20);
-  if (lower >= 'a' && lower <= 'f') return static_cast<unsigned>(lower - 'a' + 10);
-  return std::nullopt;
-}
-
-// Null when the text is no UUID of 8-4-4-4-12 digits.
+// Null if the text is not a UUID of 8-4-4-4-12 digits.
 KvRef<KvObject> uuidOf(std::string_view text) {
   constexpr std::string_view kForm = "xxxxxxxx-xxxx-xxxx-xxxx-xxxxxxxxxxxx";
   if (text.size() != kForm.size()) return nullptr;
@@ -35,7 +29,7 @@ KvRef<KvObject> uuidOf(std::string_view text) {
       if (text[i] != '-') return nullptr;
       continue;
     }
-    const auto digit = hexadecimalDigit(text[i]);
+    const auto digit = hexDigitValue(text[i]);
     if (!digit) return nullptr;
     if (high) bytes.push_back(static_cast<std::byte>(*high << 4 | *digit));
     high = high ? std::nullopt : digit;
@@ -50,7 +44,7 @@ KvRef<KvObject> valueOf(const nlohmann::json& json) {
   return nullptr;
 }
 
-// What is not an array of objects gives null.
+// Null if the document is not an array of objects.
 KvRef<KvArray> arrayOfJson(std::string_view document) {
   const auto root = nlohmann::json::parse(document, nullptr, /*allow_exceptions=*/false);
   if (!root.is_array()) return nullptr;

@@ -1,12 +1,12 @@
 #include "tools/endpoint/send_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <nlohmann/json.hpp>
 
 #include "driver/app_info_listener.h"
 #include "host/bus/bus_connection.h"
 #include "tools/endpoint/application_list.h"
+#include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/output.h"
 
@@ -56,23 +56,19 @@ int sendApplications(const ToolContext& context, const SendArguments& arguments)
 }  // namespace
 
 void addSendCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<SendArguments>();
-  CLI::App* const family = app.add_subcommand(
-      "send", "Send a message to the program of this device root, which the bus starts if needed");
-  family->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    return addCommand(family, context, name, description,
-                      [&context, arguments, run] { return run(context, *arguments); });
-  };
-  add("logging", "Announce a list of activated applications", sendLogging);
-  add("day", "Ask for the tasks of a day", sendDay)
-      ->add_option("DAY", arguments->day, kDayForms)
-      ->required();
-  add("apps", "Deliver the list of activated applications", sendApplications)
-      ->add_option("FILE", arguments->file,
-                   "JSON or a property list, - for standard input: an array of objects with "
-                   "bundle_id, version, adam_id, arch and uuid")
-      ->required();
+  CommandGroup<SendArguments> send(
+      addFamily(
+          app, "send",
+          "Send a message to the program of this device root, which the bus starts if needed"),
+      context);
+  SendArguments& arguments = send.arguments();
+  send.add("logging", "Announce a list of activated applications", sendLogging);
+  send.add("day", "Ask for the tasks of a day", sendDay)
+      .argument(kDayValue, &arguments.day, kDayForms);
+  send.add("apps", "Deliver the list of activated applications", sendApplications)
+      .argument(kFileValue, &arguments.file,
+                "JSON or a property list, - for standard input: an array of objects with "
+                "bundle_id, version, adam_id, arch and uuid");
 }
 
 }  // namespace tally::tools

@@ -1,9 +1,9 @@
-// The table of all commands, in the order of the help.
+#include "tools/frame/command_families.h"
+
 #include "tools/channels/channel_commands.h"
 #include "tools/doctor/doctor_command.h"
 #include "tools/endpoint/send_commands.h"
 #include "tools/frame/complete_command.h"
-#include "tools/frame/tool.h"
 #include "tools/preferences/prefs_commands.h"
 #include "tools/report/report_commands.h"
 #include "tools/storage/nand_commands.h"

@@ -8,7 +8,8 @@
 
 namespace CLI {
 class App;
-}
+class Option;
+}  // namespace CLI
 
 namespace tally::tools {
 
@@ -19,6 +20,7 @@ struct OptionHelp {
   std::string description;
   bool required = false, repeats = false;
   bool common = false;  // every command has it
+  const CLI::Option* declared = nullptr;
 };
 
 struct CommandHelp {
@@ -26,17 +28,16 @@ struct CommandHelp {
   std::string description;
   std::vector<OptionHelp> arguments;  // in their order
   std::vector<OptionHelp> options;    // its own, then those that every command has
-  std::vector<const CLI::App*> commands;
+  struct Entry {
+    const CLI::App* app;
+    std::string name, description;
+  };
+  std::vector<Entry> commands;
   std::string usage() const;  // "tallyctl store set [OPTION...] KEY VALUE"
 };
 
-CommandHelp describe(const CLI::App& app);
 // "--day DAY", "-h, --help", "KEY".
 std::string formOf(const OptionHelp& option);
-std::string helpText(const CLI::App& app, const Terminal& terminal);
-// The command of a parsed line that is furthest from the app: what --help is about.
-const CLI::App& chosenCommand(const CLI::App& app);
-// The command of this name below the app; null when there is none.
-const CLI::App* findCommand(const CLI::App& app, std::string_view name);
+std::string helpText(const CommandHelp& help, const Terminal& terminal);
 
 }  // namespace tally::tools

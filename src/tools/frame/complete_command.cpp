@@ -1,6 +1,5 @@
 #include "tools/frame/complete_command.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <limits>
 #include <memory>
@@ -14,7 +13,9 @@
 #include "host/store/store_schema.h"
 #include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "tools/frame/command.h"
 #include "tools/frame/command_help.h"
+#include "tools/frame/command_line.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
 #include "tools/report/daily_log.h"
@@ -35,7 +36,7 @@ struct Line {
   std::size_t arguments = 0;            // of the command, already given
   bool onlyArguments = false;           // after --
   std::string root, domain;             // the values of --root and --domain
-  Platform* platform = nullptr;
+  const ToolContext* context = nullptr;
 };
 
 const OptionHelp* findOption(const CommandHelp& help, std::string_view name) {
@@ -103,7 +104,7 @@ Candidates days(const Line& line) {
 }
 
 PropertyListPreferences preferencesOf(const Line& line) {
-  return {*userPreferencesFolder(line.root, kProgramUser), line.platform->log, 0600,
+  return {*userPreferencesFolder(line.root, kProgramUser), line.context->platform->log, 0600,
           PropertyListPreferences::Access::ReadOnly};
 }
 
@@ -136,23 +137,30 @@ Candidates logs(const Line& line) {
   return found;
 }
 
-Candidates filesOf(const Line&) { return {{":file", ""}}; }
-Candidates foldersOf(const Line&) { return {{":dir", ""}}; }
-
-struct ValueSource {
-  std::string_view value;  // as the help names it
-  Candidates (*list)(const Line& line);
-};
-constexpr ValueSource kSources[] = {
-    {"KEY", storeKeys}, {"DAY", days},     {"DOMAIN", domains}, {"PREFERENCE", preferenceKeys},
-    {"LOG", logs},      {"FILE", filesOf}, {"DIR", foldersOf}};
-
 Candidates valuesOf(const Line& line, const OptionHelp& option) {
   Candidates found;
   for (const std::string& choice : option.choices) found.push_back({choice, ""});
-  const auto* const source = std::ranges::find(kSources, option.value, &ValueSource::value);
-  if (!found.empty() || source == std::end(kSources)) return found;
-  return source->list(line);
+  if (!found.empty()) return found;
+  switch (line.context->valueKinds.at(option.declared)) {
+    case ValueKind::Text:
+    case ValueKind::Number:
+      return {};
+    case ValueKind::StoreKey:
+      return storeKeys(line);
+    case ValueKind::Day:
+      return days(line);
+    case ValueKind::Domain:
+      return domains(line);
+    case ValueKind::Preference:
+      return preferenceKeys(line);
+    case ValueKind::Log:
+      return logs(line);
+    case ValueKind::File:
+      return {{":file", ""}};
+    case ValueKind::Directory:
+      return {{":dir", ""}};
+  }
+  return {};
 }
 
 Candidates optionsOf(const Line& line) {
@@ -165,8 +173,8 @@ Candidates optionsOf(const Line& line) {
 
 Candidates argumentsOf(const Line& line) {
   Candidates found;
-  for (const CLI::App* command : line.help.commands) {
-    found.push_back({command->get_name(), command->get_description()});
+  for (const auto& command : line.help.commands) {
+    found.push_back({command.name, command.description});
   }
   const auto& arguments = line.help.arguments;
   if (!found.empty() || arguments.empty()) return found;
@@ -181,7 +189,7 @@ int complete(const ToolContext& context, const CLI::App& app,
             .help = describe(app),
             .root = context.root,
             .domain = std::string(kProgramDomain),
-            .platform = context.platform};
+            .context = &context};
   for (std::size_t i = 0; i + 1 < words.size(); ++i) takeWord(line, words[i]);
   std::string begun = words.empty() ? "" : words.back(), before;
   if (const std::size_t equals = begun.find('=');
@@ -209,11 +217,12 @@ int complete(const ToolContext& context, const CLI::App& app,
 
 void addCompleteCommand(CLI::App& app, ToolContext& context) {
   const auto words = std::make_shared<std::vector<std::string>>();
-  CLI::App* const command =
-      addCommand(&app, context, "complete", "What may follow the words of a command line",
+  Command command =
+      addCommand(app, context, "complete", "What may follow the words of a command line",
                  [&context, &app, words] { return complete(context, app, *words); });
-  command->group("");
-  command->add_option("WORD", *words, "The words after the program, after --; the last is begun");
+  command.hide();
+  command.optionalArgument({"WORD", ValueKind::Text}, words.get(),
+                           "The words after the program, after --; the last is begun");
 }
 
 }  // namespace tally::tools

@@ -10,7 +10,7 @@
 
 namespace tally::tools {
 
-// What the steps would have left behind.
+// What the steps would have written.
 struct DryRun {
   struct Log {
     std::string typeCode, name, body;

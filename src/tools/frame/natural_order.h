@@ -1,12 +1,12 @@
-// The order in which people expect names that hold numbers.
+// The order in which people expect names that contain numbers.
 #pragma once
 
 #include <string_view>
 
 namespace tally::tools {
 
-// True when a comes before b: by bytes, but runs of digits by the number that they are, so that
-// "bus2" comes before "bus10". Names that differ in leading zeros alone have an order too.
+// True when a comes before b: by bytes, but runs of digits by their value, so that
+// "bus2" comes before "bus10". Names that differ only in leading zeros are ordered too.
 bool naturalLess(std::string_view a, std::string_view b);
 
 }  // namespace tally::tools

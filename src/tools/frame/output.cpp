@@ -57,7 +57,7 @@ void printLine(const ToolContext& context, std::string_view text, Ink ink) {
   if (!context.output.interactive || displayWidth(shown) <= context.output.columns) {
     return print(context.out, inked(context.output, ink, shown) + "\n");
   }
-  // What continues a line is indented further than it.
+  // Continuation lines are indented further.
   constexpr std::size_t kContinued = 2;
   const std::size_t first = std::min(shown.find_first_not_of(' '), context.output.columns / 2);
   const std::size_t hang = first + kContinued;
@@ -199,7 +199,7 @@ std::string printableJson(std::string text) {
   for (std::size_t i = 0; i < text.size();) {
     const std::size_t begin = i;
     const std::uint32_t character = takeCharacter(text, i);
-    // Only texts hold what is not ASCII, so that an escape is right wherever such a character is.
+    // Characters outside ASCII occur only inside strings, where an escape is valid.
     if (character != 0x7F && (character < 0x80 || !isControl(character))) continue;
     out.append(text, copied, begin - copied).append(fmt::format("\\u{:04x}", character));
     copied = i;

@@ -1,4 +1,4 @@
-// How tallyctl says things: ink, bars, numbers for people, JSON for programs.
+// Output of tallyctl: colours, bars, numbers for people, JSON for programs.
 #pragma once
 
 #include <cstdint>
@@ -15,11 +15,11 @@ namespace tally::tools {
 using Json = nlohmann::ordered_json;
 
 enum class Ink { Plain, Strong, Faint, Good, Doubtful, Bad };
-// The text in an ink, where the terminal has colour; the text alone elsewhere.
+// The text in an ink if the terminal has colour, else the plain text.
 std::string inked(const Terminal& terminal, Ink ink, std::string_view text);
 // A title line, with an empty line above it.
 void printHeading(const ToolContext& context, std::string_view title);
-// A line of text that may come from outside. A terminal gets it wrapped, with what continues it
+// A line of text that may be untrusted. On a terminal it is wrapped, and continuation lines are
 // indented further.
 void printLine(const ToolContext& context, std::string_view text, Ink ink = Ink::Plain);
 
@@ -28,14 +28,14 @@ std::string bar(const Terminal& terminal, double share, std::size_t width);
 
 // "1,234,567".
 std::string integerText(std::int64_t value);
-// Four significant digits, grouped, without a fraction that says nothing: "0.0123", "29.02",
+// Four significant digits, grouped, without trailing zeros: "0.0123", "29.02",
 // "48,731,904"; "inf", "-inf", "nan".
 std::string realText(double value);
 // "512 bytes", "1.4 MiB".
 std::string byteText(std::uint64_t bytes);
 // "1 key", "2 keys", "2 entries".
 std::string counted(std::uint64_t count, std::string_view noun);
-// The entries by name, so that what belongs together stands together; as long as the dictionary.
+// The entries by name, so that related ones are adjacent. They are valid as long as the dictionary.
 std::vector<const KvDictionary::Entry*> entriesByName(const KvDictionary& dictionary);
 // "string", "number", "dictionary".
 std::string_view typeName(KvType type);
@@ -51,12 +51,12 @@ Json jsonOfReal(double value);
 void addMember(Json& object, std::string name, Json value);
 void printJson(const ToolContext& context, const Json& document);
 
-// JSON whose texts hold no character that a terminal would obey: control characters beyond those
-// that JSON escapes anyway, and those that reorder a line, are written as escapes.
+// JSON that is safe to show on a terminal: control characters beyond those that JSON escapes
+// anyway, and characters that reorder a line, are escaped.
 std::string printableJson(std::string text);
 
-// Says why the command ends, and passes the status on: a line on standard error, or with --json a
-// part of the error object that runTool() prints.
+// Reports why the command fails, as a line on standard error or with --json as a part of the error
+// object that runTool() prints. Returns the status.
 int complain(const ToolContext& context, std::string_view message, ExitStatus status);
 
 }  // namespace tally::tools

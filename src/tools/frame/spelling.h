@@ -1,4 +1,4 @@
-// Words that may be meant by a misspelt one.
+// The words that a misspelt one may mean.
 #pragma once
 
 #include <optional>
@@ -9,12 +9,12 @@
 
 namespace tally::tools {
 
-// The known words that are so near to the text, letter case and punctuation aside, that they may be
-// meant: at most so many, the nearest first, and none that is much further than it.
+// The known words that the text may mean, ignoring case and punctuation: at most so many, the
+// nearest first, and none that is much further than the nearest.
 std::vector<std::string_view> nearestWords(std::string_view text,
                                            std::span<const std::string_view> words,
                                            std::size_t most);
-// The nearest one; empty when none is.
+// The nearest word; empty if none is near.
 std::optional<std::string_view> nearestWord(std::string_view text,
                                             std::span<const std::string_view> words);
 

@@ -8,7 +8,7 @@
 
 namespace tally::tools {
 
-// An error when it cannot be read or holds more than so many bytes.
+// An error if it cannot be read or is larger than mostBytes.
 Result<std::string> readStandardInput(std::size_t mostBytes);
 
 }  // namespace tally::tools

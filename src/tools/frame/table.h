@@ -14,7 +14,7 @@ enum class Align { Left, Right };
 struct Column {
   std::string title;  // a table whose titles are all empty has no title line
   Align align = Align::Left;
-  bool shrinks = false;  // gives way when the terminal is too narrow: its text is wrapped
+  bool shrinks = false;  // shrinks if the terminal is too narrow: its text is wrapped
 };
 
 struct Cell {
@@ -50,8 +50,8 @@ class Table {
   bool hasTitles() const;
   void renderRow(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
                  const Layout& layout, std::size_t indent) const;
-  // A row that does not fit: a cell a line after its title, or cells without titles one after the
-  // other.
+  // A row that does not fit: one cell per line after its title, or cells without titles in
+  // sequence.
   void renderTitled(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
                     std::size_t indent) const;
   void renderRunning(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,

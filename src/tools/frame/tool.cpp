@@ -2,7 +2,6 @@
 
 #include <fmt/core.h>
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
@@ -10,6 +9,7 @@
 
 #include "base/version.h"
 #include "tools/frame/command_help.h"
+#include "tools/frame/command_line.h"
 #include "tools/frame/output.h"
 #include "tools/frame/usage_error.h"
 
@@ -23,30 +23,30 @@ bool asksForJson(std::span<const char* const> arguments) {
 
 int runCommand(ToolContext& context, std::span<const char* const> arguments,
                const PlatformFactory& makePlatform) {
-  CLI::App app;
-  addAllCommands(app, context);
-  try {
-    app.parse(static_cast<int>(arguments.size()), arguments.data());
-  } catch (const CLI::CallForHelp&) {
-    print(context.out, helpText(chosenCommand(app), context.output));
-    return kSuccess;
-  } catch (const CLI::CallForVersion&) {
-    if (context.json) {
-      printJson(context, {{"program", "tallyctl"}, {"version", kProgramVersion}});
-    } else {
-      print(context.out, fmt::format("tallyctl {}\n", kProgramVersion));
-    }
-    return kSuccess;
-  } catch (const CLI::ParseError& error) {
-    return complain(context, usageFault(app, arguments, error), kBadUsage);
+  CommandLine line(context);
+  switch (line.parse(arguments)) {
+    case CommandLine::Request::Help:
+      print(context.out, helpText(describe(line.chosen()), context.output));
+      return kSuccess;
+    case CommandLine::Request::Version:
+      if (context.json) {
+        printJson(context, {{"program", "tallyctl"}, {"version", kProgramVersion}});
+      } else {
+        print(context.out, fmt::format("tallyctl {}\n", kProgramVersion));
+      }
+      return kSuccess;
+    case CommandLine::Request::Refused:
+      return complain(context, usageFault(line.app(), arguments, line.fault()), kBadUsage);
+    case CommandLine::Request::Command:
+      break;
   }
-  // The libraries hwreport and storage find the platform in force; the tool is handed it.
-  const PlatformScope scope(makePlatform(context.root));
-  context.platform = &platform();
+  // The libraries hwreport and storage find the platform in force; commands are handed it.
+  PlatformScope scope(makePlatform(context.root));
+  context.platform = &scope.services();
   return context.command();
 }
 
-// Every command's output is checked here, so that none has to look after it.
+// Checks the output of every command, so that no command has to.
 int finishOutput(const ToolContext& context, int status) {
   const bool failed = std::ferror(context.out) != 0;
   // What is left in the buffer after a failure fails once more, for the same reason.
@@ -70,19 +70,6 @@ void reportFailure(const ToolContext& context, int status) {
 
 }  // namespace
 
-void addAllCommands(CLI::App& app, ToolContext& context) {
-  app.name("tallyctl");
-  app.description("Inspects a device's analytics: what is stored, what is reported, and why.");
-  app.set_help_flag("-h,--help", "Print this help");
-  app.require_subcommand(1);
-  app.fallthrough();  // the common options may stand anywhere
-  app.set_version_flag("--version", std::string(kProgramVersion), "Print the version");
-  app.add_option("--root", context.root, "The device root; TALLYRUN_ROOT or / by default")
-      ->type_name("DIR");
-  app.add_flag("--json", context.json, "Print JSON");
-  for (const CommandFamily addCommands : commandFamilies()) addCommands(app, context);
-}
-
 int runTool(ToolContext context, std::span<const char* const> arguments,
             const PlatformFactory& makePlatform) {
   std::vector<std::string> complaints;
@@ -97,13 +84,6 @@ int runTool(ToolContext context, std::span<const char* const> arguments,
     for (const std::string& complaint : complaints) complain(context, complaint, kSuccess);
   }
   return status;
-}
-
-CLI::App* addCommand(CLI::App* family, ToolContext& context, const char* name,
-                     const char* description, std::function<int()> run) {
-  CLI::App* const command = family->add_subcommand(name, description);
-  command->callback([&context, run = std::move(run)] { context.command = run; });
-  return command;
 }
 
 void print(std::FILE* file, std::string_view text) {

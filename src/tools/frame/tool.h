@@ -1,8 +1,9 @@
-// What every command of tallyctl shares: the device, the form of the output and the exit status.
+// What all commands of tallyctl share: the device, the output format and the exit status.
 #pragma once
 
 #include <cstdio>
 #include <functional>
+#include <map>
 #include <span>
 #include <string>
 #include <string_view>
@@ -13,15 +14,19 @@
 
 namespace CLI {
 class App;
-}
+class Option;
+}  // namespace CLI
 
 namespace tally::tools {
 
 enum ExitStatus : int {
   kSuccess = 0,
   kWrong = 1,     // the thing asked about is wrong or missing
-  kBadUsage = 2,  // the command line makes no sense
+  kBadUsage = 2,  // the command line is malformed
 };
+
+// What a value on the command line is: completion offers what the device has of this kind.
+enum class ValueKind { Text, Number, StoreKey, Day, Domain, Preference, Log, File, Directory };
 
 struct ToolContext {
   std::string root;   // the device root: --root, else what it was built with
@@ -32,28 +37,17 @@ struct ToolContext {
   std::FILE* err = stderr;
   // The services of the device root, while a command runs; borrowed.
   Platform* platform = nullptr;
-  // What went wrong, for the error object of --json; borrowed.
+  // The messages for the error object of --json; borrowed.
   std::vector<std::string>* complaints = nullptr;
-  // The command that the arguments chose, set by the callback of its CLI::App. It runs once the
-  // platform of the root is installed, and returns the exit status.
+  // Of every declared option and argument that takes a value.
+  std::map<const CLI::Option*, ValueKind> valueKinds;
+  // The command that the arguments chose. It runs once the platform of the root is installed, and
+  // returns the exit status.
   std::function<int()> command;
 };
 
-// Each family of commands adds its own subcommands with a function of this form, declared in its
-// own header and listed in commandFamilies(). The app and the context outlive the commands.
-using CommandFamily = void (*)(CLI::App& app, ToolContext& context);
-std::span<const CommandFamily> commandFamilies();
-
-// Adds a command to a family. Its options are added to what is returned; run is called when the
-// arguments chose it.
-CLI::App* addCommand(CLI::App* family, ToolContext& context, const char* name,
-                     const char* description, std::function<int()> run);
-
 // Makes the platform of a device root.
 using PlatformFactory = std::function<Platform(const std::string& root)>;
-
-// Adds the commands, and the options that all of them take, to an app.
-void addAllCommands(CLI::App& app, ToolContext& context);
 
 // Runs the command that the arguments name (the first is the program's own name) and returns the
 // exit status, which is kWrong where context.out could not be written. Help goes to context.out,

@@ -8,8 +8,8 @@
 
 namespace tally::tools {
 
-// Errors go to the file as lines of tallyctl, the same one once; everything else is the daily job's
-// affair. The file is borrowed.
+// Writes errors to the file as lines of tallyctl, each text once. Other levels concern the daily
+// job and are dropped. The file is borrowed.
 std::shared_ptr<SystemLog> makeToolLog(std::FILE* file);
 
 }  // namespace tally::tools

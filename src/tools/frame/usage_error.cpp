@@ -2,7 +2,6 @@
 
 #include <fmt/core.h>
 
-#include <CLI/CLI.hpp>
 #include <string_view>
 #include <vector>
 
@@ -16,7 +15,7 @@ constexpr std::size_t kSuggested = 3;
 
 std::vector<std::string_view> namesOf(const CommandHelp& help) {
   std::vector<std::string_view> names;
-  for (const CLI::App* command : help.commands) names.push_back(command->get_name());
+  for (const auto& command : help.commands) names.push_back(command.name);
   return names;
 }
 
@@ -61,20 +60,20 @@ std::string unexpected(const CommandHelp& help, std::string_view word) {
 }  // namespace
 
 std::string usageFault(const CLI::App& app, std::span<const char* const> arguments,
-                       const CLI::ParseError& error) {
+                       const ParseFault& refused) {
   const Path path = follow(app, arguments);
   const CommandHelp help = describe(*path.command);
-  std::string fault = error.what();
+  std::string fault = refused.text;
   const auto names = namesOf(help);
-  const auto rest = app.remaining(true);
+  const auto& rest = refused.rest;
   const bool unknownOption = !rest.empty() && rest.front().starts_with('-');
-  if (dynamic_cast<const CLI::ArgumentMismatch*>(&error) != nullptr) {
+  if (refused.kind == ParseFault::Kind::Mismatch) {
     const std::string name = fault.substr(0, fault.find(':'));
     const bool isMissing = fault.ends_with("missing");
     fault = name + (isMissing ? " needs a value" : " is given more than once");
   } else if (path.stop.empty() && unknownOption) {
     fault = unexpected(help, rest.front());
-  } else if (!names.empty() && dynamic_cast<const CLI::RequiredError*>(&error) != nullptr) {
+  } else if (!names.empty() && refused.kind == ParseFault::Kind::Required) {
     const auto near = nearestWords(path.stop, names, kSuggested);
     fault = path.stop.empty() ? fmt::format("{} needs a command: ", help.path)
                               : fmt::format("{} has no command \"{}\"", help.path, path.stop);
@@ -85,7 +84,7 @@ std::string usageFault(const CLI::App& app, std::span<const char* const> argumen
     } else {
       fault += suggestion(near);
     }
-  } else if (dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr) {
+  } else if (refused.kind == ParseFault::Kind::Extra) {
     if (!rest.empty()) fault = unexpected(help, rest.front());
   }
   return fmt::format("{} (see {} --help)", fault, help.path);

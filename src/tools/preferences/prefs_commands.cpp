@@ -1,10 +1,10 @@
 #include "tools/preferences/prefs_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cmath>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <optional>
 
 #include "base/file.h"
 #include "base/number_text.h"
@@ -15,6 +15,7 @@
 #include "kv/plist_codec.h"
 #include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "tools/frame/command.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"
@@ -25,7 +26,8 @@ namespace {
 using Access = PropertyListPreferences::Access;
 
 struct PrefsArguments {
-  std::string key, value, file;
+  std::string key;
+  std::optional<std::string> value, file;
   std::string type = "auto";
   std::string domain{kProgramDomain};
   std::string listedDomain;  // empty: the domains are listed
@@ -39,7 +41,7 @@ bool isDomainName(const std::string& name) {
   return isSafeFileName(name) && !isTemporaryName(name);
 }
 
-// A name for a line of text: the empty key is a key, too.
+// A visible name, also for the empty key.
 std::string keyText(const std::string& key) { return key.empty() ? "\"\"" : key; }
 
 int refuseDomain(const ToolContext& context, const std::string& name) {
@@ -74,19 +76,19 @@ struct ValueType {
 constexpr ValueType kTypes[] = {
     {"boolean", booleanOf}, {"integer", integerOf}, {"real", realOf}, {"string", stringOf}};
 
-// What the arguments say the value is; an error when they contradict each other.
+// The value that the arguments describe; an error if they contradict each other.
 Result<KvRef<KvObject>> valueOf(const PrefsArguments& arguments) {
-  if (!arguments.file.empty()) {
-    const auto document = readFile(arguments.file, kPlistMaximumBytes);
+  if (arguments.file) {
+    const auto document = readFile(*arguments.file, kPlistMaximumBytes);
     if (!document) return document.error();
     return decodePlist(*document);
   }
   for (const ValueType& type : kTypes) {
     if (arguments.type != "auto" && arguments.type != type.name) continue;
-    if (auto value = type.parse(arguments.value)) return value;
+    if (auto value = type.parse(*arguments.value)) return value;
   }
   return Error{
-      fmt::format("\"{}\" is not a value of the type {}", arguments.value, arguments.type)};
+      fmt::format("\"{}\" is not a value of the type {}", *arguments.value, arguments.type)};
 }
 
 int get(const ToolContext& context, const PrefsArguments& arguments) {
@@ -114,7 +116,7 @@ int get(const ToolContext& context, const PrefsArguments& arguments) {
   return kSuccess;
 }
 
-// Whether a domain's file gives the key and the value back as they are: XML carries neither control
+// Whether a domain's file returns the key and the value unchanged: XML can contain neither control
 // characters nor bytes that are not UTF-8.
 bool canBeStored(const std::string& key, const std::string& text, const KvRef<KvObject>& value) {
   if (!isValidUtf8(key) || !isValidUtf8(text)) return false;
@@ -145,10 +147,14 @@ int write(const ToolContext& context, const PrefsArguments& arguments, KvRef<KvO
 }
 
 int set(const ToolContext& context, const PrefsArguments& arguments) {
+  if (!arguments.value && !arguments.file) {
+    return complain(context, "VALUE or --file is required (see tallyctl prefs set --help)",
+                    kBadUsage);
+  }
   if (!isDomainName(arguments.domain)) return refuseDomain(context, arguments.domain);
   const auto value = valueOf(arguments);
   if (!value) return complain(context, value.error().message, kBadUsage);
-  if (!canBeStored(arguments.key, arguments.value, *value)) {
+  if (!canBeStored(arguments.key, arguments.value.value_or(""), *value)) {
     return complain(context,
                     fmt::format("{} cannot be stored as given: a property list has no control "
                                 "characters, only valid UTF-8",
@@ -168,22 +174,30 @@ int remove(const ToolContext& context, const PrefsArguments& arguments) {
   return write(context, arguments, nullptr);
 }
 
+struct ListedDomain {
+  std::string name;
+  std::size_t keys;
+};
+
 int listDomains(const ToolContext& context, PropertyListPreferences& preferences) {
-  auto domains = preferences.listDomains();
-  if (!domains) return complain(context, domains.error().message, kWrong);
-  Table table({{"domain", Align::Left, true}, {"keys", Align::Right}});
-  Json document = Json::array();
-  std::ranges::sort(*domains, naturalLess);
-  for (const std::string& domain : *domains) {
-    const auto keys = preferences.copyDomain(domain)->size();
-    table.add({domain, integerText(static_cast<std::int64_t>(keys))});
-    document.push_back({{"domain", domain}, {"keys", keys}});
+  auto names = preferences.listDomains();
+  if (!names) return complain(context, names.error().message, kWrong);
+  std::ranges::sort(*names, naturalLess);
+  std::vector<ListedDomain> domains;
+  for (const std::string& name : *names) {
+    domains.push_back({name, preferences.copyDomain(name)->size()});
   }
   if (context.json) {
+    Json document = Json::array();
+    for (const auto& [name, keys] : domains) document.push_back({{"domain", name}, {"keys", keys}});
     printJson(context, document);
-  } else if (table.empty()) {
+  } else if (domains.empty()) {
     printLine(context, "no preferences are set");
   } else {
+    Table table({{"domain", Align::Left, true}, {"keys", Align::Right}});
+    for (const auto& [name, keys] : domains) {
+      table.add({name, integerText(static_cast<std::int64_t>(keys))});
+    }
     table.print(context);
   }
   return kSuccess;
@@ -216,48 +230,38 @@ int list(const ToolContext& context, const PrefsArguments& arguments) {
 }  // namespace
 
 void addPrefsCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<PrefsArguments>();
-  CLI::App* const prefs = app.add_subcommand("prefs", "Read and write preferences");
-  prefs->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    return addCommand(prefs, context, name, description,
-                      [&context, arguments, run] { return run(context, *arguments); });
-  };
-  const auto addKey = [&](CLI::App* command) {
-    command->add_option("PREFERENCE", arguments->key, "Its key")->required();
-    command->add_option("--domain", arguments->domain, "The domain")
-        ->type_name("DOMAIN")
-        ->capture_default_str();
+  CommandGroup<PrefsArguments> prefs(addFamily(app, "prefs", "Read and write preferences"),
+                                     context);
+  PrefsArguments& arguments = prefs.arguments();
+  constexpr Value kDomainValue{"DOMAIN", ValueKind::Domain};
+  const auto addKey = [&](Command command) {
+    command.argument({"PREFERENCE", ValueKind::Preference}, &arguments.key, "Its key");
+    command.option("--domain", kDomainValue, &arguments.domain, "The domain").showsDefault();
+    return command;
   };
 
-  addKey(add("get", "Print a value", get));
+  addKey(prefs.add("get", "Print a preference", get));
 
-  CLI::App* command = add("set", "Write a value", set);
-  addKey(command);
-  CLI::Option* const value = command->add_option("VALUE", arguments->value, "The value as text");
-  CLI::Option* const file =
+  Command command = addKey(prefs.add("set", "Write a preference", set));
+  const Option value =
+      command.optionalArgument({"VALUE", ValueKind::Text}, &arguments.value, "The value as text");
+  const Option file =
       command
-          ->add_option("--file", arguments->file,
-                       "A property list whose root is the value: for arrays, dictionaries, data")
-          ->type_name("FILE")
-          ->excludes(value);
+          .option("--file", kFileValue, &arguments.file,
+                  "A property list whose root is the value: for arrays, dictionaries, data")
+          .excludes(value);
   command
-      ->add_option("--type", arguments->type,
-                   "string, integer, real or boolean; auto uses the first that fits of boolean "
-                   "(true, false, yes, no), integer, real, string")
-      ->check(CLI::IsMember({"auto", "string", "integer", "real", "boolean"}))
-      ->type_name("TYPE")
-      ->excludes(file);
-  command->callback([&context, arguments, value, file] {
-    if (value->count() + file->count() == 0) throw CLI::RequiredError("VALUE or --file");
-    context.command = [&context, arguments] { return set(context, *arguments); };
-  });
+      .option("--type", {"TYPE", ValueKind::Text}, &arguments.type,
+              "string, integer, real or boolean; auto uses the first that fits of boolean "
+              "(true, false, yes, no), integer, real, string")
+      .oneOf({"auto", "string", "integer", "real", "boolean"})
+      .excludes(file);
 
-  addKey(add("delete", "Remove a value", remove));
+  addKey(prefs.add("delete", "Remove a preference", remove));
 
-  command = add("list", "List the domains, or the keys of one", list);
-  command->add_option("--domain", arguments->listedDomain, "The domain whose keys are listed")
-      ->type_name("DOMAIN");
+  prefs.add("list", "List the domains of preferences, or the keys of one", list)
+      .option("--domain", kDomainValue, &arguments.listedDomain,
+              "The domain whose keys are listed");
 }
 
 }  // namespace tally::tools

@@ -14,10 +14,10 @@
 
 namespace tally::tools {
 
-// A document that has the shape of a daily log. What a damaged one lacks reads as empty.
+// A document in the form of a daily log. Missing parts of a damaged one are empty.
 class DailyLog {
  public:
-  // An error when the bytes are no property list, or not that of a daily log.
+  // An error if the bytes are not a property list, or not that of a daily log.
   static Result<DailyLog> parse(std::string_view bytes);
   static Result<DailyLog> of(KvRef<KvDictionary> document);
 

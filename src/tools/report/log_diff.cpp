@@ -16,7 +16,7 @@ namespace {
 constexpr std::string_view kParts[] = {"TBScalars", "TBDistributions", "TBDistributionsHistogram",
                                        "TBMetadata"};
 
-// What stands beside the parts that are compared key by key.
+// The document without the parts that are compared key by key.
 KvRef<KvDictionary> besideParts(const DailyLog& log) {
   auto rest = KvDictionary::create();
   for (const auto& entry : log.document()) {

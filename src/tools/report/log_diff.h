@@ -21,8 +21,8 @@ std::vector<Difference> differences(const KvDictionary& before, const KvDictiona
 
 void printLogDiff(const ToolContext& context, const DailyLog& before, const DailyLog& after);
 // {"scalars", "distributions", "histograms", "metadata", "document"}, each {"added", "removed",
-// "changed": {key: {"before", "after"}}}; changed scalars have a "delta" too. "document" is what
-// stands beside the four.
+// "changed": {key: {"before", "after"}}}; changed scalars have a "delta" too. "document" is the
+// rest.
 Json jsonOfLogDiff(const DailyLog& before, const DailyLog& after);
 
 }  // namespace tally::tools

@@ -1,4 +1,4 @@
-// A daily log, drawn for people.
+// Prints a daily log for people.
 #pragma once
 
 #include "tools/frame/output.h"
@@ -10,10 +10,10 @@ namespace tally::tools {
 // applications, each as a table. options are those of the submission and may be null.
 void printDailyLog(const ToolContext& context, const DailyLog& log, const KvDictionary* options);
 
-// The buckets of one histogram as a table with bars, each line behind so many blanks.
+// The buckets of one histogram as a table with bars, each line after so many blanks.
 void printHistogram(const ToolContext& context, const KvDictionary& histogram, std::size_t indent);
 
-// The document, with what people derive from it: {"document", "options", "standardDeviations"}.
+// The document with derived figures: {"document", "options", "standardDeviations"}.
 Json jsonOf(const DailyLog& log, const KvDictionary* options);
 
 // A value on one line: strings as they are, numbers grouped, containers as their size.

@@ -16,8 +16,8 @@ struct Preview {
   std::string body;              // the document as its bytes
 };
 
-// Builds the day's log by the very steps of the daily job, as a dry run. Follows a key when a trace
-// is given.
+// Builds the day's log with the steps of the daily job, as a dry run. Follows a key if a trace is
+// given.
 Preview previewLog(const Platform& platform, std::int32_t day, KeyTrace* trace = nullptr);
 
 }  // namespace tally::tools

@@ -1,15 +1,16 @@
 #include "tools/report/report_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <nlohmann/json.hpp>
 
 #include "base/file.h"
+#include "base/text_lines.h"
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
 #include "platform/platform.h"
 #include "report/document.h"
+#include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/standard_input.h"
 #include "tools/frame/table.h"
@@ -98,45 +99,69 @@ int preview(const ToolContext& context, const ReportArguments& arguments) {
   return kSuccess;
 }
 
-int list(const ToolContext& context, const ReportArguments&) {
-  const SubmittedLogs logs(context);
-  const auto all = logs.list();
-  if (!all) return complain(context, all.error().message, kWrong);
+struct ListedLog {
+  SpooledLog log;
+  std::optional<DailyLog> content;  // of a daily log that can be read
+  std::string_view fault;           // "damaged" and the like; empty when nothing is wrong
+};
+
+std::vector<ListedLog> gatherLogs(const SubmittedLogs& logs, const std::vector<SpooledLog>& all) {
+  std::vector<ListedLog> listed;
+  for (const SpooledLog& log : all) {
+    const auto body = logs.read(log);
+    auto content = body ? DailyLog::parse(*body) : Result<DailyLog>(body.error());
+    if (content) {
+      listed.push_back({log, *std::move(content), ""});
+    } else {
+      listed.push_back({log, std::nullopt, faultOf(log, body)});
+    }
+  }
+  return listed;
+}
+
+Json logsJson(const std::vector<ListedLog>& logs) {
   Json document = Json::array();
+  for (const auto& [log, content, fault] : logs) {
+    document.push_back(
+        {{"file", log.fileName},
+         {"sequence", log.sequence},
+         {"name", log.name},
+         {"typeCode", log.typeCode},
+         {"bytes", log.bytes},
+         {"created", log.creationTime ? Json(timeText(log.creationTime)) : Json(nullptr)},
+         {"day", content ? dayJson(*content) : Json(nullptr)},
+         {"keys", content ? Json(content->keyCount()) : Json(nullptr)}});
+  }
+  return document;
+}
+
+void printLogs(const ToolContext& context, const std::vector<ListedLog>& logs) {
+  if (logs.empty()) return printLine(context, "no log was submitted yet");
   Table table({{"log", Align::Left, true},
                {"type", Align::Right},
                {"day"},
                {"created"},
                {"size", Align::Right},
                {"keys", Align::Right}});
-  for (const SpooledLog& log : *all) {
-    const auto body = logs.read(log);
-    const auto content = body ? DailyLog::parse(*body) : Result<DailyLog>(body.error());
-    if (context.json) {
-      Json item = {{"file", log.fileName},
-                   {"sequence", log.sequence},
-                   {"name", log.name},
-                   {"typeCode", log.typeCode},
-                   {"bytes", log.bytes}};
-      item["created"] = log.creationTime ? Json(timeText(log.creationTime)) : Json(nullptr);
-      item["day"] = content ? dayJson(*content) : Json(nullptr);
-      item["keys"] = content ? Json(content->keyCount()) : Json(nullptr);
-      document.push_back(std::move(item));
-      continue;
-    }
-    const std::string_view fault = content ? "" : faultOf(log, body);
+  for (const auto& [log, content, fault] : logs) {
     table.add({log.fileName, log.typeCode,
                !fault.empty() ? Cell(std::string(fault), Ink::Bad)
                               : Cell(content ? dayDate(*content) : "-"),
                timeText(log.creationTime), byteText(log.bytes),
                content ? integerText(static_cast<std::int64_t>(content->keyCount())) : "-"});
   }
+  table.print(context);
+}
+
+int list(const ToolContext& context, const ReportArguments&) {
+  const SubmittedLogs logs(context);
+  const auto all = logs.list();
+  if (!all) return complain(context, all.error().message, kWrong);
+  const auto listed = gatherLogs(logs, *all);
   if (context.json) {
-    printJson(context, document);
-  } else if (table.empty()) {
-    printLine(context, "no log was submitted yet");
+    printJson(context, logsJson(listed));
   } else {
-    table.print(context);
+    printLogs(context, listed);
   }
   return kSuccess;
 }
@@ -148,15 +173,11 @@ int showText(const ToolContext& context, const std::string& title, std::string_v
     return kSuccess;
   }
   printLine(context, title, Ink::Strong);
-  for (std::size_t begin = 0; begin < body.size();) {
-    const std::size_t end = std::min(body.find('\n', begin), body.size());
-    printLine(context, body.substr(begin, end - begin));
-    begin = end + 1;
-  }
+  eachLine(body, [&](std::string_view line) { printLine(context, line); });
   return kSuccess;
 }
 
-// What begins like a property list is one that is damaged, however well it reads.
+// Text that begins like a property list is a damaged property list, even if it is readable.
 bool isText(std::string_view body) {
   constexpr std::size_t kHead = 1024;
   const bool beginsList =
@@ -165,7 +186,7 @@ bool isText(std::string_view body) {
   return !beginsList && isValidUtf8(body) && body.find('\0') == body.npos;
 }
 
-// Structured-data logs are property lists too; they are shown as what they hold.
+// Structured-data logs are property lists too; they are shown as JSON.
 int showPropertyList(const ToolContext& context, const std::string& title, const KvObject& root) {
   const auto* const fields = kvCast<KvDictionary>(&root);
   if (fields == nullptr || !fields->contains("RecordType")) {
@@ -191,8 +212,8 @@ int showDailyLog(const ToolContext& context, const std::string& title, std::size
   return kSuccess;
 }
 
-// Any log, from the spool or from elsewhere (spooled is null then): by what it holds, so that a
-// copy is shown like the log itself.
+// Shows any log, from the spool or from a file (spooled is null then). The content decides how, so
+// that a copy is shown like the log itself.
 int showBody(const ToolContext& context, const std::string& title, std::string_view body,
              const SpooledLog* spooled) {
   const bool mustBeDaily = spooled != nullptr && isDailyLog(*spooled);
@@ -238,26 +259,23 @@ int show(const ToolContext& context, const ReportArguments& arguments) {
 }  // namespace
 
 void addReportCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<ReportArguments>();
-  CLI::App* const report = app.add_subcommand("report", "Show the next log and earlier ones");
-  report->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    return addCommand(report, context, name, description,
-                      [&context, arguments, run] { return run(context, *arguments); });
-  };
-  CLI::App* command =
-      add("preview", "The log that would be submitted; changes nothing on the device", preview);
-  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
-  CLI::Option* const diff =
-      command->add_flag("--diff", arguments->diff, "Only differences from the last submitted log");
-  command->add_flag("--xml", arguments->xml, "The document itself, byte for byte")->excludes(diff);
+  CommandGroup<ReportArguments> report(
+      addFamily(app, "report", "Show the next log and earlier ones"), context);
+  ReportArguments& arguments = report.arguments();
 
-  add("list", "List the submitted logs", list);
+  Command command = report.add(
+      "preview", "Show the log that would be submitted; changes nothing on the device", preview);
+  command.option("--day", kDayValue, &arguments.day, kDayForms);
+  const Option diff =
+      command.flag("--diff", &arguments.diff, "Only differences from the last submitted log");
+  command.flag("--xml", &arguments.xml, "The document itself, byte for byte").excludes(diff);
 
-  command = add("show", "A submitted log: statistics, histograms, scalars", show);
-  command->add_option(
-      "LOG", arguments->name,
-      "Its number or name, a file, or - for standard input; the last daily log by default");
+  report.add("list", "List the submitted logs", list);
+
+  report.add("show", "Show a submitted log: statistics, histograms, scalars", show)
+      .optionalArgument(
+          {"LOG", ValueKind::Log}, &arguments.name,
+          "Its number or name, a file, or - for standard input; the last daily log by default");
 }
 
 }  // namespace tally::tools

@@ -15,9 +15,9 @@ bool hasDriver(Platform& platform) {
 
 }  // namespace
 
-CLI::App* addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
-                         const char* description, std::function<int()> run) {
-  return addCommand(&nand, context, name, description, [&context, run = std::move(run)] {
+Command addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
+                       const char* description, std::function<int()> run) {
+  return addCommand(nand, context, name, description, [&context, run = std::move(run)] {
     if (hasDriver(*context.platform)) return run();
     return complain(context, "this device has no driver that exports figures of its flash storage",
                     kWrong);

@@ -1,6 +1,5 @@
 #include "tools/storage/nand_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -9,6 +8,7 @@
 #include "storage/auxiliary_metrics.h"
 #include "storage/exporter.h"
 #include "storage/nand_info.h"
+#include "tools/frame/command.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
 #include "tools/storage/nand_command.h"
@@ -20,7 +20,7 @@
 namespace tally::tools {
 namespace {
 
-// What the dictionary says went wrong; empty when nothing did.
+// The failure that the dictionary records; empty if there is none.
 std::string failureOf(const KvDictionary& info) {
   return info.contains(kNANDInfoErrorKey) ? kvText(info.get(kNANDInfoErrorMessageKey)) : "";
 }
@@ -165,20 +165,20 @@ int runHealth(const ToolContext& context) {
 }  // namespace
 
 void addNandCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* nand = app.add_subcommand("nand", "Figures and health of the flash storage");
-  nand->require_subcommand(1);
+  CLI::App& nand = addFamily(app, "nand", "Show figures and health of the flash storage");
 
   const auto text = std::make_shared<std::string>();
-  addNandCommand(*nand, context, "info", "What the storage driver exports, in groups",
+  addNandCommand(nand, context, "info", "Show what the storage driver exports, in groups",
                  [&context, text] { return runInfo(context, *text); })
-      ->add_option("TEXT", *text, "Only keys that contain it");
-  addNandCommand(*nand, context, "health",
-                 "Wear, errors and spare blocks; exit status 1 when the storage should be retired",
-                 [&context] { return runHealth(context); });
+      .optionalArgument(kTextValue, text.get(), "Only keys that contain it");
+  addNandCommand(
+      nand, context, "health",
+      "Show wear, errors and spare blocks; exit status 1 when the storage should be retired",
+      [&context] { return runHealth(context); });
 
-  addNandListCommands(*nand, context);
-  addNandEventCommands(*nand, context);
-  addNandSnapshotCommands(*nand, context);
+  addNandListCommands(nand, context);
+  addNandEventCommands(nand, context);
+  addNandSnapshotCommands(nand, context);
 }
 
 }  // namespace tally::tools

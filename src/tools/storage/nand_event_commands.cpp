@@ -1,6 +1,5 @@
 #include "tools/storage/nand_event_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <utility>
@@ -9,6 +8,7 @@
 #include "storage/analytics_events.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info/analytics_day.h"
+#include "tools/frame/command.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
 #include "tools/storage/nand_command.h"
@@ -22,7 +22,7 @@ struct ShownEvent {
   KvRef<KvDictionary> payload;
 };
 
-// Takes the place of the device's service: keeps every event, sends none.
+// Replaces the device's service: keeps every event and sends none.
 class EventPreview final : public AnalyticsEvents {
  public:
   explicit EventPreview(std::shared_ptr<AnalyticsEvents> service) : service_(std::move(service)) {}
@@ -75,35 +75,33 @@ void printEvent(const ToolContext& context, const ShownEvent& event) {
   }
 }
 
+Json eventJson(const ShownEvent& event) {
+  return {
+      {"event", event.name}, {"wanted", event.wanted}, {"payload", jsonOf(event.payload.get())}};
+}
+
 int runEvents(const ToolContext& context, const std::string& text) {
   const bool available = context.platform->analyticsEvents->isAvailable();
-  const auto events = previewEvents(*context.platform);
-  std::size_t wanted = 0, shown = 0;
-  Json listed = Json::array();
-  for (const ShownEvent& event : events) {
-    wanted += event.wanted;
-    if (event.name.find(text) == std::string::npos) continue;
-    ++shown;
-    if (context.json) {
-      listed.push_back({{"event", event.name},
-                        {"wanted", event.wanted},
-                        {"payload", jsonOf(event.payload.get())}});
-    } else {
-      printEvent(context, event);
-    }
-  }
+  auto events = previewEvents(*context.platform);
+  const std::size_t all = events.size();
+  const auto wanted = std::ranges::count_if(events, &ShownEvent::wanted);
+  std::erase_if(
+      events, [&](const ShownEvent& event) { return event.name.find(text) == std::string::npos; });
   if (context.json) {
+    Json listed = Json::array();
+    for (const ShownEvent& event : events) listed.push_back(eventJson(event));
     printJson(context, {{"serviceAvailable", available},
                         {"analyticsDay", isAnalyticsDay()},
                         {"events", std::move(listed)}});
-  } else if (shown > 0) {
+  } else if (!events.empty()) {
+    for (const ShownEvent& event : events) printEvent(context, event);
     printLine(context, "");
-    printLine(context, counted(events.size(), "event") + ", " + std::to_string(wanted) +
+    printLine(context, counted(all, "event") + ", " + std::to_string(wanted) +
                            " of them wanted; nothing was sent.");
     printLine(context, isAnalyticsDay() ? "Today the figures go to the analytics service."
                                         : "Today the figures go to the metrics store.");
   }
-  if (shown == 0) return complain(context, "no event of that name: " + text, kWrong);
+  if (events.empty()) return complain(context, "no event of that name: " + text, kWrong);
   return available ? kSuccess
                    : complain(context, "this device has no analytics-event service", kWrong);
 }
@@ -113,9 +111,9 @@ int runEvents(const ToolContext& context, const std::string& text) {
 void addNandEventCommands(CLI::App& nand, ToolContext& context) {
   const auto text = std::make_shared<std::string>();
   addNandCommand(nand, context, "events",
-                 "The analytics events that would be sent now; sends nothing",
+                 "Show the analytics events that would be sent now; sends nothing",
                  [&context, text] { return runEvents(context, *text); })
-      ->add_option("TEXT", *text, "Only events whose name contains it");
+      .optionalArgument(kTextValue, text.get(), "Only events whose name contains it");
 }
 
 }  // namespace tally::tools

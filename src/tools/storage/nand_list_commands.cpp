@@ -1,12 +1,12 @@
 #include "tools/storage/nand_list_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <vector>
 
 #include "base/number_text.h"
+#include "base/text_lines.h"
 #include "base/time_text.h"
 #include "platform/known_preferences.h"
 #include "storage/lists/defects_list.h"
@@ -17,6 +17,7 @@
 #include "storage/lists/validity_list.h"
 #include "storage/lists/write_amplification.h"
 #include "storage/storage_log.h"
+#include "tools/frame/command.h"
 #include "tools/frame/dry_run.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
@@ -25,7 +26,7 @@
 namespace tally::tools {
 namespace {
 
-// The driver's complaints are on standard error already.
+// The driver's messages are on standard error already.
 int complainOfList(const ToolContext& context, std::string_view list) {
   return complain(context, fmt::format("the {} cannot be read whole", list), kWrong);
 }
@@ -67,36 +68,50 @@ void printRecord(const ToolContext& context, const KvDictionary& families) {
   table.print(context);
 }
 
-int runTelemetry(const ToolContext& context, std::optional<std::uint32_t> only) {
-  Json modes = Json::array();
-  std::vector<ListRequest> requests;
-  bool seen = true;
+struct TelemetryMode {
+  std::uint32_t mode;
+  std::vector<KvRef<KvDictionary>> buses;
+};
+
+// False when a list could not be read whole.
+bool gatherTelemetry(const ToolContext& context, std::optional<std::uint32_t> only,
+                     std::vector<TelemetryMode>& modes) {
+  bool complete = true;
   for (std::uint32_t mode = 0; mode < kTelemetryModes; ++mode) {
     if (only && *only != mode) continue;
     bool handled = false;
     const auto handler = [&, mode](const StorageList& list) {
       handled = true;
-      Json buses = Json::array();
-      const bool read = readTelemetryList(
-          list.bytes, list.characteristics, context.err, [&](const KvDictionary& record) {
-            const auto families = gathered(record);
-            if (context.json) {
-              buses.push_back(jsonOf(families.get()));
-            } else {
-              printHeading(context, fmt::format("Mode {}, bus {}", mode, buses.size()));
-              printRecord(context, *families);
-              buses.push_back(nullptr);
-            }
-          });
-      modes.push_back({{"mode", mode}, {"buses", std::move(buses)}});
-      return read;
+      modes.push_back({mode, {}});
+      return readTelemetryList(
+          list.bytes, list.characteristics, context.err,
+          [&](const KvDictionary& record) { modes.back().buses.push_back(gathered(record)); });
     };
     const ListRequest request{kTelemetryList, handler, mode};
-    const bool result = fetchLists({&request, 1}, false);
-    seen = seen && result && handled;
+    const bool read = fetchLists({&request, 1}, false);
+    complete = complete && read && handled;
   }
-  if (context.json) printJson(context, modes);
-  return seen ? kSuccess : complainOfList(context, "telemetry list");
+  return complete;
+}
+
+int runTelemetry(const ToolContext& context, std::optional<std::uint32_t> only) {
+  std::vector<TelemetryMode> modes;
+  const bool complete = gatherTelemetry(context, only, modes);
+  Json document = Json::array();
+  for (const auto& [mode, buses] : modes) {
+    Json list = Json::array();
+    for (std::size_t bus = 0; bus < buses.size(); ++bus) {
+      if (context.json) {
+        list.push_back(jsonOf(buses[bus].get()));
+      } else {
+        printHeading(context, fmt::format("Mode {}, bus {}", mode, bus));
+        printRecord(context, *buses[bus]);
+      }
+    }
+    document.push_back({{"mode", mode}, {"buses", std::move(list)}});
+  }
+  if (context.json) printJson(context, document);
+  return complete ? kSuccess : complainOfList(context, "telemetry list");
 }
 
 int runValidity(const ToolContext& context) {
@@ -155,8 +170,8 @@ int runDefects(const ToolContext& context) {
   return read ? kSuccess : complainOfList(context, "defects list");
 }
 
-// The log that could be written now: by the very steps of the daily job, but wanted whatever the
-// write amplification and whenever the last one was written.
+// The log that could be written now: made with the steps of the daily job, but whatever the write
+// amplification and the time of the last log.
 struct LogPreview {
   bool complete = false;  // every list could be handled
   bool wanted = false, due = true;
@@ -213,12 +228,7 @@ int runStorageLog(const ToolContext& context) {
     table.print(context);
     if (made) {
       printLine(context, "");
-      std::string_view text = logs[0].body;
-      while (!text.empty()) {
-        const std::size_t end = std::min(text.find('\n'), text.size());
-        printLine(context, text.substr(0, end));
-        text.remove_prefix(std::min(end + 1, text.size()));
-      }
+      eachLine(logs[0].body, [&](std::string_view line) { printLine(context, line); });
     }
   }
   if (!made) return complain(context, "no storage log can be made", kWrong);
@@ -229,20 +239,19 @@ int runStorageLog(const ToolContext& context) {
 
 void addNandListCommands(CLI::App& nand, ToolContext& context) {
   const auto mode = std::make_shared<std::optional<std::uint32_t>>();
-  addNandCommand(nand, context, "telemetry", "The read-algorithm counters of each flash bus",
+  addNandCommand(nand, context, "telemetry", "Show the read-algorithm counters of each flash bus",
                  [&context, mode] { return runTelemetry(context, *mode); })
-      ->add_option("--mode", *mode, "Only this mode, 0 to 2")
-      ->type_name("MODE")
-      ->check(CLI::Range(std::uint32_t{0}, kTelemetryModes - 1));
-  addNandCommand(nand, context, "validity", "The validity lists",
+      .option("--mode", {"MODE", ValueKind::Number}, mode.get(), "Only this mode, 0 to 2")
+      .within(0, static_cast<int>(kTelemetryModes) - 1);
+  addNandCommand(nand, context, "validity", "Show the validity lists",
                  [&context] { return runValidity(context); });
-  addNandCommand(nand, context, "defects", "Defects of the flash: factory defects and later ones",
+  addNandCommand(nand, context, "defects",
+                 "Show defects of the flash: factory defects and later ones",
                  [&context] { return runDefects(context); });
-  addNandCommand(nand, context, "storage-log", "The weekly storage log",
+  addNandCommand(nand, context, "storage-log", "Show the weekly storage log",
                  [&context] { return runStorageLog(context); })
-      ->add_flag_callback(
-          "--preview", [] {}, "Show it as it would be written now; write nothing")
-      ->required();
+      .flag("--preview", "Show it as it would be written now; write nothing")
+      .required();
 }
 
 }  // namespace tally::tools

@@ -1,6 +1,5 @@
 #include "tools/store/forget_command.h"
 
-#include <CLI/CLI.hpp>
 #include <iostream>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -9,6 +8,7 @@
 #include "host/spool/waiting_logs.h"
 #include "host/store/store_schema.h"
 #include "platform/known_preferences.h"
+#include "tools/frame/command.h"
 #include "tools/frame/output.h"
 
 namespace tally::tools {
@@ -30,7 +30,7 @@ bool isConfirmed(const ToolContext& context, const WaitingFiles& waiting) {
   return std::getline(std::cin, answer) && answer == "yes";
 }
 
-// SQLite's files beside the store go first, so that none is left for another store.
+// Removes SQLite's companion files first, so that none is left for another store.
 Status eraseStore(const DeviceRoot& root) {
   const StoreFile file = metricsStoreFile(root);
   const auto directory = file.directory.open();
@@ -55,7 +55,8 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
   const WaitingFiles waiting = countWaiting(root);
   if (!arguments.yes) {
     if (context.json || !terminalOf(0).interactive) {
-      return complain(context, "--yes is needed where nobody can be asked", kBadUsage);
+      return complain(context, "--yes is required because standard input is not interactive",
+                      kBadUsage);
     }
     if (!isConfirmed(context, waiting)) return complain(context, "nothing was erased", kWrong);
   }
@@ -81,10 +82,9 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
 }  // namespace
 
 void addForgetCommand(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<ForgetArguments>();
-  addCommand(&app, context, "forget", "Erase the metrics store, all waiting files, and the history",
-             [&context, arguments] { return forget(context, *arguments); })
-      ->add_flag("--yes", arguments->yes, "Do not ask");
+  CommandGroup<ForgetArguments> group(app, context);
+  group.add("forget", "Erase the metrics store, all waiting files, and the history", forget)
+      .flag("--yes", &group.arguments().yes, "Do not ask");
 }
 
 }  // namespace tally::tools

@@ -1,6 +1,5 @@
 #include "tools/store/store_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <limits>
 #include <memory>
@@ -14,6 +13,7 @@
 #include "host/linux_platform.h"
 #include "host/store/store_history.h"
 #include "host/store/store_writer.h"
+#include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
@@ -29,8 +29,7 @@ namespace {
 struct StoreArguments {
   std::string key, value, file;
   std::vector<std::string> values;
-  std::string dayForm;              // as it was given; empty when it was not
-  std::optional<std::int32_t> day;  // the day that it names
+  std::optional<std::string> day;
   std::optional<std::uint32_t> offset;
   std::string prefix;
 };
@@ -47,12 +46,21 @@ Status writeStore(const ToolContext& context, const Work& work) {
   return writer.commit();
 }
 
+// The day that was given, if any. False, after a complaint, when it is not a day.
+bool readDay(const ToolContext& context, const StoreArguments& arguments,
+             std::optional<std::int32_t>& day) {
+  if (!arguments.day) return true;
+  day = dayOf(context, *arguments.day);
+  return day.has_value();
+}
+
 int setScalar(const ToolContext& context, const StoreArguments& arguments) {
+  std::optional<std::int32_t> given;
+  if (!readDay(context, arguments, given)) return kBadUsage;
   const auto value = parseInt64(arguments.value);
   if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
   if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
-  const std::int32_t day =
-      arguments.day.value_or(context.platform->metricsStore->TBDaysSince1970());
+  const std::int32_t day = given.value_or(context.platform->metricsStore->TBDaysSince1970());
   const Status set = writeStore(
       context, [&](StoreWriter& writer) { return writer.setScalar(day, arguments.key, *value); });
   if (!set) return complain(context, set.error().message, kWrong);
@@ -65,6 +73,8 @@ int setScalar(const ToolContext& context, const StoreArguments& arguments) {
 }
 
 int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
+  std::optional<std::int32_t> given;
+  if (!readDay(context, arguments, given)) return kBadUsage;
   std::vector<double> values;
   for (const std::string& text : arguments.values) {
     const auto value = parseDouble(text);
@@ -74,7 +84,7 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
   if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
   const double now = context.platform->clock->secondsSince1970();
   const std::int32_t today = dayOfSeconds(now);
-  const std::int32_t day = arguments.day.value_or(today);
+  const std::int32_t day = given.value_or(today);
   const std::uint32_t offset = arguments.offset.value_or(
       static_cast<std::uint32_t>(now - static_cast<double>(today) * kSecondsPerDay));
   const std::vector<std::uint32_t> offsets(values.size(), offset);
@@ -98,12 +108,14 @@ void printImport(const ToolContext& context, const ImportResult& result) {
     complain(context, fmt::format("line {}: {}", bad.line, bad.reason), kWrong);
   }
   if (const auto more = result.rejected - result.firstRejected.size(); more > 0) {
-    complain(context, fmt::format("and {} more bad lines", more), kWrong);
+    complain(context, fmt::format("and {} more bad {}", more, more == 1 ? "line" : "lines"),
+             kWrong);
   }
   if (!context.json) {
     if (result.failure.empty()) {
-      print(context.out, fmt::format("imported {} scalars and {} samples; {} bad lines\n",
-                                     result.scalars, result.samples, result.rejected));
+      print(context.out,
+            fmt::format("imported {} and {}; {}\n", counted(result.scalars, "scalar"),
+                        counted(result.samples, "sample"), counted(result.rejected, "bad line")));
     }
     return;
   }
@@ -139,12 +151,14 @@ int import(const ToolContext& context, const StoreArguments& arguments) {
 }
 
 int dump(const ToolContext& context, const StoreArguments& arguments) {
+  std::optional<std::int32_t> day;
+  if (!readDay(context, arguments, day)) return kBadUsage;
   DumpRange range;
   range.keyPrefix = arguments.prefix;
-  if (arguments.day) {
-    // The range is open at its lower end; the least day of all has none below it.
-    range.minimumDay = *arguments.day == range.minimumDay ? *arguments.day : *arguments.day - 1;
-    range.maximumDay = *arguments.day;
+  if (day) {
+    // The lower end of the range is exclusive; there is no day before the smallest.
+    range.minimumDay = *day == range.minimumDay ? *day : *day - 1;
+    range.maximumDay = *day;
   }
   std::string fault;
   const auto history = openSqliteHistory(storeFile(context), [&](const std::string& message) {
@@ -153,117 +167,115 @@ int dump(const ToolContext& context, const StoreArguments& arguments) {
   if (context.json) {
     dumpAsJson(*history, range, context.out);
   } else {
-    // A person gets keys that are safe to look at; a file those that can be imported again.
+    // On a terminal, keys are made safe to show; in a file, they can be imported again.
     dumpAsCsv(*history, range, context.out, context.output.interactive);
   }
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
 struct ListedKey {
-  StoreKey key;
-  std::string name;  // what the key's view would refer to
+  StoreKey::Kind kind;
+  std::string name;
+  std::int64_t firstDay, lastDay, days;
+  std::int64_t samples;  // of a distribution
+  bool isScalar() const { return kind == StoreKey::Kind::Scalar; }
+  const char* kindText() const { return isScalar() ? "scalar" : "distribution"; }
 };
 
-int listKeys(const ToolContext& context, const StoreArguments&) {
+// Scalars first, by name. What went wrong, if anything, goes to fault.
+std::vector<ListedKey> gatherKeys(const StoreFile& file, std::string& fault) {
   std::vector<ListedKey> keys;
-  std::string fault;
   listStoreKeys(
-      storeFile(context),
+      file,
       [&keys](const StoreKey& key) {
-        keys.push_back({key, std::string(key.key)});
+        keys.push_back(
+            {key.kind, std::string(key.key), key.firstDay, key.lastDay, key.days, key.samples});
       },
       [&](const std::string& message) { fault = message; });
   std::ranges::stable_sort(keys, [](const ListedKey& a, const ListedKey& b) {
-    return a.key.kind != b.key.kind ? a.key.kind < b.key.kind : naturalLess(a.name, b.name);
+    return a.kind != b.kind ? a.kind < b.kind : naturalLess(a.name, b.name);
   });
+  return keys;
+}
+
+Json keysJson(const std::vector<ListedKey>& keys) {
   Json document = Json::array();
+  for (const ListedKey& key : keys) {
+    Json entry = {{"kind", key.kindText()},
+                  {"key", key.name},
+                  {"firstDay", key.firstDay},
+                  {"lastDay", key.lastDay},
+                  {"days", key.days}};
+    if (!key.isScalar()) entry["samples"] = key.samples;
+    document.push_back(std::move(entry));
+  }
+  return document;
+}
+
+void printKeys(const ToolContext& context, const std::vector<ListedKey>& keys) {
+  if (keys.empty()) return printLine(context, "the store has no keys");
   Table table({{"kind"},
                {"days", Align::Right},
                {"first"},
                {"last"},
                {"samples", Align::Right},
                {"key", Align::Left, true}});
-  for (const auto& [key, name] : keys) {
-    const bool isScalar = key.kind == StoreKey::Kind::Scalar;
-    const char* const kind = isScalar ? "scalar" : "distribution";
-    if (context.json) {
-      Json entry = {{"kind", kind},
-                    {"key", name},
-                    {"firstDay", key.firstDay},
-                    {"lastDay", key.lastDay},
-                    {"days", key.days}};
-      if (!isScalar) entry["samples"] = key.samples;
-      document.push_back(std::move(entry));
-      continue;
-    }
-    table.add({kind, integerText(key.days), dayText(static_cast<std::int32_t>(key.firstDay)),
+  for (const ListedKey& key : keys) {
+    table.add({key.kindText(), integerText(key.days),
+               dayText(static_cast<std::int32_t>(key.firstDay)),
                dayText(static_cast<std::int32_t>(key.lastDay)),
-               isScalar ? "" : integerText(key.samples), name});
+               key.isScalar() ? "" : integerText(key.samples), key.name});
   }
-  if (context.json) {
-    printJson(context, document);
-  } else if (table.empty()) {
-    printLine(context, "the store has no keys");
-  } else {
-    table.print(context);
-  }
-  return fault.empty() ? kSuccess : complain(context, fault, kWrong);
+  table.print(context);
 }
 
-// False when what was given is not a day.
-bool resolveDay(const ToolContext& context, StoreArguments& arguments) {
-  if (arguments.dayForm.empty()) return true;
-  arguments.day = dayOf(context, arguments.dayForm);
-  return arguments.day.has_value();
+int listKeys(const ToolContext& context, const StoreArguments&) {
+  std::string fault;
+  const auto keys = gatherKeys(storeFile(context), fault);
+  if (context.json) {
+    printJson(context, keysJson(keys));
+  } else {
+    printKeys(context, keys);
+  }
+  return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
 
 }  // namespace
 
 void addStoreCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<StoreArguments>();
-  CLI::App* const store = app.add_subcommand("store", "Write and read the metrics store");
-  store->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    CLI::App* const command = store->add_subcommand(name, description);
-    command->callback([&context, arguments, run] {
-      context.command = [&context, arguments, run] {
-        return resolveDay(context, *arguments) ? run(context, *arguments) : kBadUsage;
-      };
-    });
+  CommandGroup<StoreArguments> store(addFamily(app, "store", "Write and read the metrics store"),
+                                     context);
+  StoreArguments& arguments = store.arguments();
+  const auto addDay = [&](Command command, const char* otherwise) {
+    command.option("--day", kDayValue, &arguments.day, kDayForms + std::string(otherwise));
     return command;
-  };
-  const auto addDay = [&](CLI::App* command, const char* otherwise) {
-    command->add_option("--day", arguments->dayForm, kDayForms + std::string(otherwise))
-        ->type_name("DAY");
   };
   constexpr const char* kDay = "; today by default";
 
   constexpr const char* kStoreKeyHelp = "Valid UTF-8 of 1 to 512 bytes without a zero byte";
-  CLI::App* command = add("set", "Set a scalar", setScalar);
-  command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
-  command->add_option("VALUE", arguments->value, "A 64-bit whole number")->required();
+  Command command = store.add("set", "Set a scalar", setScalar);
+  command.argument(kStoreKeyValue, &arguments.key, kStoreKeyHelp);
+  command.argument({"VALUE", ValueKind::Number}, &arguments.value, "A 64-bit whole number");
   addDay(command, kDay);
 
-  command = add("push", "Add samples to a distribution", pushSamples);
-  command->add_option("KEY", arguments->key, kStoreKeyHelp)->required();
+  command = store.add("push", "Add samples to a distribution", pushSamples);
+  command.argument(kStoreKeyValue, &arguments.key, kStoreKeyHelp);
+  command.argument({"VALUE", ValueKind::Number}, &arguments.values,
+                   "Numbers, inf or nan; -inf only after --, which ends the options");
+  addDay(command, kDay);
   command
-      ->add_option("VALUE", arguments->values,
-                   "Numbers, inf or nan; -inf only after --, which ends the options")
-      ->required();
-  addDay(command, kDay);
-  command->add_option("--offset", arguments->offset, "Second of the day; now by default")
-      ->check(CLI::Range(0, 86399))
-      ->type_name("S");
+      .option("--offset", {"S", ValueKind::Number}, &arguments.offset,
+              "Second of the day; now by default")
+      .within(0, 86399);
 
-  command = add("import", "Import CSV: kind,key,day,offset,value", import);
-  command->add_option("FILE", arguments->file, "A file, or - for standard input")->required();
+  store.add("import", "Import CSV: kind,key,day,offset,value", import)
+      .argument(kFileValue, &arguments.file, "A file, or - for standard input");
 
-  command = add("dump", "Print all rows as CSV, in the form that import reads", dump);
-  addDay(command, "; all days by default");
-  command->add_option("--prefix", arguments->prefix, "Only keys that start with it")
-      ->type_name("TEXT");
+  addDay(store.add("dump", "Print all rows as CSV, in the form that import reads", dump),
+         "; all days by default")
+      .option("--prefix", kTextValue, &arguments.prefix, "Only keys that start with it");
 
-  add("keys", "List the keys, with their days and numbers of samples", listKeys);
+  store.add("keys", "List the keys, with their days and numbers of samples", listKeys);
 }
 
 }  // namespace tally::tools

@@ -12,12 +12,13 @@ namespace tally::tools {
 
 struct DumpRange {
   std::string keyPrefix;
-  // As in HistoryStore: above the minimum, up to the maximum.
+  // As in HistoryStore: after the minimum, up to the maximum.
   std::int32_t minimumDay = std::numeric_limits<std::int32_t>::min();
   std::int32_t maximumDay = std::numeric_limits<std::int32_t>::max();
 };
 
-// Scalars, then samples, by day and key, until the file cannot take them; it keeps the error.
+// Writes scalars, then samples, by day and key. Stops when the file cannot be written; the error
+// stays in the file.
 // Memory does not grow with the rows. For a person, keys have their control characters escaped, so
 // that what is printed cannot be imported where there are any.
 void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson);

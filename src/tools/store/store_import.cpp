@@ -6,7 +6,7 @@
 #include <fmt/core.h>
 
 #include "host/store/store_importer.h"
-#include "tools/frame/record_reader.h"
+#include "tools/store/record_reader.h"
 #include "tools/store/store_csv.h"
 
 namespace tally::tools {

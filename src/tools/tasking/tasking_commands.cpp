@@ -1,6 +1,5 @@
 #include "tools/tasking/tasking_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -10,6 +9,7 @@
 #include "host/linux_platform.h"
 #include "kv/plist_codec.h"
 #include "platform/known_preferences.h"
+#include "tools/frame/command.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"
 
@@ -26,66 +26,66 @@ std::size_t entriesOf(const KvObject* payload) {
   return array != nullptr ? array->size() : 0;
 }
 
-// The writes of a plan as rows, its messages as lines.
-class PlanView {
- public:
-  explicit PlanView(const TaskingPlan& plan) : messages_(plan.messages), isDue_(plan.isDue) {
-    if (!plan.change) return;
-    for (const PreferenceWrite& removal : plan.change->removals) add(removal);
-    for (const PreferenceWrite& write : plan.change->writes) add(write);
-    if (plan.change->payload) recorded_ = plan.change->id;
-  }
-  bool hasFaults() const { return std::ranges::any_of(messages_, &TaskingMessage::isFault); }
-  Json json() const {
-    Json messages = Json::array();
-    for (const TaskingMessage& message : messages_) {
-      messages.push_back({{"fault", message.isFault}, {"text", message.text}});
-    }
-    return {{"messages", std::move(messages)},
-            {"writes", writes_},
-            {"records", jsonOf(recorded_.get())},
-            {"notifies", isDue_}};
-  }
-  void print(const ToolContext& context) const {
-    for (const TaskingMessage& message : messages_) {
-      printLine(context, message.text, message.isFault ? Ink::Bad : Ink::Plain);
-    }
-    if (writes_.empty()) {
-      printLine(context, "nothing is written or removed");
-    } else {
-      table_.print(context);
-    }
-    if (recorded_) {
-      printLine(context, fmt::format("then {} is in force", valueText(recorded_.get())));
-    }
-    if (isDue_) {
-      printLine(context, fmt::format("then {} is posted", kTaskingNotification));
-    }
-  }
+// Removals, then writes.
+std::vector<PreferenceWrite> writesOf(const TaskingPlan& plan) {
+  if (!plan.change) return {};
+  std::vector<PreferenceWrite> writes = plan.change->removals;
+  writes.insert(writes.end(), plan.change->writes.begin(), plan.change->writes.end());
+  return writes;
+}
 
- private:
-  void add(const PreferenceWrite& write) {
-    const bool removes = !write.value;
-    table_.add({Cell(removes ? "remove" : "set", removes ? Ink::Doubtful : Ink::Good), write.user,
-                write.domain, write.key, removes ? "" : valueText(write.value.get())});
-    Json one = {{"action", removes ? "remove" : "set"},
+// What will be in force; null when there will be no tasking, or no other one.
+const KvObject* recordedBy(const TaskingPlan& plan) {
+  return plan.change && plan.change->payload ? plan.change->id.get() : nullptr;
+}
+
+bool hasFaults(const TaskingPlan& plan) {
+  return std::ranges::any_of(plan.messages, &TaskingMessage::isFault);
+}
+
+Json planJson(const TaskingPlan& plan) {
+  Json messages = Json::array();
+  for (const TaskingMessage& message : plan.messages) {
+    messages.push_back({{"fault", message.isFault}, {"text", message.text}});
+  }
+  Json writes = Json::array();
+  for (const PreferenceWrite& write : writesOf(plan)) {
+    Json one = {{"action", write.value ? "set" : "remove"},
                 {"user", write.user},
                 {"domain", write.domain},
                 {"key", write.key}};
-    if (!removes) one["value"] = jsonOf(write.value.get());
-    writes_.push_back(std::move(one));
+    if (write.value) one["value"] = jsonOf(write.value.get());
+    writes.push_back(std::move(one));
   }
+  return {{"messages", std::move(messages)},
+          {"writes", std::move(writes)},
+          {"records", jsonOf(recordedBy(plan))},
+          {"notifies", plan.isDue}};
+}
 
-  std::vector<TaskingMessage> messages_;
-  KvRef<KvObject> recorded_;  // what will be in force; null: no tasking, or no other one
-  bool isDue_;
-  Json writes_ = Json::array();
-  Table table_{{{""},
-                {"user", Align::Left, true},
-                {"domain", Align::Left, true},
-                {"key", Align::Left, true},
-                {"value", Align::Left, true}}};
-};
+void printPlan(const ToolContext& context, const TaskingPlan& plan) {
+  for (const TaskingMessage& message : plan.messages) {
+    printLine(context, message.text, message.isFault ? Ink::Bad : Ink::Plain);
+  }
+  Table table({{""},
+               {"user", Align::Left, true},
+               {"domain", Align::Left, true},
+               {"key", Align::Left, true},
+               {"value", Align::Left, true}});
+  for (const PreferenceWrite& write : writesOf(plan)) {
+    table.add({write.value ? Cell("set", Ink::Good) : Cell("remove", Ink::Doubtful), write.user,
+               write.domain, write.key, write.value ? valueText(write.value.get()) : ""});
+  }
+  if (table.empty()) {
+    printLine(context, "nothing is written or removed");
+  } else {
+    table.print(context);
+  }
+  if (const KvObject* const recorded = recordedBy(plan)) {
+    printLine(context, fmt::format("then {} is in force", valueText(recorded)));
+  }
+  if (plan.isDue) printLine(context, fmt::format("then {} is posted", kTaskingNotification));
+}
 
 Json taskingJson(const KvObject* id, const KvObject* digest, const KvObject* payload) {
   if (id == nullptr) return nullptr;
@@ -106,7 +106,7 @@ int show(const ToolContext& context, const TaskingArguments&) {
   const auto scheduled = [schedule](const char* key) {
     return schedule != nullptr ? schedule->get(key) : nullptr;
   };
-  const PlanView plan(planTasking(inputs));
+  const TaskingPlan plan = planTasking(inputs);
   const KvObject* const id = inputs.recordedID.get();
   const KvObject* const payload = inputs.recordedPayload.get();
   if (context.json) {
@@ -117,7 +117,7 @@ int show(const ToolContext& context, const TaskingArguments&) {
                {"scheduled", taskingJson(scheduled("TaskingID"), scheduled("TaskingDigest"),
                                          scheduled("TaskingPayload"))},
                {"unfinished", static_cast<bool>(inputs.unfinished)},
-               {"change", plan.json()}});
+               {"change", planJson(plan)}});
   } else {
     Table table({{""}, {"", Align::Left, true}});
     table.add({"in force", taskingLine(id, digest.get(), payload)});
@@ -128,9 +128,9 @@ int show(const ToolContext& context, const TaskingArguments&) {
     if (inputs.unfinished) table.add({"unfinished", "an update is not complete"});
     table.print(context);
     printHeading(context, "The next run");
-    plan.print(context);
+    printPlan(context, plan);
   }
-  return plan.hasFaults() ? kWrong : kSuccess;
+  return hasFaults(plan) ? kWrong : kSuccess;
 }
 
 int apply(const ToolContext& context, const TaskingArguments& arguments) {
@@ -159,33 +159,27 @@ int apply(const ToolContext& context, const TaskingArguments& arguments) {
   TaskingInputs inputs = readTaskingInputs(variant);
   inputs.schedule = *std::move(schedule);
   const TaskingPlan plan = planTasking(inputs);
-  const PlanView view(plan);
   if (context.json) {
-    printJson(context, view.json());
+    printJson(context, planJson(plan));
   } else {
-    view.print(context);
+    printPlan(context, plan);
   }
   const bool done = arguments.dryRun || carryOut(variant, plan);
-  return done && !view.hasFaults() ? kSuccess : kWrong;
+  return done && !hasFaults(plan) ? kSuccess : kWrong;
 }
 
 }  // namespace
 
 void addTaskingCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<TaskingArguments>();
-  CLI::App* const family =
-      app.add_subcommand("tasking", "Show and apply scheduled changes of preferences");
-  family->require_subcommand(1);
-  addCommand(family, context, "show", "The tasking in force, the schedule, and what would change",
-             [&context, arguments] { return show(context, *arguments); });
-  CLI::App* const command =
-      addCommand(family, context, "apply", "Apply a tasking from a file as if it were scheduled",
-                 [&context, arguments] { return apply(context, *arguments); });
-  command
-      ->add_option("FILE", arguments->file,
-                   "A property list: TaskingID, TaskingDigest and TaskingPayload")
-      ->required();
-  command->add_flag("--dry-run", arguments->dryRun, "Only print each write and removal");
+  CommandGroup<TaskingArguments> tasking(
+      addFamily(app, "tasking", "Show and apply scheduled changes of preferences"), context);
+  TaskingArguments& arguments = tasking.arguments();
+  tasking.add("show", "Show the tasking in force, the schedule, and what would change", show);
+  Command command =
+      tasking.add("apply", "Apply a tasking from a file as if it were scheduled", apply);
+  command.argument(kFileValue, &arguments.file,
+                   "A property list: TaskingID, TaskingDigest and TaskingPayload");
+  command.flag("--dry-run", &arguments.dryRun, "Only print each write and removal");
 }
 
 }  // namespace tally::tools

@@ -1,11 +1,11 @@
 #include "tools/whitelist/explain_command.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
 #include <nlohmann/json.hpp>
 
 #include "base/time_text.h"
 #include "platform/platform.h"
+#include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/spelling.h"
 #include "tools/frame/table.h"
@@ -95,7 +95,7 @@ void printValue(const ToolContext& context, const DailyLog& log, const std::stri
                 KeyKind kind) {
   const KvObject* value = loggedValue(log, key, kind);
   if (value == nullptr) {
-    printLine(context, fmt::format("  not there as a {}", kindName(kind)), Ink::Doubtful);
+    printLine(context, fmt::format("  absent as a {}", kindName(kind)), Ink::Doubtful);
     return;
   }
   if (kind == KeyKind::Scalar) {
@@ -126,7 +126,7 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
     if (reason.empty() && next) {
       printValue(context, *next, story.key, kind);
     } else {
-      printLine(context, fmt::format("  not there as a {}: {}", kindName(kind), reason),
+      printLine(context, fmt::format("  absent as a {}: {}", kindName(kind), reason),
                 Ink::Doubtful);
     }
   }
@@ -234,15 +234,12 @@ int explain(const ToolContext& context, const ExplainArguments& arguments) {
 }  // namespace
 
 void addExplainCommand(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<ExplainArguments>();
-  CLI::App* const command =
-      addCommand(&app, context, "explain", "Follow one key from the store to the log",
-                 [&context, arguments] { return explain(context, *arguments); });
-  command
-      ->add_option("KEY", arguments->key,
-                   "A key of the metrics store, or one that the report measures")
-      ->required();
-  command->add_option("--day", arguments->day, kDayForms)->type_name("DAY");
+  CommandGroup<ExplainArguments> group(app, context);
+  ExplainArguments& arguments = group.arguments();
+  Command command = group.add("explain", "Follow one key from the store to the log", explain);
+  command.argument(kStoreKeyValue, &arguments.key,
+                   "A key of the metrics store, or one that the report measures");
+  command.option("--day", kDayValue, &arguments.day, kDayForms);
 }
 
 }  // namespace tally::tools

@@ -1,4 +1,4 @@
-// What there is to say about one key on one day.
+// Everything that is known about one key on one day.
 #pragma once
 
 #include <cstdint>
@@ -45,13 +45,13 @@ struct KeyStory {
   // The kinds that the key is of: those that it has rows of or is measured as, both when there are
   // none.
   std::vector<KeyKind> kinds() const;
-  // Why the key does not stand in a log of the day as that kind; empty when it would.
+  // Why a log of the day does not contain the key as that kind; empty if it does.
   std::string whyAbsent(KeyKind kind) const;
 };
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day);
 
-// The value that a log holds for the key; null when there is none.
+// The value of the key in a log; null if there is none.
 const KvObject* loggedValue(const DailyLog& log, std::string_view key, KeyKind kind);
 
 }  // namespace tally::tools

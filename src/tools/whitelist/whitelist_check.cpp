@@ -36,12 +36,12 @@ class Checker final : public WhitelistVisitor {
     inForce_ = state == GroupState::InForce;
     if (state != GroupState::InForce) {
       add(Severity::Surprise, {name, {}, {}, {}},
-          fmt::format("does not count here: it {}", whyNotInForce(state)));
+          fmt::format("not in force here: it {}", whyNotInForce(state)));
     }
     const auto value = platform_.preferences->SMAPreferencesGetValue(name, kGroupSwitchDomain);
     if (value && value->type() != KvType::Boolean && value->type() != KvType::Number) {
       add(Severity::Surprise, {name, {}, {}, {}},
-          fmt::format("its switch in the preferences {} is no boolean and does nothing",
+          fmt::format("its switch in the preferences {} is not a boolean and is ignored",
                       kGroupSwitchDomain));
     }
     return true;
@@ -255,7 +255,7 @@ class Checker final : public WhitelistVisitor {
   bool malformedOfGroup_ = false;
   bool inForce_ = false;
   Table tables_[kWhitelistSections];         // of the whole file
-  Table inForceTables_[kWhitelistSections];  // of the groups that count on this device
+  Table inForceTables_[kWhitelistSections];  // of the groups in force on this device
 };
 
 }  // namespace

@@ -9,8 +9,8 @@
 
 namespace tally::tools {
 
-// A fault makes the file do something else than it says. A surprise is allowed, and probably not
-// meant, or worth knowing.
+// A fault makes the file do something other than it says. A surprise is allowed, but probably not
+// intended, or worth knowing.
 enum class Severity { Fault, Surprise };
 
 struct Finding {

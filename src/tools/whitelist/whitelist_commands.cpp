@@ -1,6 +1,5 @@
 #include "tools/whitelist/whitelist_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -8,6 +7,7 @@
 
 #include "base/file.h"
 #include "kv/plist_codec.h"
+#include "tools/frame/command.h"
 #include "tools/frame/table.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_verdict.h"
@@ -20,8 +20,8 @@ struct WhitelistArguments {
   std::vector<std::string> keys;
 };
 
-WhitelistFile load(Platform& platform, const WhitelistArguments& arguments) {
-  if (arguments.file.empty()) return loadWhitelistFile(platform);
+WhitelistFile load(const ToolContext& context, const WhitelistArguments& arguments) {
+  if (arguments.file.empty()) return loadWhitelistFile(*context.platform);
   const auto bytes = readFile(arguments.file, kPlistMaximumBytes);
   if (bytes) return parseWhitelistFile(*bytes);
   WhitelistFile file;
@@ -103,7 +103,7 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
 }
 
 int check(const ToolContext& context, const WhitelistArguments& arguments) {
-  const WhitelistFile file = load(*context.platform, arguments);
+  const WhitelistFile file = load(context, arguments);
   std::vector<Finding> findings;
   if (file.root) {
     findings = checkWhitelist(*context.platform, *file.root);
@@ -115,53 +115,60 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
   return countOf(findings, Severity::Fault) > 0 ? kWrong : kSuccess;
 }
 
-int test(const ToolContext& context, const WhitelistArguments& arguments) {
-  const WhitelistJudge judge(*context.platform, load(*context.platform, arguments));
-  Json document = Json::array();
-  bool allReported = true;
-  for (const std::string& key : arguments.keys) {
-    const KeyVerdict verdicts[] = {judge.judge(key, KeyKind::Scalar),
-                                   judge.judge(key, KeyKind::Distribution)};
-    allReported = allReported && (verdicts[0].admitted() || verdicts[1].admitted());
-    if (context.json) {
-      document.push_back(
-          {{"key", key}, {"scalar", jsonOf(verdicts[0])}, {"distribution", jsonOf(verdicts[1])}});
-      continue;
-    }
-    printLine(context, key, Ink::Strong);
-    Table table({{""}, {""}, {"", Align::Left, true}});
-    for (const KeyVerdict& verdict : verdicts) {
-      std::string text = verdict.reason;
-      if (verdict.admitted()) text += "; " + optionsText(*verdict.match.options);
-      table.add({std::string("as a ") + std::string(kindName(verdict.kind)),
-                 verdict.admitted() ? Cell("reported", Ink::Good) : Cell("refused", Ink::Doubtful),
-                 text});
-    }
-    table.print(context);
+struct TestedKey {
+  std::string key;
+  KeyVerdict scalar, distribution;
+  bool isReported() const { return scalar.admitted() || distribution.admitted(); }
+};
+
+void printTestedKey(const ToolContext& context, const TestedKey& tested) {
+  printLine(context, tested.key, Ink::Strong);
+  Table table({{""}, {""}, {"", Align::Left, true}});
+  for (const KeyVerdict* verdict : {&tested.scalar, &tested.distribution}) {
+    std::string text = verdict->reason;
+    if (verdict->admitted()) text += "; " + optionsText(*verdict->match.options);
+    table.add({std::string("as a ") + std::string(kindName(verdict->kind)),
+               verdict->admitted() ? Cell("reported", Ink::Good) : Cell("refused", Ink::Doubtful),
+               text});
   }
-  if (context.json) printJson(context, document);
-  return allReported ? kSuccess : kWrong;
+  table.print(context);
+}
+
+int test(const ToolContext& context, const WhitelistArguments& arguments) {
+  const WhitelistJudge judge(*context.platform, load(context, arguments));
+  std::vector<TestedKey> tested;
+  for (const std::string& key : arguments.keys) {
+    tested.push_back(
+        {key, judge.judge(key, KeyKind::Scalar), judge.judge(key, KeyKind::Distribution)});
+  }
+  if (context.json) {
+    Json document = Json::array();
+    for (const auto& [key, scalar, distribution] : tested) {
+      document.push_back(
+          {{"key", key}, {"scalar", jsonOf(scalar)}, {"distribution", jsonOf(distribution)}});
+    }
+    printJson(context, document);
+  } else {
+    for (const TestedKey& one : tested) printTestedKey(context, one);
+  }
+  return std::ranges::all_of(tested, &TestedKey::isReported) ? kSuccess : kWrong;
 }
 
 }  // namespace
 
 void addWhitelistCommands(CLI::App& app, ToolContext& context) {
-  const auto arguments = std::make_shared<WhitelistArguments>();
-  CLI::App* const whitelist =
-      app.add_subcommand("whitelist", "Check the whitelist, test keys against it");
-  whitelist->require_subcommand(1);
-  const auto add = [&](const char* name, const char* description, auto run) {
-    return addCommand(whitelist, context, name, description,
-                      [&context, arguments, run] { return run(context, *arguments); });
-  };
+  CommandGroup<WhitelistArguments> whitelist(
+      addFamily(app, "whitelist", "Check the whitelist and test keys against it"), context);
+  WhitelistArguments& arguments = whitelist.arguments();
   constexpr const char* kFile = "A whitelist file instead of the device's";
 
-  CLI::App* command = add("check", "Find faults (exit status 1) and surprises", check);
-  command->add_option("FILE", arguments->file, kFile);
+  whitelist.add("check", "Find faults (exit status 1) and surprises in the whitelist", check)
+      .optionalArgument(kFileValue, &arguments.file, kFile);
 
-  command = add("test", "Say whether keys would be reported, and by which entry", test);
-  command->add_option("KEY", arguments->keys, "Keys of the metrics store")->required();
-  command->add_option("--file", arguments->file, kFile)->type_name("FILE");
+  Command command =
+      whitelist.add("test", "Say whether keys would be reported, and by which entry", test);
+  command.argument(kStoreKeyValue, &arguments.keys, "Keys of the metrics store");
+  command.option("--file", kFileValue, &arguments.file, kFile);
 }
 
 }  // namespace tally::tools

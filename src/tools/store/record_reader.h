@@ -9,16 +9,16 @@
 
 namespace tally::tools {
 
-// A record is a line, or several when a quoted field holds line ends. A quote that is never closed
-// costs its own line only: a record that would be longer than longestRecord is cut at its first
-// line end.
+// A record is a line, or several if a quoted field contains line ends. A quote that is never closed
+// invalidates only its own line: a record that would be longer than kLongestRecord is cut at its
+// first line end.
 class RecordReader {
  public:
   static constexpr std::size_t kLongestRecord = 8192;
   struct Record {
     std::string_view text;   // without its line end; valid until the next call
     std::uint64_t line = 0;  // of its first byte, from 1
-    bool tooLong = false;    // a line above the bound; its text is left out
+    bool tooLong = false;    // a line longer than the bound; its text is left out
   };
   // The file is borrowed.
   explicit RecordReader(std::FILE* file) : file_(file), buffer_(kBufferBytes) {}

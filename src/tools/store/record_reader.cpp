@@ -1,4 +1,4 @@
-#include "tools/frame/record_reader.h"
+#include "tools/store/record_reader.h"
 
 #include <algorithm>
 #include <cstring>
@@ -6,8 +6,8 @@
 namespace tally::tools {
 namespace {
 
-// Whether text, so far, ends inside a quoted field. A quote elsewhere than at a field's begin is an
-// ordinary character.
+// Whether text, so far, ends inside a quoted field. A quote that is not at the start of a field is
+// an ordinary character.
 class QuoteState {
  public:
   void add(std::string_view text) {
