@@ -7,7 +7,6 @@
 
 #include <functional>
 #include <map>
-#include <set>
 
 #include "fakes/fake_platform.h"
 #include "platform/known_preferences.h"
@@ -20,6 +19,7 @@ using testing::HasSubstr;
 using testing::IsEmpty;
 
 const std::string kOwn(kProgramDomain);
+const std::string kPosted = "post vellum.da.tasking_changed";
 
 KvRef<KvObject> text(std::string_view value) { return KvString::create(value); }
 KvRef<KvDictionary> entry(const char* user, const char* domain, const char* key,
@@ -82,8 +82,7 @@ TEST_F(TaskingTest, AppliesAndRollsBackInOrder) {
                   "set " + kOwn + " TaskingID=A", "set " + kOwn + " TaskingOS=1A1",
                   "set " + kOwn + " TaskingDigest=digest of A",
                   "set " + kOwn + " TaskingPayload=" + payloadText(*taskingA()),
-                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn,
-                  "post vellum.da.tasking_changed"));
+                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn, kPosted));
   EXPECT_THAT(fake.log->lines, IsEmpty());
 
   EXPECT_THAT(update(taskingA()), IsEmpty());
@@ -96,11 +95,10 @@ TEST_F(TaskingTest, AppliesAndRollsBackInOrder) {
                   "remove " + kOwn + " TaskingDigest", "remove " + kOwn + " TaskingPayload",
                   "synchronize " + kOwn, "remove vellum.da G", "system sys S removed unsynced",
                   "user guest dom K deleted", "remove vellum.da common", "synchronize vellum.da",
-                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn,
-                  "post vellum.da.tasking_changed"));
+                  "remove " + kOwn + " TaskingUnfinished", "synchronize " + kOwn, kPosted));
   EXPECT_TRUE(fake.log->has(LogLevel::Default, "Tasking update (A -> E, 1A1 -> 1A1)"));
   EXPECT_EQ(own("TaskingOS"), "1A1");
-  EXPECT_THAT(update(schedule("E", nullptr)), ElementsAre("post vellum.da.tasking_changed"));
+  EXPECT_THAT(update(schedule("E", nullptr)), ElementsAre(kPosted));
   EXPECT_THAT(fake.log->lines, IsEmpty());
 }
 
@@ -152,7 +150,7 @@ TEST_F(TaskingTest, StatesOfTheRecordAndTheSchedule) {
     EXPECT_EQ(own("TaskingID"), c.id);
     EXPECT_EQ(kvText(fake.preferences->SMAPreferencesGetValue("G", "vellum.da").get()), c.g);
     EXPECT_EQ(kvText(fake.preferences->SMAPreferencesGetValue("H", "zz").get()), c.h);
-    EXPECT_EQ(!calls.empty() && calls.back() == "post vellum.da.tasking_changed", c.notified);
+    EXPECT_EQ(!calls.empty() && calls.back() == kPosted, c.notified);
     EXPECT_EQ(fake.log->lines.empty() ? "" : fake.log->lines[0].text, std::string(c.message));
   }
 }
@@ -195,9 +193,8 @@ TEST_F(TaskingTest, EntriesThatCanNeverBeWrittenAreSkippedWithALine) {
   for (const std::string& call : update(schedule("A", payload))) {
     if (call.find(kOwn) == call.npos) effects.push_back(call);
   }
-  EXPECT_THAT(effects,
-              ElementsAre("set d Wi-Fi / Cellular=v", "set d =v", "set d ..=v", "set d twice=last",
-                          "remove d k", "synchronize d", "post vellum.da.tasking_changed"));
+  EXPECT_THAT(effects, ElementsAre("set d Wi-Fi / Cellular=v", "set d =v", "set d ..=v",
+                                   "set d twice=last", "remove d k", "synchronize d", kPosted));
   EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), bad);
   EXPECT_TRUE(fake.log->has(LogLevel::Error,
                             "tasking: entry 4 of the scheduled payload is skipped: its \"Domain\" "
@@ -208,166 +205,99 @@ TEST_F(TaskingTest, EntriesThatCanNeverBeWrittenAreSkippedWithALine) {
               good.get()));
 }
 
-// The stores of a device, as they are after a run: writes that are not flushed are lost.
-struct DeviceStores final : Preferences, SMASystemConfiguration, SMAServicesClient {
-  using Values = std::map<std::string, std::string>;
-  Values values;                                  // by "DOMAIN KEY", "USER DOMAIN KEY"
-  std::map<std::string, KvRef<KvObject>> record;  // the program's own domain, with its types
-  std::set<std::string> failing, refusing;        // "DOMAIN", "DOMAIN KEY", "USER DOMAIN KEY"
-  std::vector<std::string> attempts;              // to write; "-" before a removal
-  KvRef<KvObject> scheduled;
-  std::map<std::string, std::map<std::string, KvRef<KvObject>>> pending;
-
-  KvRef<KvObject> SMAPreferencesGetValue(std::string_view key, std::string_view) override {
-    const auto found = record.find(std::string(key));
-    return found == record.end() ? nullptr : found->second;
-  }
-  void SMAPreferencesSetValue(std::string_view key, KvRef<KvObject> value,
-                              std::string_view domain) override {
-    pending[std::string(domain)].insert_or_assign(std::string(key), std::move(value));
-  }
-  WriteResult SMAPreferencesSynchronize(std::string_view name) override {
-    const std::string domain(name);
-    if (const WriteResult result = resultOf(domain); !result) return result;
-    for (const auto& [key, value] : pending[domain]) {
-      if (domain != kOwn) {
-        store(domain + " " + key, value.get());
-      } else if (value) {
-        record[key] = value;
-      } else {
-        record.erase(key);
-      }
-    }
-    pending.erase(domain);
-    return WriteResult::Written;
-  }
-  KvRef<KvObject> getPreference(std::string_view, std::string_view) override { return scheduled; }
-  WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
-                            bool) override {
-    return store(std::string(domain).append(" ").append(key), value.get());
-  }
-  WriteResult setPreference(std::string_view key, std::string_view user, std::string_view domain,
-                            KvRef<KvObject> value) override {
-    return store(fakes::FakeServicesClient::nameOf(key, user, domain), value.get());
-  }
-  WriteResult deletePreference(std::string_view key, std::string_view user,
-                               std::string_view domain) override {
-    return setPreference(key, user, domain, nullptr);
-  }
-
-  WriteResult resultOf(const std::string& name) const {
-    if (refusing.contains(name)) return WriteResult::Refused;
-    return failing.contains(name) ? WriteResult::Failed : WriteResult::Written;
-  }
-  WriteResult store(const std::string& name, const KvObject* value) {
-    attempts.push_back((value != nullptr ? "" : "-") + name);
-    const WriteResult result = resultOf(name);
-    if (result && value != nullptr) values[name] = kvText(value);
-    if (result && value == nullptr) values.erase(name);
-    return result;
-  }
-  Values everything() const {
-    Values all = values;
-    for (const auto& [key, value] : record) all["record " + key] = kvText(value.get());
-    return all;
-  }
-  std::string inForce() const {
-    const auto found = record.find("TaskingID");
-    return found == record.end() ? "" : kvText(found->second.get());
-  }
-};
-
-class FailingStoresTest : public TaskingTest {
- protected:
-  void run(const std::shared_ptr<DeviceStores>& stores, const KvRef<KvDictionary>& scheduled) {
-    stores->scheduled = scheduled;
-    stores->attempts.clear();
-    stores->pending.clear();
-    fake.log->lines.clear();
-    fake.calls->clear();
-    Platform services = fake.services();
-    services.preferences = stores;
-    services.systemConfiguration = stores;
-    services.servicesClient = stores;
-    updateTaskingState(services);
-  }
-  // A list in which commas separate.
-  static std::vector<std::string> split(std::string_view text) {
-    std::vector<std::string> parts;
-    while (!text.empty()) {
-      const auto end = std::min(text.find(','), text.size());
-      parts.emplace_back(text.substr(0, end));
-      text.remove_prefix(std::min(end + 1, text.size()));
-    }
-    return parts;
-  }
-};
-
-TEST_F(FailingStoresTest, WhatFailedIsTriedAgainAndNothingElse) {
+TEST_F(TaskingTest, WhatFailedIsTriedAgainAndNothingElse) {
+  using Values = std::map<std::string, WriteResult>;
+  using Calls = std::vector<std::string>;
   const auto A = taskingA(), B = taskingB();
   const KvRef<KvDictionary> none;
+  const Values sysT = {{"sys T", WriteResult::Failed}};
   // Tasking A is in force, and B is scheduled.
   const struct {
-    const char *name, *failing, *refusing;  // while B is applied for the first time
-    std::size_t lines;                      // about them
-    const char* inForce;                    // then
-    KvRef<KvDictionary> next;               // scheduled for the second run, which meets no fault
-    const char *attempts, *inForceAtLast;   // of it, after it
-    const char* newBuild = nullptr;         // since the second run
+    const char* name;
+    Values failures;            // of the system and of users, while B is applied first
+    std::string failingDomain;  // of the program, likewise
+    std::size_t lines;          // about them
+    const char* inForce;        // then
+    KvRef<KvDictionary> next;   // scheduled for the second run, which meets no fault
+    Calls attempts;             // of it
+    const char* inForceAtLast;
+    const char* newBuild = nullptr;  // since the second run
   } cases[] = {
-      {"a system write", "sys T", "", 1, "", B, "sys T", "B"},
-      {"a domain", "vellum.da", "", 2, "", B, "-vellum.da G,vellum.da common", "B"},
-      {"a refused write", "", "sys T", 1, "B", B, "", "B"},
-      {"a refused removal", "", "guest dom K", 1, "B", B, "", "B"},
-      {"the note", kOwn.c_str(), "", 1, "A", B,
-       "-sys S,-guest dom K,sys T,guest dom L,-vellum.da G,vellum.da common,zz H", "B"},
-      {"withdrawn while failing", "sys T", "", 1, "", none, "sys T", "B"},
-      {"the former one again", "sys T,guest dom K", "", 2, "", A,
-       "-sys T,-guest dom L,-guest dom K,sys S,guest dom K,-zz H,vellum.da G,vellum.da common",
+      {"a system write", sysT, "", 1, "(null)", B, {"system sys T=b"}, "B"},
+      {"a domain",
+       {},
+       "vellum.da",
+       2,
+       "(null)",
+       B,
+       {"remove vellum.da G", "set vellum.da common=b", "synchronize vellum.da"},
+       "B"},
+      {"a refused write", {{"sys T", WriteResult::Refused}}, "", 1, "B", B, {}, "B"},
+      {"a refused removal", {{"guest dom K", WriteResult::Refused}}, "", 1, "B", B, {}, "B"},
+      {"the note",
+       {},
+       kOwn,
+       1,
+       "A",
+       B,
+       {"remove vellum.da G", "system sys S removed unsynced", "user guest dom K deleted",
+        "remove vellum.da common", "system sys T=b", "set zz H=b", "user guest dom L=b",
+        "set vellum.da common=b", "synchronize vellum.da", "synchronize zz"},
+       "B"},
+      {"withdrawn while failing", sysT, "", 1, "(null)", none, {"system sys T=b"}, "B"},
+      {"the former one again",
+       {{"sys T", WriteResult::Failed}, {"guest dom K", WriteResult::Failed}},
+       "",
+       2,
+       "(null)",
+       A,
+       {"system sys T removed unsynced", "remove zz H", "user guest dom L deleted",
+        "remove vellum.da common", "user guest dom K deleted", "set vellum.da G=a",
+        "system sys S=a", "user guest dom K=a", "set vellum.da common=a", "synchronize zz",
+        "synchronize vellum.da"},
        "A"},
-      {"a system update while failing", "sys T", "", 1, "", B,
-       "-sys T,-guest dom L,sys T,guest dom L,zz H,vellum.da common", "B", "1A2"},
+      {"a system update while failing",
+       sysT,
+       "",
+       1,
+       "(null)",
+       B,
+       {"system sys T removed unsynced", "remove zz H", "user guest dom L deleted",
+        "remove vellum.da common", "system sys T=b", "set zz H=b", "user guest dom L=b",
+        "set vellum.da common=b", "synchronize zz", "synchronize vellum.da"},
+       "B",
+       "1A2"},
   };
-  const auto systemVersion = fake.deviceInformation->systemVersion;
   for (const auto& c : cases) {
     SCOPED_TRACE(c.name);
-    const auto device = std::make_shared<DeviceStores>(),
-               expected = std::make_shared<DeviceStores>();
-    fake.deviceInformation->systemVersion = systemVersion;
-    run(device, A);
-    const auto failing = split(c.failing), refusing = split(c.refusing);
-    device->failing = {failing.begin(), failing.end()};
-    device->refusing = {refusing.begin(), refusing.end()};
-    const bool isUnrecorded = device->failing.contains(kOwn);
-    run(device, B);
-    EXPECT_EQ(device->inForce(), c.inForce);
+    fake = fakes::makeFakePlatform();
+    update(A);
+    const auto stored = fake.preferences->values;
+    fake.systemConfiguration->failures = fake.servicesClient->failures = c.failures;
+    fake.preferences->failingDomains = {c.failingDomain};
+    const bool isNoted = c.failingDomain != kOwn;
+    EXPECT_EQ(update(B).back() == kPosted, isNoted) << "posted when something changed";
+    if (!isNoted) fake.preferences->values = stored;  // what was not flushed is lost
+    EXPECT_EQ(own("TaskingID"), c.inForce);
     EXPECT_EQ(fake.log->texts(LogLevel::Error).size(), c.lines);
-    EXPECT_EQ(fake.calls->empty(), isUnrecorded) << "posted when something changed";
-    const bool isFinished = device->inForce() == "B";
-    if (!isFinished && !isUnrecorded) {
-      const auto before = device->everything();
-      run(device, B);
-      EXPECT_EQ(device->everything(), before) << "the same faults again";
-      EXPECT_THAT(*fake.calls, IsEmpty()) << "nothing changed";
+    const bool isFinished = own("TaskingID") == "B";
+    if (!isFinished && isNoted) {
+      EXPECT_NE(update(B).back(), kPosted) << "the same faults change nothing";
     }
-    device->failing.clear();
-    device->refusing.clear();
+    fake.systemConfiguration->failures = fake.servicesClient->failures = {};
+    fake.preferences->failingDomains.clear();
     if (c.newBuild != nullptr) {
       fake.deviceInformation->systemVersion =
           KvDictionary::create({{"ProductBuildVersion", text(c.newBuild)}});
     }
-    run(device, c.next);
-    EXPECT_EQ(device->attempts, split(c.attempts));
-    EXPECT_EQ(device->inForce(), c.inForceAtLast);
+    Calls attempts = update(c.next);
+    EXPECT_EQ(!attempts.empty() && attempts.back() == kPosted, !isFinished);
+    std::erase_if(attempts, [](const std::string& call) {
+      return call == kPosted || call.find(kOwn) != call.npos;
+    });
+    EXPECT_EQ(attempts, c.attempts);
+    EXPECT_EQ(own("TaskingID"), c.inForceAtLast);
     EXPECT_THAT(fake.log->texts(LogLevel::Error), IsEmpty());
-    EXPECT_EQ(fake.calls->size(), isFinished ? 0u : 1u) << "posted when something changed";
-    if (!refusing.empty()) continue;
-    run(expected, c.next ? c.next : B);
-    for (const auto& stores : {device, expected}) {
-      stores->record.erase("LastOSUpdate");
-      if (device->inForce().empty()) stores->record.erase("TaskingOS");
-    }
-    EXPECT_EQ(device->everything(), expected->everything());
   }
 }
 

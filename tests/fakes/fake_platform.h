@@ -151,6 +151,7 @@ struct FakeNotifications final : Notifications {
 // Writes are recorded as "system DOMAIN KEY=VALUE" or "... removed", with " unsynced" at the end.
 struct FakeSystemConfiguration final : SMASystemConfiguration {
   std::shared_ptr<CallLog> calls;
+  std::map<std::string, WriteResult> failures;                            // by "DOMAIN KEY"
   std::map<std::pair<std::string, std::string>, KvRef<KvObject>> values;  // by domain and key
 
   KvRef<KvObject> getPreference(std::string_view key, std::string_view domain) override {
@@ -159,8 +160,10 @@ struct FakeSystemConfiguration final : SMASystemConfiguration {
   }
   WriteResult setPreference(std::string_view key, KvRef<KvObject> value, std::string_view domain,
                             bool sync) override {
-    calls->push_back("system " + std::string(domain) + " " + std::string(key) +
-                     (value ? "=" + kvText(value.get()) : " removed") + (sync ? "" : " unsynced"));
+    const std::string name = std::string(domain) + " " + std::string(key);
+    calls->push_back("system " + name + (value ? "=" + kvText(value.get()) : " removed") +
+                     (sync ? "" : " unsynced"));
+    if (const auto failure = failures.find(name); failure != failures.end()) return failure->second;
     values[{std::string(domain), std::string(key)}] = std::move(value);
     return WriteResult::Written;
   }
@@ -168,19 +171,23 @@ struct FakeSystemConfiguration final : SMASystemConfiguration {
 
 struct FakeServicesClient final : SMAServicesClient {
   std::shared_ptr<CallLog> calls;
+  std::map<std::string, WriteResult> failures;    // by "USER DOMAIN KEY"
   std::map<std::string, KvRef<KvObject>> values;  // by "USER DOMAIN KEY"
 
   WriteResult setPreference(std::string_view key, std::string_view user, std::string_view domain,
                             KvRef<KvObject> value) override {
     const std::string name = nameOf(key, user, domain);
     calls->push_back("user " + name + "=" + kvText(value.get()));
+    if (const auto failure = failures.find(name); failure != failures.end()) return failure->second;
     values[name] = std::move(value);
     return WriteResult::Written;
   }
   WriteResult deletePreference(std::string_view key, std::string_view user,
                                std::string_view domain) override {
-    calls->push_back("user " + nameOf(key, user, domain) + " deleted");
-    values.erase(nameOf(key, user, domain));
+    const std::string name = nameOf(key, user, domain);
+    calls->push_back("user " + name + " deleted");
+    if (const auto failure = failures.find(name); failure != failures.end()) return failure->second;
+    values.erase(name);
     return WriteResult::Written;
   }
   static std::string nameOf(std::string_view key, std::string_view user, std::string_view domain) {
