@@ -49,7 +49,8 @@ std::string fixedLine(const FixedRecord& r) {
   return line;
 }
 
-Bytes bytesOf(const std::vector<FixedRecord>& records) {
+template <class Words>
+Bytes bytesOf(const std::vector<Words>& records) {
   Bytes bytes;
   for (const auto& record : records) {
     for (const std::uint32_t word : record) appendValue(bytes, word);
@@ -58,16 +59,21 @@ Bytes bytesOf(const std::vector<FixedRecord>& records) {
 }
 
 struct Rendered {
-  int result = -1;
-  std::uint32_t size = 0;
+  std::uint32_t size;
   std::string text;  // the whole buffer, of the capacity
+  int result = -1;
 };
 
-Rendered renderFixed(const Bytes& records, std::uint32_t capacity) {
-  Rendered r{-1, capacity, std::string(capacity, kUntouched)};
-  std::vector<char> exact(r.text.begin(), r.text.end());  // its bounds are watched
-  r.result = SPXParseSnapshotBuffer(records.data(), static_cast<std::uint32_t>(records.size()),
-                                    exact.data(), &r.size);
+// Of fixed records, or of those that a block describes.
+Rendered render(const Bytes& records, std::uint32_t capacity, const Bytes* block = nullptr,
+                std::uint32_t* cursor = nullptr) {
+  Rendered r{capacity, {}};
+  std::vector<char> exact(capacity, kUntouched);  // its bounds are watched
+  const auto length = static_cast<std::uint32_t>(records.size());
+  r.result = block == nullptr
+                 ? SPXParseSnapshotBuffer(records.data(), length, exact.data(), &r.size)
+                 : SPXParseSnapshotBufferWithInplaceParser(records.data(), length, exact.data(),
+                                                           &r.size, *block, cursor);
   r.text.assign(exact.begin(), exact.end());
   return r;
 }
@@ -85,20 +91,17 @@ std::vector<FixedRecord> fixedRecords(std::size_t count) {
 TEST(Snapshot, OnlyWholeFixedRecordsArePrinted) {
   auto records = fixedRecords(3);
   records[1].fill(kLargest);
-  Bytes bytes = bytesOf(records);
-  for (const std::size_t length : {0u, 251u, 252u, 503u, 504u, 756u}) {
-    bytes.resize(length);
-    bytes.shrink_to_fit();
+  const Bytes bytes = bytesOf(records);
+  for (const std::ptrdiff_t length : {0, 251, 252, 503, 504, 756}) {
     std::string expected(kSnapshotKey);
-    for (std::size_t i = 0; i < length / 252; ++i) expected += fixedLine(records[i]);
-    const auto r = renderFixed(bytes, 8192);
+    for (int i = 0; i < length / 252; ++i) expected += fixedLine(records.at(i));
+    const auto r = render(Bytes(bytes.begin(), bytes.begin() + length), 8192);
     EXPECT_EQ(r.result, 1) << length;
     EXPECT_EQ(r.text.substr(0, r.size), expected + "\n") << length;
-    bytes = bytesOf(records);
   }
   FixedRecord hysteresis{};
   hysteresis[39] = 123456;
-  EXPECT_NE(renderFixed(bytesOf({hysteresis}), 8192).text.find(" TH=     123.45 GC="),
+  EXPECT_NE(render(bytesOf(std::vector{hysteresis}), 8192).text.find(" TH=     123.45 GC="),
             std::string::npos);
 }
 
@@ -159,6 +162,11 @@ struct Descriptor {
 
 constexpr std::uint32_t kTableOffset = 64;
 
+void appendText(Bytes& bytes, const std::string& text, std::size_t end) {
+  for (const char letter : text) appendValue(bytes, letter);
+  bytes.resize(end);
+}
+
 struct Block {
   std::uint32_t version = 6, stride = 40, count = 6, table = kTableOffset;
   std::string title = "storage processor 3";
@@ -171,8 +179,7 @@ struct Block {
     for (const std::uint32_t word : {0u, version, stride, count, 0u, 0u, table, 0u}) {
       appendValue(all, word);
     }
-    for (const char letter : title) appendValue(all, letter);
-    all.resize(kTableOffset);
+    appendText(all, title, kTableOffset);
     appendValue(all, static_cast<std::uint32_t>(fields.size()));
     appendValue(all, 0u);
     for (const Descriptor& field : fields) {
@@ -180,9 +187,7 @@ struct Block {
       appendValue(all, std::uint16_t{0});
       appendValue(all, field.offset);
       appendValue(all, field.size);
-      const std::size_t start = all.size();
-      for (const char letter : field.label) appendValue(all, letter);
-      all.resize(start + 16);
+      appendText(all, field.label, all.size() + 16);
     }
     return all;
   }
@@ -201,13 +206,7 @@ std::vector<std::array<std::uint32_t, 10>> describedRecords() {
   return records;
 }
 
-Bytes describedBytes() {
-  Bytes bytes;
-  for (const auto& record : describedRecords()) {
-    for (const std::uint32_t word : record) appendValue(bytes, word);
-  }
-  return bytes;
-}
+Bytes describedBytes() { return bytesOf(describedRecords()); }
 
 std::string describedLine(const std::array<std::uint32_t, 10>& r) {
   if (r[0] == 0) return "";
@@ -215,15 +214,10 @@ std::string describedLine(const std::array<std::uint32_t, 10>& r) {
                  r[2] / 1000, r[3], r[6], r[4], r[7], r[5], r[8]);
 }
 
-Rendered renderDescribed(const Bytes& records, const Bytes& block, std::uint32_t capacity,
-                         std::uint32_t& cursor) {
-  Rendered r{-1, capacity, {}};
-  std::vector<char> exact(capacity, kUntouched);
-  r.result = SPXParseSnapshotBufferWithInplaceParser(records.data(),
-                                                     static_cast<std::uint32_t>(records.size()),
-                                                     exact.data(), &r.size, block, &cursor);
-  r.text.assign(exact.begin(), exact.end());
-  return r;
+Rendered renderDescribed(const Block& block, std::uint32_t capacity, std::uint32_t& cursor,
+                         const Bytes& records = describedBytes()) {
+  const Bytes description = block.bytes();
+  return render(records, capacity, &description, &cursor);
 }
 
 // From every cursor and at every capacity: whole lines only, and the cursor after the line that
@@ -251,7 +245,7 @@ TEST(Snapshot, DescribedLinesAtEveryCapacity) {
           fits = line.size() < capacity;
           if (fits) committed = line;
         }
-        const auto r = renderDescribed(bytes, description, capacity, cursor);
+        const auto r = render(bytes, capacity, &description, &cursor);
         ASSERT_EQ(r.result, fits ? 1 : 0) << start << " " << capacity;
         ASSERT_EQ(cursor, expectedCursor) << start << " " << capacity;
         ASSERT_EQ(r.size, capacity == 0 ? 0 : committed.size() + 1);
@@ -264,20 +258,18 @@ TEST(Snapshot, DescribedLinesAtEveryCapacity) {
 }
 
 TEST(Snapshot, WrongCountsAndLengthsEndWithTheRecords) {
-  const struct {
-    std::uint32_t count;
-    std::size_t bytes, records;
-  } cases[] = {{0, 200, 0},       {1, 200, 0},        {2, 200, 1},       {5, 200, 4}, {6, 199, 4},
-               {kLargest, 81, 2}, {kLargest, 200, 5}, {kLargest, 39, 0}, {6, 0, 0}};
-  for (const auto& c : cases) {
+  const std::tuple<std::uint32_t, std::size_t, std::uint32_t> cases[] = {
+      {0, 200, 0},       {1, 200, 0},        {2, 200, 1},       {5, 200, 4}, {6, 199, 4},
+      {kLargest, 81, 2}, {kLargest, 200, 5}, {kLargest, 39, 0}, {6, 0, 0}};
+  for (const auto& [count, length, records] : cases) {
     Block block;
-    block.count = c.count;
+    block.count = count;
     Bytes bytes = describedBytes();
-    bytes.resize(c.bytes);
+    bytes.resize(length);
     bytes.shrink_to_fit();
     std::uint32_t cursor = 0;
-    EXPECT_EQ(renderDescribed(bytes, block.bytes(), 4096, cursor).result, 1);
-    EXPECT_EQ(cursor, c.records) << c.count << " " << c.bytes;
+    EXPECT_EQ(renderDescribed(block, 4096, cursor, bytes).result, 1);
+    EXPECT_EQ(cursor, records) << count << " " << length;
   }
 }
 
@@ -307,18 +299,15 @@ TEST(Snapshot, DescriptionsThatCannotBeHonouredAreRefusedWhole) {
     c.change(block);
     std::uint32_t cursor = 0;
     testing::internal::CaptureStderr();
-    const auto r = renderDescribed(describedBytes(), block.bytes(), 4096, cursor);
+    const auto r = renderDescribed(block, 4096, cursor);
     EXPECT_EQ(testing::internal::GetCapturedStderr(), "") << c.what;
-    EXPECT_EQ(r.result, 0) << c.what;
-    EXPECT_EQ(cursor, 0u) << c.what;
-    EXPECT_EQ(r.size, 1u) << c.what;
-    EXPECT_EQ(r.text[0], '\0') << c.what;
+    EXPECT_EQ(std::tuple(r.result, cursor, r.size, r.text[0]), std::tuple(0, 0u, 1u, '\0'))
+        << c.what;
   }
   std::uint32_t cursor = 3;  // and one that is null
-  const auto none = renderDescribed(describedBytes(), {}, 100, cursor);
-  EXPECT_EQ(none.result, 0);
-  EXPECT_EQ(none.size, 100u);
-  EXPECT_EQ(cursor, 3u);
+  const Bytes null;
+  const auto none = render(describedBytes(), 100, &null, &cursor);
+  EXPECT_EQ(std::tuple(none.result, cursor, none.size), std::tuple(0, 3u, 100u));
   EXPECT_EQ(none.text, std::string(100, kUntouched));
 }
 
@@ -327,7 +316,7 @@ TEST(Snapshot, LabelsEndWithTheirField) {
   Block block;
   block.fields = {{0, 0, 4, "0123456789abcd%u"}, {1, 4, 4, "|%u"}};
   std::uint32_t cursor = 0;
-  const auto r = renderDescribed(describedBytes(), block.bytes(), 4096, cursor);
+  const auto r = renderDescribed(block, 4096, cursor);
   EXPECT_NE(r.text.find("0123456789abcd1000|1037\n"), std::string::npos);
 }
 
