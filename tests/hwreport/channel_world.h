@@ -42,6 +42,10 @@ inline KvRef<KvDictionary> flat(std::initializer_list<KvRef<KvObject>> channels)
   return KvDictionary::create({{"HwReportChannels", KvArray::create(channels)}});
 }
 
+inline KvDictionary* channelAt(const KvRef<KvDictionary>& flatCollection, std::size_t index) {
+  return flatCollection->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(index);
+}
+
 struct Element {
   std::vector<std::uint64_t> slots;
   std::uint64_t time = 0;
@@ -103,6 +107,7 @@ inline std::string errorText(const KvRef<HwReportError>& error) {
   std::snprintf(code, sizeof(code), "%08X ", error->code());
   return code + std::string(error->failureReason());
 }
+constexpr const char* kNotAdded = "E00002BC _addChannel() failed";
 constexpr const char* kNoReason = "createKvErr() passed a NULL string!";
 
 // A platform with a registry and nothing else.

@@ -9,13 +9,10 @@ using namespace tests;
 class Samples : public RegistryTest {
  protected:
   void addHub() { registry().entries.push_back({"HwReportHub", "hub", 1}); }
-  KvRef<HwReportSubscription> subscribe(KvDictionary* desired, std::string* error = nullptr) {
-    KvRef<HwReportError> object;
-    auto subscription = HwReportCreateSubscription(nullptr, desired, &subscribed_, 0, &object);
-    EXPECT_EQ(!subscription, !!object);
-    if (error != nullptr) *error = errorText(object);
-    return subscription;
+  KvRef<HwReportSubscription> subscribe(KvDictionary* desired) {
+    return HwReportCreateSubscription(nullptr, desired, &subscribed_, 0, &error_);
   }
+  KvRef<HwReportError> error_;
   KvRef<KvDictionary> subscribed_;
 };
 
@@ -52,11 +49,11 @@ TEST_F(Samples, SubscribingFailsStepByStep) {
     addHub();
     registry().region.resize(64);
     if (c.fault) c.fault(registry());
-    std::string error;
+    error_ = nullptr;
     subscribed_ = nullptr;
-    subscribe(c.desired.get(), &error);  // and releases it
     SCOPED_TRACE(&c - cases);
-    EXPECT_EQ(error, c.error);
+    EXPECT_EQ(!subscribe(c.desired.get()), !c.error.empty());  // and releases it
+    EXPECT_EQ(errorText(error_), c.error);
     EXPECT_EQ(!subscribed_, !c.error.empty());
     std::vector<std::string> calls = {"open 0", "call 0", "call 2", "map 7 1", "unmap 7"};
     calls.resize(c.calls);
@@ -64,9 +61,8 @@ TEST_F(Samples, SubscribingFailsStepByStep) {
     EXPECT_EQ(registry().calls, calls);
     EXPECT_EQ(registry().openHandles(), 0);
   }
-  KvRef<HwReportError> error;
-  EXPECT_FALSE(HwReportCreateSubscription(nullptr, good.get(), nullptr, 0, &error));
-  EXPECT_EQ(errorText(error), "E00002C2 bad arguments");
+  EXPECT_FALSE(HwReportCreateSubscription(nullptr, good.get(), nullptr, 0, &error_));
+  EXPECT_EQ(errorText(error_), "E00002C2 bad arguments");
 }
 
 TEST_F(Samples, TheHubGetsTheInterestsAndTheSampleItsElements) {
@@ -79,45 +75,34 @@ TEST_F(Samples, TheHubGetsTheInterestsAndTheSampleItsElements) {
   const std::uint64_t interests[] = {2, 0x10, 0x41, typeWord(1, 1), 0x10, 0x42, 0};
   ASSERT_EQ(registry().structure.size(), sizeof(interests));
   EXPECT_EQ(std::memcmp(registry().structure.data(), interests, sizeof(interests)), 0);
-  const auto* const subscribed = subscribed_->getAs<KvArray>("HwReportChannels");
-  EXPECT_NE(subscribed->get(0), desired->getAs<KvArray>("HwReportChannels")->get(0)) << "a copy";
+  EXPECT_NE(channelAt(subscribed_, 0), channelAt(desired, 0)) << "a copy";
 
   const auto samples = HwReportCreateSamples(subscription.get(), subscribed_.get());
   EXPECT_EQ(registry().scalars, std::vector<std::uint64_t>{0x1'0000'0007}) << "the whole token";
-  const auto* const channels = samples->getAs<KvArray>("HwReportChannels");
-  EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 9u);
-  EXPECT_EQ(HwReportArrayGetValueAtIndex(channels->getAs<KvDictionary>(1), 6), 7);
+  EXPECT_EQ(HwReportArrayGetValueAtIndex(channelAt(samples, 1), 6), 7);
   // The channel without a format has learnt it, in every copy of it.
-  EXPECT_EQ(
-      HwReportChannelGetFormat(desired->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(1)),
-      4);
-  EXPECT_EQ(HwReportChannelGetCategories(channels->getAs<KvDictionary>(1)), 0x100);
+  EXPECT_EQ(HwReportChannelGetFormat(channelAt(desired, 1)), 4);
+  EXPECT_EQ(HwReportChannelGetCategories(channelAt(samples, 1)), 0x100);
   // A sample is its own.
   registry().region[32 + 128] = std::byte{99};
-  EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 9u);
+  EXPECT_EQ(slotOf(*channelAt(samples, 0), 0, 0), 9u);
 
-  KvRef<HwReportError> error;
   registry().callResults[3] = 0xE5;
-  EXPECT_FALSE(HwReportCreateSamples(subscription.get(), subscribed_.get(), &error));
-  EXPECT_EQ(errorText(error), "000000E5 " + std::string(kNoReason));
-  EXPECT_FALSE(HwReportCreateSamples(nullptr, subscribed_.get(), &error));
-  EXPECT_EQ(errorText(error), "E00002C2 " + std::string(kNoReason));
+  EXPECT_FALSE(HwReportCreateSamples(subscription.get(), subscribed_.get(), &error_));
+  EXPECT_EQ(errorText(error_), "000000E5 " + std::string(kNoReason));
+  EXPECT_FALSE(HwReportCreateSamples(nullptr, subscribed_.get(), &error_));
+  EXPECT_EQ(errorText(error_), "E00002C2 " + std::string(kNoReason));
 }
 
 TEST_F(Samples, WhatASampleLearnsStaysOutOfTheLegend) {
   // Others may be reading the driver's legend, which is one object for all.
   const auto line = KvArray::create({number(0x41), number(0)});
-  const auto group = KvDictionary::create({{"HwReportChannels", KvArray::create({line})}});
-  addDriver("D", 0x10, KvArray::create({group}));
+  addDriver("D", 0x10, KvArray::create({flat({line})}));
   const auto channels = HwReportCopyAllChannels(0);
   const auto raw = KvData::create(run(0x41, typeWord(1, 1), {{{9}}}));
   const auto samples = HwReportCreateSamplesRaw(channels.get(), raw.get());
-  EXPECT_EQ(HwReportSimpleGetIntegerValue(
-                samples->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(0)),
-            9);
-  EXPECT_EQ(HwReportChannelGetFormat(
-                channels->getAs<KvArray>("HwReportChannels")->getAs<KvDictionary>(0)),
-            1);
+  EXPECT_EQ(HwReportSimpleGetIntegerValue(channelAt(samples, 0)), 9);
+  EXPECT_EQ(HwReportChannelGetFormat(channelAt(channels, 0)), 1);
   EXPECT_EQ(line->getAs<KvNumber>(1)->asInt64(), 0);
 }
 
@@ -130,15 +115,13 @@ TEST(SamplesRaw, BuffersOfEveryShape) {
   const struct {
     const char* what;
     std::vector<std::byte> buffer;
-    const char* names;  // null: failure
-    std::string error = {};
+    std::string names, error = {};
   } cases[] = {
       {"both, in another order", two + one, "a b"},
       {"the first of two runs counts", one + again + two, "a b"},
       {"one is missing", one, "a"},
-      {"63 bytes are none", std::vector<std::byte>(63), nullptr,
-       "E00002C2 couldn't create samples"},
-      {"a zero count before one of them", one + zero + two, nullptr, failed},
+      {"63 bytes are none", std::vector<std::byte>(63), "", "E00002C2 couldn't create samples"},
+      {"a zero count before one of them", one + zero + two, "", failed},
       {"a zero count after all of them", one + two + zero, "a b"},
       {"a run longer than the rest", one + lies, "a"},
   };
@@ -147,11 +130,10 @@ TEST(SamplesRaw, BuffersOfEveryShape) {
     const auto samples =
         HwReportCreateSamplesRaw(wanted.get(), KvData::create(c.buffer).get(), &error);
     EXPECT_EQ(errorText(error), c.error) << c.what;
-    ASSERT_EQ(!samples, c.names == nullptr) << c.what;
-    EXPECT_EQ(namesOf(samples.get()), c.names != nullptr ? c.names : "") << c.what;
-    const auto* channels = samples ? samples->getAs<KvArray>("HwReportChannels") : nullptr;
-    if (channels != nullptr && !channels->empty()) {
-      EXPECT_EQ(slotOf(*channels->getAs<KvDictionary>(0), 0, 0), 10u) << c.what;
+    ASSERT_EQ(!samples, !c.error.empty()) << c.what;
+    EXPECT_EQ(namesOf(samples.get()), c.names) << c.what;
+    if (samples) {
+      EXPECT_EQ(slotOf(*channelAt(samples, 0), 0, 0), 10u) << c.what;
     }
   }
   KvRef<HwReportError> error;
