@@ -35,21 +35,15 @@ int walk(Mode mode, KvDictionary* collection, const std::map<std::string, int>& 
     const auto found = results.find(name);
     return found != results.end() ? found->second : 0;
   };
+  if (mode == Mode::Iterate) return iterateChannels(collection, answer);
+  if (mode == Mode::Prune) return pruneChannels(collection, answer);
   KvArena arena;
-  switch (mode) {
-    case Mode::Iterate:
-      return iterateChannels(collection, answer);
-    case Mode::Prune:
-      return pruneChannels(collection, answer);
-    case Mode::Transform:
-      return transformChannels(
-          collection, arena, [&](KvDictionary* one, KvDictionary*) { return answer(one); }, output);
-    case Mode::Delta:
-      return deltaChannels(
-          collection, nested().get(), arena,
-          [&](KvDictionary*, KvDictionary* one, KvDictionary*) { return answer(one); }, output);
+  if (mode == Mode::Transform) {
+    const auto handler = [&](KvDictionary* one, KvDictionary*) { return answer(one); };
+    return transformChannels(collection, arena, handler, output);
   }
-  return -1;
+  const auto handler = [&](KvDictionary*, KvDictionary* one, KvDictionary*) { return answer(one); };
+  return deltaChannels(collection, nested().get(), arena, handler, output);
 }
 
 TEST(Walk, ResultsInEveryMode) {

@@ -84,26 +84,6 @@ class StorageLogTest : public testing::Test {
   bool wantsStatus = false;
 };
 
-TEST_F(StorageLogTest, WhatTheDriverIsAsked) {
-  wantsStatus = true;
-  putThreshold(KvNumber::float64(1.5));
-  serveDump();
-  EXPECT_EQ(dump(true), "");
-  // Selector, then flags: 1 the size query, 2 the caller's flag, the mode from 4 on.
-  EXPECT_THAT(registry.calls,
-              ElementsAre("find SPXStorage", "open 7 type 0", "call 8 in 24 13 1 room 4",
-                          "call 8 in 24 13 room 80", "close 9",  //
-                          "find SPXStorage", "open 7 type 0",    //
-                          "call 8 in 24 11 3 room 4", "call 8 in 24 11 2 room 80",
-                          "find SPXStorage", "open 7 type 0", "call 8 in 24 13 1 room 4",
-                          "call 8 in 24 13 room 80", "close 9",  //
-                          "call 8 in 24 17 3 room 4", "call 8 in 24 17 2 room 4128",
-                          "call 8 in 24 17 7 room 4", "call 8 in 24 17 6 room 4128",
-                          "call 8 in 24 17 11 room 4", "call 8 in 24 17 10 room 4128",
-                          "call 8 in 24 15 3 room 4", "call 8 in 24 15 2 room 44", "close 9"));
-  EXPECT_EQ(platform.crashReporting->records.size(), 3u + 2u);
-}
-
 TEST_F(StorageLogTest, AListThatFailsDoesNotStopTheOthers) {
   serveDump();
   registry.replies[7].status = 0xE00002C2;   // the data of the second telemetry list
@@ -165,30 +145,22 @@ TEST_F(StorageLogTest, WhatAControllerCannotExport) {
 }
 
 TEST_F(StorageLogTest, ValidityLists) {
-  Words sixteen = {17, 0, 0};
-  for (std::uint32_t i = 0; i < 17; ++i) sixteen.insert(sixteen.end(), {i, i * 10, 0, 0, 0});
-  std::string firstSixteen;
-  for (int i = 0; i < 16; ++i) {
-    firstSixteen += "ValidityList[" + std::to_string(i) + "] = (" + std::to_string(i * 10) + ");";
-  }
-  const std::string refused = "data cannot be parsed(null)";
-  const std::pair<Words, std::string> cases[] = {
-      {kValidity, "{ValidityList[0] = (5);ValidityList[2] = (70,-1);}"},
-      {sixteen, "{" + firstSixteen + "}"},
-      {{1}, refused},
-      {{1, 1, 0, 1, 1, 0, 0, 0}, refused},
-      {{858993460, 0, 0, 1, 1, 0, 0, 0}, refused},   // * 5 is 4 in 32 bits
-      {{1, 0x80000000, 0, 1, 1, 0, 0, 0}, refused},  // * 2 is 0 in 32 bits
-      {{1, 0x20000000, 0, 1, 1, 0, 0, 0}, refused},  // * 8 is 0 in 32 bits
-  };
-  for (const auto& [words, lists] : cases) {
+  const auto lists = [](const Words& words) {
     const Bytes bytes = listOf(words);
     KvRef<KvDictionary> validity;
-    const std::string errors = errorsOf([&] {
-      validity = readValidityList(bytes);
-      return true;
-    });
-    EXPECT_EQ(errors + oneLine(validity.get()), lists);
+    const std::string errors = errorsOf([&] { return bool(validity = readValidityList(bytes)); });
+    return errors + oneLine(validity.get());
+  };
+  EXPECT_EQ(lists(kValidity), "{ValidityList[0] = (5);ValidityList[2] = (70,-1);}");
+  Words seventeen = {17, 0, 0};
+  for (std::uint32_t i = 0; i < 17; ++i) seventeen.insert(seventeen.end(), {i, i * 10, 0, 0, 0});
+  EXPECT_THAT(lists(seventeen), EndsWith(";ValidityList[15] = (150);}"));
+  for (const Words& words : {Words{1},
+                             {1, 1, 0, 1, 1, 0, 0, 0},
+                             {858993460, 0, 0, 1, 1, 0, 0, 0},      // * 5 is 4 in 32 bits
+                             {1, 0x80000000, 0, 1, 1, 0, 0, 0},     // * 2 is 0 in 32 bits
+                             {1, 0x20000000, 0, 1, 1, 0, 0, 0}}) {  // * 8 is 0 in 32 bits
+    EXPECT_EQ(lists(words), "data cannot be parsedfalse(null)");
   }
 }
 
@@ -264,40 +236,50 @@ TEST_F(StorageLogTest, WriteAmplification) {
 }
 
 TEST_F(StorageLogTest, TheNeedForTheValidityList) {
-  const struct {
-    KvRef<KvObject> threshold;
-    bool needed;  // at a user amplification of 1.8
-    bool force = false;
-  } cases[] = {
+  const auto number = [](double threshold) { return KvNumber::float64(threshold); };
+  // Whether the list is needed, at a user amplification of 1.8.
+  const std::pair<KvRef<KvObject>, bool> cases[] = {
       {nullptr, false},
-      {KvNumber::float64(1.5), true},
-      {KvNumber::float64(1.9), false},
+      {number(1.5), true},
+      {number(1.9), false},
+      {number(-1), false},
       {KvNumber::int32(1), false},  // not a floating-point number
-      {KvNumber::float64(-1), false},
-      {KvNumber::float64(std::numeric_limits<double>::quiet_NaN()), false},
-      {nullptr, true, true},
-  };
-  for (const auto& c : cases) {
-    gForceCollectionSet = c.force ? 1 : 0;
-    wantsStatus = c.needed;
+      {number(std::numeric_limits<double>::quiet_NaN()), false},
+      {nullptr, true}};  // the last one by force
+  for (const auto& [threshold, needed] : cases) {
+    gForceCollectionSet = needed && !threshold ? 1 : 0;
+    wantsStatus = needed;
     platform.preferences->put("SSLastLoggedAt", nullptr, kProgramDomain);
     platform.logSubmission->logs.clear();
-    putThreshold(c.threshold);
+    putThreshold(threshold);
     serveDump();
     EXPECT_EQ(dump(), "");
     EXPECT_EQ(gCurrentUserWamp, double{1.8f});
-    EXPECT_EQ(gNeedValidityList != 0, c.needed) << kvText(c.threshold.get());
-    EXPECT_EQ(platform.logSubmission->logs.size(), c.needed ? 1u : 0u);
+    EXPECT_EQ(gNeedValidityList != 0, needed) << kvText(threshold.get());
+    EXPECT_EQ(platform.logSubmission->logs.size(), needed ? 1u : 0u);
   }
 }
 
-TEST_F(StorageLogTest, TheLogAsItIsWritten) {
+TEST_F(StorageLogTest, WhatTheDriverIsAskedAndWhatTheLogSays) {
   wantsStatus = true;
-  gForceCollectionSet = 1;
+  putThreshold(KvNumber::float64(1.5));
   platform.clock->now = 1709647629.9;
   platform.deviceInformation->answers["InverseDeviceID"] = KvString::create("abcdef");
   serveDump();
-  ASSERT_EQ(dump(), "");
+  EXPECT_EQ(dump(true), "");
+  // Selector, then flags: 1 the size query, 2 the caller's flag, the mode from 4 on.
+  EXPECT_THAT(registry.calls,
+              ElementsAre("find SPXStorage", "open 7 type 0", "call 8 in 24 13 1 room 4",
+                          "call 8 in 24 13 room 80", "close 9",  //
+                          "find SPXStorage", "open 7 type 0",    //
+                          "call 8 in 24 11 3 room 4", "call 8 in 24 11 2 room 80",
+                          "find SPXStorage", "open 7 type 0", "call 8 in 24 13 1 room 4",
+                          "call 8 in 24 13 room 80", "close 9",  //
+                          "call 8 in 24 17 3 room 4", "call 8 in 24 17 2 room 4128",
+                          "call 8 in 24 17 7 room 4", "call 8 in 24 17 6 room 4128",
+                          "call 8 in 24 17 11 room 4", "call 8 in 24 17 10 room 4128",
+                          "call 8 in 24 15 3 room 4", "call 8 in 24 15 2 room 44", "close 9"));
+  EXPECT_EQ(platform.crashReporting->records.size(), 3u + 2u);
   ASSERT_EQ(platform.logSubmission->logs.size(), 1u);
   const auto& log = platform.logSubmission->logs[0];
   EXPECT_EQ(log.typeCode + " " + log.name, "165 StorageStatus");
