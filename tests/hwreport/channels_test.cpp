@@ -239,27 +239,18 @@ TEST_F(Channels, ADriverThatFailsIsPrintedWhenAskedFor) {
 }
 
 TEST(ChannelNames, ComeFromTheLegendOrTheID) {
-  const struct {
-    std::uint64_t id;
-    const char *name, *legend = nullptr;
-  } cases[] = {
-      {0x435055, "CPU"},
-      {0x4300500055000000, "CPU"},
-      {0x41420043, "ABC"},
-      {0x4101, nullptr},
-      {0x417F, nullptr},
-      {0x4180, nullptr},
-      {0, nullptr},
-      {0x207E, " ~"},
-      {0x435055, "named", "named"},
-  };
-  for (const auto& c : cases) {
-    const auto one = channel(c.id, 1, c.legend);
+  const std::pair<std::uint64_t, std::string> cases[] = {
+      {0x435055, "CPU"},  {0x4300500055000000, "CPU"}, {0x41420043, "ABC"}, {0x4101, "(null)"},
+      {0x417F, "(null)"}, {0x4180, "(null)"},          {0, "(null)"},       {0x207E, " ~"}};
+  for (const auto& [id, expected] : cases) {
+    const auto one = channel(id, 1);
     const KvString* const name = HwReportChannelGetChannelName(one.get());
-    EXPECT_EQ(kvText(name), c.name != nullptr ? c.name : "(null)") << c.id;
+    EXPECT_EQ(kvText(name), expected) << id;
     EXPECT_EQ(one->contains("ChannelName"), name != nullptr);
     EXPECT_EQ(HwReportChannelGetChannelName(one.get()), name) << "cached";
   }
+  const auto named = channel(0x435055, 1, "named");
+  EXPECT_EQ(kvText(HwReportChannelGetChannelName(named.get())), "named");
 }
 
 }  // namespace

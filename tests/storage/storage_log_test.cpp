@@ -156,6 +156,7 @@ TEST_F(StorageLogTest, ValidityLists) {
   for (std::uint32_t i = 0; i < 17; ++i) seventeen.insert(seventeen.end(), {i, i * 10, 0, 0, 0});
   EXPECT_THAT(lists(seventeen), EndsWith(";ValidityList[15] = (150);}"));
   for (const Words& words : {Words{1},
+                             {0, 0, 0},
                              {1, 1, 0, 1, 1, 0, 0, 0},
                              {858993460, 0, 0, 1, 1, 0, 0, 0},      // * 5 is 4 in 32 bits
                              {1, 0x80000000, 0, 1, 1, 0, 0, 0},     // * 2 is 0 in 32 bits
