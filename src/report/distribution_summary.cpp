@@ -16,6 +16,7 @@ template <bool kWithHistogram>
 DistributionSummary addSamples(DistributionSummary summary, std::span<const double> samples,
                                const HistogramIntervals* intervals,
                                std::span<std::uint32_t> counts) {
+  auto* const buckets = counts.data();  // bucketOf() stays within them
   for (const double sample : samples) {
     // The latency of the division dominates; the bucket search runs in parallel with it.
     ++summary.count;
@@ -24,7 +25,7 @@ DistributionSummary addSamples(DistributionSummary summary, std::span<const doub
     summary.squaredDeviations += delta * (sample - summary.mean);
     summary.minimum = sample < summary.minimum ? sample : summary.minimum;
     summary.maximum = sample > summary.maximum ? sample : summary.maximum;
-    if constexpr (kWithHistogram) ++counts[intervals->bucketOf(sample)];
+    if constexpr (kWithHistogram) ++buckets[intervals->bucketOf(sample)];
   }
   return summary;
 }
