@@ -1,4 +1,4 @@
-// What the shared library has that its room has not.
+// The parts of the shared library that are not in its room.
 #include "hwreport/device_root.h"
 #include "library_platform.h"
 

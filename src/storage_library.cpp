@@ -1,5 +1,5 @@
-// What the shared library has that its room has not: the platform of a program that installs none.
-// It is made when it is first asked for.
+// The part of the shared library that is not in its room: the platform of a program that installs
+// none. It is made when it is first asked for.
 #include <string>
 
 #include "host/host_platform.h"

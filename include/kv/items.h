@@ -21,7 +21,7 @@ TALLY_API void kvFreeItems(void* memory, std::size_t size) noexcept;
 template <class T>
 class KvItems {
  public:
-  // Room for items behind the owner, which the owner's block has.
+  // Space for items after the owner, in the owner's block.
   KvItems(void* room, std::uint32_t capacity) noexcept
       : items_(static_cast<T*>(room)), capacity_(capacity & kMostItems) {}
   KvItems(const KvItems&) = delete;
@@ -46,7 +46,7 @@ class KvItems {
     new (items_ + size_) T(std::move(item));
     ++size_;
   }
-  // Adds copies. REQUIRES: there is room.
+  // Adds copies. REQUIRES: there is capacity for them.
   void appendWithinRoom(const KvItems& other) {
     std::uninitialized_copy(other.begin(), other.end(), end());
     size_ += other.size_;

@@ -268,7 +268,7 @@ class TALLY_API KvDictionary final : public KvObject {
   void merge(const KvDictionary& other);
   auto begin() const noexcept { return entries_.begin(); }
   auto end() const noexcept { return entries_.end(); }
-  // A new dictionary of the same keys and values, with room for some more.
+  // A new dictionary of the same keys and values, with capacity for some more.
   KvRef<KvDictionary> copy(std::size_t more = 0, KvArena* arena = nullptr) const;
 
  private:

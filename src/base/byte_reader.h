@@ -1,4 +1,4 @@
-// ByteReader: the one way in which a buffer from outside is read.
+// ByteReader: the only way in which untrusted buffers are read.
 #pragma once
 
 #include <bit>

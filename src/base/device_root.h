@@ -10,11 +10,11 @@
 
 namespace tally {
 
-// Paths are those of the device ("/var/mobile"), whose components never climb: ".." is refused. A
-// link on the way is followed when root (or the program's own user) owns it and nobody else can
-// write any directory down to it, as where a system keeps /var on another volume; its target is
-// taken below the root too. Below the first directory that another user can write, no link is
-// followed. The root itself is the caller's choice and may be a link.
+// Paths are those of the device ("/var/mobile"); ".." is rejected. A link on the way is followed
+// when root (or the program's own user) owns it and nobody else can write any directory down to it,
+// as where a system keeps /var on another volume; its target is taken below the root too. Below the
+// first directory that another user can write, no link is followed. The root itself is the caller's
+// choice and may be a link.
 class DeviceRoot {
  public:
   // "" is this machine's "/". Nothing is opened.
@@ -46,7 +46,7 @@ class DeviceRoot {
   std::shared_ptr<Opened> opened_;  // the root once it was found, shared by copies
 };
 
-// A directory of a device, opened anew whenever it is needed.
+// A directory of a device, opened again for each use.
 class DeviceDirectory {
  public:
   DeviceDirectory(DeviceRoot root, std::string path)
@@ -66,7 +66,7 @@ class DeviceDirectory {
   std::optional<FileIdentity> identity(std::string_view name) const {
     return root_.identity(path_ + "/" + std::string(name));
   }
-  // Sorted; those of a directory that is not there are none.
+  // Sorted; empty if the directory does not exist.
   Result<std::vector<std::string>> list() const;
 
  private:

@@ -126,7 +126,7 @@ Result<Directory> Directory::openBelow(std::string_view path) const {
 // By the descriptor, since the directory's owner may have put something else at the name by now.
 void Directory::giveToOwner(int made, const struct stat& status) const {
   if (::geteuid() != 0 || owner_ == 0 || status.st_uid != 0) return;
-  // A volume without owners is no reason to write nothing.
+  // Some volumes have no file owners; writing continues there.
   if (::fchown(made, owner_, group_) != 0) return;
 }
 
@@ -139,8 +139,8 @@ Result<Directory> Directory::makeDirectory(std::string_view name, unsigned mode)
   auto made = openDirectory(name);
   if (!made) return made;
   struct stat status {};
-  // The owner of this directory can put another one in the place of the new one, also one that root
-  // made elsewhere; only an empty one is given away.
+  // The owner of this directory can replace the new directory with another, even one that root
+  // created elsewhere. So only an empty one is given away.
   if (owner_ != 0 && ::fstat(made->descriptor(), &status) == 0 &&
       isEmptyDirectory(made->descriptor())) {
     giveToOwner(made->descriptor(), status);
@@ -168,7 +168,7 @@ Status Directory::check(int file, std::string_view name) const {
   return Done{};
 }
 
-// Non-blocking, so that a pipe or a device in a file's place cannot hold the run up.
+// Non-blocking, so that a pipe or a device in a file's place cannot block the run.
 Result<Descriptor> Directory::openFile(std::string_view name, int flags) const {
   Descriptor file(retried([&] {
     return ::openat(descriptor(), std::string(name).c_str(),
@@ -177,7 +177,7 @@ Result<Descriptor> Directory::openFile(std::string_view name, int flags) const {
   if (!file && errno == ELOOP) {
     return Error{pathOf(name) + " is a symbolic link, which is not followed", ELOOP};
   }
-  // What a pipe without a reader and a device without a driver answer.
+  // The errors of a pipe without a reader and of a device without a driver.
   if (!file && errno == ENXIO) return Error{pathOf(name) + " is not a regular file"};
   if (!file) return systemError("cannot open", pathOf(name));
   if (auto checked = check(file.get(), name); !checked) return checked.error();

@@ -1,8 +1,8 @@
 // Directory: an open directory, through which every file of the device is reached.
 //
-// Root works in directories that users own and change while it works. A path is looked up anew by
-// each call, so what was checked and what is used may differ; an open directory stays the one it
-// is. Names are single components, and a symbolic link at a name is never followed.
+// Root works in directories that users own and change while it works. Each call looks a path up
+// again, so the file that is used may not be the one that was checked; an open directory stays the
+// same. Names are single components, and a symbolic link at a name is never followed.
 #pragma once
 
 #include <sys/types.h>
@@ -30,7 +30,7 @@ struct FileIdentity {
   bool operator==(const FileIdentity&) const = default;
 };
 
-// Copies share one descriptor. Errors name the path, for people alone.
+// Copies share one descriptor. The path is used in error messages only.
 class Directory {
  public:
   // Opens a path that the caller chose, links included. It is the device root of what is opened
@@ -43,20 +43,21 @@ class Directory {
   // Whether it still has a name.
   bool exists() const;
 
-  // The directory at a name, or at a path of several. An error (ELOOP) when there is a link on it.
+  // The directory at a name, or at a path of several names. An error (ELOOP) if one is a link.
   Result<Directory> openDirectory(std::string_view name) const;
   Result<Directory> openBelow(std::string_view path) const;
-  // The same, made durably when it is missing. What root makes in the directory of another user
-  // belongs to that user, who could not read it otherwise: directories and files alike.
+  // The same; created durably if it is missing. Directories and files that root creates in another
+  // user's directory belong to that user, who could not read them otherwise.
   Result<Directory> makeDirectory(std::string_view name, unsigned mode = 0755) const;
 
   // The whole file; larger ones than limit are refused without reading them. Only a regular file is
   // opened, and below a directory that another user can write only one that has a single name and
-  // belongs to that user or to root: any other may be a foreign file in disguise (EPERM, EMLINK).
+  // belongs to that user or to root: any other may be somebody else's file under this name (EPERM,
+  // EMLINK).
   Result<std::string> readFile(std::string_view name, std::size_t limit) const;
   // Opens a file for writing under the same conditions.
   Result<Descriptor> openForWriting(std::string_view name) const;
-  // Makes a file, which must not be there yet (EEXIST).
+  // Creates a file, which must not exist yet (EEXIST).
   Result<Descriptor> create(std::string_view name, unsigned mode) const;
   // Whether a file that was opened in this directory meets the conditions above.
   Status check(int file, std::string_view name) const;
@@ -68,10 +69,10 @@ class Directory {
   std::optional<std::string> trustedLink(std::string_view name) const;
   // Names of the entries, sorted.
   Result<std::vector<std::string>> list() const;
-  // Removing what is not there succeeds.
+  // Removing a missing entry succeeds.
   Status remove(std::string_view name) const;
   Status rename(std::string_view from, std::string_view to) const;
-  // Makes what was made, renamed and removed here survive a power cut.
+  // Makes creations, renames and removals in this directory survive a power cut.
   Status sync() const;
   // Bytes that an ordinary user can still write on the volume.
   std::optional<std::uint64_t> freeSpace() const;

@@ -32,7 +32,7 @@ Error systemError(std::string_view what, const std::string& path, int code) {
 }
 
 Result<std::string> readFile(const std::string& path, std::size_t limit) {
-  // Non-blocking, so that a pipe put in a file's place cannot hold the run up.
+  // Non-blocking, so that a pipe in a file's place cannot block the run.
   const Descriptor file(
       retried([&] { return ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK); }));
   if (!file) return systemError("cannot open", path);
@@ -41,7 +41,7 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
 
 Result<std::string> readDescriptor(int descriptor, const std::string& path, std::size_t limit) {
   constexpr std::size_t kPiece = 128u << 10;
-  constexpr std::size_t kSmallestPiece = 4096;  // files of the kernel say that they are empty
+  constexpr std::size_t kSmallestPiece = 4096;  // files of the kernel report a size of 0
   struct stat status {};
   if (::fstat(descriptor, &status) != 0) return systemError("cannot examine", path);
   if (!S_ISREG(status.st_mode)) return Error{path + " is not a regular file"};

@@ -27,7 +27,7 @@ class Descriptor {
   ~Descriptor() { (void)close(); }
   int get() const { return value_; }
   explicit operator bool() const { return value_ >= 0; }
-  // Leaves the descriptor to the caller.
+  // Hands the descriptor over to the caller.
   int release() { return std::exchange(value_, -1); }
   // What close(2) returned; 0 when nothing was open.
   int close();
@@ -36,7 +36,7 @@ class Descriptor {
   int value_ = -1;
 };
 
-// Makes the call until it is not interrupted; what it answered, -1 with errno for a failure.
+// Repeats the call while signals interrupt it. Returns its result; -1 with errno on failure.
 template <class Call>
 auto retried(Call call) {
   auto result = call();
@@ -44,7 +44,7 @@ auto retried(Call call) {
   return result;
 }
 
-// That a system call failed on a path, with the reason that errno or the code given names.
+// The error of a system call on a path; the reason is that of errno or of the given code.
 Error systemError(std::string_view what, const std::string& path);
 Error systemError(std::string_view what, const std::string& path, int code);
 
@@ -56,8 +56,8 @@ Result<std::string> readDescriptor(int descriptor, const std::string& path, std:
 // Size in bytes of a regular file; empty when it cannot be examined.
 std::optional<std::uint64_t> fileSize(const std::string& path);
 
-// True when name can stand as one component of a path: not empty, not "." or "..", no '/', no NUL,
-// at most 200 bytes. Everything that names a file and came from outside is checked with this.
+// True when name can be one component of a path: not empty, not "." or "..", no '/', no NUL, at
+// most 200 bytes. Every untrusted name of a file is checked with this.
 bool isSafeFileName(std::string_view name);
 
 }  // namespace tally

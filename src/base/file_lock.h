@@ -1,4 +1,4 @@
-// Locks on files, which no process waits for without a bound.
+// File locks, for which every wait is bounded.
 #pragma once
 
 #include <chrono>
@@ -20,8 +20,8 @@ class FileLock {
   // (EWOULDBLOCK) names the process that holds it.
   static Result<FileLock> acquire(const Directory& directory, std::string_view name,
                                   std::chrono::milliseconds patience);
-  // The same with what is left of the process's patience, one minute in all, so that whoever never
-  // releases one lock or many delays a run by no more than that.
+  // The same within what remains of the process's total waiting time of one minute, so that
+  // processes that never release their locks cannot delay a run by more than that.
   static Result<FileLock> acquire(const Directory& directory, std::string_view name);
 
  private:

@@ -27,7 +27,7 @@ void* allocateLarge(std::size_t size) {
   std::byte* const aligned = start + before;
   if (before != 0) ::munmap(start, before);
   if (before != kLargePage) ::munmap(aligned + wanted, kLargePage - before);
-  ::madvise(aligned, wanted, MADV_HUGEPAGE);  // where it is refused, small pages serve
+  ::madvise(aligned, wanted, MADV_HUGEPAGE);  // if this fails, small pages are used
   return aligned;
 }
 

@@ -1,5 +1,5 @@
-// Memory for what is large: touched page by page, fresh memory can cost more than what is done
-// with it, so it is asked for in huge pages where the kernel has them.
+// Memory for large buffers. Touching fresh memory page by page can cost more than the work done in
+// it, so it is requested in huge pages where the kernel has them.
 #pragma once
 
 #include <cstddef>

@@ -20,8 +20,8 @@ void appendReal(std::string& out, T value) {
     out += "nan";  // without the sign that some processors give it
     return;
   }
-  // Plain digits as far as the type's precision reaches, so that 100000 is no "1e+05" beside a
-  // 250000.
+  // Plain digits as far as the type's precision reaches, so that 100000 does not become "1e+05"
+  // beside 250000.
   constexpr T kPlainFrom = T(1e-4);
   constexpr T kPlainBelow = std::is_same_v<T, float> ? T(1e7) : T(1e16);
   const T size = std::fabs(value);

@@ -1,4 +1,4 @@
-// Text from outside in a form that is safe to show, and how much room it takes.
+// Untrusted text in a form that is safe to show, and the columns that it takes.
 #pragma once
 
 #include <cstddef>

@@ -1,5 +1,4 @@
-// What a library may ask of its own process, how a program stays alive, and the one write that is
-// not to a file.
+// The process's name, protection against fatal signals, and the one write that is not to a file.
 #pragma once
 
 #include <cstddef>
@@ -11,8 +10,8 @@ namespace tally {
 // The program's name without its folder.
 std::string programName();
 int processID();
-// Writing to a closed pipe, and beyond the largest file that the process may write, is from now on
-// an error of the call and no longer the end of the process. For programs only.
+// From now on, writing to a closed pipe or beyond the process's file-size limit makes the call fail
+// instead of ending the process. For programs only.
 void surviveFailedWrites();
 // One write call: how many bytes it took, or a negative number.
 std::ptrdiff_t writeOnce(int descriptor, std::string_view bytes);

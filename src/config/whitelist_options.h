@@ -1,5 +1,5 @@
-// The options of whitelisted keys: one table says of each what it may be, which keys it is for, and
-// what it does. Checks, documents and the report itself read it.
+// The options of whitelisted keys: one table gives each option's values, the keys it is for, and
+// its effect. Checks, documents and the report itself read it.
 #pragma once
 
 #include <cstdint>

@@ -1,4 +1,4 @@
-// The daily sweep: health values of the device that nobody else records.
+// The daily sweep: health values of the device that no other program records.
 #pragma once
 
 #include "platform/platform.h"

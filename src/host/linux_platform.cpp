@@ -28,8 +28,8 @@
 namespace tally {
 namespace {
 
-// The data folder of whoever runs the program, who is part of the device only when the device is
-// this machine.
+// The data folder of the user who runs the program, which belongs to the device only if the device
+// is this machine.
 std::string userDataFolder(const DeviceRoot& root) {
   if (!root.prefix().empty()) return "";
   const std::string data = environmentVariable("XDG_DATA_HOME");

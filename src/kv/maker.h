@@ -10,7 +10,7 @@ namespace tally {
 
 class KvMaker {
  public:
-  // A T followed by room for more bytes, which the value knows how to use.
+  // A T followed by space for more bytes, which the value manages.
   template <class T, class... Arguments>
   static KvRef<T> make(KvArena* arena, std::size_t more, Arguments... arguments) {
     const std::size_t size = sizeof(T) + more;
@@ -20,10 +20,10 @@ class KvMaker {
     return KvRef<T>::adopt(value);
   }
 
-  // A container with room for its first items in its own block.
+  // A container with space for its first items in its own block.
   template <class T, class Item>
   static KvRef<T> makeContainer(KvArena* arena, std::size_t capacity) {
-    // Many items are better off in memory of their own.
+    // Many items get memory of their own.
     constexpr std::size_t kMostInside = 64;
     const auto inside = static_cast<std::uint32_t>(capacity <= kMostInside ? capacity : 0);
     auto container = make<T>(arena, inside * sizeof(Item), inside);

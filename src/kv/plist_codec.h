@@ -10,8 +10,8 @@
 
 namespace tally {
 
-// Bounds on what is accepted; more than any real document needs, little enough that a hostile one
-// can cost neither the stack nor the memory of a small device.
+// Bounds on what is accepted: above what any real document needs, and low enough that a hostile one
+// cannot exhaust the stack or the memory of a small device.
 constexpr std::size_t kPlistMaximumBytes = 64u << 20;
 constexpr std::size_t kPlistMaximumObjects = 4'000'000;
 

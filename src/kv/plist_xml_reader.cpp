@@ -1,7 +1,7 @@
 // A reader of our own, in one pass without a tree in between. The library takes quadratic time over
-// references in a text and over large dictionaries, holds several times the document's size in
-// memory, and lets much damage through in silence: text in a number, impossible dates, a key
-// without a value, a document that stops half-way.
+// references in a text and over large dictionaries, uses several times the document's size in
+// memory, and silently accepts much damage: text in a number, impossible dates, a key without a
+// value, a document that stops half-way.
 #include "kv/plist_xml_reader.h"
 
 #include <algorithm>
@@ -83,7 +83,7 @@ class Reader {
     while (!atEnd() && isBlank(text_[position_])) ++position_;
   }
 
-  // Blanks, comments and processing instructions, which may stand between any two elements.
+  // Blanks, comments and processing instructions, which may occur between any two elements.
   bool skipBetween() {
     for (;;) {
       skipBlanks();

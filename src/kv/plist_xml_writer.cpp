@@ -1,6 +1,6 @@
 // A writer of our own: building the library's tree first costs several times the time and the
 // memory of the document, and it loses unsigned integers, dates far from today and control
-// characters. What the library writes right is written here byte for byte the same.
+// characters. Where the library's output is correct, this writer's is the same byte for byte.
 #include "kv/plist_xml_writer.h"
 
 #include <algorithm>

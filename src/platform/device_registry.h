@@ -11,11 +11,11 @@
 
 namespace tally {
 
-// 0 is success; what else an operation returns is the platform's code.
+// 0 is success; any other result is the platform's code.
 using RegistryResult = std::uint32_t;
 
 // Handles of entries, iterators and connections; 0 is none. An operation that hands one out has
-// retained it for the caller, who gives it back with HandleRelease (a connection: with
+// retained it for the caller, who releases it with HandleRelease (a connection: with
 // ServiceCloseConnection). An operation on a handle that is not in use fails, it never crashes.
 using RegistryHandle = std::uint32_t;
 using ConnectionHandle = std::uint32_t;
@@ -32,9 +32,9 @@ constexpr std::string_view kMatchProperty = "HwPropertyMatch";  // dictionary: p
 struct MethodCall {
   std::span<const std::uint64_t> scalarInput = {};
   std::span<const std::byte> structInput = {};
-  std::span<std::uint64_t> scalarOutput = {};  // room for results
+  std::span<std::uint64_t> scalarOutput = {};  // capacity for results
   std::size_t scalarOutputCount = 0;           // how many were written
-  std::span<std::byte> structOutput = {};      // room for results
+  std::span<std::byte> structOutput = {};      // capacity for results
   std::size_t structOutputSize = 0;            // how many bytes were written
 };
 
@@ -79,7 +79,7 @@ class DeviceRegistry {
                                                const std::byte* address) = 0;
 };
 
-// Options of ConnectionMapMemory: wherever there is room.
+// Options of ConnectionMapMemory: at any free address.
 constexpr std::uint32_t kMapAnywhere = 1;
 
 // The matching dictionary of a class.

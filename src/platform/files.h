@@ -14,7 +14,7 @@ namespace tally {
 class Files {
  public:
   virtual ~Files() = default;
-  // The whole file; an error when it is missing, unreadable, no regular file or above limit.
+  // The whole file; an error if it is missing, unreadable, not a regular file or larger than limit.
   virtual Result<std::string> readFile(std::string_view path, std::size_t limit) = 0;
   // Empty when the file cannot be examined.
   virtual std::optional<std::uint64_t> fileSize(std::string_view path) = 0;

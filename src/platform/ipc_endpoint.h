@@ -13,7 +13,7 @@ namespace tally {
 // a list of dictionaries a KvArray of KvDictionary.
 class IpcEndpoint {
  public:
-  // Gets one message; what it holds was checked for form and bounds, not for meaning.
+  // Gets one message. Its form and bounds have been checked, but not its meaning.
   using MessageHandler = std::function<void(const KvDictionary& message)>;
 
   virtual ~IpcEndpoint() = default;

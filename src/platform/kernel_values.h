@@ -22,7 +22,7 @@ class KernelValues {
   // does not fit.
   virtual int readKernelValue(std::string_view name, std::span<std::byte> buffer,
                               std::size_t* length) = 0;
-  // Ticks since boot; they stand still while the device sleeps.
+  // Ticks since boot; they stop while the device sleeps.
   virtual std::uint64_t MonotonicTicks() = 0;
   // Empty when it cannot be read.
   virtual std::optional<Timebase> TimebaseInfo() = 0;

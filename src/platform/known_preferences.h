@@ -1,5 +1,5 @@
-// Every preference that the program reads or keeps, a row each: the one place that says where it
-// is, what it may be, and what applies without it.
+// Every preference that the program reads or keeps, one row each: its place, its type and bound,
+// and what applies without it. This is the only such list.
 #pragma once
 
 #include <algorithm>

@@ -10,7 +10,7 @@ namespace tally {
 class Locale {
  public:
   virtual ~Locale() = default;
-  // The user's languages, most wanted first, as tags ("de-DE").
+  // The user's languages, in order of preference, as tags ("de-DE").
   virtual std::vector<std::string> PreferredLanguages() = 0;
   // The languages that the system can show.
   virtual std::vector<std::string> SystemLanguages() = 0;
@@ -19,8 +19,8 @@ class Locale {
 };
 
 // Those of available that serve the preferences, best first: for each preference the exact tag,
-// then the tag without its region, then any tag of the same language. When nothing serves, the
-// first available.
+// then the tag without its region, then any tag of the same language. If none does, the first of
+// available.
 std::vector<std::string> BestLocalizations(const std::vector<std::string>& available,
                                            const std::vector<std::string>& preferred);
 

@@ -8,8 +8,8 @@ namespace tally {
 class Notifications {
  public:
   virtual ~Notifications() = default;
-  // Tells whoever is interested that something happened; there is nothing to it but its name. A
-  // notification that cannot be posted costs a log line.
+  // Tells all subscribers that something happened; a notification consists of its name only. If it
+  // cannot be posted, one line is logged.
   virtual void postSystemNotification(std::string_view name) = 0;
 };
 

@@ -26,9 +26,9 @@ class WriteResult {
   Kind kind_;
 };
 
-// Values by key and domain. A key is any text, the empty one too. Writes are seen by later reads at
-// once and reach storage at SMAPreferencesSynchronize of their domain, or when the program ends
-// normally.
+// Values by key and domain. A key is any text, including the empty one. Writes are seen by later
+// reads at once and reach storage at SMAPreferencesSynchronize of their domain, or when the program
+// ends normally.
 class Preferences {
  public:
   virtual ~Preferences() = default;
@@ -39,11 +39,10 @@ class Preferences {
                                       std::string_view domain) = 0;
   // Makes the domain's writes durable, in one atomic replacement. The reason of a failure is logged
   // once until a write to the domain succeeds, and the writes are kept for the next attempt;
-  // refused ones are forgotten.
+  // refused ones are dropped.
   virtual WriteResult SMAPreferencesSynchronize(std::string_view domain) = 0;
 
-  // False while the domain's values are there but cannot be read, so that an absent key says
-  // nothing.
+  // False while the domain's values exist but cannot be read; an absent key then means nothing.
   virtual bool isReadable(std::string_view) { return true; }
 
   // 0 when the key is absent or not a number.
@@ -56,8 +55,8 @@ class Preferences {
   KvRef<KvObject> get(const KnownPreference& known);
   // A null value removes it.
   void set(const KnownPreference& known, KvRef<KvObject> value);
-  // The number, or the row's fallback for anything else: no number, one outside its bound, or for a
-  // real an integer.
+  // The number, or the row's fallback if the value is not a number, is outside the row's bound or,
+  // for getReal(), is an integer.
   std::int64_t getInteger(const KnownPreference& known);
   double getReal(const KnownPreference& known);
 };

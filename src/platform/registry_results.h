@@ -1,5 +1,5 @@
-// What the operations of a device registry come to. Drivers may return other codes, which are
-// passed on.
+// The results of a device registry's operations. Drivers may return other codes, which are passed
+// on.
 #pragma once
 
 #include "platform/device_registry.h"

@@ -1,4 +1,4 @@
-// The run lock: two runs on one device never work at once.
+// The run lock: serialises the runs on one device.
 #pragma once
 
 namespace tally {
@@ -7,8 +7,8 @@ class RunLock {
  public:
   virtual ~RunLock() = default;
   // Waits until no other run is working, for a bounded time. False, after one line that names the
-  // other run's process, when it still is; then nothing may be done. Nested calls are allowed; each
-  // one that succeeds is followed by a leave().
+  // other run's process, if it is still working; the caller must then do nothing. Nested calls are
+  // allowed; each one that succeeds is followed by a leave().
   virtual bool enter() = 0;
   virtual void leave() = 0;
 };

@@ -21,7 +21,7 @@ enum class LogLevel { Debug, Info, Default, Error };  // rising importance
 class SystemLog {
  public:
   virtual ~SystemLog() = default;
-  // False when a message of this level would go nowhere, so that its text need not be made.
+  // False if messages of this level are discarded; their text then need not be made.
   virtual bool enabled(LogLevel level) const = 0;
   // One message, without a newline at its end.
   virtual void write(LogLevel level, std::string_view message) = 0;

@@ -47,16 +47,16 @@ std::pair<std::string, std::string> splitNotification(std::string_view name);
 
 constexpr const char* kBusMethod = "Send";
 constexpr const char* kBusMethodSignature = "a{sv}";
-// The bus itself, and a question of it that is always answered, after all messages before it.
+// The bus itself, and a call that it always answers, after all earlier messages.
 constexpr const char* kBusDriver = "org.freedesktop.DBus";
 constexpr const char* kBusDriverObject = "/org/freedesktop/DBus";
 constexpr const char* kBusDriverQuestion = "GetId";
-// Where signals come from that stand for notifications.
+// The object that emits notifications as signals.
 constexpr const char* kNotificationObject = "/vellum";
 
 // Sends one message to the endpoint of a name, which starts the program when it is not running, and
-// waits until it was taken. The error says why it was not: also when the program serves another
-// device root than this one.
+// waits until it is accepted. The error says why it was not, including that the program serves
+// another device root.
 Status sendToEndpoint(std::string_view name, const std::string& root, const KvDictionary& message);
 
 }  // namespace tally

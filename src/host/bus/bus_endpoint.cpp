@@ -36,7 +36,7 @@ Status statusOf(std::string_view step, int result) {
   return Done{};
 }
 
-// By the bus or by the service manager: nobody starts the program like that but for a message.
+// By the bus or by the service manager, which start the program like this only for a message.
 bool isStartedForAMessage() {
   return !environmentVariable("DBUS_STARTER_ADDRESS").empty() ||
          environmentVariable("SYSTEMD_EXEC_PID") == std::to_string(::getpid());
@@ -76,7 +76,7 @@ Status BusEndpoint::start() {
         statusOf("object", ::sd_bus_add_object_vtable(*bus, nullptr, busObjectPath(name_).c_str(),
                                                       name_.c_str(), kMethods, this));
   }
-  // Last, for from here on messages come.
+  // Last, because messages arrive from here on.
   if (status) status = statusOf("name", ::sd_bus_request_name(*bus, name_.c_str(), 0));
   if (!status) return status;
   const auto asker = questions_.get();
@@ -84,8 +84,8 @@ Status BusEndpoint::start() {
   return status;
 }
 
-// Whoever started the program by asking the bus for it sends the message later, so only the end of
-// the listening tells.
+// A peer that had the bus start the program sends its message later, so the answer is known only
+// when the listening ends.
 void BusEndpoint::noteLostMessage() {
   if (arrived_ || !isStartedForAMessage()) return;
   // The bus drops the message that starts a program if its sender is gone by the time the program

@@ -17,12 +17,12 @@ struct sd_bus_message;
 namespace tally {
 
 // The name is a name on the bus, an object and an interface with one method, Send(a{sv}), whose
-// empty return says that the message was taken, whatever it holds; it is sent before the message is
-// handled, so that no peer waits for a day's work. A message of another signature is taken and
-// ignored. One from a user who is not accepted, or above the limits, is refused: the peer gets a
-// D-Bus error, the log a line, and it is not an event of the loop. Accepted are root, mobile and
-// the program's own user; a sender that is gone by then only where the bus itself refuses all
-// others.
+// empty return acknowledges the message, whatever it contains; it is sent before the message is
+// handled, so that no peer waits for a day's work. A message of another signature is acknowledged
+// and ignored. One from a user who is not accepted, or above the limits, is refused: the peer gets
+// a D-Bus error, the log a line, and it is not an event of the loop. Accepted are root, mobile and
+// the program's own user; a sender that has disconnected by then is accepted only if the bus itself
+// rejects all others.
 class BusEndpoint final : public IpcEndpoint {
  public:
   BusEndpoint(std::shared_ptr<BusConnection> connection, std::shared_ptr<SdEventLoop> loop,
@@ -60,10 +60,10 @@ class BusEndpoint final : public IpcEndpoint {
   bool arrived_ = false;  // a message, whatever became of it
   bool busRefusesOthers_ = false;
   std::set<std::uint32_t> acceptedUsers_;
-  // Questions to the bus have a connection of their own: on the main one an answer would come after
-  // all messages that wait there, which would have to be read into memory first.
+  // Queries to the bus use a separate connection: on the main one, the answer would come after all
+  // waiting messages, which would have to be read into memory first.
   BusConnection questions_;
-  std::string lastSender_;  // the bus never gives a sender's name again, so its user stays known
+  std::string lastSender_;  // the bus never reuses a name, so its user stays valid
   std::uint32_t lastUser_ = 0;
 };
 

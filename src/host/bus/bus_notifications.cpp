@@ -14,7 +14,7 @@ Status emit(BusConnection& connection, std::string_view name) {
   if (!bus) return bus.error();
   int result =
       ::sd_bus_emit_signal(*bus, kNotificationObject, interface.c_str(), member.c_str(), nullptr);
-  // It must be out before work begins during which nobody serves the bus.
+  // It must be sent before work begins, during which the bus is not served.
   if (result >= 0) result = ::sd_bus_flush(*bus);
   if (result < 0) return Error{std::strerror(-result), -result};
   return Done{};

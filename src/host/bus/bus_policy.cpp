@@ -10,7 +10,8 @@
 namespace tally {
 namespace {
 
-// No method has this name: what the bus passes is answered with an error later, and never handled.
+// No method has this name, so a call that the bus passes is answered with an error and never
+// handled.
 constexpr const char* kProbe = "PolicyProbe";
 
 struct SlotDeleter {

@@ -7,11 +7,10 @@ struct sd_bus;
 
 namespace tally {
 
-// True when the bus itself refuses messages to the name from users to whom the policy does not
-// allow it, so that whatever reaches the name was allowed to. Found out by two calls: the shipped
-// policy allows root one interface and everybody else nothing, so on any other interface root is an
-// ordinary user, whose calls the bus must refuse, while it must pass those on the allowed one. A
-// policy that is missing, overridden or not loaded fails this, whatever lies in which file.
+// True if the bus itself rejects messages to the name from users whom the policy does not allow, so
+// that every message that arrives was allowed. Two calls test this. The shipped policy allows root
+// one interface, on which a call must pass. On any other interface root is an ordinary user, whose
+// call the bus must reject. The test fails if the policy is missing, overridden or not loaded.
 // REQUIRES: this process owns the name, and `asker` is another connection of it to the same bus.
 bool busRefusesOthers(sd_bus* asker, const std::string& name);
 

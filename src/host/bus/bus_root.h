@@ -1,4 +1,4 @@
-// Which device root the program serves that has a name on the bus.
+// Finds the device root of the program that owns a name on the bus.
 #pragma once
 
 #include <string>
@@ -10,9 +10,9 @@ struct sd_bus;
 
 namespace tally {
 
-// The connection that owns the name, started by the bus when there is none, for messages that must
-// reach the program of this device root and no other: a name on the bus is the machine's, a root is
-// any folder. An error when nothing owns it, or when its program serves another root.
+// The connection that owns the name; the bus starts the program if none does. For messages that
+// must reach the program of this device root only: the machine has one such name, but any folder
+// can be a root. An error if nothing owns the name, or if its owner serves another root.
 Result<std::string> findEndpoint(sd_bus* bus, std::string_view name, const std::string& root);
 
 }  // namespace tally

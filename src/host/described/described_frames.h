@@ -17,9 +17,9 @@ struct ElementValues {
                                               element::kMissingValue, element::kMissingValue};
 };
 
-// The elements of one channel, one frame for each refresh. The elements that a shorter frame
-// lacks are missing values; they are not stored, since a long frame among many short ones would
-// take the product of both.
+// The elements of one channel, one frame for each refresh. The elements that a shorter frame lacks
+// are missing values; they are not stored, since one long frame among many short ones would make
+// all of them long.
 struct ChannelFrames {
   std::uint64_t type = 0;  // the type word; 0 when only the legend gives it
   std::vector<std::vector<ElementValues>> frames;

@@ -16,7 +16,7 @@
 namespace tally {
 
 // Read once, at the first question. A damaged file is named in one error line and answers nothing;
-// an entry of the wrong type is named in one error line and counts as absent. Any thread may ask.
+// an entry of the wrong type is named in one error line and ignored. Any thread may ask.
 class DeviceDescription {
  public:
   // The directory of device.plist and of the files that it names.
@@ -30,7 +30,7 @@ class DeviceDescription {
   const T* getAs(std::type_identity_t<DescribedAs<T>> entry) {
     return static_cast<const T*>(get(entry.entry));
   }
-  // Says once, as an error, that an entry, or the part of one that is named, cannot be used.
+  // Logs one error that an entry, or its named part, cannot be used.
   void reportEntry(std::string_view entry, std::string_view fault);
   void reportEntry(Described entry, std::string_view fault) {
     reportEntry(describedEntry(entry).name, fault);

@@ -15,7 +15,7 @@ namespace {
 
 constexpr std::string_view kSuffix = ".plist";
 constexpr std::string_view kLockName = ".preferences.lock";
-// Damaged files that are kept for whoever looks into the matter.
+// Damaged files that are kept for diagnosis.
 constexpr int kDamagedFilesKept = 8;
 
 std::string fileNameOf(std::string_view domain) { return fmt::format("{}{}", domain, kSuffix); }
@@ -93,7 +93,7 @@ PropertyListPreferences::Domain* PropertyListPreferences::find(std::string_view 
   return &domains_.try_emplace(std::string(domain)).first->second;
 }
 
-// One look at the file's identity, without walking to it and reading it again.
+// Compares the file's identity only, without resolving its path and reading it again.
 void PropertyListPreferences::refresh(Domain& state, std::string_view domain) {
   if (state.read && opened_ && opened_->identity(fileNameOf(domain)) == state.identity) return;
   reload(state, domain, nullptr);
@@ -133,8 +133,8 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain,
     state.writable = true;
     return;
   }
-  // What cannot be read now may be sound, so nothing is written over it, and what this very file
-  // held before still counts.
+  // A file that cannot be read now may be sound, so it is not overwritten, and what was read from
+  // this very file before still applies.
   if (std::exchange(state.writable, false))
     report(domain, "cannot be read", document.error().message);
   if (seen) return;
@@ -142,7 +142,7 @@ void PropertyListPreferences::reload(Domain& state, std::string_view domain,
   state.read = false;  // the next use tries again
 }
 
-// Makes room for a new file where there is a damaged one.
+// Moves a damaged file out of the way of a new one.
 void PropertyListPreferences::recover(Domain& state, std::string_view domain,
                                       const std::string& fault, const Directory* locked) {
   if (access_ == Access::ReadOnly) {
@@ -151,7 +151,7 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
     return;
   }
   if (locked == nullptr) {
-    // Another process may be at the same, or may just have put a sound file in its place.
+    // Another process may be doing the same, or may just have put a sound file in its place.
     const auto folder = folder_.open();
     const auto lock = folder ? lockFolder(*folder) : Result<FileLock>(folder.error());
     if (lock) {

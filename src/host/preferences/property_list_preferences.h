@@ -18,7 +18,7 @@ namespace tally {
 
 // The preferences of whoever owns the directory: the program's own user, another user, the system.
 // A domain is read at its first use and again whenever another process has replaced its file.
-// Writes are kept per key and laid over what the file holds when they are synchronised, so that
+// Writes are kept per key and merged into the file's content when they are synchronised, so that
 // two processes never undo each other's keys. Domains still unsynchronised are written when the
 // object is destroyed. Values are shared, not copied: a value given or got must not be changed. Any
 // thread may call.
@@ -52,7 +52,7 @@ class PropertyListPreferences final : public Preferences {
     std::optional<FileIdentity> identity;                         // of the file that was read
     bool read = false;
     bool writable = true;  // false while the file holds something that could not be read
-    bool failing = false;  // the last write failed, which was said
+    bool failing = false;  // the last write failed, which was logged
   };
 
   Domain* find(std::string_view domain);

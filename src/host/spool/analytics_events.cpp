@@ -43,7 +43,7 @@ std::string eventLine(std::string_view event, double secondsSince1970,
 Status EventSpool::append(std::string_view event, const KvDictionary& payload,
                           const FolderBounds& bounds) {
   const std::string line = eventLine(event, clock_.secondsSince1970(), payload);
-  // The newest file is never evicted, so that it must leave room for the bound to hold.
+  // The newest file is never evicted, so it must stay small enough for the bound to hold.
   const std::uint64_t largest =
       std::min<std::uint64_t>(kLargestFile, std::max<std::uint64_t>(bounds.maximumBytes / 4, 1));
   if (line.size() > bounds.maximumBytes) return Error{"larger than the whole spool may be"};
@@ -104,7 +104,7 @@ bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
   if (wanted == nullptr) return true;
   const auto* names = kvCast<KvArray>(wanted);
   if (names == nullptr) {
-    // What cannot be read wants nothing: events that nobody asked for must not lie about.
+    // An unreadable list wants nothing: unwanted events must not be stored.
     description_->reportEntry("AnalyticsEvents.Wanted", "is no array; no event is sent");
     return false;
   }

@@ -1,5 +1,4 @@
-// The analytics-event service on Linux: a spool of events that were sent, from which whoever
-// uploads them takes them.
+// The analytics-event service on Linux: a spool of sent events, from which an uploader takes them.
 #pragma once
 
 #include <memory>
@@ -36,7 +35,7 @@ class EventSpool {
 std::string eventLine(std::string_view event, double secondsSince1970, const KvDictionary& payload);
 
 // A device without a description has no such service. The description's entry "AnalyticsEvents"
-// says otherwise, and what the service wants.
+// says whether it has one, and which events it wants.
 class LinuxAnalyticsEvents final : public AnalyticsEvents {
  public:
   LinuxAnalyticsEvents(DeviceDirectory folder, std::shared_ptr<SystemLog> log,

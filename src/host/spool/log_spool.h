@@ -23,9 +23,9 @@ namespace tally {
 FolderBounds folderBounds(Preferences& preferences);
 
 // Submits logs into a spool folder. A log is in the spool once its body has its final name, which
-// is the last step; a killed run leaves nothing that counts, and its left-overs are swept at the
-// next submission. Submitters of several processes are
-// serialised. What the user has forbidden is refused with one info line.
+// is the last step; a killed run leaves only files that are ignored, which the next submission
+// removes. Submissions of several processes are serialised. If the user forbids submission, a log
+// is rejected with one info line.
 class SpoolSubmission final : public LogSubmission {
  public:
   SpoolSubmission(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
@@ -54,7 +54,7 @@ class SpoolSubmission final : public LogSubmission {
   bool submitting_ = false;
 };
 
-// A log in the spool. What its information does not tell, or tells wrongly, is empty.
+// A log in the spool. Fields that its information lacks, or that have another type, are empty.
 struct SpooledLog {
   std::uint64_t sequence = 0;
   std::uint64_t bytes = 0;  // of the body

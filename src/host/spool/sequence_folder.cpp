@@ -20,12 +20,12 @@ constexpr std::size_t kDigits = 10;
 constexpr std::uint64_t kLastSequence = 9'999'999'999;
 // A log a second for thirty years.
 constexpr std::uint64_t kLastReachable = 999'999'999;
-// Once a stray file's number was nearly out of reach, the logs after it have such numbers too; they
-// go with it, or each later log would follow the stray file again.
+// Logs after a stray file with a nearly unreachable number have such numbers too. They are set
+// aside with it; otherwise each later log would continue from it again.
 constexpr std::uint64_t kStrayMargin = 1'000'000;
 constexpr std::string_view kAsidePrefix = "set-aside-";
 
-// A volume that runs full takes a part before it says so.
+// A volume that becomes full accepts part of a write before it reports the error.
 bool writeAllAt(int file, std::string_view bytes, off_t offset) {
   while (!bytes.empty()) {
     const auto count = retried([&] { return ::pwrite(file, bytes.data(), bytes.size(), offset); });
@@ -91,14 +91,14 @@ Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uin
   Status status = Done{};
   for (const SequencedLog& log : *logs) {
     if (count <= bounds.maximumLogs && bytes <= bounds.maximumBytes) break;
-    if (log.sequence >= kept) break;  // a newer one makes its own room when it is done
+    if (log.sequence >= kept) break;  // a newer one frees its own space when it is finished
     for (auto name = log.names.rbegin(); name != log.names.rend(); ++name) {
       if (auto removed = folder.remove(*name); !removed) {
         status = removed;
         break;
       }
     }
-    // What cannot be removed, a folder in its place, must not keep the others.
+    // An entry that cannot be removed, such as a folder, must not protect the others.
     --count;
     bytes -= log.bytes;
   }

@@ -13,7 +13,7 @@
 
 namespace tally {
 
-// What a folder may have; by default what applies without preferences.
+// The bounds of a folder; by default those that apply without preferences.
 inline constexpr const KnownPreference& kMaximumLogs = knownPreference("SpoolMaximumLogs");
 inline constexpr const KnownPreference& kMaximumBytes = knownPreference("SpoolMaximumBytes");
 struct FolderBounds {
@@ -36,25 +36,26 @@ std::optional<std::uint64_t> sequenceOf(std::string_view name);
 // "0000000042-", the beginning of a log's names.
 std::string sequencePrefix(std::uint64_t sequence);
 
-// The logs of a folder, oldest first. Age is the number's, so that it does not depend on the clock.
+// The logs of a folder, oldest first. The number gives the age, which therefore does not depend on
+// the clock.
 Result<std::vector<SequencedLog>> listSequenced(const Directory& folder);
-// The same for whoever writes there, with the folder's lock held: logs whose numbers no run can
-// have reached are renamed to "set-aside-NAME" with one error line, so that a stray file of a huge
-// number does not leave later logs without one.
+// The same for a writer that holds the folder's lock: logs whose numbers no run can have reached
+// are renamed to "set-aside-NAME" with one error line, so that a stray file with a huge number does
+// not use up the numbers of later logs.
 Result<std::vector<SequencedLog>> listForWriting(const Directory& folder, SystemLog& log);
 // The number for the next log.
 Result<std::uint64_t> nextSequence(const std::vector<SequencedLog>& logs);
 
 // Removes the oldest logs until the folder is within its bounds, but neither the log `kept` nor a
-// newer one. A log's files go last name first. One that cannot be removed is passed over, with an
-// error in the end.
+// newer one. A log's files go last name first. One that cannot be removed is skipped, and the
+// result is an error.
 Status evictOldest(const Directory& folder, const FolderBounds& bounds, std::uint64_t kept);
 
-// An error when writing this many more bytes would use what is reserved of the volume.
+// An error if writing this many more bytes would use the volume's reserved space.
 Status checkReserve(const Directory& folder, std::uint64_t bytes);
 
-// Makes the file end with the bytes, which are on the disk afterwards, at the place where its whole
-// records end; what a killed run left half written there is cut off.
+// Appends the bytes durably after the file's whole records, and cuts off what a killed run left
+// half written there.
 Status appendAt(const Directory& folder, std::string_view name, std::size_t end,
                 std::string_view bytes);
 

@@ -23,7 +23,7 @@ constexpr std::size_t kLengthDigits = 10;
 constexpr std::size_t kFrameBytes = kLengthDigits + 2;
 constexpr int kGenerationsKept = 7;
 
-// The property list of the record at an offset; empty when what is there is no whole record.
+// The property list of the record at an offset; empty if there is no whole record.
 std::optional<std::string_view> recordAt(std::string_view bytes, std::size_t offset) {
   const std::string_view rest = bytes.substr(offset);
   if (rest.size() < kFrameBytes || rest[kLengthDigits] != '\n') return std::nullopt;
@@ -44,8 +44,8 @@ std::string finishedName(std::string_view pendingName) {
   return stemOf(pendingName) + std::string(kFinishedSuffix);
 }
 
-// Moves generations up to the first free place, so that a run killed in between loses none. What is
-// there is known from the folder's names, since a file that cannot be examined is no free place.
+// Moves generations up to the first free place, so that a run killed in between loses none. The
+// folder's names show which places are taken, since a file that cannot be examined still takes one.
 Status rollLog(const Directory& folder, const std::vector<std::string>& names,
                const std::string& name) {
   const auto generation = [&name](int number) { return fmt::format("{}.{}", name, number); };
@@ -102,8 +102,8 @@ bool StructuredDataFolder::takesMore(const Directory& folder, const Pending& pen
   return identity && identity->size == pending.end && !folder.identity(finishedName(pending.name));
 }
 
-// The pending log that takes the next record of a type. One that is full, or that a killed run had
-// written out already, makes way for a new one.
+// The pending log that takes the next record of a type. A new one replaces one that is full, or
+// that a killed run had already written out.
 Result<StructuredDataFolder::Pending> StructuredDataFolder::pendingFor(const Directory& folder,
                                                                        std::uint32_t recordType,
                                                                        std::size_t bytes,

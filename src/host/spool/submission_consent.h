@@ -1,4 +1,4 @@
-// Whether the user allows logs to leave the device, and what follows when not.
+// Whether the user allows logs to leave the device, and what happens to them if not.
 #pragma once
 
 #include <memory>
@@ -24,15 +24,15 @@ class SubmissionConsent {
         preferences_(std::move(preferences)),
         description_(std::move(description)) {}
 
-  // The description's word, else the user's preference; allowed when neither says anything. A
-  // preference that cannot be read, or is neither a boolean nor a number, may be a refusal.
+  // The description's entry, else the user's preference; true if neither exists. A preference that
+  // cannot be read, or is neither a boolean nor a number, may be a refusal.
   bool given() const { return wish() == Wish::Allowed; }
   // The same, with one info line for each kind of thing that is therefore not recorded.
   bool permits(std::string_view what);
-  // When the user no longer allows submission, deletes what still waits from before, or holds it
-  // back where the preference "WithdrawnLogs" of the program is "hold"; when the user allows it
-  // again, what was held waits again. One line says how many files were concerned. While the wish
-  // is unknown, everything stays as it is.
+  // If the user no longer allows submission, deletes the waiting files, or holds them if the
+  // program's preference "WithdrawnLogs" is "hold"; once the user allows it again, releases the
+  // held files. One line gives the number of files. While the user's choice is unknown, nothing
+  // changes.
   void enforce();
 
  private:

@@ -1,4 +1,4 @@
-// What waits on the device to be taken away: submitted logs, structured data and analytics events.
+// Files that wait on the device for an uploader: submitted logs, structured data, analytics events.
 #pragma once
 
 #include <cstdint>
@@ -8,7 +8,7 @@
 
 namespace tally {
 
-// A directory of numbered files, and the lock of whoever changes it.
+// A directory of numbered files, and the lock file of its writers.
 struct LogFolder {
   std::string_view path, lock;
   DeviceDirectory on(const DeviceRoot& root) const { return {root, std::string(path)}; }
@@ -22,16 +22,16 @@ constexpr LogFolder kLogFolders[] = {kSubmittedLogs, kStructuredDataLogs, kAnaly
 struct WaitingFiles {
   std::uint64_t files = 0, bytes = 0;
 };
-// How much waits in all folders. What cannot be listed counts as nothing.
+// How much waits in all folders. A folder that cannot be listed is left out.
 WaitingFiles countWaiting(const DeviceRoot& root);
 
 enum class WaitingAction {
   Erase,
-  Hold,     // renames NAME to NAME.held, which nobody takes away; the folder's bounds still hold
+  Hold,     // renames NAME to NAME.held, which uploaders ignore; the folder's bounds still apply
   Release,  // names them as they were
 };
-// Does so with every file that waits, those held included when they are erased. The number of files
-// concerned; an error when one could not be, after all others were.
+// Applies the action to every waiting file; Erase includes held ones. Returns the number of files,
+// or an error if one of them failed, after all others were handled.
 Result<std::uint64_t> handleWaiting(const DeviceRoot& root, WaitingAction action);
 
 }  // namespace tally

@@ -16,8 +16,8 @@
 namespace tally {
 namespace {
 
-// A checkpoint of millions of new samples takes minutes, for which nobody who records would wait.
-// It lets the others in between, long enough for those who look only ten times a second.
+// A checkpoint of millions of new samples takes minutes, longer than other writers wait. It
+// releases the lock in between, long enough for writers that try only ten times a second.
 constexpr std::chrono::seconds kLongestTurn{2};
 constexpr std::chrono::milliseconds kPauseForOthers{150};
 

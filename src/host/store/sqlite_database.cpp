@@ -55,9 +55,9 @@ Status makePrivateFile(const Directory& directory, const std::string& name) {
 // A chunk of another writer has up to a million samples, of twelve bytes each.
 constexpr int kLargestRow = 16 << 20;
 
-// How often a step is looked at, so rarely that it costs nothing, and how many looks it may take:
-// of the instructions that reading a whole store takes, some three for each byte, and what a small
-// one cannot need. A loop in a damaged tree or a schema has no end.
+// How often a step is checked, rarely enough to cost nothing, and how many checks end it: reading a
+// whole store takes about three instructions for each byte, and no small one needs the minimum. A
+// loop in a damaged tree or a schema has no end.
 constexpr int kInstructionsBetweenLooks = 1'000'000;
 constexpr std::int64_t kInstructionsPerByte = 8, kLooksAtLeast = 20;
 constexpr std::uint64_t kMostBytesWatched = 1u << 30;  // a file may have holes

@@ -19,7 +19,7 @@ namespace tally {
 enum class Step { Row, Done, Failed };
 enum class ColumnType { Null, Integer, Real, Text, Blob };
 
-// How long the step has taken that is being made, and how long it may.
+// How long the current step has taken, and how long it may take.
 struct StepWatch {
   std::int64_t looks = 0, most = 0;
 };
@@ -33,7 +33,7 @@ class Statement {
   Statement& bind(int parameter, std::string_view text);
   Statement& bind(int parameter, std::span<const std::byte> blob);
   Step step();
-  // Ready for other parameters, and no longer in the way of a commit.
+  // Ready for other parameters; no longer blocks a commit.
   void reset();
   // Binds nothing, runs to its end, resets. False on failure.
   bool run();
@@ -53,9 +53,8 @@ class Statement {
 };
 
 // A connection. It waits a minute for the locks of others before an operation fails. The file may
-// have been made to harm whoever opens it: what its schema could do is switched off, a row larger
-// than a store can have is an error, and so is a step that finds no row in a time in which any
-// store would have been read twice.
+// be hostile: code in its schema is disabled, a row larger than a store can have is an error, and
+// so is a step that finds no row in the time in which any store could be read twice.
 class Database {
  public:
   enum class Access {

@@ -183,7 +183,8 @@ int remove(sqlite3_vfs*, const char* path, int syncDirectory) {
   return base()->xDelete(base(), path, syncDirectory);
 }
 
-// SQLite's own takes a journal that it cannot examine for none, and would use a store half written.
+// SQLite's own treats a journal that it cannot examine as absent, and would use a half-written
+// store.
 int access(sqlite3_vfs*, const char* path, int flags, int* result) {
   *result = 0;
   const auto place = placeOf(path);

@@ -8,10 +8,10 @@
 
 namespace tally {
 
-// SQLite works on paths, which it looks up anew for each of a store's files: the database, its log,
-// the log's index and the journal. A store lies in a directory that a user can change meanwhile, so
-// names are made up for them that lead through the open directory, and a file system of SQLite's
-// kind that takes no others. It opens no link, pipe or device, and no file that Directory::check
+// SQLite works on paths, which it looks up again for each of a store's files: the database, its
+// log, the log's index and the journal. A store lies in a directory that a user can change
+// meanwhile, so its files get names that lead through the open directory, and an SQLite file system
+// that accepts no others. It opens no link, pipe or device, and no file that Directory::check
 // refuses; nothing is made, removed or given away anywhere else, whatever a journal may ask for.
 
 // The file system's name, for sqlite3_open_v2. Null when this SQLite cannot have it.

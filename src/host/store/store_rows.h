@@ -1,4 +1,4 @@
-// How rows are read from a file that may have been made to harm its reader.
+// Reads rows from a file that may be hostile.
 #pragma once
 
 #include <cstdint>
@@ -15,8 +15,8 @@ constexpr std::string_view kBoundedValues =
 constexpr std::string_view kBoundedOffsets =
     "iif(length(sample_offsets) <= 4194304, sample_offsets, NULL)";
 
-// Sees to it that a walk along a tree has an end: in a damaged file pages may lead back to each
-// other, but rows that only rise cannot repeat. Looking at a few of them is enough for that.
+// Ensures that a walk along a tree ends: in a damaged file pages may form a loop, but rows in
+// rising order cannot repeat. Checking a few of them is enough.
 class RowOrder {
  public:
   // Whether the row, whose second column is the key, comes after the one before. A number tells

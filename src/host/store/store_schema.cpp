@@ -36,7 +36,7 @@ constexpr TableDefinition kTables[] = {
     {"chunks", kSampleColumns},
     {"recent", kSampleColumns},
 };
-// What SQLite itself adds when somebody lets it look for better plans. It does no harm.
+// Tables that SQLite itself adds for its query planner on request. They are harmless.
 constexpr TableDefinition kStatistics[] = {
     {"sqlite_stat1", "(tbl,idx,stat)"},
     {"sqlite_stat4", "(tbl,idx,neq,nlt,ndlt,sample)"},

@@ -1,4 +1,4 @@
-// The metrics store as a file: where it lies, what makes it one, and how it is opened.
+// The metrics store as a file: its place, its identity, and how it is opened.
 #pragma once
 
 #include <optional>
@@ -27,9 +27,9 @@ bool isStoreKey(std::string_view key);
 constexpr std::string_view kStoreKeyRule =
     "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
 
-// Opens the store and takes hold of its present state: what others commit afterwards is not seen.
-// Nothing is created. Empty when there is no store yet; an error when there is something else in
-// its place, or a store of a newer version of the program.
+// Opens the store in its present state: later commits of others are not seen. Nothing is created.
+// Empty when there is no store yet; an error when there is something else in its place, or a store
+// of a newer version of the program.
 Result<std::optional<Database>> openStoreForReading(const StoreFile& file);
 
 enum class IfMissing { Leave, Create };

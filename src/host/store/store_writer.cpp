@@ -23,7 +23,7 @@ class StoreWriter::ChunkTail {
   ChunkTail(Database& database, Statements& statements)
       : database_(database), statements_(statements) {}
 
-  // Takes up the key's last chunk if it has room, else a new one.
+  // Continues the key's last chunk if it has space, else starts a new one.
   Status moveTo(std::int32_t day, std::string_view key) {
     day_ = day;
     key_ = key;

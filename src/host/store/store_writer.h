@@ -43,10 +43,10 @@ class StoreWriter {
 
   // Whether foldRecent() would find something to do.
   Result<bool> hasRecent();
-  // The days that hold data, from the newest on; of more than 4096 the newest. Costs one look into
+  // The days that hold data, from the newest on; of more than 4096 the newest. Takes one look-up in
   // the tables for each day, however many rows it has.
   Result<std::vector<std::int32_t>> days();
-  // What the pages that hold something take.
+  // The bytes of all pages in use.
   Result<std::uint64_t> usedBytes();
 
  private:

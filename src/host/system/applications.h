@@ -12,14 +12,14 @@
 
 namespace tally {
 
-// Folders of desktop entries: where one id is in several folders, the earlier folder counts.
+// Folders of desktop entries: if an id is in several folders, the first one takes precedence.
 struct ApplicationFolder {
   DeviceDirectory directory;
   std::string_view bundleType;
 };
 
-// The folders of a device, the user's first. dataHome is the value of XDG_DATA_HOME or what stands
-// for it; empty when the program's own user has no part in the device.
+// The folders of a device, the user's first. dataHome is the value of XDG_DATA_HOME or its default;
+// empty when the program's own user has no part in the device.
 std::vector<ApplicationFolder> applicationFolders(const DeviceRoot& root,
                                                   const std::string& dataHome);
 

@@ -31,8 +31,8 @@ class LinuxDeviceInformation final : public DeviceInformation {
 // nearest one above it that is there. The root's own volume is often read-only.
 Result<Directory> openDataVolume(const DeviceRoot& root);
 
-// An identifier that is stable for a machine and a stranger to its machine id, which it is a hash
-// of: 32 hexadecimal digits. Empty when the text holds no machine id.
+// An identifier that is stable for a machine and does not reveal its machine id, of which it is a
+// hash: 32 hexadecimal digits. Empty when the text holds no machine id.
 std::string inverseDeviceID(std::string_view machineId);
 
 }  // namespace tally

@@ -26,7 +26,7 @@ class SdEventLoop final : public EventLoop {
   // For services that deliver their events here; borrowed, null when there can be no loop.
   sd_event* event();
   // Such a service has handled an event. Its other work (replies of the bus, messages that it
-  // refuses) extends nobody's quiet period.
+  // refuses) does not extend a quiet period.
   void noteHandledEvent() { handled_ = true; }
 
  private:

@@ -32,7 +32,7 @@ std::vector<std::byte> bytesOf(const T& value) {
 }
 
 // The number in the value's width (a record's first field is its number); empty when a 4-byte value
-// cannot hold it or it is no whole number.
+// cannot hold it or it is not a whole number.
 std::optional<std::vector<std::byte>> numberBytes(const KvNumber& number, std::size_t width) {
   if (number.isReal()) return std::nullopt;
   auto bytes = bytesOf(number.asUInt64());

@@ -18,10 +18,10 @@ struct LocaleEnvironment {
   std::string language, all, messages, lang;  // LANGUAGE, LC_ALL, LC_MESSAGES, LANG
 };
 
-// "de_CH.UTF-8@euro" as "de-CH", "sr_RS@latin" as "sr-Latn-RS"; empty for "C", "POSIX" and what is
-// no locale's name.
+// "de_CH.UTF-8@euro" as "de-CH", "sr_RS@latin" as "sr-Latn-RS"; empty for "C", "POSIX" and text
+// that is not a locale's name.
 std::string languageTag(std::string_view localeName);
-// Most wanted first; LANGUAGE counts for nothing in the locales C and POSIX.
+// In order of preference; LANGUAGE is ignored in the locales C and POSIX.
 std::vector<std::string> preferredLanguages(const LocaleEnvironment& environment);
 std::optional<std::string> regionCode(const LocaleEnvironment& environment);
 

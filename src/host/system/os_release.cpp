@@ -14,8 +14,8 @@ bool isName(std::string_view name) {
   });
 }
 
-// A value as a shell would read it: single quotes keep everything, double quotes and bare text
-// take a backslash for the character behind it.
+// A value as a shell would read it: single quotes keep everything, double quotes and bare text let
+// a backslash escape the character after it.
 std::string unquoted(std::string_view text) {
   constexpr std::string_view kEscapedInDoubleQuotes = "\"\\$`";
   std::string value;

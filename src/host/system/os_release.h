@@ -9,8 +9,8 @@
 
 namespace tally {
 
-// The assignments of the file, with quotes and escapes resolved; lines that are none are skipped.
-// The last assignment of a name counts.
+// The assignments of the file, with quotes and escapes resolved; other lines are skipped. The last
+// assignment of a name applies.
 std::map<std::string, std::string, std::less<>> parseOsRelease(std::string_view text);
 
 // "ProductName", "ProductVersion" and "ProductBuildVersion" from NAME, VERSION_ID and the first of

@@ -14,7 +14,7 @@
 namespace tally {
 
 // When the lock file cannot be made, one error line says so and the run goes on without a lock: a
-// device that cannot be written is no reason to do nothing.
+// run on a read-only device still does its work.
 class FileRunLock final : public RunLock {
  public:
   static constexpr std::chrono::minutes kPatience{10};

@@ -3,8 +3,8 @@
 
 namespace tally {
 
-// Keeps the numbers of streams that are closed from going to the next file that is opened: writing
-// to such a stream fails.
+// Keeps the next file that is opened from getting the descriptor of a closed standard stream;
+// writing to such a stream fails.
 void prepareStandardStreams();
 
 }  // namespace tally

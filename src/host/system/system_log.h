@@ -14,8 +14,8 @@ struct SystemLogSettings {
   LogLevel lowest = LogLevel::Info;
 };
 
-// From the values of TALLYRUN_LOG and TALLYRUN_LOG_LEVEL; null is unset. What is not understood
-// counts as unset.
+// From the values of TALLYRUN_LOG and TALLYRUN_LOG_LEVEL; null is unset. An unknown value is
+// treated as unset.
 SystemLogSettings systemLogSettings(const char* destination, const char* level);
 
 // The settings that this process runs with, and what of the two variables is not understood.
@@ -32,9 +32,9 @@ bool journalIsThere();
 // Whether there is a journal is found out at the first message.
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings);
 
-// The one line, ending in a newline, that a message is on standard error: control characters are
-// written as escapes ("\n", "\x1b"), so that no message can pass for two, and bytes that are not
-// UTF-8 as U+FFFD. Messages above 16 KiB are cut short.
+// A message as one line of standard error, ending in a newline: control characters are written as
+// escapes ("\n", "\x1b"), so that no message can look like two, and bytes that are not UTF-8 as
+// U+FFFD. Messages above 16 KiB are cut short.
 std::string standardErrorLine(LogLevel level, std::string_view message);
 
 }  // namespace tally

@@ -20,10 +20,11 @@ struct TerminalEnvironment {
   std::string all, ctype, lang;        // LC_ALL, LC_CTYPE, LANG
 };
 
-// For the terminal behind a descriptor, or a file's. The width is that of the terminal, else
-// COLUMNS, else 80, and always from 40 to 200, where tables stay readable.
+// For the terminal or file of a descriptor. The width is that of the terminal, else COLUMNS, else
+// 80, and always from 40 to 200, where tables stay readable.
 Terminal terminalOf(int descriptor);
-// The same from what was found; columns is 0 when the descriptor is no terminal or hides its width.
+// The same from what was found; columns is 0 if the descriptor is not a terminal or does not report
+// its width.
 Terminal makeTerminal(bool interactive, std::size_t columns,
                       const TerminalEnvironment& environment);
 

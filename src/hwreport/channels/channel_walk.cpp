@@ -120,7 +120,7 @@ void fetchAhead(const KvArray& channels, std::size_t i) {
       legendElement(channels.getAs<KvDictionary>(i + kLegendAhead), kLegendTypeWord));
 }
 
-// The items of an array one after the other, as long as it is now. step(channel, index) gives a
+// The items of an array one after the other, up to its current length. step(channel, index) gives a
 // result.
 template <class Step>
 int eachChannel(const KvArray& channels, Step step) {

@@ -1,5 +1,5 @@
-// What drivers, the statistics hub and their clients have agreed upon: how a driver publishes its
-// channels, the hub's calls, and the memory that it shares.
+// The protocol of drivers, the statistics hub and its clients: how a driver publishes its channels,
+// the hub's calls, and the memory that it shares.
 #pragma once
 
 #include <cstddef>

@@ -70,7 +70,7 @@ KvRef<KvObject> stringOf(std::string_view text) { return KvString::create(text);
 
 struct ValueType {
   std::string_view name;
-  KvRef<KvObject> (*parse)(std::string_view text);  // null when the text is no such value
+  KvRef<KvObject> (*parse)(std::string_view text);  // null if the text is not such a value
 };
 // In the order in which a value without a type is tried.
 constexpr ValueType kTypes[] = {

@@ -20,7 +20,7 @@ std::optional<Numbered> numberedName(std::string_view name) {
   return Numbered{name.substr(0, start), *number};
 }
 
-// The figures of a group as they come; those that count on from the former one join it.
+// The figures of a group in their order; consecutive numbered ones join one family.
 void addFigure(std::vector<NandFigure>& figures, std::string_view name, std::int64_t value) {
   const auto numbered = numberedName(name);
   if (numbered) {
