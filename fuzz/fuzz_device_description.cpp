@@ -2,9 +2,13 @@
 #include <array>
 
 #include "described_folder.h"
+#include "fakes/fake_platform.h"
 #include "host/described/described_purgeable_space.h"
 #include "host/described/described_stackshot.h"
 #include "host/spool/analytics_events.h"
+#include "host/spool/submission_consent.h"
+#include "host/system/applications.h"
+#include "host/system/crash_support_library.h"
 #include "host/system/device_information.h"
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"
@@ -26,6 +30,21 @@ void askKernelValues(LinuxKernelValues& values) {
   }
   values.MonotonicTicks();
   values.TimebaseInfo();
+}
+
+void askServices(const DeviceRoot& root, const std::shared_ptr<DeviceDescription>& description) {
+  const auto log = std::make_shared<fuzz::UnreadLog>();
+  const auto preferences = std::make_shared<fakes::FakePreferences>();
+  const auto consent = std::make_shared<SubmissionConsent>(root, log, preferences, description);
+  consent->given();
+  LinuxAnalyticsEvents events(analyticsEventsFolder(root), log,
+                              std::make_shared<fakes::FakeClock>(), preferences, description,
+                              consent);
+  require(!events.isEventWanted("Value") || events.isAvailable(), "no service wants no event");
+  LinuxCrashSupportLibrary library(description);
+  if (library.open("Value")) library.hasSymbol("Value");
+  DesktopAppRegistry applications({}, description);
+  applications.enumerateBundles(0, [](std::string_view type) { require(!type.empty(), "a type"); });
 }
 
 }  // namespace
@@ -59,6 +78,7 @@ FUZZ_TARGET(device_description)(const std::uint8_t* data, std::size_t size) {
     config->stackshotCapture();
     config->stackshotBuffer();
   }
+  askServices(folder.root, description);
   DescribedPurgeableSpace space(description);
   if (space.isAvailable()) space.copyItemizedPurgeableSpace(*KvDictionary::create());
   return 0;

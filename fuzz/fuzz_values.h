@@ -7,13 +7,14 @@
 #include <string_view>
 
 #include "fuzz.h"
+#include "host/described/described_entries.h"
 #include "kv/plist_codec.h"
 #include "kv/value.h"
 
 namespace tally::fuzz {
 
-// The keys and texts that mean something somewhere, with bars between them. Only append: seeds name
-// them by their place.
+// The keys and texts that mean something somewhere, with bars between them; the entries of the
+// device description come after them. Only append: seeds name them by their place.
 constexpr std::string_view kKnownTexts =
     "Entries|Class|Name|ID|Parents|Properties|Hub|UserClient|Methods|Method|Selector|Flags|Data|"
     "SizeStatus|DataStatus|AnnouncedSize|OpenStatus|CloseStatus|StartStatus|ConfigureStatus|"
@@ -42,6 +43,10 @@ inline std::string_view knownText(std::size_t number) {
       const std::size_t end = std::min(kKnownTexts.find('|', begin), kKnownTexts.size());
       made->push_back(kKnownTexts.substr(begin, end - begin));
       begin = end + 1;
+    }
+    for (const DescribedEntry& entry : kDescribedEntries) {
+      made->push_back(entry.name);
+      for (const DescribedMember& member : entry.members) made->push_back(member.name);
     }
     return made;
   }();

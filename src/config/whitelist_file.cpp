@@ -8,7 +8,7 @@
 #include "config/internal_device.h"
 #include "config/whitelist_options.h"
 #include "kv/plist_codec.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -3,7 +3,7 @@
 #include <cerrno>
 
 #include "config/whitelist_file.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 #include "report/daily_report.h"
 
 namespace tally {

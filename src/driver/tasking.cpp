@@ -7,7 +7,7 @@
 #include <set>
 #include <utility>
 
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -69,9 +69,10 @@ struct Level {
   std::uint64_t next = 0;
 };
 
-class Reader {
+class BinaryReader {
  public:
-  explicit Reader(std::span<const std::byte> document) : document_(document), reader_(document) {}
+  explicit BinaryReader(std::span<const std::byte> document)
+      : document_(document), reader_(document) {}
 
   Result<KvRef<KvObject>> read() {
     if (reader_.size() < kMagic.size() + kTrailerSize) return Error{"the document is cut short"};
@@ -346,7 +347,7 @@ class Reader {
 bool isBinaryPlist(std::string_view document) { return document.starts_with(kMagic); }
 
 Result<KvRef<KvObject>> readBinaryPlist(std::string_view document) {
-  return Reader(std::as_bytes(std::span(document))).read();
+  return BinaryReader(std::as_bytes(std::span(document))).read();
 }
 
 }  // namespace tally

@@ -3,7 +3,7 @@
 
 #include <utility>
 
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 

@@ -8,7 +8,7 @@
 
 namespace tally {
 
-struct KnownPreference;  // platform/known_preferences.h, which few need
+struct KnownPreference;  // platform/tables/known_preferences.h, which few need
 
 // How a write ended. True when it is done.
 class WriteResult {

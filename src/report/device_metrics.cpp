@@ -6,8 +6,8 @@
 
 #include "base/byte_reader.h"
 #include "config/saturate.h"
-#include "platform/known_preferences.h"
-#include "platform/measured_metrics.h"
+#include "platform/tables/known_preferences.h"
+#include "platform/tables/measured_metrics.h"
 
 namespace tally {
 namespace {
@@ -30,6 +30,16 @@ constexpr bool isWellFormed(const MeasuredMetric& metric) {
          metric.percentageOf.empty() == (metric.source != MetricSource::KernelPercentage);
 }
 static_assert(std::ranges::all_of(kMeasuredMetrics, isWellFormed));
+// Two rows may read one kernel value, and then with the same width.
+constexpr bool agree(const MeasuredMetric& one, const MeasuredMetric& other) {
+  return one.key != other.key && (one.kernelValue.empty() || one.kernelValue != other.kernelValue ||
+                                  one.width == other.width);
+}
+static_assert(std::ranges::all_of(kMeasuredMetrics, [](const MeasuredMetric& one) {
+  return std::ranges::all_of(kMeasuredMetrics, [&one](const MeasuredMetric& other) {
+    return &one == &other || agree(one, other);
+  });
+}));
 
 // Empty when the value cannot be read.
 std::optional<std::uint64_t> readKernelNumber(KernelValues& kernel, std::string_view name,

@@ -6,7 +6,7 @@
 
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -6,7 +6,7 @@
 
 #include "config/whitelist_file.h"
 #include "fakes/fake_platform.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -9,7 +9,7 @@
 #include <map>
 
 #include "fakes/fake_platform.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -118,7 +118,7 @@ class Documents(unittest.TestCase):
 
     def test_the_device_description_is_documented_as_it_is_read(self):
         header = (TOP / "src/host/described/described_entries.h").read_text()
-        entry = re.compile(r'\{"(\w+)",\s*KvType::(\w+),\s*((?:"[^"]*"\s*)+)')
+        entry = re.compile(r'\{Described::\w+,\s*"(\w+)",\s*KvType::(\w+),\s*((?:"[^"]*"\s*)+)')
         read = [(name, kind.lower().replace("number", "integer"), "".join(re.findall('"([^"]*)"', answers)))
                 for name, kind, answers in entry.findall(header.split("kDescribedEntries[]")[1])]
         text = (TOP / "docs/device-root.md").read_text().split("## The device description")[1]

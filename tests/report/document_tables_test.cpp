@@ -8,8 +8,8 @@
 
 #include "base/file.h"
 #include "config/whitelist_options.h"
-#include "platform/known_preferences.h"
-#include "platform/measured_metrics.h"
+#include "platform/tables/known_preferences.h"
+#include "platform/tables/measured_metrics.h"
 
 namespace tally {
 namespace {
@@ -42,7 +42,7 @@ TEST(DocumentTables, Preferences) {
         known.domain == domain ? std::string() : fmt::format(" `{}`", known.domain),
         known.key.empty() ? "a whitelist group's name" : fmt::format("`{}`", known.key),
         typeText(known), known.meaning,
-        isNumber ? fmt::format("{:.0f}", known.bound.fallback) : std::string(known.without));
+        isNumber ? fmt::format("{}", known.bound.fallback) : std::string(known.without));
     domain = known.domain;
   }
   expectInDocument("device-root.md", table);

@@ -1,5 +1,5 @@
 // The daily log: what is in it, in which order things happen, and what happens on failures.
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 #include "report/daily_report.h"
 
 #include <gmock/gmock.h>

@@ -2,6 +2,7 @@
 // docs/device-root.md agree on.
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <span>
 #include <string_view>
@@ -10,7 +11,6 @@
 
 namespace tally {
 
-// In the order of kDescribedEntries.
 enum class Described : std::size_t {
   DeviceAnswers,
   HasInternalDiagnostics,
@@ -38,6 +38,7 @@ struct DescribedMember {
   KvType type;
 };
 struct DescribedEntry {
+  Described entry;
   std::string_view name;
   KvType type;
   std::string_view answers;                    // what
@@ -57,39 +58,47 @@ constexpr DescribedMember kTimebaseMembers[] = {{"Numerator", KvType::Number},
                                                 {"Denominator", KvType::Number}};
 
 constexpr DescribedEntry kDescribedEntries[] = {
-    {"DeviceAnswers", KvType::Dictionary, "device queries"},
-    {"HasInternalDiagnostics", KvType::Boolean,
+    {Described::DeviceAnswers, "DeviceAnswers", KvType::Dictionary, "device queries"},
+    {Described::HasInternalDiagnostics, "HasInternalDiagnostics", KvType::Boolean,
      "whether this is an internal-diagnostics build, for every subsystem"},
-    {"OSVersion", KvType::String, "the running system's version as logs carry it"},
-    {"SystemID", KvType::String, "what the storage log calls the system"},
-    {"HardwareModel", KvType::String, "what the storage log calls the machine"},
-    {"SystemVersion", KvType::Dictionary,
+    {Described::OSVersion, "OSVersion", KvType::String,
+     "the running system's version as logs carry it"},
+    {Described::SystemID, "SystemID", KvType::String, "what the storage log calls the system"},
+    {Described::HardwareModel, "HardwareModel", KvType::String,
+     "what the storage log calls the machine"},
+    {Described::SystemVersion, "SystemVersion", KvType::Dictionary,
      "the system version, as a whole: what it leaves out is not known", kSystemVersionMembers},
-    {"Applications", KvType::Array, "installed applications"},
-    {"PreferredLanguages", KvType::Array, "the user's languages, most wanted first"},
-    {"SystemLanguages", KvType::Array, "the languages that the system can show"},
-    {"RegionCode", KvType::String, "the region of the user's locale"},
-    {"DiagnosticSubmissionEnabled", KvType::Boolean, "whether logs may be submitted"},
-    {"CrashSupport", KvType::Dictionary,
+    {Described::Applications, "Applications", KvType::Array, "installed applications"},
+    {Described::PreferredLanguages, "PreferredLanguages", KvType::Array,
+     "the user's languages, most wanted first"},
+    {Described::SystemLanguages, "SystemLanguages", KvType::Array,
+     "the languages that the system can show"},
+    {Described::RegionCode, "RegionCode", KvType::String, "the region of the user's locale"},
+    {Described::DiagnosticSubmissionEnabled, "DiagnosticSubmissionEnabled", KvType::Boolean,
+     "whether logs may be submitted"},
+    {Described::CrashSupport, "CrashSupport", KvType::Dictionary,
      "whether the crash-reporting support library is there, and which entry points it lacks",
      kCrashSupportMembers},
-    {"Stackshot", KvType::Dictionary, "snapshots of all threads", kStackshotMembers},
-    {"PurgeableSpace", KvType::Dictionary, "purgeable space"},
-    {"AnalyticsEvents", KvType::Dictionary,
+    {Described::Stackshot, "Stackshot", KvType::Dictionary, "snapshots of all threads",
+     kStackshotMembers},
+    {Described::PurgeableSpace, "PurgeableSpace", KvType::Dictionary, "purgeable space"},
+    {Described::AnalyticsEvents, "AnalyticsEvents", KvType::Dictionary,
      "whether there is an analytics-event service, and which events it takes; a `Wanted` of "
      "another "
      "type wants nothing",
      kAnalyticsEventsMembers},
-    {"KernelValues", KvType::Dictionary, "kernel values"},
-    {"MonotonicTicks", KvType::Number, "ticks since boot"},
-    {"Timebase", KvType::Dictionary,
+    {Described::KernelValues, "KernelValues", KvType::Dictionary, "kernel values"},
+    {Described::MonotonicTicks, "MonotonicTicks", KvType::Number, "ticks since boot"},
+    {Described::Timebase, "Timebase", KvType::Dictionary,
      "nanoseconds in a tick; a dictionary without both is a reading that fails", kTimebaseMembers},
 };
 
 constexpr const DescribedEntry& describedEntry(Described entry) {
   return kDescribedEntries[static_cast<std::size_t>(entry)];
 }
-static_assert(describedEntry(Described::Timebase).name == "Timebase");
+static_assert(std::ranges::all_of(kDescribedEntries, [](const DescribedEntry& row) {
+  return &describedEntry(row.entry) == &row;
+}));
 
 // An entry that is known, when it is compiled, to be read as what the table says.
 template <class T>

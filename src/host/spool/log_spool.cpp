@@ -10,7 +10,7 @@
 #include "base/temporary_file.h"
 #include "host/spool/waiting_logs.h"
 #include "kv/plist_codec.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "base/device_root.h"
-#include "platform/known_preferences.h"
 #include "platform/system_log.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 

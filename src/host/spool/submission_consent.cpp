@@ -3,7 +3,7 @@
 #include <fmt/core.h>
 
 #include "host/spool/waiting_logs.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 
 namespace tally {
 namespace {

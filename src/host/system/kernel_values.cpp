@@ -10,7 +10,7 @@
 #include "base/file.h"
 #include "base/number_text.h"
 #include "base/text_lines.h"
-#include "platform/measured_metrics.h"
+#include "platform/tables/measured_metrics.h"
 
 namespace tally {
 namespace {

@@ -7,8 +7,8 @@
 #include <string>
 
 #include "base/time_text.h"
-#include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "platform/tables/known_preferences.h"
 #include "storage/storage_log.h"
 
 namespace tally {

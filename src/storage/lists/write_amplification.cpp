@@ -2,8 +2,8 @@
 
 #include <cstdint>
 
-#include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "platform/tables/known_preferences.h"
 #include "storage/controller/statistics_fetch.h"
 
 namespace tally {

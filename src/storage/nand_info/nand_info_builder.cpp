@@ -6,8 +6,8 @@
 #include <string_view>
 
 #include "base/time_text.h"
-#include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "platform/tables/known_preferences.h"
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
@@ -123,6 +123,17 @@ constexpr RoleOfName kRoles[] = {
 };
 
 constexpr std::string_view kRoundedDurations[] = {"maxMemLowDuration", "maxMemChokeDuration"};
+
+// A misspelt name would silently leave its counter out of a figure.
+constexpr bool isCounter(std::string_view name) {
+  for (std::size_t number = 0; number < kCounterNames; ++number) {
+    if (kNames.name(number) == name) return true;
+  }
+  return false;
+}
+static_assert(std::ranges::all_of(kRoles,
+                                  [](const RoleOfName& row) { return isCounter(row.name); }));
+static_assert(std::ranges::all_of(kRoundedDurations, [](auto name) { return isCounter(name); }));
 
 // How the counter of each name number is treated.
 struct Treatment {

@@ -10,8 +10,8 @@
 #include "config/internal_device.h"
 #include "host/store/store_retention.h"
 #include "host/system/system_log.h"
-#include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "platform/tables/known_preferences.h"
 #include "report/device_metrics.h"
 #include "tools/frame/output.h"
 

@@ -66,6 +66,9 @@ class CountedCrashReporting final : public CrashReporting {
 
 }  // namespace
 
+// Whoever adds a service decides here whether it has effects that a dry run must keep back.
+static_assert(sizeof(Platform) == 24 * sizeof(std::shared_ptr<void>));
+
 Platform DryRun::variantOf(const Platform& platform) {
   Platform variant = platform;
   variant.preferences = std::make_shared<OverlayPreferences>(variant.preferences);

@@ -8,7 +8,7 @@
 #include "base/number_text.h"
 #include "base/text_lines.h"
 #include "base/time_text.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 #include "storage/lists/defects_list.h"
 #include "storage/lists/log_writer.h"
 #include "storage/lists/storage_lists.h"

@@ -7,7 +7,7 @@
 #include "host/linux_platform.h"
 #include "host/spool/waiting_logs.h"
 #include "host/store/store_schema.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 #include "tools/frame/command.h"
 #include "tools/frame/output.h"
 

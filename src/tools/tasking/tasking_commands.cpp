@@ -8,7 +8,7 @@
 #include "driver/tasking.h"
 #include "host/linux_platform.h"
 #include "kv/plist_codec.h"
-#include "platform/known_preferences.h"
+#include "platform/tables/known_preferences.h"
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"

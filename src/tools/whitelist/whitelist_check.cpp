@@ -8,8 +8,8 @@
 #include "config/internal_device.h"
 #include "config/whitelist_options.h"
 #include "host/store/store_schema.h"
-#include "platform/known_preferences.h"
 #include "platform/platform.h"
+#include "platform/tables/known_preferences.h"
 #include "tools/frame/spelling.h"
 #include "tools/whitelist/whitelist_verdict.h"
 

@@ -104,14 +104,15 @@ static_assert(std::ranges::all_of(kKnownPreferences, [](const KnownPreference& k
 
 // The row of a key. Does not compile if there is none.
 consteval const KnownPreference& knownPreference(std::string_view key) {
-  const KnownPreference* found = nullptr;
-  for (const KnownPreference& known : kKnownPreferences) {
-    if (known.key != key) continue;
-    if (found != nullptr) throw "two preferences have this key";
-    found = &known;
+  constexpr std::size_t kCount = std::size(kKnownPreferences);
+  std::size_t found = kCount;
+  for (std::size_t row = 0; row < kCount; ++row) {
+    if (kKnownPreferences[row].key != key) continue;
+    if (found != kCount) throw "two preferences have this key";
+    found = row;
   }
-  if (found == nullptr) throw "kKnownPreferences has no row of this key";
-  return *found;
+  if (found == kCount) throw "kKnownPreferences has no row of this key";
+  return kKnownPreferences[found];
 }
 
 // The last day that a day check processed.
