@@ -201,7 +201,7 @@ int access(sqlite3_vfs*, const char* path, int flags, int* result) {
   return SQLITE_OK;
 }
 
-// SQLite's own would look up what the directory's descriptor stands for.
+// SQLite's own would look up what the directory's descriptor names.
 int fullPath(sqlite3_vfs*, const char* path, int capacity, char* full) {
   const std::size_t length = std::strlen(path) + 1;
   if (length > static_cast<std::size_t>(capacity)) return SQLITE_CANTOPEN;

@@ -92,7 +92,7 @@ class SampleTable {
     advance();
   }
 
-  // The next row's place, before which the walk stands.
+  // Where the next row is.
   bool atEnd() const { return atEnd_; }
   std::int32_t day() const { return day_; }
   const std::string& key() const { return key_; }

@@ -164,7 +164,7 @@ Result<std::optional<Database>> openStoreForReading(const StoreFile& file) {
     const auto log = (*directory)->identity(file.name + "-wal");
     return log ? log->size : 0;
   };
-  // A reader that may not write leaves the empty files of a write-ahead log behind. One that may
+  // A reader that may not write leaves the empty files of a write-ahead log. One that may
   // removes them when it ends as the last; and with nothing in that log, it has nothing to fold.
   auto store = readFrom(
       Database::open(**directory, file.name,
