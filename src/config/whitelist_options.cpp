@@ -22,7 +22,7 @@ std::int64_t roundToMultiple(std::int64_t value, std::uint32_t interval) {
 
 std::optional<SettingRemark> remarkOnInterval(std::uint32_t interval) {
   if (interval == 0) {
-    return SettingRemark{true, true, "a step of 0 rounds nothing; values leave as they are"};
+    return SettingRemark{true, true, "a step of 0 rounds nothing; values are reported unchanged"};
   }
   if (interval == 1) return SettingRemark{false, true, "a step of 1 rounds nothing"};
   return std::nullopt;

@@ -79,7 +79,7 @@ std::vector<PreferenceWrite> failuresOf(SystemLog& log, const Attempts& attempts
   std::vector<PreferenceWrite> failures;
   for (const auto& [write, result] : attempts) {
     if (result) continue;
-    log.repeated(LogLevel::Error, "tasking: entries not done", "tasking: {} {} of {} {}",
+    log.repeated(LogLevel::Error, "tasking: entries not applied", "tasking: {} {} of {} {}",
                  write.domain, write.key, write.user,
                  result.isRefused()
                      ? fmt::format("is refused and not {}", what)

@@ -36,7 +36,8 @@ Result<PreferenceWrite> preferenceIn(const KvObject* entry) {
     const auto text = fields->getString(name);
     if (!text) return Error{fmt::format("no text \"{}\"", name)};
     if (replaceNonXmlCharacters(*text) != *text) {
-      return Error{fmt::format("its \"{}\" has characters that no property list holds", name)};
+      return Error{
+          fmt::format("its \"{}\" has characters that a property list cannot represent", name)};
     }
   }
   const std::string_view domain = *fields->getString("Domain");
@@ -205,7 +206,7 @@ class Planner {
         continue;
       }
       fault(fmt::format("entry {} of the scheduled payload is skipped: {}", i,
-                        preference ? "no property list holds its \"Value\" as it is"
+                        preference ? "a property list cannot represent its \"Value\""
                                    : preference.error().message));
     }
     return kept;

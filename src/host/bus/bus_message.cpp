@@ -285,7 +285,7 @@ class DictionaryWriter {
   }
   Status close() { return done(::sd_bus_message_close_container(message_)); }
   static Status done(int result) {
-    if (result < 0) return systemFailure("a message cannot be made", result);
+    if (result < 0) return systemFailure("a message cannot be created", result);
     return Done{};
   }
 

@@ -57,20 +57,20 @@ std::shared_ptr<DescribedRegistryEntry> parseEntry(const KvDictionary& descripti
   entry->name = description.getString("Name").value_or(*className);
   const KvObject* const number = description.get("ID");
   if (number != nullptr && kvCast<KvNumber>(number) == nullptr) {
-    *fault = "its ID is no number";
+    *fault = "its ID is not a number";
     return nullptr;
   }
   entry->id = number != nullptr ? kvCast<KvNumber>(number)->asUInt64() : id;
   auto parents = parseParents(description);
   if (!parents) {
-    *fault = "its Parents are no array of numbers";
+    *fault = "its Parents are not an array of numbers";
     return nullptr;
   }
   entry->parents = std::move(*parents);
   if (!takeDictionary(description, "Properties", &entry->properties) ||
       !takeDictionary(description, kHub, &entry->hub) ||
       !takeDictionary(description, kUserClient, &entry->userClient)) {
-    *fault = "its Properties, Hub or UserClient is no dictionary";
+    *fault = "its Properties, Hub or UserClient is not a dictionary";
     return nullptr;
   }
   if (!entry->properties) entry->properties = KvDictionary::create();
@@ -106,7 +106,7 @@ std::shared_ptr<const RegistrySource::Entries> RegistryDescription::read() {
   if (items == nullptr) {
     files_->report(
         "damaged",
-        path + ": " + (root ? "no dictionary with an array of Entries" : root.error().message));
+        path + ": " + (root ? "not a dictionary with an Entries array" : root.error().message));
     return entries;
   }
   std::set<std::uint64_t> ids;

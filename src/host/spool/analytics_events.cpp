@@ -105,7 +105,7 @@ bool LinuxAnalyticsEvents::isEventWanted(std::string_view eventName) {
   const auto* names = kvCast<KvArray>(wanted);
   if (names == nullptr) {
     // An unreadable list wants nothing: unwanted events must not be stored.
-    description_->reportEntry("AnalyticsEvents.Wanted", "is no array; no event is sent");
+    description_->reportEntry("AnalyticsEvents.Wanted", "is not an array; no event is sent");
     return false;
   }
   return std::any_of(names->begin(), names->end(), [&](const auto& item) {

@@ -99,10 +99,9 @@ class SqliteMetricsStore final : public MetricsStore {
         return complete ? forgetDays(store, dropped) : Status(Done{});
       });
       if (done && dropped > 0) {
-        log_->write(
-            LogLevel::Default,
-            fmt::format("metrics store {}: too large, {} days are removed before their time",
-                        file_.text(), dropped));
+        log_->write(LogLevel::Default,
+                    fmt::format("metrics store {}: too large, {} days are removed early",
+                                file_.text(), dropped));
       }
       if (!done || complete) return done;
       std::this_thread::sleep_for(kPauseForOthers);

@@ -75,7 +75,8 @@ void DesktopAppRegistry::enumerateBundles(int kind,
       if (const auto* type = kvCast<KvString>(item.get())) {
         handler(type->view());
       } else {
-        description_->reportEntry(Described::Applications, "holds what is not a bundle type");
+        description_->reportEntry(Described::Applications,
+                                  "contains an item that is not a bundle type");
       }
     }
     return;

@@ -41,7 +41,7 @@ sd_event* SdEventLoop::event() {
     result = ::sd_event_add_signal(event_, nullptr, number, requestStop, &stopRequested_);
   }
   if (result < 0) {
-    log_->fault("event loop", "event loop: cannot be made: {}", std::strerror(-result));
+    log_->fault("event loop", "event loop: cannot be created: {}", std::strerror(-result));
     event_ = ::sd_event_unref(event_);
   }
   return event_;

@@ -126,7 +126,7 @@ std::optional<LinuxKernelValues::Answer> LinuxKernelValues::convert(std::string_
     if (code && *code > 0 && *code < INT32_MAX) return Answer{static_cast<int>(*code), {}};
   }
   description_->reportEntry("KernelValues " + std::string(name),
-                            "is no number of the value's width, no data and no error");
+                            "is neither a number of the value's width, nor data, nor an error");
   return std::nullopt;
 }
 

@@ -122,7 +122,7 @@ std::optional<std::vector<std::string>> LinuxLocale::described(DescribedAs<KvArr
     if (const auto* tag = kvCast<KvString>(item.get())) {
       tags.emplace_back(tag->view());
     } else {
-      description_->reportEntry(entry.entry, "holds what is not a string");
+      description_->reportEntry(entry.entry, "contains an item that is not a string");
     }
   }
   return tags;
