@@ -8,10 +8,12 @@
 #include "tools/report/log_diff.h"
 #include "tools/report/log_view.h"
 
-// The tool's own is beside its command line, which takes longer to build than everything else.
+#ifndef FUZZ_REPLAY
+// The tool's own is beside its command line, which the fuzzer's program does without.
 void tally::tools::print(std::FILE* file, std::string_view text) {
   std::fwrite(text.data(), 1, text.size(), file);
 }
+#endif
 
 using namespace tally;
 using fuzz::require;

@@ -38,15 +38,17 @@ struct ScalarRounding {
 // What an option does. Has no default, so that a row without an effect does not compile.
 class OptionEffect {
  public:
-  constexpr OptionEffect(ScalarRounding rounding) : rounding_(rounding) {}
+  constexpr OptionEffect(ScalarRounding rounding) : rounding_(rounding), isForScalars_(true) {}
   // Its effect on distributions is in the report's summary.
-  static constexpr OptionEffect onDistributions() { return OptionEffect(ScalarRounding{}); }
+  static constexpr OptionEffect onDistributions() { return {}; }
 
-  constexpr bool isForScalars() const { return rounding_.round != nullptr; }
+  constexpr bool isForScalars() const { return isForScalars_; }
   constexpr const ScalarRounding& rounding() const { return rounding_; }
 
  private:
-  ScalarRounding rounding_;
+  constexpr OptionEffect() = default;
+  ScalarRounding rounding_{};  // of scalars alone
+  bool isForScalars_ = false;
 };
 
 struct WhitelistOption {

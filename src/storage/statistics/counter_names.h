@@ -18,11 +18,13 @@ constexpr std::uint16_t kHighestStatistic =
 
 // The first row of a statistic gives it its names. Further rows report other elements of it, and
 // must repeat its name and number of elements.
-using FirstRows = std::array<const StorageCounter*, kHighestStatistic + 1>;  // null: not known
+constexpr std::size_t kNoStorageCounter = kStorageCounters.size();
+using FirstRows = std::array<std::size_t, kHighestStatistic + 1>;  // kNoStorageCounter: not known
 constexpr FirstRows findFirstRows() {
-  FirstRows first{};
-  for (const StorageCounter& row : kStorageCounters) {
-    if (first[row.statistic] == nullptr) first[row.statistic] = &row;
+  FirstRows first;
+  first.fill(kNoStorageCounter);
+  for (std::size_t row = kStorageCounters.size(); row-- > 0;) {
+    first[kStorageCounters[row].statistic] = row;
   }
   return first;
 }
@@ -30,7 +32,7 @@ inline constexpr FirstRows kFirstRows = findFirstRows();
 
 constexpr bool rowsOfEachStatisticAgree() {
   return std::ranges::all_of(kStorageCounters, [](const StorageCounter& row) {
-    const StorageCounter& first = *kFirstRows[row.statistic];
+    const StorageCounter& first = kStorageCounters[kFirstRows[row.statistic]];
     return &row == &first || (std::string_view(row.name) == first.name &&
                               row.elements == first.elements && row.isReported());
   });
@@ -72,10 +74,11 @@ struct NameTotals {
 };
 constexpr NameTotals countNames() {
   NameTotals totals;
-  for (const StorageCounter* row : kFirstRows) {
-    if (row == nullptr) continue;
-    totals.names += namesOf(*row);
-    for (std::size_t i = 0; i < namesOf(*row); ++i) totals.bytes += nameLength(*row, i) + 1;
+  for (const std::size_t first : kFirstRows) {
+    if (first == kNoStorageCounter) continue;
+    const StorageCounter& row = kStorageCounters[first];
+    totals.names += namesOf(row);
+    for (std::size_t i = 0; i < namesOf(row); ++i) totals.bytes += nameLength(row, i) + 1;
   }
   return totals;
 }
@@ -103,12 +106,13 @@ constexpr CounterNames makeCounterNames() {
   char* const pool = names.pool.data();
   char* to = pool;
   std::size_t number = 0;
-  for (const StorageCounter* row : kFirstRows) {
-    if (row == nullptr) continue;
-    names.plainName[row->statistic] = static_cast<std::uint16_t>(number);
-    for (std::size_t i = 0; i < namesOf(*row); ++i) {
+  for (const std::size_t first : kFirstRows) {
+    if (first == kNoStorageCounter) continue;
+    const StorageCounter& row = kStorageCounters[first];
+    names.plainName[row.statistic] = static_cast<std::uint16_t>(number);
+    for (std::size_t i = 0; i < namesOf(row); ++i) {
       names.start[number++] = static_cast<std::uint16_t>(to - pool);
-      to = appendName(to, *row, i) + 1;
+      to = appendName(to, row, i) + 1;
     }
   }
   names.start[number] = static_cast<std::uint16_t>(to - pool);

@@ -13,7 +13,7 @@ namespace tally {
 namespace {
 
 constexpr std::size_t kUnit = 8;  // a header, or a value
-constexpr std::size_t kCountOffset = 4;
+constexpr std::size_t kValueCountOffset = 4;
 constexpr std::uint32_t kHighestWireKey = 0x30000000;
 constexpr std::uint32_t kUnset = 0xFFFFFFFF;
 constexpr std::uint32_t kReadCountHistoKey = 265;
@@ -107,7 +107,7 @@ int SPXParseBufferToCxt(SPXParseContext* context, const void* buffer, std::size_
   const ByteReader reader({static_cast<const std::byte*>(buffer), length / kUnit * kUnit});
   for (std::size_t at = 0; at < reader.size();) {
     const std::uint32_t key = reader.read<std::uint32_t>(at).value_or(0);
-    const std::uint32_t count = reader.read<std::uint32_t>(at + kCountOffset).value_or(0);
+    const std::uint32_t count = reader.read<std::uint32_t>(at + kValueCountOffset).value_or(0);
     // Compared in units: in bytes the product would wrap where sizes have 32 bits.
     const std::size_t unitsLeft = (reader.size() - at) / kUnit - 1;
     const auto values = count <= unitsLeft ? reader.slice(at + kUnit, count * kUnit) : std::nullopt;
