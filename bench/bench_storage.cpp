@@ -100,10 +100,11 @@ void appendRecord(Bytes& bytes, std::uint32_t key, std::uint32_t count, std::uin
 // All keys, all elements.
 Bytes fullBuffer() {
   Bytes bytes;
-  for (const StorageCounter* row : kFirstRows) {
-    if (row == nullptr) continue;
-    const std::uint64_t value = row->statistic == 53 ? 0x20002 : row->statistic * 1'000'003ull;
-    appendRecord(bytes, row->statistic, row->elements, value);
+  for (const std::size_t first : kFirstRows) {
+    if (first == kNoStorageCounter) continue;
+    const StorageCounter& row = kStorageCounters[first];
+    const std::uint64_t value = row.statistic == 53 ? 0x20002 : row.statistic * 1'000'003ull;
+    appendRecord(bytes, row.statistic, row.elements, value);
   }
   return bytes;
 }
