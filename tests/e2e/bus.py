@@ -34,6 +34,7 @@ SHIPPED = {"rules": """<deny own="*"/><deny send_type="method_call"/>
 class BusDevice(Device):
     """A device, a bus, and the messages of every run that the bus started."""
     today = TODAY
+    address = None  # until there is a bus
 
     def __init__(self, root=None, shipped_policy=False):
         super().__init__(root)
@@ -45,10 +46,8 @@ class BusDevice(Device):
         self.messages_file.touch()
         (self.folder / "services").mkdir()
         starter = self.folder / "start"
-        environment = {**self.environment(), "DBUS_SYSTEM_BUS_ADDRESS": self.address,
-                       "DBUS_SESSION_BUS_ADDRESS": self.address}
         wanted = ("TALLYRUN", "DBUS", "ASAN", "UBSAN", "LANG", "LC_", "TZ", "PATH")
-        exports = "".join(f"export {key}='{value}'\n" for key, value in environment.items()
+        exports = "".join(f"export {key}='{value}'\n" for key, value in self.environment().items()
                           if key.startswith(wanted))
         command = " ".join(f"'{part}'" for part in self.command())
         starter.write_text(f"#!/bin/sh\n{exports}echo $$ > {self.folder}/pid\n"
@@ -70,9 +69,7 @@ class BusDevice(Device):
         super().remove()
 
     def environment(self, day=None, *moment, **more):
-        bus = {}
-        if hasattr(self, "address"):
-            bus = {"DBUS_SYSTEM_BUS_ADDRESS": self.address, "DBUS_SESSION_BUS_ADDRESS": self.address}
+        bus = {f"DBUS_{kind}_BUS_ADDRESS": self.address for kind in ("SYSTEM", "SESSION") if self.address}
         return super().environment(day, *moment, **bus, **more)
 
     def messages(self):
@@ -87,11 +84,8 @@ class BusDevice(Device):
     def until(self, condition, seconds, what):
         end = time.monotonic() + seconds
         while not condition():
-            assert time.monotonic() < end, f"{what}: not after {seconds} s: {self.log_tail()}"
+            assert time.monotonic() < end, f"{what}: not after {seconds} s: {self.messages()[-9:]}"
             time.sleep(0.05)
-
-    def log_tail(self):
-        return self.messages_file.read_bytes()[-1500:] if self.messages_file.exists() else b""
 
     def wait_for_end(self, runs=1, seconds=150):
         self.until(lambda: self.messages_file.read_bytes().count(b"tallyrun ended") >= runs,

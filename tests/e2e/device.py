@@ -1,10 +1,9 @@
 """A device root in a temporary folder, and the real programs run on it."""
-import csv
 import glob
-import io
 import os
 import pathlib
 import plistlib
+import re
 import shutil
 import subprocess
 import tempfile
@@ -23,6 +22,14 @@ PREFERENCES = "var/mobile/Library/Preferences"
 FAKETIME_LIBRARY = glob.glob("/usr/lib/*/faketime/libfaketime.so.1")[0]
 
 
+def checked(*command, status=0, **environment):
+    """The output of a command that must end with that status; of one that fails, the errors."""
+    result = subprocess.run([str(part) for part in command], env={**os.environ, **environment}, capture_output=True,
+                            text=True, timeout=600)
+    assert result.returncode == status, (command, (result.stdout + result.stderr)[-3000:])
+    return result.stderr if status else result.stdout
+
+
 def group(scalars=None, distributions=None, **prefixes):
     return {"ScalarKeys": scalars or {}, "DistributionKeys": distributions or {},
             "ScalarKeyPrefixes": prefixes.get("scalar_prefixes", {}),
@@ -33,7 +40,6 @@ class Device:
     today = TODAY  # the day of its runs
 
     def __init__(self, root=None):
-        """A fresh device, or the one whose root is given."""
         self.root = root or pathlib.Path(tempfile.mkdtemp(prefix="tally-e2e-"))
         if root is None:
             self.describe()
@@ -59,17 +65,17 @@ class Device:
             "kern.bootsessionuuid", b"%d0000000" % ((self.today + 1) % 2))
         self.write("device/device.plist", entries)
 
+    def fill(self):
+        """One whitelisted scalar on each of the last days and of the next."""
+        self.whitelist(G=group({"a": {}}))
+        self.store([("a", day, day) for day in range(self.today - 4, self.today + 4)])
+
     def store(self, scalars=(), distributions=()):
         """scalars: (key, day, value); distributions: (key, day, [values])."""
-        text = io.StringIO()
-        out = csv.writer(text, lineterminator="\n")
-        out.writerow(["kind", "key", "day", "offset", "value"])
-        for key, day, value in scalars:
-            out.writerow(["scalar", key, day, "", value])
-        for key, day, values in distributions:
-            for offset, value in enumerate(values):
-                out.writerow(["distribution", key, day, offset % 86400, repr(value)])
-        self.tool("store", "import", "-", stdin=text.getvalue().encode())
+        rows = ["kind,key,day,offset,value", *(f"scalar,{key},{day},,{value}" for key, day, value in scalars)]
+        rows += [f"distribution,{key},{day},{offset},{value!r}" for key, day, values in distributions
+                 for offset, value in enumerate(values)]
+        self.tool("store", "import", "-", stdin="\n".join(rows).encode())
 
     def environment(self, day=None, seconds=NOON, **more):
         environment = dict(os.environ, TALLYRUN_ROOT=str(self.root), TALLYRUN_LOG="stderr", TZ="UTC",
@@ -121,24 +127,16 @@ class Device:
         return [plistlib.loads(path.read_bytes()) for path in self.log_files()]
 
     def log(self):
-        logs = self.logs()
-        assert len(logs) == 1, f"{len(logs)} logs"
-        return logs[0]
+        only, = self.logs()
+        return only
 
     def info(self, path):
         return plistlib.loads(path.with_name(path.name[:-len(".log")] + ".info.plist").read_bytes())
 
 
 def parse_messages(stderr):
-    messages = []
-    for line in stderr.decode().splitlines():
-        # The storage library writes lines of its own, some without an end.
-        start = line.find("tallyrun[")
-        if start < 0:
-            continue
-        head, _, text = line[start:].partition("]: ")
-        messages.append((head[len("tallyrun["):], text))
-    return messages
+    # The storage library writes lines of its own, some without an end.
+    return re.findall(r"tallyrun\[(\w+)\]: (.*)", stderr.decode())
 
 
 # What the sweep says of a device without a storage driver; which of them depends on the day.
@@ -161,10 +159,8 @@ class DeviceTest(unittest.TestCase):
         return device
 
     def simple(self):
-        """A device with one whitelisted scalar on each of the last days."""
         device = self.fresh()
-        device.whitelist(G=group({"a": {}}))
-        device.store([("a", day, day) for day in range(TODAY - 4, TODAY + 4)])
+        device.fill()
         return device
 
     def logged_days(self, device):

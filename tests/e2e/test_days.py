@@ -3,17 +3,18 @@ import bisect
 import datetime
 import hashlib
 import json
-import os
+import plistlib
 import random
 import signal
 import subprocess
 import time
 import unittest
 
-from device import BIN, DeviceTest, LAST_DAY, TODAY, WHITELIST, group, parse_messages, texts
+from device import BIN, DeviceTest, LAST_DAY, PREFERENCES, TODAY, WHITELIST, checked, group, parse_messages, texts
 
 YESTERDAY = TODAY - 1
 UNCHANGED = "Day unchanged since last run"
+RECORD = ("TaskingID", "TaskingOS", "TaskingDigest", "TaskingPayload", "TaskingUnfinished")
 
 
 def summary(samples):
@@ -78,13 +79,11 @@ class Days(DeviceTest):
                 repairs = [line["repair"] for line in findings if "repair" in line]
                 self.assertEqual(len(repairs), ahead)
                 for repair in repairs:
-                    subprocess.run(["/bin/sh", "-c", repair], check=True,
-                                   stdout=subprocess.DEVNULL, env=dict(os.environ, PATH=BIN))
+                    checked("/bin/sh", "-c", repair, PATH=str(BIN))
                     device.run("-d", day=TODAY + 2)
                 self.assertLessEqual({YESTERDAY, TODAY + 1}, set(self.logged_days(device)))
-                rows = device.tool("store", "dump").splitlines()
-                kept = {int(row.split(",")[2]) for row in rows if row.startswith("scalar,a,")}
-                self.assertLessEqual(set(range(TODAY - 27, TODAY + 2)), kept)
+                kept = device.tool("store", "dump")
+                self.assertEqual([day for day in range(TODAY - 27, TODAY + 2) if f"a,{day},,{day}" not in kept], [])
 
     def test_the_log_is_what_another_reader_computes(self):
         device, source = self.device, random.Random(1)
@@ -101,8 +100,6 @@ class Days(DeviceTest):
         payload = [{"Domain": "vellum.da", "User": "mobile", "Key": "G", "Value": True}]
         device.set_preferences(TaskingID="T-1", TaskingDigest=b"\x01\x02", TaskingPayload=payload)
         messages = device.run("-f")
-        path, = device.log_files()
-        self.assertEqual(path.stat().st_mode & 0o777, 0o600)
         log = device.log()
         noon = datetime.datetime(2026, 3, 2, 12, 0)
         self.assertLess(abs(log.pop("TBLogCreationDate") - noon), datetime.timedelta(minutes=5))
@@ -116,10 +113,26 @@ class Days(DeviceTest):
                                          for i, (key, some) in enumerate(samples.items())},
             "TBTasking": payload, "TBTaskID": "T-1", "TBTaskDigest": "<0102>",
             "TBWhitelistDigest": hashlib.md5((device.root / WHITELIST).read_bytes()).hexdigest()})
-        info = device.info(path)
-        self.assertEqual((info["TypeCode"], info["Name"], info["Options"]),
-                         ("193", "log-tallyd", {"previous_os_version": "<unknown>"}))
         self.assertEqual(texts(messages, "info"), [f"writing tallyd log. yesterday={YESTERDAY}"])
+
+    def test_tasking_reaches_every_user_and_the_next_log(self):
+        device = self.simple()
+        files = {"mobile": f"{PREFERENCES}/dom.plist", "__sysmetra__": "Library/Preferences/dom.plist",
+                 "guest": "var/guest/Library/Preferences/dom.plist"}
+        for build, identifier in (("16S46", "A"), ("16S50", "A"), ("16S50", "B")):
+            device.describe(SystemVersion={"ProductBuildVersion": build})
+            payload = [{"User": user, "Domain": "dom", "Key": identifier, "Value": 0} for user in files]
+            schedule = {"TaskingID": identifier, "TaskingDigest": b"\1\2", "TaskingPayload": payload}
+            device.write("Library/Preferences/vellum.Ferryman.plist",
+                         plistlib.dumps({"ScheduledTasking": schedule}, fmt=plistlib.FMT_BINARY))
+            again = "Tasking update (A -> A, 16S46 -> 16S50)" in texts(device.run("-f"))
+            self.assertEqual(again, (build, identifier) == ("16S50", "A"))
+            self.assertEqual([plistlib.loads((device.root / file).read_bytes()) for file in files.values()],
+                             [{identifier: 0}] * 3)
+            self.assertEqual([device.preferences().get(key) for key in RECORD],
+                             [identifier, build, b"\1\2", payload, None])
+        # A log carries what was in force when it was written.
+        self.assertEqual([log["TBTaskID"] for log in device.logs()], ["(no tasking id)", "A", "A"])
 
     def test_four_at_once_do_one_day(self):
         device = self.simple()
@@ -157,8 +170,7 @@ class Days(DeviceTest):
                                     capture_output=True, env=self.device.environment())
             self.assertEqual(result.returncode, 1)
             self.assertIn(b"cannot write to standard output", result.stderr)
-        tool, job = (subprocess.run([BIN / name, "--version"], capture_output=True, check=True).stdout
-                     for name in ("tallyctl", "tallyrun"))
+        tool, job = (checked(BIN / name, "--version") for name in ("tallyctl", "tallyrun"))
         self.assertEqual(tool.split()[1:], job.split()[1:])
 
 

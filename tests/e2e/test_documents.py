@@ -8,7 +8,7 @@ import tempfile
 import unittest
 
 from bus import BusDevice
-from device import BIN
+from device import BIN, Device, checked
 
 TOP = pathlib.Path(__file__).resolve().parents[2]
 DOCUMENTS = sorted([TOP / "README.md", TOP / "CONTRIBUTING.md", *TOP.glob("docs/*.md")])
@@ -21,13 +21,9 @@ RUN_BY_OTHERS = {
     "cmake --build build": "scripts/test",
     "cpack --config build/CPackConfig.cmake": "test_package.py",
     "apt install ./build/packages-debian/tallyrun_*.deb": "test_package.py",
-    "cmake --install build --prefix /usr/local --component tallykv": "test_library.py",
-    "cmake --install build --prefix /usr/local --component tallykv-dev": "test_library.py",
-    "cmake --install build --prefix /usr/local --component hwreport": "test_library.py",
-    "cmake --install build --prefix /usr/local --component hwreport-dev": "test_library.py",
-    "cmake -S examples/hwreport -B example": "test_library.py",
-    "cmake --build example": "test_library.py",
-    "example/channels": "test_library.py",
+    **dict.fromkeys(("cmake -S examples/hwreport -B example", "cmake --build example", "example/channels", *(
+        f"cmake --install build --prefix /usr/local --component {name}"
+        for name in ("tallykv", "tallykv-dev", "hwreport", "hwreport-dev"))), "test_library.py"),
     "scripts/demo": ".ci/run", "scripts/test": ".ci/run", "scripts/test --sanitize": ".ci/run",
     "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
     "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "the test bench.load, at a smaller size",
@@ -43,9 +39,8 @@ class Documents(unittest.TestCase):
         cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-documents-"))
         cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
         cls.demo = cls.folder / "demo-root"
-        environment = {**os.environ, "TALLYRUN_BIN": str(BIN), "TALLYRUN_ROOT": str(cls.demo)}
         for command in ([TOP / "scripts/make-demo-root", cls.demo], [BIN / "tallyrun", "-f"]):
-            subprocess.run(command, check=True, capture_output=True, env=environment)
+            checked(*command, TALLYRUN_ROOT=str(cls.demo))
 
     def clone(self):
         """A folder that looks like a clone after its demo; calls that are too large to run are recorded."""
@@ -58,8 +53,7 @@ class Documents(unittest.TestCase):
                      *(f"scripts/{path.name}" for path in (TOP / "scripts").iterdir())):
             program = clone / name
             program.parent.mkdir(exist_ok=True)
-            shown = program.name if program.parent.name == "stand-ins" else name
-            program.write_text(STANDS_IN.replace("$TALLYRUN_SHOWN", shown))
+            program.write_text(STANDS_IN.replace("$TALLYRUN_SHOWN", name.removeprefix("stand-ins/")))
             program.chmod(0o755)
         return clone
 
@@ -77,10 +71,9 @@ class Documents(unittest.TestCase):
             if language != "sh":
                 continue
             ran += 1
-            result = subprocess.run(["bash", "-euo", "pipefail", "-c", content], cwd=clone,
-                                    env=environment, capture_output=True, timeout=120, check=False)
-            self.assertEqual(result.returncode, 0,
-                             f"{content}\n{(result.stdout + result.stderr).decode()[-2000:]}")
+            result = subprocess.run(["bash", "-euo", "pipefail", "-c", content], cwd=clone, env=environment,
+                                    stdout=subprocess.PIPE, stderr=subprocess.STDOUT, timeout=120, check=False)
+            self.assertEqual(result.returncode, 0, f"{content}\n{result.stdout.decode()[-2000:]}")
         for call in (clone / "calls").read_text().splitlines():
             self.assertIn(call.strip(), RUN_BY_OTHERS)
         return ran
@@ -95,24 +88,19 @@ class Documents(unittest.TestCase):
                 ran += self.run_document(document.read_text(), clone, device)
         self.assertGreater(ran, 15)
 
-    def test_every_block_says_what_it_is(self):
-        for document in DOCUMENTS:
-            languages = {match[1] for match in FENCE.finditer(document.read_text())}
-            self.assertLessEqual(languages, {"sh", "xml", "csv", "json", "cpp", "text"}, document.name)
-
-    def test_examples_are_those_that_are_built(self):
+    def test_blocks_say_what_they_are_and_examples_are_those_that_are_built(self):
         sources = [path.read_text() for path in (TOP / "examples").rglob("*.cpp")]
         for document in DOCUMENTS:
             for language, content in FENCE.findall(document.read_text()):
+                self.assertIn(language, {"sh", "xml", "csv", "json", "cpp", "text"}, document.name)
                 if language == "cpp":
                     self.assertTrue(any(content.strip() in source for source in sources), content)
 
     def test_an_example_replaces_a_service(self):
-        device = BusDevice(self.clone() / "build/demo-root")
-        self.addCleanup(device.remove)
-        device.command = lambda *arguments: [str(BIN / "example_platform"), *arguments]
-        device.run("-f", day=None)
-        device.run("-f", day=None)
+        device = Device(self.clone() / "build/demo-root")
+        device.command = lambda *arguments: [BIN / "example_platform", *arguments]
+        for _ in range(2):
+            device.run("-f", day=None)
         self.assertEqual(device.info(device.log_files()[0])["Options"]["previous_os_version"], "<unknown>")
         self.assertEqual(device.preferences()["LastOSVersion"], "Trailhead 4.2 (R1180)")
 
@@ -128,8 +116,7 @@ class Documents(unittest.TestCase):
     @unittest.skipUnless(shutil.which("man"), "man is missing")
     def test_every_command_of_the_tool_is_documented(self):
         def rows(*words):
-            out = subprocess.run([BIN / "tallyctl", *words, "--help"], capture_output=True, text=True,
-                                 check=True).stdout
+            out = checked(BIN / "tallyctl", *words, "--help")
             description, usage = (" ".join(part.split()) for part in out.split("\n\n")[:2])
             commands = out.partition("\nCommands:\n")[2].partition("\n\n")[0]
             names = re.findall(r"^  (\S+)", commands, re.MULTILINE)

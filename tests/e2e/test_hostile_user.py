@@ -9,7 +9,7 @@ import sys
 import time
 import unittest
 
-from device import BIN, PREFERENCES, STORE, WHITELIST, DeviceTest, group
+from device import PREFERENCES, STORE, DeviceTest, group
 
 USER = 12345
 RUNS = 200
@@ -93,11 +93,9 @@ class HostileUser(DeviceTest):
         with subprocess.Popen([sys.executable, __file__, "rival", str(device.root)]) as process:
             try:
                 for number in range(RUNS):
-                    subprocess.run(device.command(("-f", "-d")[number % 2]), timeout=120, check=True,
-                                   capture_output=True, env=device.environment())
+                    device.run(("-f", "-d")[number % 2], day=None)
                     if number % 10 == 0:
-                        subprocess.run([BIN / "tallyctl", "store", "set", "a", "1"], timeout=120,
-                                       capture_output=True, env=device.environment())
+                        device.tool("store", "set", "a", "1", status=None)
                 self.assertIsNone(process.poll(), "the rival ended by itself")
             finally:
                 process.send_signal(signal.SIGKILL)

@@ -7,7 +7,7 @@ import subprocess
 import tempfile
 import unittest
 
-from device import BIN, Device, LAST_DAY, PROGRAM_DOMAIN as NAME, TODAY, group
+from device import BIN, Device, LAST_DAY, PROGRAM_DOMAIN as NAME, TODAY, checked, group
 
 BUILD = BIN.parent
 DATA = {"var", "Library"}  # what a device recorded stays
@@ -20,40 +20,26 @@ FORMER_FILES = {"tallyrun": ["bin/tallyrun", "lib/systemd/system/timers.target.w
                 "libtallykv-dev": ["lib/libtallykv.so", "lib/pkgconfig/tallykv.pc"]}
 
 
-def run(*command, **options):
-    result = subprocess.run(command, capture_output=True, timeout=600, check=False, **options)
-    assert result.returncode == 0, (command, (result.stdout + result.stderr).decode()[-3000:])
-    return result.stdout.decode()
-
-
-class InstalledDevice(Device):
-    """The machine's own root is the device, as it is when the package is installed for real."""
-
-    def command(self, *arguments):
-        return [str(self.root / "usr/bin/tallyrun"), *arguments]
-
-
 class Package(unittest.TestCase):
     @classmethod
     def setUpClass(cls):
         cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-package-"))
         cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
-        run("cpack", "--config", str(BUILD / "CPackConfig.cmake"), "-B", str(cls.folder / "made"))
+        checked("cpack", "--config", BUILD / "CPackConfig.cmake", "-B", cls.folder / "made")
         cls.packages = sorted((cls.folder / "made").glob("*.deb"))
         cls.names = {path.name.split("_")[0]: path for path in cls.packages}
         cls.package = cls.names["tallyrun"]
 
     def clean_root(self):
         root = pathlib.Path(tempfile.mkdtemp(prefix="root-", dir=self.folder))
-        (root / "var/lib/dpkg/info").mkdir(parents=True)
-        (root / "var/lib/dpkg/updates").mkdir()
+        for name in ("var/lib/dpkg/info", "var/lib/dpkg/updates", "etc"):
+            (root / name).mkdir(parents=True)
         (root / "var/lib/dpkg/status").touch()
-        (root / "etc").mkdir()
         return root
 
     def dpkg(self, root, *arguments):
-        return run("dpkg", f"--root={root}", "--force-script-chrootless", "--force-depends",
-                   "--force-not-root", "--log=/dev/null", *arguments)
+        return checked("dpkg", f"--root={root}", "--force-script-chrootless", "--force-depends",
+                       "--force-not-root", "--log=/dev/null", *arguments)
 
     def files(self, root):
         return {str(path.relative_to(root)) for path in root.rglob("*")
@@ -62,26 +48,23 @@ class Package(unittest.TestCase):
     def test_installed_and_removed(self):
         root = self.clean_root()
         before = self.files(root)
-        self.dpkg(root, "-i", str(self.package))
-        wanted = ["usr/bin/tallyrun", "usr/bin/tallyctl", "usr/share/man/man1/tallyrun.1.gz",
-                  "usr/share/man/man1/tallyctl.1.gz", "usr/lib/systemd/system/tallyrun.service",
-                  "usr/lib/systemd/system/tallyrun-day.timer",
-                  f"usr/share/dbus-1/system-services/{NAME}.service",
-                  f"usr/share/dbus-1/services/{NAME}.service",
-                  f"usr/share/dbus-1/system.d/{NAME}.conf",
-                  "usr/share/bash-completion/completions/tallyctl",
-                  "usr/share/man/man5/tallyrun-root.5.gz", "usr/share/man/man7/tallyrun.7.gz",
-                  "Library/Preferences", "var/mobile",
-                  "usr/share/doc/tallyrun/docs/security.md", "usr/share/doc/tallyrun/SECURITY.md", TIMER_LINK]
+        self.dpkg(root, "-i", self.package)
+        # The programs' manual pages are lintian's.
+        wanted = ["Library/Preferences", TIMER_LINK, *(f"usr/{path}" for path in (
+            "bin/tallyctl", "lib/systemd/system/tallyrun.service", "lib/systemd/system/tallyrun-day.timer",
+            f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
+            f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
+            "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
+            "share/doc/tallyrun/docs/security.md", "share/doc/tallyrun/SECURITY.md"))]
         self.assertLessEqual(set(wanted), self.files(root))
-        self.assertEqual(os.readlink(root / TIMER_LINK), f"/{wanted[5]}")
+        self.assertEqual(os.readlink(root / TIMER_LINK), "/usr/lib/systemd/system/tallyrun-day.timer")
         user = re.search(r"^mobile:x:(\d+):", (root / "etc/passwd").read_text(), re.M)
         self.assertEqual((root / "var/mobile").stat().st_uid, int(user[1]))
         (root / "var/mobile/Library").mkdir()
         (root / "var/mobile/Library/log").write_text("data")
         self.dpkg(root, "-r", "tallyrun")
         (root / TIMER_LINK).unlink()  # as the administrator does who wants no timer
-        self.dpkg(root, "-i", str(self.package))
+        self.dpkg(root, "-i", self.package)
         self.assertFalse((root / TIMER_LINK).is_symlink())
         stamp = root / "var/lib/systemd/timers/stamp-tallyrun-day.timer"
         stamp.parent.mkdir(parents=True)
@@ -94,14 +77,15 @@ class Package(unittest.TestCase):
 
     def test_upgrade_from_the_first_release_keeps_data(self):
         root = self.clean_root()
-        device = InstalledDevice(root)
+        device = Device(root)  # the machine's own root, as when the package is installed for real
+        device.command = lambda *arguments: [root / "usr/bin/tallyrun", *arguments]
         former = {name: files for name, files in FORMER_FILES.items() if name in self.names}
         self.dpkg(root, "-i", *(self.former(name, files) for name, files in former.items()))
         device.describe()
         device.whitelist(G=group({"a": {}}))
         device.store([("a", TODAY - 1, 7)])
         device.set_preferences(kept=5)
-        self.dpkg(root, "-i", *map(str, self.packages))
+        self.dpkg(root, "-i", *self.packages)
         device.run("-d", day=TODAY)
         self.assertEqual(device.log()["TBScalars"]["a"], 7)
         kept = device.preferences()
@@ -117,45 +101,37 @@ class Package(unittest.TestCase):
             (tree / "usr" / file).write_text("former")
         (tree / "DEBIAN").mkdir()
         (tree / "DEBIAN/control").write_text(
-            f"Package: {name}\nVersion: 0.1.0-1\nArchitecture: {run('dpkg', '--print-architecture').strip()}\n"
+            f"Package: {name}\nVersion: 0.1.0-1\nArchitecture: {checked('dpkg', '--print-architecture').strip()}\n"
             "Maintainer: nobody <nobody@example.org>\nDescription: former\n")
-        run("dpkg-deb", "-b", str(tree), f"{tree}.deb")
+        checked("dpkg-deb", "-b", tree, f"{tree}.deb")
         return f"{tree}.deb"
 
     @unittest.skipUnless((BUILD / "libhwreport.so").exists(), "built without shared libraries")
     def test_libraries_say_what_they_export(self):
         root = self.clean_root()
-        self.dpkg(root, "-i", *map(str, self.packages))
+        self.dpkg(root, "-i", *self.packages)
         self.assertEqual(set(LIBRARIES), {name for name in self.names if name[-1].isdigit()})
         for package, name in LIBRARIES.items():
             library, = (root / "usr/lib").glob(f"*/{name}")  # the architecture's directory
-            self.assertIn(f"[{name}]", run("readelf", "-dW", str(library)))
-            exported = {line.split()[2] for line in
-                        run("nm", "-D", "--defined-only", str(library)).splitlines()}
+            exported = {line.split()[2] for line in checked("nm", "-D", "--defined-only", library).splitlines()}
             file, = (root / "var/lib/dpkg/info").glob(f"{package}*.symbols")
             head, _, *symbols = file.read_text().splitlines()
             self.assertEqual(head.split()[:2], [name, package])
             self.assertEqual({line.split("@")[0].strip() for line in symbols}, exported)
 
-    @unittest.skipUnless(shutil.which("systemd-tmpfiles"), "systemd-tmpfiles is missing")
-    def test_a_home_stays_as_its_user_has_it(self):
+    @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd is missing")
+    def test_units_are_sound_and_a_home_stays_as_its_user_has_it(self):
         root = self.clean_root()
         home = root / "var/mobile"
-        home.mkdir()
-        home.chmod(0o700)
-        self.dpkg(root, "-i", str(self.package))
-        run("systemd-tmpfiles", f"--root={root}", "--create", "tallyrun.conf")
+        home.mkdir(mode=0o700)
+        self.dpkg(root, "-i", self.package)
+        checked("systemd-tmpfiles", f"--root={root}", "--create", "tallyrun.conf")
         # Whatever root made there would be root's, and the user could not read what comes into it.
         self.assertEqual((home.stat().st_mode & 0o777, list(home.iterdir())), (0o700, []))
-
-    @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd-analyze is missing")
-    def test_units_are_sound(self):
-        root = self.clean_root()
-        self.dpkg(root, "-i", str(self.package))
         units = root / "usr/lib/systemd/system"
         for unit in units.glob("*.service"):  # the program is not installed on this machine
             unit.write_text(unit.read_text().replace("/usr/bin/", f"{root}/usr/bin/"))
-            exposure = run("systemd-analyze", "security", "--offline=true", "--threshold=30", str(unit))
+            exposure = checked("systemd-analyze", "security", "--offline=true", "--threshold=30", unit)
             self.assertRegex(exposure, "Overall exposure level")
         result = subprocess.run(["systemd-analyze", "verify", "--man=no",
                                  *map(str, units.glob("tallyrun*"))], capture_output=True, check=False)
@@ -170,16 +146,10 @@ class Package(unittest.TestCase):
 
     def test_completion_offers_what_the_tool_has(self):
         script = pathlib.Path(__file__).parents[2] / "packaging/completion/tallyctl"
-        cases = [  # words, one of the proposals
-            (["tallyctl", "ta"], "tasking"), (["tallyctl", "send", ""], "apps"),
-            (["tallyctl", "--root", "/", "tasking", "apply", "--d"], "--dry-run"),
-            (["tallyctl", "store", "im"], "import")]
-        for words, wanted in cases:
-            with self.subTest(words):
-                code = (f'source {script}; COMP_WORDS=({" ".join(map(repr, words))}); '
-                        f'COMP_CWORD={len(words) - 1}; _tallyctl; echo "${{COMPREPLY[@]}}"')
-                environment = dict(os.environ, PATH=f"{BIN}:{os.environ['PATH']}")
-                self.assertIn(wanted, run("bash", "-c", code, env=environment).split())
+        for words, wanted in ((["send", ""], "apps"), (["--root", "/", "tasking", "apply", "--d"], "--dry-run")):
+            code = (f'source {script}; COMP_WORDS=({BIN}/tallyctl {" ".join(map(repr, words))}); '
+                    f'COMP_CWORD={len(words)}; _tallyctl; echo "${{COMPREPLY[@]}}"')
+            self.assertIn(wanted, checked("bash", "-c", code).split())
 
 
 if __name__ == "__main__":
