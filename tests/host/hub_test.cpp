@@ -2,7 +2,6 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
-#include <numeric>
 
 #include "host/described/described_frames.h"
 #include "host/described_device.h"
@@ -58,6 +57,14 @@ struct Hub {
   RegistryResult map() {
     return device.registry().ConnectionMapMemory(connection, static_cast<std::uint32_t>(token),
                                                  kMapAnywhere, &memory, &length);
+  }
+  // Whether all steps up to a region that both share succeed.
+  bool share(const std::vector<std::byte>& list) {
+    return start() == 0 && configure(list) == 0 && map() == 0;
+  }
+  RegistryResult unmap() {
+    return device.registry().ConnectionUnmapMemory(connection, static_cast<std::uint32_t>(token),
+                                                   memory);
   }
   RegistryResult update() {
     MethodCall call{.scalarInput = {&token, 1}};
@@ -121,13 +128,10 @@ TEST(StatisticsHub, FailsWhereTheDescriptionSaysSo) {
 
 TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   Hub hub("");
-  ASSERT_EQ(hub.start(), 0u);
   // The second channel and the counter; malformed and unknown channels and other drivers are not
   // served.
-  ASSERT_EQ(
-      hub.configure(interestList(5, {{5, 2, kState}, {5, 3, 1}, {5, 1, 0}, {5, 9, 1}, {6, 1, 1}})),
-      0u);
-  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_TRUE(
+      hub.share(interestList(5, {{5, 2, kState}, {5, 3, 1}, {5, 1, 0}, {5, 9, 1}, {6, 1, 1}})));
   ASSERT_EQ(hub.length, 3 * element::kSize);
   constexpr std::uint64_t kMinusTwo = ~std::uint64_t{1};  // of a real, and after the last frame
   for (const std::uint64_t counter :
@@ -144,19 +148,13 @@ TEST(StatisticsHub, RefreshesTheRegionThatItShares) {
   EXPECT_EQ(hub.word(element::kSize + element::kSlots + 16), element::kMissingValue);
   // The type that is not given is the legend's.
   EXPECT_EQ(hub.word(2 * element::kSize + element::kTypeWord), 1 | std::uint64_t{1} << 32);
-  EXPECT_EQ(hub.device.registry().ConnectionUnmapMemory(
-                hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),
-            0u);
-  EXPECT_NE(hub.device.registry().ConnectionUnmapMemory(
-                hub.connection, static_cast<std::uint32_t>(hub.token), hub.memory),
-            0u);
+  EXPECT_EQ(hub.unmap(), 0u);
+  EXPECT_NE(hub.unmap(), 0u);
 }
 
 TEST(StatisticsHub, HasARunOfNobodysWhenNothingIsServed) {
   Hub hub("");
-  ASSERT_EQ(hub.start(), 0u);
-  ASSERT_EQ(hub.configure(interestList(2, {{5, 9, 1}, {6, 1, 1}})), 0u);
-  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_TRUE(hub.share(interestList(2, {{5, 9, 1}, {6, 1, 1}})));
   ASSERT_EQ(hub.update(), 0u);
   EXPECT_EQ(hub.length, element::kSize);
   EXPECT_EQ(hub.word(element::kDriverID), element::kMissingValue);
@@ -166,14 +164,12 @@ TEST(StatisticsHub, HasARunOfNobodysWhenNothingIsServed) {
 
 TEST(StatisticsHub, ServesRawRegionsVerbatim) {
   Hub hub("<key>RawFrames</key><array><data>AQID</data><data>/w==</data></array>");
-  ASSERT_EQ(hub.start(), 0u);
-  ASSERT_EQ(hub.configure(kOneInterest), 0u);
-  ASSERT_EQ(hub.map(), 0u);
+  ASSERT_TRUE(hub.share(kOneInterest));
   ASSERT_EQ(hub.length, 3u);
-  hub.update();
-  EXPECT_EQ(std::memcmp(hub.memory, "\1\2\3", 3), 0);
-  hub.update();
-  EXPECT_EQ(std::memcmp(hub.memory, "\xff\0\0", 3), 0);
+  for (const char* frame : {"\1\2\3", "\xff\0\0"}) {
+    hub.update();
+    EXPECT_EQ(std::memcmp(hub.memory, frame, 3), 0);
+  }
 }
 
 }  // namespace

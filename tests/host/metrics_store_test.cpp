@@ -15,14 +15,10 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 
 TEST_F(StoreTest, ScalarsComeInOrderOfDayAndKeyFromTheHalfOpenRange) {
-  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
-    for (const std::int32_t day : {12, 10, 11, -5}) {
-      for (const char* key : {"b", "a", "B", "\xc3\xa9", "aa"}) {
-        if (auto set = writer.setScalar(day, key, day); !set) return set;
-      }
-    }
-    return writer.setScalar(11, "a", std::numeric_limits<std::int64_t>::min());
-  }));
+  for (const std::int32_t day : {12, 10, 11, -5}) {
+    for (const char* key : {"b", "a", "B", "\xc3\xa9", "aa"}) ASSERT_TRUE(set(day, key, day));
+  }
+  ASSERT_TRUE(set(11, "a", std::numeric_limits<std::int64_t>::min()));
   EXPECT_THAT(scalars("", 10, 12), ElementsAre("11 B=11", "11 a=-9223372036854775808", "11 aa=11",
                                                "11 b=11", "11 \xc3\xa9=11", "12 B=12", "12 a=12",
                                                "12 aa=12", "12 b=12", "12 \xc3\xa9=12"));
@@ -100,18 +96,9 @@ TEST_F(StoreTest, DistributionsOfBothTablesAreOneSeriesInOrder) {
 
 TEST_F(StoreTest, ACheckpointKeepsTheLatestThirtyDaysThatHoldDataHoweverTheClockGoes) {
   const auto record = [&](std::int32_t first, std::int32_t last) {
-    ASSERT_TRUE(write([&](StoreWriter& writer) -> Status {
-      for (std::int64_t each = first; each <= last; ++each) {
-        const auto day = static_cast<std::int32_t>(each);
-        const double value = 1;
-        const std::uint32_t offset = 0;
-        if (auto set = writer.setScalar(day, "s", day); !set) return set;
-        if (auto pushed = writer.pushSamples(day, "d", {&value, 1}, {&offset, 1}); !pushed) {
-          return pushed;
-        }
-      }
-      return Done{};
-    }));
+    for (std::int64_t day = first; day <= last; ++day) {
+      ASSERT_TRUE(set(day, "s", day) && push(static_cast<std::int32_t>(day), "d", {1}));
+    }
   };
   const auto checkpointOn = [&](std::int32_t day, std::uint64_t most = kMostStoreBytes) {
     clock->setDay(day);
@@ -225,14 +212,12 @@ TEST_F(StoreTest, AnImportAboveItsBuffersKeepsTheOrderOfEachKey) {
 }
 
 TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {
-  runTogether(6, [&](int number) {
-    const auto mine = makeSqliteMetricsStore(storeFile, log, clock);
-    for (int i = 0; i < 20; ++i) {
-      mine->TBClientSetValueForScalarKey(std::to_string(number) + "." + std::to_string(i), i);
-      if (!push(kToday, "d", {1.0 * number})) return false;
-      if (i % 5 == 0) mine->TBClientCheckpoint();
-    }
-    return log->lines.empty();
+  runTogether(6, 20, [&](int number, int i) {
+    const auto mine = store();
+    mine->TBClientSetValueForScalarKey(std::to_string(number) + "." + std::to_string(i), i);
+    const bool pushed = push(kToday, "d", {1.0 * number});
+    if (i % 5 == 0) mine->TBClientCheckpoint();
+    return pushed && log->lines.empty();
   });
   EXPECT_EQ(scalars().size(), 120u);
   EXPECT_THAT(lengths(), ElementsAre("20514 d x120"));

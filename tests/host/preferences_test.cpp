@@ -3,7 +3,6 @@
 
 #include "host/temporary_root.h"
 #include "kv/nesting.h"
-#include "kv/plist_codec.h"
 
 namespace tally {
 namespace {
@@ -15,6 +14,11 @@ class PreferencesTest : public TemporaryRoot {
  protected:
   PropertyListPreferences open() { return {folder("prefs"), log}; }
   static KvRef<KvObject> number(std::int64_t value) { return KvNumber::int64(value); }
+  static WriteResult save(PropertyListPreferences& preferences, std::string_view key,
+                          KvRef<KvObject> value) {
+    preferences.SMAPreferencesSetValue(key, std::move(value), kDomain);
+    return preferences.SMAPreferencesSynchronize(kDomain);
+  }
   std::int32_t stored(std::string_view key) {
     return open().SMAPreferencesGetIntegerValue(key, kDomain);
   }
@@ -60,12 +64,10 @@ TEST_F(PreferencesTest, OnlyWhatChangesIsWritten) {
     SCOPED_TRACE(c.name);
     std::filesystem::remove_all(at("prefs"));
     auto preferences = open();
-    preferences.SMAPreferencesSetValue(c.key, c.former, kDomain);
-    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_TRUE(save(preferences, c.key, c.former));
     const auto before = DeviceRoot(root).identity("/" + std::string(kFile));
     EXPECT_EQ(before.has_value(), static_cast<bool>(c.former)) << "a file without a value";
-    preferences.SMAPreferencesSetValue(c.key, c.next, kDomain);
-    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_TRUE(save(preferences, c.key, c.next));
     EXPECT_EQ(DeviceRoot(root).identity("/" + std::string(kFile)) != before, c.writes);
     EXPECT_TRUE(kvIdentical(open().SMAPreferencesGetValue(c.key, kDomain).get(), c.next.get()));
   }
@@ -77,22 +79,16 @@ TEST_F(PreferencesTest, SeesAndKeepsWhatOtherProcessesWrite) {
   auto second = open();
   EXPECT_EQ(first.SMAPreferencesGetIntegerValue("b", kDomain), 0);
   first.SMAPreferencesSetValue("a", number(1), kDomain);
-  second.SMAPreferencesSetValue("b", number(2), kDomain);
-  EXPECT_TRUE(second.SMAPreferencesSynchronize(kDomain));
+  EXPECT_TRUE(save(second, "b", number(2)));
   EXPECT_EQ(first.SMAPreferencesGetIntegerValue("b", kDomain), 2) << "a clean key is stale";
   EXPECT_TRUE(first.SMAPreferencesSynchronize(kDomain));
   EXPECT_EQ(second.SMAPreferencesGetIntegerValue("a", kDomain), 1);
   EXPECT_EQ(stored("b"), 2);
 
   constexpr int kProcesses = 4, kKeys = 25;
-  runTogether(kProcesses, [this](int process) {
+  runTogether(kProcesses, kKeys, [this](int process, int i) {
     auto preferences = open();
-    bool whole = true;
-    for (int i = 0; i < kKeys; ++i) {
-      preferences.SMAPreferencesSetValue(std::to_string(process * 100 + i), number(1), kDomain);
-      whole = static_cast<bool>(preferences.SMAPreferencesSynchronize(kDomain)) && whole;
-    }
-    return whole;
+    return save(preferences, std::to_string(process * 100 + i), number(1));
   });
   EXPECT_EQ(open().copyDomain(kDomain)->size(), 2u + kProcesses * kKeys);
 }
@@ -107,8 +103,7 @@ TEST_F(PreferencesTest, DamagedFilesAreSetAsideAndTheProgramGoesOn) {
     EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 0);
     EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 0);
     EXPECT_EQ(errors().size(), static_cast<std::size_t>(round)) << "one line for each damage";
-    preferences.SMAPreferencesSetValue("a", number(round), kDomain);
-    EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+    EXPECT_TRUE(save(preferences, "a", number(round)));
     EXPECT_EQ(stored("a"), round);
     if (round <= kKept) {
       EXPECT_EQ(get(std::string(kFile) + ".damaged-" + std::to_string(round)), damage);
@@ -139,8 +134,7 @@ TEST_F(PreferencesTest, UnsafeDomainsAreRefused) {
 TEST_F(PreferencesTest, AFailedWriteKeepsTheChangesForTheNextAttempt) {
   put("prefs", "a file where the folder should be");
   auto preferences = open();
-  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
-  EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_FALSE(save(preferences, "a", number(1)));
   EXPECT_FALSE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
   EXPECT_EQ(errors().size(), 1u) << "said once";
   EXPECT_EQ(preferences.SMAPreferencesGetIntegerValue("a", kDomain), 1);
@@ -154,11 +148,9 @@ TEST_F(PreferencesTest, AValueThatNoFileHoldsFailsNoLaterWrite) {
   for (int i = 0; i < kMaximumDepth; ++i) deep = KvArray::create({deep});
   auto preferences = open();
   preferences.SMAPreferencesSetValue("deep", deep, kDomain);
-  preferences.SMAPreferencesSetValue("a", number(1), kDomain);
-  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain).isRefused());
+  EXPECT_TRUE(save(preferences, "a", number(1)).isRefused());
   EXPECT_FALSE(exists(kFile)) << "half of what belongs together";
-  preferences.SMAPreferencesSetValue("a", number(2), kDomain);
-  EXPECT_TRUE(preferences.SMAPreferencesSynchronize(kDomain));
+  EXPECT_TRUE(save(preferences, "a", number(2)));
   EXPECT_EQ(stored("a"), 2);
   EXPECT_EQ(errors().size(), 1u);
 }

@@ -1,8 +1,6 @@
 // The registry of a described device: matching, handles, iterators, drivers.
 #include <gtest/gtest.h>
 
-#include <array>
-#include <cstring>
 #include <vector>
 
 #include "host/described_device.h"
@@ -41,6 +39,9 @@ TEST(Registry, MatchesByEveryKeyAndTheirCombinations) {
   DescribedDevice device(kThreeEntries);
   const auto text = [](const char* t) { return KvString::create(t); };
   const auto number = [](std::int64_t n) { return KvNumber::int64(n); };
+  const auto property = [](const char* name, KvRef<KvObject> value) {
+    return KvDictionary::create({{kMatchProperty, KvDictionary::create({{name, value}})}});
+  };
   const struct {
     const char* name;
     KvRef<KvDictionary> matching;
@@ -51,13 +52,8 @@ TEST(Registry, MatchesByEveryKeyAndTheirCombinations) {
       {"a real id", KvDictionary::create({{kMatchEntryID, KvNumber::float64(2)}}), ""},
       {"class and name",
        KvDictionary::create({{kMatchClass, text("Root")}, {kMatchName, text("bus1")}}), ""},
-      {"property value",
-       KvDictionary::create({{kMatchProperty, KvDictionary::create({{"Speed", number(7)}})}}),
-       "bus1 "},
-      {"property presence, whatever its value",
-       KvDictionary::create(
-           {{kMatchProperty, KvDictionary::create({{"Public", KvBoolean::of(true)}})}}),
-       "bus1 "},
+      {"property value", property("Speed", number(7)), "bus1 "},
+      {"property presence, whatever its value", property("Public", KvBoolean::of(true)), "bus1 "},
       {"an unknown key", KvDictionary::create({{"Colour", text("red")}}), ""},
   };
   for (const auto& c : cases) {

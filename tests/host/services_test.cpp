@@ -1,7 +1,6 @@
 // The smaller services on a device root: description, device, applications, kernel values, files,
 // the run lock, the event loop and the lines of the log.
 #include <fcntl.h>
-#include <gmock/gmock.h>
 #include <sys/epoll.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -23,6 +22,9 @@
 
 namespace tally {
 namespace {
+
+using testing::ElementsAre;
+using testing::HasSubstr;
 
 class ServicesTest : public TemporaryRoot {
  protected:
@@ -73,16 +75,14 @@ TEST_F(ServicesTest, DescriptionFaultsAreOneLineEach) {
   const auto wrong = describe("<key>OSVersion</key><integer>1</integer>");
   EXPECT_FALSE(wrong->getAs<KvString>(Described::OSVersion));
   EXPECT_FALSE(wrong->getAs<KvString>(Described::OSVersion));
-  ASSERT_EQ(errors().size(), 1u);
-  EXPECT_NE(errors()[0].find("\"OSVersion\""), std::string::npos);
+  EXPECT_THAT(errors(), ElementsAre(HasSubstr("\"OSVersion\"")));
   for (const char* damaged : {"<plist><dict>", "<plist version=\"1.0\"><array/></plist>"}) {
     useBoundedLog();
     put("device.plist", damaged);
     const auto description = describe("");
     EXPECT_FALSE(description->getAs<KvString>(Described::OSVersion));
     EXPECT_FALSE(description->getAs<KvDictionary>(Described::Timebase));
-    ASSERT_EQ(errors().size(), 1u);
-    EXPECT_NE(errors()[0].find(at("device.plist")), std::string::npos);
+    EXPECT_THAT(errors(), ElementsAre(HasSubstr(at("device.plist"))));
   }
 }
 
@@ -146,16 +146,13 @@ TEST_F(ServicesTest, LogHeaderFactsAreLines) {
 
 TEST_F(ServicesTest, ApplicationsAreCountedOnceAndTheUsersHideTheSystems) {
   const std::string shown = "[Desktop Entry]\nType=Application\n";
-  const std::string hidden = shown + "Hidden=true\n";
   const std::string user = "var/mobile/.local/share/";
-  put("usr/share/applications/a.desktop", shown);
-  put("usr/share/applications/b.desktop", shown);
-  put("usr/share/applications/c.desktop", shown);
-  put("usr/share/applications/kde/d.desktop", shown);
+  for (const char* name :
+       {"a.desktop", "b.desktop", "c.desktop", "kde/d.desktop", "mimeinfo.cache"})
+    put(std::string("usr/share/applications/") + name, shown);
   put("usr/local/share/applications/kde-d.desktop", shown);
-  put("usr/share/applications/mimeinfo.cache", shown);
   put(user + "applications/b.desktop", shown);
-  put(user + "applications/c.desktop", hidden);
+  put(user + "applications/c.desktop", shown + "Hidden=true\n");
   put("var/lib/flatpak/exports/share/applications/f.desktop", shown);
   put(user + "flatpak/exports/share/applications/f.desktop", shown);
   std::filesystem::create_directory_symlink(at("usr/share"), at("usr/share/applications/loop"));
@@ -175,10 +172,8 @@ TEST_F(ServicesTest, ApplicationsAreCountedOnceAndTheUsersHideTheSystems) {
 }
 
 TEST_F(ServicesTest, LanguagesComeFromTheRootUnlessDescribed) {
-  std::filesystem::create_directories(at("usr/share/locale/de/LC_MESSAGES"));
-  std::filesystem::create_directories(at("usr/share/locale/pt_BR/LC_MESSAGES"));
-  std::filesystem::create_directories(at("usr/share/locale/fr"));
-  std::filesystem::create_directories(at("usr/share/locale/en/LC_MESSAGES"));
+  for (const char* name : {"de/LC_MESSAGES", "pt_BR/LC_MESSAGES", "fr", "en/LC_MESSAGES"})
+    std::filesystem::create_directories(at("usr/share/locale/") + name);
   const LocaleEnvironment environment{"", "", "", "de_CH"};
   EXPECT_EQ(LinuxLocale(root, environment, describe("")).SystemLanguages(),
             (std::vector<std::string>{"en", "de", "pt-BR"}));
@@ -265,8 +260,7 @@ TEST_F(ServicesTest, TurnsNestAndEnd) {
   const RunTurn turn(lock);
   FileRunLock refused(folder("folder"), log, std::chrono::milliseconds(1));
   EXPECT_FALSE(RunTurn(refused));
-  const std::string holder = "is locked by process " + std::to_string(::getpid());
-  EXPECT_NE(errors().back().find(holder), std::string::npos) << errors().back();
+  EXPECT_THAT(errors().back(), HasSubstr("is locked by process " + std::to_string(::getpid())));
 }
 
 // Takes a byte at a time and handles one: "o".
@@ -278,7 +272,7 @@ int onInput(sd_event_source*, int file, std::uint32_t, void* loop) {
 }
 
 TEST_F(ServicesTest, ASliceWaitsItsTimeOutAndEndsAtATerminationSignal) {
-  runTogether(1, [this](int) {
+  runTogether(1, 1, [this](int, int) {
     SdEventLoop loop(log);
     const auto start = std::chrono::steady_clock::now();
     bool right = loop.runMainLoopSlice(0.05, true) == SliceResult::TimedOut;

@@ -1,10 +1,10 @@
 // A metrics store on disk, and what a test does with it.
 #pragma once
 
-#include <gmock/gmock.h>
 #include <sqlite3.h>
 
 #include <limits>
+#include <numeric>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -21,7 +21,7 @@ constexpr std::int32_t kLast = std::numeric_limits<std::int32_t>::max();
 
 inline std::vector<double> sequence(double first, std::size_t count) {
   std::vector<double> values(count);
-  for (std::size_t i = 0; i < count; ++i) values[i] = first + static_cast<double>(i);
+  std::iota(values.begin(), values.end(), first);
   return values;
 }
 
@@ -38,11 +38,16 @@ class StoreTest : public TemporaryRoot {
     auto writer = StoreWriter::open(storeFile, IfMissing::Create);
     return writer && (*writer)->begin() && work(**writer) && (*writer)->commit();
   }
+  bool set(std::int64_t day, std::string_view key, std::int64_t value) const {
+    return write([&](StoreWriter& writer) {
+      return writer.setScalar(static_cast<std::int32_t>(day), key, value);
+    });
+  }
   // Each value one second after the one before.
   bool push(std::int32_t day, std::string_view key, const std::vector<double>& values,
             bool toChunks = false) const {
     std::vector<std::uint32_t> offsets(values.size());
-    for (std::size_t i = 0; i < offsets.size(); ++i) offsets[i] = static_cast<std::uint32_t>(i);
+    std::iota(offsets.begin(), offsets.end(), 0u);
     return write([&](StoreWriter& writer) -> Status {
       return toChunks ? writer.appendToChunks(day, key, values, offsets)
                       : writer.pushSamples(day, key, values, offsets);
@@ -77,12 +82,12 @@ class StoreTest : public TemporaryRoot {
         prefix, minimum, maximum,
         [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
           Distribution row{day, std::string(key), {}, {}};
-          std::vector<double> some(batch);
-          std::vector<std::uint32_t> seconds(batch);
-          while (const auto count = values.nextValues(some.data(), seconds.data(), batch)) {
-            row.values.insert(row.values.end(), some.begin(), some.begin() + std::ptrdiff_t(count));
-            row.offsets.insert(row.offsets.end(), seconds.begin(),
-                               seconds.begin() + std::ptrdiff_t(count));
+          for (std::size_t count = batch, size = 0; count > 0;) {
+            row.values.resize(size + batch);
+            row.offsets.resize(size + batch);
+            count = values.nextValues(&row.values[size], &row.offsets[size], batch);
+            row.values.resize(size += count);
+            row.offsets.resize(size);
           }
           rows.push_back(std::move(row));
         });
@@ -91,21 +96,20 @@ class StoreTest : public TemporaryRoot {
   // As "20513 key x3" for each row.
   std::vector<std::string> lengths() const {
     std::vector<std::string> rows;
-    for (const auto& row : distributions()) {
-      rows.push_back(std::to_string(row.day) + " " + row.key + " x" +
-                     std::to_string(row.values.size()));
+    for (const auto& [day, key, values, offsets] : distributions()) {
+      rows.push_back(std::to_string(day) + " " + key + " x" + std::to_string(values.size()));
     }
     return rows;
   }
 
   // Runs SQL on the file directly; the first column of the last row.
-  std::string sql(const char* text) const {
+  std::string sql(const std::string& text) const {
     sqlite3* handle = nullptr;
     EXPECT_EQ(::sqlite3_open(path.c_str(), &handle), SQLITE_OK);
     std::string answer;
     char* message = nullptr;
     ::sqlite3_exec(
-        handle, text,
+        handle, text.c_str(),
         [](void* out, int, char** columns, char**) {
           *static_cast<std::string*>(out) = columns[0] != nullptr ? columns[0] : "NULL";
           return 0;
@@ -119,7 +123,6 @@ class StoreTest : public TemporaryRoot {
 
   StoreFile storeFile{{root, "/data"}, "TBDataStore.sqlitedb"};
   std::string path = at("data/TBDataStore.sqlitedb");
-  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
 };
 
 }  // namespace tally

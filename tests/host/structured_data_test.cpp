@@ -9,8 +9,6 @@
 namespace tally {
 namespace {
 
-using Names = std::vector<std::string>;
-
 class StructuredDataTest : public TemporaryRoot {
  protected:
   Status append(std::uint32_t type, std::int64_t value) {
@@ -37,8 +35,7 @@ class StructuredDataTest : public TemporaryRoot {
     return values;
   }
 
-  fakes::FakeClock clock;
-  StructuredDataFolder data{folder("data"), clock, *log};
+  StructuredDataFolder data{folder("data"), *clock, *log};
   FolderBounds bounds;
 };
 
@@ -79,9 +76,7 @@ TEST_F(StructuredDataTest, TornAndDamagedRecordsCostOnlyThemselves) {
   ASSERT_TRUE(append(172, 2));
   put("data/0000000001-172.pending",
       get("data/0000000001-172.pending") + "0000000003\nbad\n" + whole);
-  const auto failures = finish();
-  ASSERT_EQ(failures.size(), 1u);
-  EXPECT_NE(failures[0].find("1 damaged"), std::string::npos) << failures[0];
+  EXPECT_THAT(finish(), testing::ElementsAre(testing::HasSubstr("1 damaged")));
   EXPECT_EQ(finished(172), (std::vector<std::int64_t>{1, 2, 1}));
   std::filesystem::create_directories(at("data/0000000007-172.pending"));
   ASSERT_TRUE(append(172, 3));

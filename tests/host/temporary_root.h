@@ -1,7 +1,7 @@
 // A device root in a temporary folder, and a log that keeps its lines.
 #pragma once
 
-#include <gtest/gtest.h>
+#include <gmock/gmock.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -17,6 +17,8 @@
 
 namespace tally {
 
+using Names = std::vector<std::string>;
+
 class TemporaryRoot : public testing::Test, protected TemporaryFolder {
  protected:
   DeviceDirectory folder(std::string_view path) const { return {root, "/" + std::string(path)}; }
@@ -25,8 +27,8 @@ class TemporaryRoot : public testing::Test, protected TemporaryFolder {
     return text ? *text : "(" + text.error().message + ")";
   }
   // The entries of a folder, without lock files.
-  std::vector<std::string> names(std::string_view path) const {
-    std::vector<std::string> found;
+  Names names(std::string_view path) const {
+    Names found;
     const auto all = folder(path).list();
     EXPECT_TRUE(all);
     for (const std::string& name : *all) {
@@ -38,19 +40,24 @@ class TemporaryRoot : public testing::Test, protected TemporaryFolder {
   void useBoundedLog() {
     log = std::make_shared<fakes::FakeSystemLog>(fakes::FakeSystemLog::Repeats::Bounded);
   }
-  std::vector<std::string> errors() const { return log->texts(LogLevel::Error); }
+  Names errors() const { return log->texts(LogLevel::Error); }
 
   std::shared_ptr<fakes::FakeSystemLog> log = std::make_shared<fakes::FakeSystemLog>();
+  std::shared_ptr<fakes::FakeClock> clock = std::make_shared<fakes::FakeClock>();
 };
 
-// Runs work in several processes at once; each must return true.
+// Runs work in several processes at once, so many times in each; it must always return true.
 template <class Work>
-void runTogether(int count, const Work& work) {
+void runTogether(int count, int times, const Work& work) {
   std::vector<pid_t> children;
   for (int i = 0; i < count; ++i) {
     const pid_t child = ::fork();
     ASSERT_NE(child, -1);
-    if (child == 0) ::_exit(work(i) ? 0 : 1);
+    if (child == 0) {
+      bool all = true;
+      for (int n = 0; n < times; ++n) all = static_cast<bool>(work(i, n)) && all;
+      ::_exit(all ? 0 : 1);
+    }
     children.push_back(child);
   }
   for (const pid_t child : children) {
