@@ -1,6 +1,4 @@
 // The command line as a whole: what is refused and how, the form of failures, completion.
-#include <sstream>
-
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -15,12 +13,9 @@ class CommandLine : public ToolTest {
  protected:
   // The first words of the lines that complete what the last word begins.
   std::vector<std::string> completed(const std::vector<std::string>& words) {
-    std::vector<std::string> found;
-    std::istringstream lines(runUnder({"complete", "--"}, words).out);
-    for (std::string line; std::getline(lines, line);) {
-      found.push_back(line.substr(0, line.find('\t')));
-    }
-    return found;
+    std::vector<std::string> lines = split(runUnder({"complete", "--"}, words).out, '\n');
+    for (std::string& line : lines) line = line.substr(0, line.find('\t'));
+    return lines;
   }
 };
 
@@ -54,21 +49,21 @@ TEST_F(CommandLine, WhatIsRefusedIsNamedWithWhatMayBeMeant) {
 
 TEST_F(CommandLine, EveryFailureUnderJsonIsOneObject) {
   put("rows.csv", "bad\n");
-  for (const std::vector<std::string>& arguments :
-       std::vector<std::vector<std::string>>{{"store", "import", at("rows.csv")},
-                                             {"report", "show", "9"},
-                                             {"report", "preview"},
-                                             {"explain", "no.such"},
-                                             {"nand", "info"},
-                                             {"nand", "defects"},
-                                             {"channels", "list"},
-                                             {"prefs", "get", "x"},
-                                             {"whitelist", "check"},
-                                             {"whitelist", "test", "a"},
-                                             {"doctor"},
-                                             {"tasking", "apply", at("none")}}) {
-    SCOPED_TRACE(testing::PrintToString(arguments));
-    std::vector<std::string> asJson = arguments;
+  const std::string lines[] = {"store import " + at("rows.csv"),
+                               "report show 9",
+                               "report preview",
+                               "explain no.such",
+                               "nand info",
+                               "nand defects",
+                               "channels list",
+                               "prefs get x",
+                               "whitelist check",
+                               "whitelist test a",
+                               "doctor",
+                               "tasking apply " + at("none")};
+  for (const std::string& line : lines) {
+    SCOPED_TRACE(line);
+    std::vector<std::string> asJson = split(line, ' ');
     asJson.insert(asJson.begin() + 1, "--json");
     const Outcome outcome = run(asJson);
     EXPECT_EQ(outcome.status, kWrong);
@@ -77,7 +72,7 @@ TEST_F(CommandLine, EveryFailureUnderJsonIsOneObject) {
     EXPECT_EQ(error["status"], kWrong);
     EXPECT_NE(error["message"], "");
     EXPECT_TRUE(outcome.out.empty() || !outcome.json().contains("error"));
-    EXPECT_EQ(run(arguments).status, kWrong);
+    EXPECT_EQ(run(split(line, ' ')).status, kWrong);
   }
 }
 
@@ -85,8 +80,7 @@ TEST_F(CommandLine, CompletionKnowsWhatTheDeviceHolds) {
   putRows(
       "scalar,bus10,20000,,1\nscalar,bus2,19999,,1\ndistribution,d,20000,1,1\n"
       "scalar,odd\x1bkey,20000,,1\n");
-  putPlist("device/var/mobile/Library/Preferences/vellum.da.plist",
-           "<dict><key>G</key><true/></dict>");
+  putList(kPreferences + "vellum.da.plist", R"({"G": true})");
   EXPECT_THAT(completed({"sto"}), ElementsAre("store"));
   EXPECT_THAT(completed({"store", ""}), ElementsAre("set", "push", "import", "dump", "keys"));
   EXPECT_THAT(completed({"explain", "b"}), ElementsAre("bus2", "bus10"));

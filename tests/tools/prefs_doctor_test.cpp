@@ -8,13 +8,12 @@ namespace {
 
 using testing::HasSubstr;
 
-constexpr const char* kFolder = "device/var/mobile/Library/Preferences/";
+const std::string kOwnDomain = kPreferences + "vellum.tallyd.tallyrun.plist";
 
 using PrefsCommands = ToolTest;
 
 TEST_F(PrefsCommands, ValuesKeepTheirTypes) {
-  put("list.plist",
-      "<plist version=\"1.0\"><array><dict><key>n</key><data>AP8=</data></dict></array></plist>");
+  putList("list.plist", R"([{"n": "<data>AP8=</data>"}])");
   const struct {
     std::vector<std::string> value;
     const char* type;
@@ -34,7 +33,7 @@ TEST_F(PrefsCommands, ValuesKeepTheirTypes) {
     const auto json = run({"prefs", "get", "k", "--json"}).json();
     EXPECT_EQ(json["type"], c.type);
     EXPECT_EQ(json["value"], c.read);
-    EXPECT_THAT(get(kFolder + std::string("vellum.tallyd.tallyrun.plist")), HasSubstr(c.stored));
+    EXPECT_THAT(get(kOwnDomain), HasSubstr(c.stored));
   }
 }
 
@@ -62,7 +61,7 @@ TEST_F(PrefsCommands, MissingKeysBadValuesAndNames) {
     EXPECT_EQ(runUnder({"prefs"}, c.arguments).status, c.status)
         << testing::PrintToString(c.arguments);
   }
-  EXPECT_EQ(names(kFolder), std::vector<std::string>{"x.y.plist"});
+  EXPECT_EQ(names(kPreferences), std::vector<std::string>{"x.y.plist"});
 }
 
 class DoctorCommand : public ToolTest {
@@ -84,83 +83,57 @@ class DoctorCommand : public ToolTest {
 };
 
 TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
-  const std::string domain = kFolder + std::string("vellum.tallyd.tallyrun.plist");
-  const std::string today = std::to_string(std::time(nullptr) / 86400);
-  const auto setLastDay = [&](const char* day) {
-    putPlist(domain,
-             "<dict>" + integer("LastCrashLogSerializationDateInDaysSince1970", day) + "</dict>");
+  const std::string today = std::to_string(std::time(nullptr) / 86400), rows = "rows.csv",
+                    whitelist =
+                        "device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist",
+                    store = "device/var/mobile/Library/Tallybook/TBDataStore.sqlitedb",
+                    registry = "device/device/registry.plist";
+  const auto lastDay = [](const std::string& day) {
+    return R"({"LastCrashLogSerializationDateInDaysSince1970": )" + day + "}";
   };
   const struct {
     const char* subject;
-    std::function<void()> prepare;
-    std::vector<const char*> parts;  // of each line about it
+    std::string path, content;  // of the file that is written first: JSON is made a property list
+    const char* lines;          // about it: how each begins, separated by |
   } cases[] = {
-      {"device root", [] {}, {"wrong: "}},
-      {"device root", [&] { std::filesystem::create_directories(at("device")); }, {"ok: "}},
-      {"whitelist", [&] { putWhitelist("<key>G</key><true/>"); }, {"wrong: 1 fault"}},
-      {"whitelist", [&] { putWhitelist(dict("G", dict("ScalarKeys", dict("a", "")))); }, {"ok: 0"}},
-      {"whitelist",
-       [&] {
-         putPlist(kFolder + std::string("vellum.da.plist"), "<dict><key>G</key><false/></dict>");
-       },
-       {"ok: 0 faults, 1 surprise", "missing: the group G is disabled by tasking"}},
-      {"metrics store",
-       [&] { putRows("scalar,a," + today + ",,1\ndistribution,d,20000,1,1\n"); },
-       {"ok: 1 scalar, 1 distribution, up to "}},
-      {"metrics store", [&] { putRows("scalar,a,999999,,1\n"); }, {"ok: ", "wrong: it has days"}},
-      {"metrics store",
-       [&] {
-         put("device/var/mobile/Library/Tallybook/TBDataStore.sqlitedb", "no database at all");
-       },
-       {"wrong: "}},
-      {"preferences",
-       [&] { put(domain, "damaged"); },
-       {"wrong: preferences vellum.tallyd.tallyrun"}},
-      {"preferences",
-       [&] {
-         putPlist(domain, "<dict/>");
-         put(domain + ".damaged-1", "x");
-       },
-       {"ok: 2 domains", "wrong: 1 damaged file set aside"}},
-      {"flash storage", [] {}, {"missing: no driver"}},
-      {"statistics", [] {}, {"missing: 0 channels, no hub"}},
-      {"flash storage",
-       [&] {
-         putPlist(
-             "device/device/registry.plist",
-             "<dict><key>Entries</key><array><dict><key>Class</key><string>SPXStorage</string>"
-             "</dict><dict><key>Class</key><string>HwReportHub</string></dict></array></dict>");
-       },
-       {"wrong: driver SPXStorage cannot be opened: error 0xe00002c7"}},
-      {"last day", [] {}, {"missing: "}},
-      {"last day", [&] { setLastDay("20000"); }, {"missing: day 20000 (2024-10-04) was processed"}},
-      {"last day", [&] { setLastDay("999999"); }, {"wrong: "}},
-      {"device description",
-       [&] {
-         putPlist("device/device/device.plist",
-                  "<dict><key>RegionCode</key><true/><key>Kernelvalues</key><dict/>"
-                  "<key>Notes</key><string>x</string><key>SystemID</key><integer>1</integer>"
-                  "<key>AnalyticsEvents</key><dict><key>Wanted</key><string>x</string>"
-                  "<key>Absnt</key><true/></dict></dict>");
-       },
-       {"ok: 5 entries", "wrong: RegionCode is a boolean, not a string, and is ignored",
-        "wrong: Kernelvalues is not known; KernelValues may be meant",
-        "wrong: SystemID is a number, not a string",
-        "wrong: AnalyticsEvents.Wanted is a string, not an array",
-        "wrong: AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"}},
-      {"crash support",
-       [&] {
-         putPlist("device/device/device.plist",
-                  "<dict>" + dict("CrashSupport", "<key>Absent</key><true/>") + "</dict>");
-       },
-       {"missing: the library is missing"}},
+      {"device root", "", "", "wrong: "},
+      {"device root", "device/file", "", "ok: "},
+      {"whitelist", whitelist, R"({"G": true})", "wrong: 1 fault"},
+      {"whitelist", whitelist, R"({"G": {"ScalarKeys": {"a": {}}}})", "ok: 0"},
+      {"whitelist", kPreferences + "vellum.da.plist", R"({"G": false})",
+       "ok: 0 faults, 1 surprise|missing: the group G is disabled by tasking"},
+      {"metrics store", rows, "scalar,a," + today + ",,1\ndistribution,d,20000,1,1\n",
+       "ok: 1 scalar, 1 distribution, up to "},
+      {"metrics store", rows, "scalar,a,999999,,1\n", "ok: |wrong: it has days"},
+      {"metrics store", store, "no database at all", "wrong: "},
+      {"preferences", kOwnDomain, "damaged", "wrong: preferences vellum.tallyd.tallyrun"},
+      {"preferences", kOwnDomain, "{}", "ok: 2 domains"},
+      {"preferences", kOwnDomain + ".damaged-1", "x",
+       "ok: 2 domains|wrong: 1 damaged file set aside"},
+      {"flash storage", "", "", "missing: no driver"},
+      {"statistics", "", "", "missing: 0 channels, no hub"},
+      {"flash storage", registry,
+       R"({"Entries": [{"Class": "SPXStorage"}, {"Class": "HwReportHub"}]})",
+       "wrong: driver SPXStorage cannot be opened: error 0xe00002c7"},
+      {"last day", "", "", "missing: "},
+      {"last day", kOwnDomain, lastDay("20000"), "missing: day 20000 (2024-10-04) was processed"},
+      {"last day", kOwnDomain, lastDay("999999"), "wrong: "},
+      {"device description", kDescription,
+       R"({"RegionCode": true, "Kernelvalues": {}, "Notes": "x", "SystemID": 1,
+           "AnalyticsEvents": {"Wanted": "x", "Absnt": true}})",
+       "ok: 5 entries|wrong: RegionCode is a boolean, not a string, and is ignored|wrong: "
+       "Kernelvalues is not known; KernelValues may be meant|wrong: SystemID is a number, not a "
+       "string|wrong: AnalyticsEvents.Wanted is a string, not an array|wrong: "
+       "AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"},
+      {"crash support", kDescription, R"({"CrashSupport": {"Absent": true}})",
+       "missing: the library is missing"},
   };
   for (const auto& c : cases) {
-    SCOPED_TRACE(std::string(c.subject) + " " + testing::PrintToString(c.parts));
-    c.prepare();
-    std::vector<testing::Matcher<std::string>> wanted;
-    for (const char* part : c.parts) wanted.push_back(testing::StartsWith(part));
-    EXPECT_THAT(linesAbout(c.subject), testing::ElementsAreArray(wanted));
+    SCOPED_TRACE(std::string(c.subject) + " " + c.lines);
+    if (c.path == rows) putRows(c.content);
+    if (c.content.starts_with('{')) putList(c.path, c.content);
+    if (!c.path.empty() && !c.content.starts_with('{')) put(c.path, c.content);
+    EXPECT_THAT(linesAbout(c.subject), testing::Pointwise(Begins(), split(c.lines, '|')));
   }
 }
 

@@ -6,15 +6,40 @@
 #include <cstdio>
 #include <map>
 #include <nlohmann/json.hpp>
+#include <sstream>
 #include <string>
 #include <vector>
 
 #include "host/host_platform.h"
 #include "host/temporary_root.h"
+#include "report/daily_report.h"
+#include "tools/frame/output.h"
 #include "tools/frame/tool.h"
 #include "tools/frame/tool_log.h"
 
 namespace tally::tools {
+
+inline const std::string kPreferences = "device/var/mobile/Library/Preferences/",
+                         kDescription = "device/device/device.plist",
+                         kSpool = "device/var/mobile/Library/Logs/Submission/";
+
+// The element of a property list; a text that begins with "<" is an element as it is.
+inline std::string element(const Json& value) {
+  std::string text;
+  if (value.is_object()) {
+    for (const auto& [key, part] : value.items()) text += "<key>" + key + "</key>" + element(part);
+    return "<dict>" + text + "</dict>";
+  }
+  if (value.is_array()) {
+    for (const auto& part : value) text += element(part);
+    return "<array>" + text + "</array>";
+  }
+  if (value.is_boolean()) return value.get<bool>() ? "<true/>" : "<false/>";
+  if (value.is_number_integer()) return "<integer>" + value.dump() + "</integer>";
+  if (value.is_number()) return "<real>" + value.dump() + "</real>";
+  text = value.get<std::string>();
+  return text.starts_with('<') ? text : "<string>" + text + "</string>";
+}
 
 class ToolTest : public TemporaryRoot {
  protected:
@@ -53,13 +78,21 @@ class ToolTest : public TemporaryRoot {
     return makeHostPlatform(folder, {makeToolLog(err), /*readOnlyPreferences=*/true});
   }
 
-  void putWhitelist(const std::string& groups) {
-    putPlist("device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist",
-             "<dict>" + groups + "</dict>");
+  // The content is JSON, from which the property list is made.
+  void putList(const std::string& path, std::string_view json) const {
+    putPlist(path, element(Json::parse(json)));
+  }
+  void putWhitelist(std::string_view json) const {
+    putList("device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist", json);
   }
   void putRows(const std::string& rows) {
     put("rows.csv", rows);
     ASSERT_EQ(run({"store", "import", at("rows.csv")}).status, kSuccess);
+  }
+  // What the daily job does for the day.
+  void submit(std::int32_t day) const {
+    const PlatformScope scope(makeLinuxPlatform(at("device"), {log, false}));
+    writeDailyLog(platform(), day, nullptr);
   }
   // Every file of the device with its content.
   std::map<std::string, std::string> tree() const {
@@ -74,17 +107,24 @@ class ToolTest : public TemporaryRoot {
   Terminal terminal{80, false, false, true}, errorTerminal;
 };
 
-// A part of a whitelist: a dictionary under a key.
-inline std::string dict(const std::string& key, const std::string& content) {
-  return "<key>" + key + "</key><dict>" + content + "</dict>";
+inline std::vector<std::string> split(const std::string& text, char separator) {
+  std::vector<std::string> parts;
+  std::istringstream stream(text);
+  for (std::string part; std::getline(stream, part, separator);) parts.push_back(part);
+  return parts;
 }
-inline std::string integer(const std::string& key, const std::string& value) {
-  return "<key>" + key + "</key><integer>" + value + "</integer>";
+// For Pointwise: each text begins with the one that is wanted.
+MATCHER(Begins, "") { return std::get<0>(arg).starts_with(std::get<1>(arg)); }
+inline void expectParts(const std::string& text, const std::vector<std::string>& parts) {
+  for (const std::string& part : parts) EXPECT_THAT(text, testing::HasSubstr(part));
 }
-inline std::string intervals(const std::vector<std::string>& boundaries) {
-  std::string text = "<key>intervals</key><array>";
-  for (const std::string& boundary : boundaries) text += "<real>" + boundary + "</real>";
-  return text + "</array>";
+// The values, in JSON, are found by JSON pointers.
+inline void expectValues(const nlohmann::json& document, std::string_view values) {
+  const auto wanted = nlohmann::json::parse(values);
+  for (const auto& [pointer, value] : wanted.items()) {
+    const nlohmann::json::json_pointer place(pointer);
+    EXPECT_EQ(document.contains(place) ? document.at(place) : "absent", value) << pointer;
+  }
 }
 
 }  // namespace tally::tools
