@@ -60,10 +60,7 @@ const Json kHub = {{"Class", "HwReportHub"}, {"Hub", Json::object()}};
 class ChannelCommands : public ToolTest {
  protected:
   void describe(const std::vector<Json>& entries) const {
-    putPlist("device/device/registry.plist", element({{"Entries", entries}}));
-  }
-  Outcome channels(const std::vector<std::string>& arguments) {
-    return runUnder({"channels"}, arguments);
+    putPlist(kRegistry, element({{"Entries", entries}}));
   }
   // What is read from the sample of a device, by the names of channels.
   static nlohmann::json byName(const Outcome& outcome) {
@@ -99,7 +96,7 @@ TEST_F(ChannelCommands, FiltersChooseAndCombine) {
     EXPECT_EQ(outcome.status, *c.names != '\0' ? kSuccess : kWrong);
     EXPECT_EQ(outcome.err.empty(), *c.names != '\0');
   }
-  EXPECT_EQ(channels({"list", "--category", "0"}).status, kBadUsage) << "not all of them";
+  EXPECT_EQ(run({"channels", "list", "--category", "0"}).status, kBadUsage) << "not all of them";
 }
 
 TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
@@ -109,17 +106,21 @@ TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
     const char* values;
   } cases[] = {
       {{"sample", "--json"},
-       R"({"/count/value": 10, "/lanes/values": [1, 2, 3, 4, 5], "/power/states/0":
-           {"id": "0x49444c45", "name": "IDLE", "entries": 3, "residency": 1000, "share": 0.25, "current": false}, "/latency/buckets/1":
-           {"lower": 10, "upper": 20, "hits": 2, "sum": 30, "minimum": null, "maximum": null}})"},
+       R"({"/count/value": 10, "/lanes/values": [1, 2, 3, 4, 5],
+           "/power/states/0": {"id": "0x49444c45", "name": "IDLE", "entries": 3,
+                               "residency": 1000, "share": 0.25, "current": false},
+           "/latency/buckets/1": {"lower": 10, "upper": 20, "hits": 2, "sum": 30,
+                                  "minimum": null, "maximum": null}})"},
       {{"sample", "--json", "--delta", "0.01"},
-       R"({"/count/value": -3, "/lanes/values": [1, 2, 3, 4, 5], "/power/states/0":
-           {"id": "0x49444c45", "name": "IDLE", "entries": 2, "residency": 1500, "share": 0.75, "current": true}, "/latency/buckets/1":
-           {"lower": 10, "upper": 20, "hits": 4, "sum": 60, "minimum": null, "maximum": null}})"},
+       R"({"/count/value": -3, "/lanes/values": [1, 2, 3, 4, 5],
+           "/power/states/0": {"id": "0x49444c45", "name": "IDLE", "entries": 2,
+                               "residency": 1500, "share": 0.75, "current": true},
+           "/latency/buckets/1": {"lower": 10, "upper": 20, "hits": 4, "sum": 60,
+                                  "minimum": null, "maximum": null}})"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.arguments.back());
-    const Outcome outcome = channels(c.arguments);
+    const Outcome outcome = runUnder({"channels"}, c.arguments);
     ASSERT_EQ(outcome.status, kSuccess) << outcome.err;
     expectValues(byName(outcome), c.values);
   }
@@ -127,8 +128,7 @@ TEST_F(ChannelCommands, SamplesEveryFormatAndItsDifference) {
 
 TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
   describe({kHub, goodDriver()});
-  const Outcome outcome = channels({"sample"});
-  EXPECT_EQ(outcome.out,
+  EXPECT_EQ(run({"channels", "sample"}).out,
             "\ngood <id 0x101>\n"
             " A\n"
             "  count  10  events\n"
@@ -171,7 +171,7 @@ TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
   for (const auto& c : cases) {
     SCOPED_TRACE(c.message);
     describe(c.entries);
-    const Outcome outcome = channels(c.arguments);
+    const Outcome outcome = runUnder({"channels"}, c.arguments);
     EXPECT_EQ(outcome.status, kWrong);
     EXPECT_THAT(outcome.err, HasSubstr(c.message));
     EXPECT_EQ(outcome.out.find("latency") != std::string::npos, c.showsGood);

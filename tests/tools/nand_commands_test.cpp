@@ -85,7 +85,6 @@ TEST_F(NandCommands, HealthDecidesTheStatus) {
     EXPECT_EQ(json.status, c.status);
     EXPECT_EQ(json.out.empty(), c.records.empty());
   }
-  EXPECT_EQ(runOn({"wealth"}, {}).status, kBadUsage);
 }
 
 TEST_F(NandCommands, EventsAreShownAndNotSent) {
@@ -118,12 +117,10 @@ class NandListCommandsTest : public NandToolTest {
                               {"manufacturer-id", KvString::create("x")},
                               {"num-bus", KvNumber::int32(2)}});
   }
-  void serveTelemetry(std::size_t modes, std::size_t bytes = 2 * 4128) {
-    for (std::size_t mode = 0; mode < modes; ++mode) {
-      Bytes list(bytes);
-      list[4] = std::byte{42};  // the second counter of the first bus
-      storage.registry->serveNext(list);
-    }
+  void serveTelemetry(std::size_t modes) {
+    Bytes list(2 * 4128);
+    list[4] = std::byte{42};  // the second counter of the first bus
+    for (std::size_t mode = 0; mode < modes; ++mode) storage.registry->serveNext(list);
   }
   const Bytes statistics =
       fakes::statisticsBuffer({{53, {1}}, {20, {180}}, {50, {256}}, {49, {16384}}, {4, {102400}}});
@@ -161,20 +158,17 @@ TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
     double sinceLast, threshold;
     bool written;
   } cases[] = {{700000, 1.5, true}, {600000, 1.5, false}, {700000, 5, false}};
+  const auto serve = [this] {
+    storage.registry->replies.clear();
+    for (const Bytes& list : {statistics, validity, statistics}) storage.registry->serveNext(list);
+    serveTelemetry(3);
+    storage.registry->serveNext(defects);
+  };
   for (const auto& c : cases) {
-    const auto serve = [this] {
-      storage.registry->replies.clear();
-      for (const Bytes& list : {statistics, validity, statistics}) {
-        storage.registry->serveNext(list);
-      }
-      serveTelemetry(3);
-      storage.registry->serveNext(defects);
-    };
     auto& preferences = *storage.platform.preferences;
     preferences.put("SSLastLoggedAt", KvDate::create(storage.platform.clock->now - c.sinceLast),
                     "vellum.tallyd.tallyrun");
     preferences.put("userWAmp", KvNumber::float64(c.threshold), "vellum.NANDInfo");
-    const auto before = preferences.values;
     storage.platform.calls->clear();
     serve();
     const Outcome text = nand({"storage-log", "--preview"});
@@ -185,12 +179,7 @@ TEST_F(NandListCommandsTest, ThePreviewOfTheLogChangesNothing) {
     EXPECT_EQ(preview["wouldBeWritten"], c.written);
     EXPECT_EQ(preview["structuredRecords"], 3 * 2 + 2);
     EXPECT_THAT(preview["text"].get<std::string>(), HasSubstr("ValidityList[3]:70,71\n"));
-    EXPECT_TRUE(storage.platform.calls->empty());
-    EXPECT_TRUE(std::equal(preferences.values.begin(), preferences.values.end(), before.begin(),
-                           before.end(), [](const auto& now, const auto& then) {
-                             return now.first == then.first &&
-                                    kvEqual(now.second.get(), then.second.get());
-                           }));
+    EXPECT_TRUE(storage.platform.calls->empty()) << "every change of a preference is recorded";
     EXPECT_TRUE(storage.platform.logSubmission->logs.empty());
   }
 }
@@ -218,17 +207,15 @@ TEST_F(SnapshotCommand, ShowsRecordsOfBothLayouts) {
   EXPECT_EQ(cut.status, kSuccess);
   EXPECT_THAT(cut.err, HasSubstr("does not end with a whole record"));
 
-  const auto word = [](std::uint32_t value) {
-    return std::string(reinterpret_cast<const char*>(&value), sizeof value);
+  const auto words = [](std::initializer_list<std::uint32_t> values) {
+    return std::string(reinterpret_cast<const char*>(values.begin()), 4 * values.size());
   };
   const auto block = [&](const std::string& label) {
-    std::string bytes = word(0) + word(6) + word(4) + word(3) + word(0) + word(0) + word(36) +
-                        word(0) + std::string("\x1b]\0\0", 4) + word(1) + word(0) + word(0) +
-                        word(0) + word(4) + label;
+    std::string bytes = words({0, 6, 4, 3, 0, 0, 36, 0, 0x5d1b, 1, 0, 0, 0, 4}) + label;
     bytes.resize(36 + 8 + 28);
     return bytes;
   };
-  const std::string records = file("records", word(5) + word(77));
+  const std::string records = file("records", words({5, 77}));
   const std::string good = file("good", block("T=%04u")), bad = file("bad", block("T=%n"));
   const Outcome described = show({records, "--header", good});
   EXPECT_EQ(described.status, kSuccess);

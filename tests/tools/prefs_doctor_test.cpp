@@ -83,11 +83,7 @@ class DoctorCommand : public ToolTest {
 };
 
 TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
-  const std::string today = std::to_string(std::time(nullptr) / 86400), rows = "rows.csv",
-                    whitelist =
-                        "device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist",
-                    store = "device/var/mobile/Library/Tallybook/TBDataStore.sqlitedb",
-                    registry = "device/device/registry.plist";
+  const std::string today = std::to_string(std::time(nullptr) / 86400), rows = "rows.csv";
   const auto lastDay = [](const std::string& day) {
     return R"({"LastCrashLogSerializationDateInDaysSince1970": )" + day + "}";
   };
@@ -98,21 +94,21 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
   } cases[] = {
       {"device root", "", "", "wrong: "},
       {"device root", "device/file", "", "ok: "},
-      {"whitelist", whitelist, R"({"G": true})", "wrong: 1 fault"},
-      {"whitelist", whitelist, R"({"G": {"ScalarKeys": {"a": {}}}})", "ok: 0"},
+      {"whitelist", kWhitelist, R"({"G": true})", "wrong: 1 fault"},
+      {"whitelist", kWhitelist, R"({"G": {"ScalarKeys": {"a": {}}}})", "ok: 0"},
       {"whitelist", kPreferences + "vellum.da.plist", R"({"G": false})",
        "ok: 0 faults, 1 surprise|missing: the group G is disabled by tasking"},
       {"metrics store", rows, "scalar,a," + today + ",,1\ndistribution,d,20000,1,1\n",
        "ok: 1 scalar, 1 distribution, up to "},
       {"metrics store", rows, "scalar,a,999999,,1\n", "ok: |wrong: it has days"},
-      {"metrics store", store, "no database at all", "wrong: "},
+      {"metrics store", kStore, "no database at all", "wrong: "},
       {"preferences", kOwnDomain, "damaged", "wrong: preferences vellum.tallyd.tallyrun"},
       {"preferences", kOwnDomain, "{}", "ok: 2 domains"},
       {"preferences", kOwnDomain + ".damaged-1", "x",
        "ok: 2 domains|wrong: 1 damaged file set aside"},
       {"flash storage", "", "", "missing: no driver"},
       {"statistics", "", "", "missing: 0 channels, no hub"},
-      {"flash storage", registry,
+      {"flash storage", kRegistry,
        R"({"Entries": [{"Class": "SPXStorage"}, {"Class": "HwReportHub"}]})",
        "wrong: driver SPXStorage cannot be opened: error 0xe00002c7"},
       {"last day", "", "", "missing: "},

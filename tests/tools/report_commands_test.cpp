@@ -58,7 +58,8 @@ TEST_F(ReportCommands, APreviewIsTheNextLogAndLeavesNoTrace) {
   EXPECT_EQ(timeless(document), timeless(shown["document"]));
   EXPECT_EQ(preview.json()["options"], shown["options"]);
   expectValues(shown, R"({"/standardDeviations/d": 2.0, "/document/TBScalars": {"a": 20, "b": 5,
-      "vellum.sysmetra.tlyd.database.corruptions": 3, "vellum.usage.cur_boot_session_cpu_uptime": 120}})");
+      "vellum.sysmetra.tlyd.database.corruptions": 3,
+      "vellum.usage.cur_boot_session_cpu_uptime": 120}})");
   EXPECT_NE(tree(), before);  // so that the comparison above could have failed
 }
 

@@ -6,8 +6,6 @@ namespace {
 
 using testing::HasSubstr;
 
-constexpr const char* kStore = "var/mobile/Library/Tallybook/TBDataStore.sqlitedb";
-
 class StoreCommands : public ToolTest {
  protected:
   Platform makePlatform(const std::string&, std::FILE*) override {
@@ -68,8 +66,7 @@ TEST_F(StoreCommands, ImportKeepsTheGoodLinesAndNamesTheBadOnes) {
       EXPECT_THAT(outcome.err, HasSubstr("line " + c.bad.substr(0, 1) + ": "));
       EXPECT_THAT(document["firstRejected"][0]["reason"], HasSubstr(c.reason));
     }
-    EXPECT_EQ(std::filesystem::exists(at(std::string("device/") + kStore)),
-              c.scalars + c.samples > 0);
+    EXPECT_EQ(exists(kStore), c.scalars + c.samples > 0);
   }
 }
 
@@ -109,24 +106,23 @@ TEST_F(StoreCommands, ADumpCanBeImportedAgain) {
 
 TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
   const struct {
-    std::vector<std::string> arguments;
+    const char* arguments;
     int status;
     std::string row;  // of the dump
   } cases[] = {
-      {{"set", "a", "-5"}, kSuccess, "scalar,a,20000,,-5\n"},
-      {{"set", "a", "6", "--day", "-7"}, kSuccess, "scalar,a,-7,,6\n"},
-      {{"push", "d", "nan", "1", "--day", "3", "--offset", "9"},
-       kSuccess,
+      {"set a -5", kSuccess, "scalar,a,20000,,-5\n"},
+      {"set a 6 --day -7", kSuccess, "scalar,a,-7,,6\n"},
+      {"push d nan 1 --day 3 --offset 9", kSuccess,
        "distribution,d,3,9,nan\ndistribution,d,3,9,1\n"},
-      {{"set", "a", "1.5"}, kBadUsage, ""},
-      {{"set", "a", "1", "--day", "x"}, kBadUsage, ""},
-      {{"push", "d", "much"}, kBadUsage, ""},
-      {{"push", "d", "1", "--offset", "86400"}, kBadUsage, ""},
+      {"set a 1.5", kBadUsage, ""},
+      {"set a 1 --day x", kBadUsage, ""},
+      {"push d much", kBadUsage, ""},
+      {"push d 1 --offset 86400", kBadUsage, ""},
   };
   for (const auto& c : cases) {
     forget();
-    const Outcome outcome = runUnder({"store"}, c.arguments);
-    EXPECT_EQ(outcome.status, c.status) << testing::PrintToString(c.arguments);
+    const Outcome outcome = runUnder({"store"}, split(c.arguments, ' '));
+    EXPECT_EQ(outcome.status, c.status) << c.arguments;
     EXPECT_EQ(outcome.err.empty(), c.status == kSuccess) << outcome.err;
     EXPECT_EQ(dump(), "kind,key,day,offset,value\n" + c.row);
   }

@@ -1,6 +1,4 @@
 // tallyctl tasking and send, as far as no bus is needed.
-#include <array>
-
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -9,10 +7,10 @@ namespace {
 using testing::ElementsAre;
 using testing::HasSubstr;
 
-Json tasking(const std::string& id, const std::vector<std::array<const char*, 3>>& entries) {
+Json tasking(const std::string& id, const std::vector<Json>& entries) {
   auto payload = Json::array();
-  for (const auto& [user, domain, key] : entries) {
-    payload.push_back({{"User", user}, {"Domain", domain}, {"Key", key}, {"Value", "v"}});
+  for (const Json& one : entries) {
+    payload.push_back({{"User", one[0]}, {"Domain", one[1]}, {"Key", one[2]}, {"Value", "v"}});
   }
   return {{"TaskingID", id}, {"TaskingDigest", "d"}, {"TaskingPayload", payload}};
 }

@@ -21,6 +21,10 @@ namespace tally::tools {
 
 inline const std::string kPreferences = "device/var/mobile/Library/Preferences/",
                          kDescription = "device/device/device.plist",
+                         kRegistry = "device/device/registry.plist",
+                         kWhitelist =
+                             "device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist",
+                         kStore = "device/var/mobile/Library/Tallybook/TBDataStore.sqlitedb",
                          kSpool = "device/var/mobile/Library/Logs/Submission/";
 
 // The element of a property list; a text that begins with "<" is an element as it is.
@@ -82,9 +86,7 @@ class ToolTest : public TemporaryRoot {
   void putList(const std::string& path, std::string_view json) const {
     putPlist(path, element(Json::parse(json)));
   }
-  void putWhitelist(std::string_view json) const {
-    putList("device/Library/Application Support/Tallybook/Whitelist_Nimbus.plist", json);
-  }
+  void putWhitelist(std::string_view json) const { putList(kWhitelist, json); }
   void putRows(const std::string& rows) {
     put("rows.csv", rows);
     ASSERT_EQ(run({"store", "import", at("rows.csv")}).status, kSuccess);

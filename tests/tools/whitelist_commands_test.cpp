@@ -38,9 +38,9 @@ TEST_F(WhitelistCommands, CheckFindsFaultsAndSurprises) {
       {R"({"G": []})", {"fault /G: not a dictionary"}},
       {R"({"G": {"ScalarKey": {"a": {}}, "ScalarKeys": true}})",
        {"fault /G/ScalarKey: no section", "fault /G/ScalarKeys: not a dictionary"}},
-      {R"({"G": {"ScalarKeys": {"a": {"sig_fig": -1}, "b": {"sigfigs": 2}, "c": {"bucket_interval": 0},
-           "d": {"sig_fig": 0}, "e": {"sig_fig": 19}, "f": {"sig_fig": 2, "bucket_interval": 5},
-           "g": {"intervals": [1]}}}})",
+      {R"({"G": {"ScalarKeys": {"a": {"sig_fig": -1}, "b": {"sigfigs": 2},
+           "c": {"bucket_interval": 0}, "d": {"sig_fig": 0}, "e": {"sig_fig": 19},
+           "f": {"sig_fig": 2, "bucket_interval": 5}, "g": {"intervals": [1]}}}})",
        {"fault /G/ScalarKeys/a/sig_fig: not a whole number",
         "fault /G/ScalarKeys/b/sigfigs: no option", "fault /G/ScalarKeys/c/bucket_interval: a step",
         "surprise /G/ScalarKeys/d/sig_fig: no figure",
@@ -107,10 +107,12 @@ TEST_F(WhitelistCommands, TestNamesTheEntryThatDecides) {
       {"n.y", kSuccess,
        R"({"/scalar/reported": true, "/distribution/reported": false, "/scalar/group": "A",
            "/scalar/reason": "the group A lists the prefix n.", "/scalar/otherEntries": []})"},
-      {"n.d", kSuccess, R"({"/scalar/reported": true, "/distribution/reported": true})"},
-      {"N.x", kWrong, R"({"/scalar/reported": false, "/distribution/reported": false,
-           "/scalar/group": "absent", "/scalar/reason": "it is not listed"})"},
-      {"secret", kWrong, R"({"/scalar/reported": false, "/scalar/group": "absent", "/scalar/reason":
+      {"n.d", kSuccess, R"({"/scalar/group": "A", "/distribution/reported": true})"},
+      {"N.x", kWrong,
+       R"({"/scalar/reported": false, "/distribution/reported": false, "/scalar/group":
+           "absent", "/scalar/reason": "it is not listed", "/scalar/otherEntries": []})"},
+      {"secret", kWrong, R"({"/scalar/reported": false, "/scalar/group": "absent",
+           "/scalar/otherEntries/0/group": "InternalTesting", "/scalar/reason":
            "named only by the group InternalTesting, which is for internal devices only"})"},
   };
   for (const auto& c : cases) {
