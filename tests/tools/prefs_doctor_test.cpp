@@ -16,23 +16,19 @@ TEST_F(PrefsCommands, ValuesKeepTheirTypes) {
   putList("list.plist", R"([{"n": "<data>AP8=</data>"}])");
   const struct {
     std::vector<std::string> value;
-    const char* type;
-    nlohmann::json read;
-    const char* stored;
+    const char *values, *stored;
   } cases[] = {
-      {{"true"}, "boolean", true, "<true/>"},
-      {{"-12"}, "integer", -12, "<integer>-12</integer>"},
-      {{"9223372036854775808"}, "real", 9223372036854775808.0, "<real>"},
-      {{"12 apples"}, "string", "12 apples", "<string>12 apples</string>"},
-      {{"12", "--type", "string"}, "string", "12", "<string>12</string>"},
-      {{"--file", at("list.plist")}, "array", {{{"n", "AP8="}}}, "<data>"},
+      {{"true"}, R"({"/type": "boolean", "/value": true})", "<true/>"},
+      {{"-12"}, R"({"/type": "integer", "/value": -12})", "<integer>-12</integer>"},
+      {{"9223372036854775808"}, R"({"/type": "real", "/value": 9223372036854775808})", "<real>"},
+      {{"12 apples"}, R"({"/type": "string"})", "<string>12 apples</string>"},
+      {{"12", "--type", "string"}, R"({"/value": "12"})", "<string>12</string>"},
+      {{"--file", at("list.plist")}, R"({"/type": "array", "/value": [{"n": "AP8="}]})", "<data>"},
   };
   for (const auto& c : cases) {
     SCOPED_TRACE(c.stored);
     EXPECT_EQ(runUnder({"prefs", "set", "k"}, c.value).status, kSuccess);
-    const auto json = run({"prefs", "get", "k", "--json"}).json();
-    EXPECT_EQ(json["type"], c.type);
-    EXPECT_EQ(json["value"], c.read);
+    expectValues(run({"prefs", "get", "k", "--json"}).json(), c.values);
     EXPECT_THAT(get(kOwnDomain), HasSubstr(c.stored));
   }
 }
@@ -117,10 +113,11 @@ TEST_F(DoctorCommand, FindsWhatIsMissingAndWhatIsWrong) {
       {"device description", kDescription,
        R"({"RegionCode": true, "Kernelvalues": {}, "Notes": "x", "SystemID": 1,
            "AnalyticsEvents": {"Wanted": "x", "Absnt": true}})",
-       "ok: 5 entries|wrong: RegionCode is a boolean, not a string, and is ignored|wrong: "
-       "Kernelvalues is not known; KernelValues may be meant|wrong: SystemID is a number, not a "
-       "string|wrong: AnalyticsEvents.Wanted is a string, not an array|wrong: "
-       "AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"},
+       "ok: 5 entries|wrong: RegionCode is a boolean, not a string, and is ignored|"
+       "wrong: Kernelvalues is not known; KernelValues may be meant|"
+       "wrong: SystemID is a number, not a string|"
+       "wrong: AnalyticsEvents.Wanted is a string, not an array|"
+       "wrong: AnalyticsEvents.Absnt is not known; AnalyticsEvents.Absent may be meant"},
       {"crash support", kDescription, R"({"CrashSupport": {"Absent": true}})",
        "missing: the library is missing"},
   };

@@ -107,7 +107,8 @@ TEST_F(WhitelistCommands, TestNamesTheEntryThatDecides) {
       {"n.y", kSuccess,
        R"({"/scalar/reported": true, "/distribution/reported": false, "/scalar/group": "A",
            "/scalar/reason": "the group A lists the prefix n.", "/scalar/otherEntries": []})"},
-      {"n.d", kSuccess, R"({"/scalar/group": "A", "/distribution/reported": true})"},
+      {"n.d", kSuccess, R"({"/scalar/group": "A", "/distribution/reported": true,
+           "/scalar/otherEntries": []})"},
       {"N.x", kWrong,
        R"({"/scalar/reported": false, "/distribution/reported": false, "/scalar/group":
            "absent", "/scalar/reason": "it is not listed", "/scalar/otherEntries": []})"},
