@@ -3,6 +3,7 @@
 
 #include "fakes/fake_storage.h"
 #include "fuzz.h"
+#include "storage/freezer.h"
 #include "storage/kcdata.h"
 
 using namespace tally;

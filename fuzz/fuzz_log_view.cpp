@@ -29,7 +29,9 @@ class Screen {
     const std::string_view text(text_, size_);
     require(isValidUtf8(text), "what is shown is UTF-8");
     require(std::all_of(text.begin(), text.end(),
-                        [](char c) { return c == '\n' || (c & 0x60) != 0 || c < 0; }),
+                        [](char c) {
+                          return c == '\n' || (c & 0x60) != 0 || static_cast<signed char>(c) < 0;
+                        }),
             "what is shown holds no control characters");
     std::free(text_);
   }

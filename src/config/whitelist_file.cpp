@@ -3,8 +3,8 @@
 #include <md5.h>
 
 #include <algorithm>
-#include <iterator>
 
+#include "base/hex.h"
 #include "config/internal_device.h"
 #include "config/whitelist_options.h"
 #include "kv/plist_codec.h"
@@ -23,7 +23,7 @@ std::string md5Text(std::string_view bytes) {
   std::uint8_t digest[MD5_DIGEST_LENGTH];
   MD5Final(digest, &context);
   std::string text;
-  for (const std::uint8_t byte : digest) fmt::format_to(std::back_inserter(text), "{:02x}", byte);
+  for (const std::uint8_t byte : digest) appendHex(text, byte, 2);
   return text;
 }
 

@@ -1,11 +1,11 @@
 #include "driver/app_info_listener.h"
 
-#include <fmt/format.h>
+#include <fmt/core.h>
 
-#include <iterator>
 #include <span>
 #include <string>
 
+#include "base/hex.h"
 #include "base/result.h"
 
 namespace tally {
@@ -28,7 +28,7 @@ std::string uuidText(std::span<const std::byte> bytes) {
   text.reserve(36);
   for (std::size_t i = 0; i < bytes.size(); ++i) {
     if (i == 4 || i == 6 || i == 8 || i == 10) text += '-';
-    fmt::format_to(std::back_inserter(text), "{:02X}", std::to_integer<unsigned>(bytes[i]));
+    appendHex(text, std::to_integer<unsigned>(bytes[i]), 2, kUpperHexDigits);
   }
   return text;
 }

@@ -356,7 +356,6 @@ struct FakeLogHeaderFacts final : LogHeaderFacts {
   std::int32_t processIdentifier() override { return 321; }
 };
 
-// One fake of each service.
 struct FakePlatform {
   std::shared_ptr<CallLog> calls = std::make_shared<CallLog>();
   std::shared_ptr<FakeSystemLog> log = std::make_shared<FakeSystemLog>();

@@ -69,8 +69,7 @@ const Scenario kScenarios[] = {
 // With fewer, the calls of the whole day would not be intercepted at all.
 constexpr long kFewestCalls = 20;
 
-// Of one day.
-constexpr std::size_t kStorageRecords = 9;
+constexpr std::size_t kStorageRecordsOfADay = 9;
 
 std::size_t countIn(std::string_view text, std::string_view part) {
   std::size_t count = 0;
@@ -133,7 +132,6 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     return days;
   }
 
-  // At any moment.
   void checkNothingIsDamaged() const {
     for (const std::string& path : device->files("")) {
       if (path.find("/Preferences/") == std::string::npos) continue;
@@ -206,7 +204,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     if (scenario.hasStore) {
       EXPECT_TRUE(loggedDays().contains(day - 1));
     }
-    checkStructuredData(kStorageRecords);
+    checkStructuredData(kStorageRecordsOfADay);
     checkStore(day);
     checkTasking(tasking);
   }
@@ -252,22 +250,20 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     EXPECT_EQ(damaged, "");
   }
 
-  // The number of a folder's newest log.
-  std::uint64_t lastLog(const char* folder) const {
+  std::uint64_t newestLogNumber(const char* folder) const {
     const auto logs = listSequenced(*Directory::open(device->at(folder)));
     return logs->empty() ? 0 : logs->back().sequence;
   }
 
-  // What was there before a run.
-  struct Before {
+  struct BeforeRun {
     std::size_t events;
     std::uint64_t lastLog, lastStructuredData;
   };
 
   // After a power cut.
-  void checkAcknowledged(const Acknowledged& done, const Before& before) const {
+  void checkAcknowledged(const Acknowledged& done, const BeforeRun& before) const {
     EXPECT_GE(wholeEvents(), before.events + done.events);
-    EXPECT_GE(lastLog(kSpool), before.lastLog + done.logs);
+    EXPECT_GE(newestLogNumber(kSpool), before.lastLog + done.logs);
     if (done.records > 0) checkStructuredData(done.records, before.lastStructuredData);
     if (done.swept) checkStore(scenario.day);
     if (done.tasked) checkTasking("present");
@@ -304,7 +300,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     }
   }
 
-  void checkEnding(const Ending& ending, const Before& before) const {
+  void checkEnding(const Ending& ending, const BeforeRun& before) const {
     ASSERT_TRUE(ending.sound) << testing::PrintToString(ending.errors);
     checkNothingIsDamaged();
     const bool noted = notedDay() == scenario.day - 1;
@@ -327,7 +323,8 @@ class FaultWalk : public testing::TestWithParam<Fault> {
   // False when the walk is at its end.
   bool tryPoint(long point) {
     device->restore(scenario.hasStore);
-    const Before before{wholeEvents(), lastLog(kSpool), lastLog(kStructuredData)};
+    const BeforeRun before{wholeEvents(), newestLogNumber(kSpool),
+                           newestLogNumber(kStructuredData)};
     const Ending ending = device->run(scenario.day, &fault(), point, scenario.folder);
     SCOPED_TRACE("call " + std::to_string(point) + ": " + describeCall() +
                  "; errors: " + testing::PrintToString(ending.errors));
@@ -351,8 +348,7 @@ class FaultWalk : public testing::TestWithParam<Fault> {
     return true;
   }
 
-  // How many points were tried.
-  long walk() {
+  long pointsTried() {
     constexpr int kFailuresShown = 3;
     const long stride = FAULT_STRIDE * fault().stride;
     long tried = 0;
@@ -374,7 +370,7 @@ SampleDevice* FaultWalk::device = nullptr;
 TEST_P(FaultWalk, LeavesNothingThatTheNextRunDoesNotPutRight) {
   for (const Scenario& next : kScenarios) {
     scenario = next;
-    const long calls = walk();
+    const long calls = pointsTried();
     EXPECT_TRUE(*scenario.folder != '\0' || calls >= kFewestCalls) << calls;
   }
 }

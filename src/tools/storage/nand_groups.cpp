@@ -43,6 +43,7 @@ void addFigure(std::vector<NandFigure>& figures, std::string_view name, std::int
 
 std::vector<NandGroup> groupNandInfo(const KvDictionary& info, std::string_view text) {
   std::vector<NandGroup> groups;
+  groups.reserve(std::size(kFigureGroups) + 1);
   for (const FigureGroupTitle& group : kFigureGroups) groups.push_back({group.title, {}});
   for (const auto& [key, value] : info) {
     const auto* number = kvCast<KvNumber>(value.get());
