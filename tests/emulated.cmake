@@ -14,7 +14,7 @@ exec @emulator@ -U LD_PRELOAD @CMAKE_RUNTIME_OUTPUT_DIRECTORY@/@program@ \"$@\"
   file(CHMOD ${emulated}/${program} PERMISSIONS OWNER_READ OWNER_WRITE OWNER_EXECUTE)
 endforeach()
 
-foreach(script test_days test_storage test_tasking same_as_native)
+foreach(script test_days test_storage same_as_native)
   add_test(NAME e2e.${script}
     COMMAND ${Python3_EXECUTABLE} ${CMAKE_CURRENT_SOURCE_DIR}/e2e/${script}.py -v)
   set_tests_properties(e2e.${script} PROPERTIES TIMEOUT 600
