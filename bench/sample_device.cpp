@@ -7,8 +7,8 @@
 #include <cstdio>
 #include <vector>
 
-#include "base/device_root.h"
-#include "base/temporary_file.h"
+#include "base/files/device_root.h"
+#include "base/files/temporary_file.h"
 #include "host/store/store_importer.h"
 #include "kv/plist_codec.h"
 #include "tools/store/store_csv.h"

@@ -1,6 +1,6 @@
 // Interest lists at the statistics hub: parsed, served from drivers of any values, and mapped.
 #include "described_folder.h"
-#include "host/described/statistics_hub.h"
+#include "host/described/described_hub.h"
 #include "platform/protocol/hub_protocol.h"
 
 using namespace tally;
@@ -35,7 +35,7 @@ FUZZ_TARGET(interest_lists)(const std::uint8_t* data, std::size_t size) {
       DeviceDirectory(DeviceRoot("/nonexistent"), ""), std::make_shared<fuzz::UnreadLog>());
 
   RegistryResult result = 0;
-  const auto client = openStatisticsHub(hub, drivers, files, &result);
+  const auto client = openDescribedHub(hub, drivers, files, &result);
   require((client != nullptr) == (result == kRegistrySuccess), "a client or a reason");
   if (client == nullptr) return 0;
   MethodCall start;

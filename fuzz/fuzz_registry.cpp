@@ -1,7 +1,7 @@
 // registry.plist: its entries found, asked and connected to as clients do.
 #include "described_folder.h"
 #include "host/described/registry_description.h"
-#include "host/described/source_registry.h"
+#include "host/registry/source_registry.h"
 
 using namespace tally;
 using fuzz::require;

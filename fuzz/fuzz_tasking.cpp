@@ -1,7 +1,7 @@
 // Taskings: schedules and records of any shape, as a run finds them, and what it plans to write.
 #include <set>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "driver/tasking_plan.h"
 #include "fuzz_values.h"
 #include "kv/plist_codec.h"

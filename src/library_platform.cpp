@@ -7,7 +7,7 @@
 
 #include <fmt/core.h>
 
-#include "host/described/device_platform.h"
+#include "host/devices/device_registry.h"
 #include "host/system/environment.h"
 #include "platform/platform.h"
 

@@ -6,10 +6,10 @@
 #include <set>
 #include <utility>
 
-#include "base/directory.h"
-#include "base/file.h"
+#include "base/files/directory.h"
+#include "base/files/file.h"
+#include "base/files/temporary_file.h"
 #include "base/result.h"
-#include "base/temporary_file.h"
 #include "base/utf8.h"
 #include "kv/plist_codec.h"
 

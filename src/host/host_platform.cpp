@@ -1,6 +1,6 @@
 #include "host/host_platform.h"
 
-#include "host/described/device_platform.h"
+#include "host/devices/device_registry.h"
 
 namespace tally {
 

@@ -8,12 +8,12 @@
 #include <limits>
 
 #include "base/byte_reader.h"
-#include "base/device_root.h"
-#include "base/file.h"
-#include "base/file_lock.h"
+#include "base/files/device_root.h"
+#include "base/files/file.h"
+#include "base/files/file_lock.h"
+#include "base/files/temporary_file.h"
 #include "base/number_text.h"
 #include "base/printable.h"
-#include "base/temporary_file.h"
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "fakes/temporary_folder.h"

@@ -17,9 +17,9 @@
 #include <optional>
 #include <set>
 
-#include "base/directory.h"
-#include "base/file.h"
-#include "base/temporary_file.h"
+#include "base/files/directory.h"
+#include "base/files/file.h"
+#include "base/files/temporary_file.h"
 #include "faults/sample_device.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/structured_data.h"

@@ -15,7 +15,7 @@
 #include <new>
 #include <numeric>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "driver/daily_job.h"
 #include "driver/tasking.h"
 #include "driver/telemetry_sweep.h"

@@ -7,7 +7,7 @@
 #include "fakes/fake_platform.h"
 #include "fakes/temporary_folder.h"
 #include "host/described/registry_description.h"
-#include "host/described/source_registry.h"
+#include "host/registry/source_registry.h"
 
 namespace tally::tests {
 

@@ -10,8 +10,8 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
-#include "base/file.h"
+#include "base/files/device_root.h"
+#include "base/files/file.h"
 #include "fakes/fake_platform.h"
 #include "fakes/temporary_folder.h"
 

@@ -6,7 +6,7 @@
 
 #include <cmath>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "config/whitelist_options.h"
 #include "platform/tables/known_preferences.h"
 #include "platform/tables/measured_metrics.h"

@@ -7,9 +7,9 @@
 
 #include <limits>
 
+#include "base/natural_order.h"
 #include "base/printable.h"
 #include "tools/frame/day_argument.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
 
 namespace tally::tools {

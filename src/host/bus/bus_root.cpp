@@ -10,7 +10,7 @@
 #include <memory>
 #include <optional>
 
-#include "base/file.h"
+#include "base/files/file.h"
 
 namespace tally {
 namespace {

@@ -4,7 +4,7 @@
 #include <cstring>
 #include <limits>
 
-#include "host/described/injected_result.h"
+#include "host/registry/injected_result.h"
 #include "platform/protocol/fetch_request.h"
 
 namespace tally {

@@ -4,7 +4,7 @@
 #include <memory>
 
 #include "host/described/described_files.h"
-#include "host/described/registry_source.h"
+#include "host/registry/registry_source.h"
 
 namespace tally {
 

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "base/file.h"
+#include "base/files/file.h"
 
 namespace tally {
 namespace {

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "kv/value.h"
 #include "platform/system_log.h"
 

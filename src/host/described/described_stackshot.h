@@ -4,7 +4,7 @@
 #include <memory>
 #include <string>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/described/device_description.h"
 #include "platform/stackshot.h"
 

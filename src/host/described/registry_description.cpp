@@ -3,7 +3,7 @@
 #include <set>
 
 #include "host/described/described_driver.h"
-#include "host/described/statistics_hub.h"
+#include "host/described/described_hub.h"
 #include "kv/plist_codec.h"
 #include "platform/protocol/hub_protocol.h"
 
@@ -134,7 +134,7 @@ std::unique_ptr<UserClient> RegistryDescription::open(const RegistryEntry& entry
   *result = kRegistryUnsupported;
   if (type != 0) return nullptr;
   if (described.className == kStatisticsHubClass) {
-    return openStatisticsHub(described.hub, entries(), files_, result);
+    return openDescribedHub(described.hub, entries(), files_, result);
   }
   return described.userClient ? openDescribedDriver(described.userClient, files_, result) : nullptr;
 }

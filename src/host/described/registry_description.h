@@ -5,9 +5,9 @@
 #include <optional>
 #include <string>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/described/described_files.h"
-#include "host/described/registry_source.h"
+#include "host/registry/registry_source.h"
 
 namespace tally {
 

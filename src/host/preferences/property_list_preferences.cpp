@@ -6,8 +6,8 @@
 #include <cerrno>
 #include <utility>
 
-#include "base/file.h"
-#include "base/temporary_file.h"
+#include "base/files/file.h"
+#include "base/files/temporary_file.h"
 #include "kv/plist_codec.h"
 
 namespace tally {

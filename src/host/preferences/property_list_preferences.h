@@ -9,8 +9,8 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
-#include "base/file_lock.h"
+#include "base/files/device_root.h"
+#include "base/files/file_lock.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "base/file_lock.h"
+#include "base/files/file_lock.h"
 #include "base/time_text.h"
 #include "host/spool/log_spool.h"
 #include "host/spool/waiting_logs.h"

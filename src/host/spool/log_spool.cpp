@@ -5,9 +5,9 @@
 #include <algorithm>
 #include <cerrno>
 
-#include "base/file.h"
-#include "base/file_lock.h"
-#include "base/temporary_file.h"
+#include "base/files/file.h"
+#include "base/files/file_lock.h"
+#include "base/files/temporary_file.h"
 #include "host/spool/waiting_logs.h"
 #include "kv/plist_codec.h"
 #include "platform/tables/known_preferences.h"

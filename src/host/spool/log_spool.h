@@ -8,7 +8,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/submission_consent.h"
 #include "platform/clock.h"

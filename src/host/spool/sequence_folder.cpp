@@ -9,9 +9,9 @@
 #include <cstring>
 #include <map>
 
-#include "base/file.h"
+#include "base/files/file.h"
+#include "base/files/temporary_file.h"
 #include "base/number_text.h"
-#include "base/temporary_file.h"
 
 namespace tally {
 namespace {

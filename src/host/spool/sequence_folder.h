@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "platform/system_log.h"
 #include "platform/tables/known_preferences.h"
 

@@ -6,7 +6,7 @@
 #include <set>
 #include <string>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/described/device_description.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"

@@ -3,8 +3,8 @@
 #include <cerrno>
 #include <optional>
 
-#include "base/file_lock.h"
-#include "base/temporary_file.h"
+#include "base/files/file_lock.h"
+#include "base/files/temporary_file.h"
 #include "host/spool/sequence_folder.h"
 
 namespace tally {

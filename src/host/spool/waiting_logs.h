@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string_view>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 
 namespace tally {
 

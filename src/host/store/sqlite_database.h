@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-#include "base/directory.h"
+#include "base/files/directory.h"
 #include "base/result.h"
 
 struct sqlite3;

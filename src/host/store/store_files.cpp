@@ -14,7 +14,7 @@
 #include <optional>
 #include <utility>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/number_text.h"
 
 namespace tally {

@@ -4,7 +4,7 @@
 #include <string>
 #include <string_view>
 
-#include "base/directory.h"
+#include "base/files/directory.h"
 
 namespace tally {
 

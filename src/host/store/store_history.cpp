@@ -6,7 +6,7 @@
 #include <optional>
 #include <utility>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "host/store/sample_chunk.h"
 #include "host/store/store_rows.h"
 #include "host/store/store_schema.h"

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/store/sqlite_database.h"
 
 namespace tally {

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/described/device_description.h"
 #include "platform/applications.h"
 

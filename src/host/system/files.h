@@ -1,7 +1,7 @@
 // Files of the device, below its root.
 #pragma once
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "platform/files.h"
 
 namespace tally {

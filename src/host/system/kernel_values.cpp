@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/number_text.h"
 #include "base/text_lines.h"
 #include "platform/tables/measured_metrics.h"

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cctype>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 
 namespace tally {
 namespace {

@@ -7,7 +7,7 @@
 
 #include <random>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/printable.h"
 #include "base/text_lines.h"
 

@@ -6,8 +6,8 @@
 #include <optional>
 #include <string>
 
-#include "base/device_root.h"
-#include "base/file_lock.h"
+#include "base/files/device_root.h"
+#include "base/files/file_lock.h"
 #include "platform/run_lock.h"
 #include "platform/system_log.h"
 

@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <limits>
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "host/described/described_entries.h"
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"

@@ -6,7 +6,7 @@
 #include <optional>
 #include <vector>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/hex.h"
 #include "driver/app_info_listener.h"
 #include "kv/plist_codec.h"

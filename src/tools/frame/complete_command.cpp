@@ -5,6 +5,7 @@
 #include <memory>
 #include <set>
 
+#include "base/natural_order.h"
 #include "base/printable.h"
 #include "base/time_text.h"
 #include "host/linux_platform.h"
@@ -16,7 +17,6 @@
 #include "tools/frame/command.h"
 #include "tools/frame/command_help.h"
 #include "tools/frame/command_line.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
 #include "tools/report/daily_log.h"
 

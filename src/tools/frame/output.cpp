@@ -5,12 +5,12 @@
 #include <cstdlib>
 #include <nlohmann/json.hpp>
 
+#include "base/natural_order.h"
 #include "base/number_text.h"
 #include "base/printable.h"
 #include "base/time_text.h"
 #include "base/utf8.h"
 #include "kv/base64.h"
-#include "tools/frame/natural_order.h"
 
 namespace tally::tools {
 namespace {

@@ -6,9 +6,10 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 
-#include "base/file.h"
+#include "base/files/file.h"
+#include "base/files/temporary_file.h"
+#include "base/natural_order.h"
 #include "base/number_text.h"
-#include "base/temporary_file.h"
 #include "base/utf8.h"
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"
@@ -16,7 +17,6 @@
 #include "platform/platform.h"
 #include "platform/tables/known_preferences.h"
 #include "tools/frame/command.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"
 

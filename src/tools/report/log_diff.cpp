@@ -5,8 +5,8 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 
+#include "base/natural_order.h"
 #include "base/number_text.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
 #include "tools/report/log_view.h"
 

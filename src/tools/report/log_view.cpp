@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <nlohmann/json.hpp>
 
+#include "base/natural_order.h"
 #include "base/printable.h"
 #include "base/time_text.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/table.h"
 
 namespace tally::tools {

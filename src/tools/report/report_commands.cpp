@@ -3,7 +3,7 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/text_lines.h"
 #include "base/time_text.h"
 #include "base/utf8.h"

@@ -6,7 +6,7 @@
 #include <optional>
 #include <vector>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/text_lines.h"
 #include "base/utf8.h"
 #include "storage/snapshot.h"

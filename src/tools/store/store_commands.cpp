@@ -7,7 +7,8 @@
 #include <optional>
 #include <vector>
 
-#include "base/file.h"
+#include "base/files/file.h"
+#include "base/natural_order.h"
 #include "base/number_text.h"
 #include "base/time_text.h"
 #include "host/linux_platform.h"
@@ -15,7 +16,6 @@
 #include "host/store/store_writer.h"
 #include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
-#include "tools/frame/natural_order.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
 #include "tools/store/store_csv.h"

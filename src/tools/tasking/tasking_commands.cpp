@@ -4,7 +4,7 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "driver/tasking.h"
 #include "host/linux_platform.h"
 #include "kv/plist_codec.h"

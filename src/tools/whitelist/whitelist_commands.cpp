@@ -5,7 +5,7 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "kv/plist_codec.h"
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"

@@ -1,4 +1,4 @@
-#include "base/directory.h"
+#include "base/files/directory.h"
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -13,7 +13,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "base/file.h"
+#include "base/files/file.h"
 
 namespace tally {
 namespace {

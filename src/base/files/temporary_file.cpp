@@ -1,4 +1,4 @@
-#include "base/temporary_file.h"
+#include "base/files/temporary_file.h"
 
 #include <fcntl.h>
 #include <unistd.h>

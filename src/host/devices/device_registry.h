@@ -1,7 +1,7 @@
 // The device registry of a device root.
 #pragma once
 
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 #include "platform/platform.h"
 
 namespace tally {

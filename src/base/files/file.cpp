@@ -1,4 +1,4 @@
-#include "base/file.h"
+#include "base/files/file.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

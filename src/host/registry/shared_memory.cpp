@@ -1,4 +1,4 @@
-#include "host/described/shared_memory.h"
+#include "host/registry/shared_memory.h"
 
 #include <sys/mman.h>
 #include <unistd.h>

@@ -1,7 +1,7 @@
-#include "host/described/device_platform.h"
+#include "host/devices/device_registry.h"
 
 #include "host/described/registry_description.h"
-#include "host/described/source_registry.h"
+#include "host/registry/source_registry.h"
 
 namespace tally {
 

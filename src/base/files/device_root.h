@@ -6,7 +6,7 @@
 #include <string_view>
 #include <utility>
 
-#include "base/directory.h"
+#include "base/files/directory.h"
 
 namespace tally {
 

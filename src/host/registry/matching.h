@@ -1,7 +1,7 @@
 // Which registry entries a matching dictionary means.
 #pragma once
 
-#include "host/described/registry_source.h"
+#include "host/registry/registry_source.h"
 
 namespace tally {
 

@@ -1,4 +1,4 @@
-#include "host/described/matching.h"
+#include "host/registry/matching.h"
 
 #include <algorithm>
 

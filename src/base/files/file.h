@@ -1,5 +1,5 @@
 // Open files, and files that the caller names: those of the command line, and the kernel's own.
-// Files of the device are reached through directories (base/directory.h).
+// Files of the device are reached through directories (base/files/directory.h).
 #pragma once
 
 #include <cerrno>

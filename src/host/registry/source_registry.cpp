@@ -1,9 +1,9 @@
-#include "host/described/source_registry.h"
+#include "host/registry/source_registry.h"
 
 #include <deque>
 #include <set>
 
-#include "host/described/matching.h"
+#include "host/registry/matching.h"
 
 namespace tally {
 

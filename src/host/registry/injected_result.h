@@ -3,7 +3,7 @@
 
 #include <string_view>
 
-#include "host/described/registry_source.h"
+#include "host/registry/registry_source.h"
 
 namespace tally {
 

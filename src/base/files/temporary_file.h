@@ -5,8 +5,8 @@
 #include <string_view>
 #include <utility>
 
-#include "base/directory.h"
-#include "base/file.h"
+#include "base/files/directory.h"
+#include "base/files/file.h"
 #include "base/result.h"
 
 namespace tally {

@@ -15,7 +15,7 @@
 #include <string_view>
 #include <vector>
 
-#include "base/file.h"
+#include "base/files/file.h"
 #include "base/result.h"
 
 struct stat;

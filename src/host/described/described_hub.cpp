@@ -1,11 +1,11 @@
-#include "host/described/hub_region.h"
+#include "host/described/described_hub.h"
 
 #include <algorithm>
 #include <cstring>
 #include <unordered_map>
 
-#include "base/byte_reader.h"
 #include "host/described/described_frames.h"
+#include "host/registry/statistics_hub.h"
 
 namespace tally {
 namespace {
@@ -130,23 +130,8 @@ ChannelsByID describedChannels(const RegistryEntry& driver, DescribedFiles& file
   return channels;
 }
 
-}  // namespace
-
-std::optional<std::vector<Interest>> parseInterestList(std::span<const std::byte> list) {
-  const ByteReader reader(list);
-  const auto count = reader.read<std::uint32_t>(0);
-  const auto reserved = reader.read<std::uint32_t>(4);
-  if (!count || reserved != 0u || *count == 0 || *count > kMostInterests) return std::nullopt;
-  if (list.size() != kInterestHeaderSize + kInterestSize * *count) return std::nullopt;
-  std::vector<Interest> interests(*count);
-  for (std::size_t i = 0; i < interests.size(); ++i) {
-    const std::size_t offset = kInterestHeaderSize + kInterestSize * i;
-    interests[i] = {*reader.read<std::uint64_t>(offset), *reader.read<std::uint64_t>(offset + 8),
-                    *reader.read<std::uint64_t>(offset + 16)};
-  }
-  return interests;
-}
-
+// The runs of the channels that the drivers describe, in the order of the interests; null when they
+// would take more than 256 MiB.
 std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& interests,
                                              const RegistrySource::Entries& drivers,
                                              DescribedFiles& files) {
@@ -170,6 +155,7 @@ std::unique_ptr<HubRegion> makeChannelRegion(const std::vector<Interest>& intere
   return std::make_unique<ChannelRegion>(std::move(channels));
 }
 
+// Frames that are served unchanged, whatever is wanted; null when there are no bytes.
 std::unique_ptr<HubRegion> makeRawRegion(const KvArray& frames, DescribedFiles& files) {
   std::vector<std::vector<std::byte>> regions;
   for (const auto& frame : frames) {
@@ -180,6 +166,21 @@ std::unique_ptr<HubRegion> makeRawRegion(const KvArray& frames, DescribedFiles& 
     return nullptr;
   }
   return std::make_unique<RawRegion>(std::move(regions));
+}
+
+}  // namespace
+
+std::unique_ptr<UserClient> openDescribedHub(KvRef<KvDictionary> description,
+                                             std::shared_ptr<const RegistrySource::Entries> drivers,
+                                             std::shared_ptr<DescribedFiles> files,
+                                             RegistryResult* result) {
+  const auto makeRegion = [description, drivers = std::move(drivers),
+                           files = std::move(files)](const std::vector<Interest>& interests) {
+    const auto* raw = description ? description->getAs<KvArray>("RawFrames") : nullptr;
+    return raw != nullptr ? makeRawRegion(*raw, *files)
+                          : makeChannelRegion(interests, *drivers, *files);
+  };
+  return openStatisticsHub(makeRegion, description, result);
 }
 
 }  // namespace tally

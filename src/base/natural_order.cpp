@@ -1,8 +1,8 @@
-#include "tools/frame/natural_order.h"
+#include "base/natural_order.h"
 
 #include <algorithm>
 
-namespace tally::tools {
+namespace tally {
 namespace {
 
 bool isDigit(char c) { return c >= '0' && c <= '9'; }
@@ -37,4 +37,4 @@ bool naturalLess(std::string_view a, std::string_view b) {
   return a < b;
 }
 
-}  // namespace tally::tools
+}  // namespace tally

@@ -1,4 +1,4 @@
-#include "base/device_root.h"
+#include "base/files/device_root.h"
 
 #include <cerrno>
 #include <deque>

@@ -8,7 +8,7 @@
 #include <variant>
 #include <vector>
 
-#include "host/described/registry_source.h"
+#include "host/registry/registry_source.h"
 
 namespace tally {
 
