@@ -123,7 +123,7 @@ int recordChannel(StoreBatch& batch, KvDictionary* channel) {
   return HwIterContinue;
 }
 
-void sweepChannels(StoreBatch& batch) {
+void sweepChannels(DailyCounters& counters, StoreBatch& batch) {
   const auto channels = HwReportCopyChannelsInCategories(kSweptCategories, kHwReportByDriver);
   if (!channels) return;
   HwReportPrune(channels.get(), [](KvDictionary* channel) {
@@ -136,6 +136,7 @@ void sweepChannels(StoreBatch& batch) {
   if (samples) {
     HwReportIterate(samples.get(),
                     [&batch](KvDictionary* channel) { return recordChannel(batch, channel); });
+    counters.commitSweep();
   }
 }
 
@@ -147,7 +148,7 @@ void runTelemetrySweep(Platform& platform) {
   DumpStorageStructuredLog(*KvBoolean::of(false));
   sweepStorage(*platform.log, batch);
   forwardEccEvents(platform);
-  sweepChannels(batch);
+  sweepChannels(*platform.dailyCounters, batch);
 }
 
 }  // namespace tally

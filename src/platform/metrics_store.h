@@ -6,9 +6,11 @@
 #include <functional>
 #include <memory>
 #include <string_view>
+#include <vector>
 
 #include "base/time_text.h"
 #include "kv/value.h"
+#include "platform/counter_state.h"
 
 namespace tally {
 
@@ -59,7 +61,11 @@ class MetricsStore {
   // Sets the scalar for the day in progress; a store that does not exist yet is created. A failure
   // is logged.
   virtual void TBClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
-  // Scalars set between these two are one transaction.
+  // All counters that are kept; none when the store cannot be read, which is logged.
+  virtual std::vector<CounterState> counterStates() { return {}; }
+  // Keeps a counter, in the order of the scalars.
+  virtual void setCounterState(const CounterState&) {}
+  // Scalars and counters set between these two are one transaction.
   virtual void beginBatch() = 0;
   virtual void endBatch() = 0;
   // The history of the store on its default path. Never null: a store that is missing has no rows,

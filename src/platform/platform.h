@@ -13,6 +13,7 @@
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
 #include "platform/crash_support_library.h"
+#include "platform/daily_counters.h"
 #include "platform/device_information.h"
 #include "platform/device_registry.h"
 #include "platform/event_loop.h"
@@ -61,6 +62,7 @@ struct Platform {
   std::shared_ptr<Locale> locale;
   std::shared_ptr<KernelValues> kernelValues;
   std::shared_ptr<DeviceRegistry> deviceRegistry;
+  std::shared_ptr<DailyCounters> dailyCounters = std::make_shared<DailyCounters>();
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<LogHeaderFacts> logHeaderFacts;

@@ -1,14 +1,35 @@
 #include "host/devices/device_registry.h"
 
 #include "host/described/registry_description.h"
+#include "host/devices/undescribed_source.h"
+#include "host/kernel/kernel_statistics.h"
 #include "host/registry/source_registry.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
+namespace {
+
+// A device that describes channels has those alone.
+bool hasChannels(const RegistryEntry& entry) {
+  return entry.className == kStatisticsHubClass ||
+         entry.properties->get(kLegendPublicProperty) != nullptr;
+}
+
+}  // namespace
 
 void addDeviceRegistry(Platform& services, const DeviceRoot& root) {
+  auto described =
+      std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log);
+  KernelDevice device{std::make_shared<SystemTree>(root), services.log, nullptr};
+  if (services.metricsStore) {
+    device.days = std::make_shared<DailyAmounts>(services.metricsStore, services.clock);
+    services.dailyCounters = device.days;
+  }
+  auto kernel = std::make_unique<UndescribedSource>(
+      std::make_unique<KernelStatistics>(std::move(device)), *described, hasChannels);
   std::vector<std::unique_ptr<RegistrySource>> sources;
-  sources.push_back(
-      std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log));
+  sources.push_back(std::move(described));
+  sources.push_back(std::move(kernel));
   services.deviceRegistry = std::make_shared<SourceRegistry>(std::move(sources));
 }
 

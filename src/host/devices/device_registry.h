@@ -6,7 +6,8 @@
 
 namespace tally {
 
-// Adds the registry to a platform that has a log.
+// Adds the registry to a platform that has a log, and the daily amounts of counters to one that
+// also has a store and a clock.
 void addDeviceRegistry(Platform& services, const DeviceRoot& root);
 
 }  // namespace tally

@@ -9,6 +9,7 @@
 #include <fmt/core.h>
 
 #include "base/time_text.h"
+#include "host/store/store_counters.h"
 #include "host/store/store_history.h"
 #include "host/store/store_retention.h"
 #include "host/store/store_writer.h"
@@ -41,6 +42,15 @@ class SqliteMetricsStore final : public MetricsStore {
     }
     // Kept in memory until the batch ends, so that others need not wait while its values are read.
     batch_.push_back({TBDaysSince1970(), std::string(key), value});
+    if (batchDepth_ == 0) writeBatch();
+  }
+  std::vector<CounterState> counterStates() override {
+    auto states = readCounterStates(file_);
+    if (!states) report(states.error());
+    return states ? *std::move(states) : std::vector<CounterState>();
+  }
+  void setCounterState(const CounterState& state) override {
+    counters_.push_back(state);
     if (batchDepth_ == 0) writeBatch();
   }
   void beginBatch() override { ++batchDepth_; }
@@ -146,13 +156,17 @@ class SqliteMetricsStore final : public MetricsStore {
 
   void writeBatch() {
     const auto scalars = std::exchange(batch_, {});
-    if (scalars.empty()) return;
+    const auto counters = std::exchange(counters_, {});
+    if (scalars.empty() && counters.empty()) return;
     const auto opened = writer(IfMissing::Create);
     if (!opened) return report(opened.error());
     report(transaction(**opened, [&]() -> Status {
       for (const Scalar& scalar : scalars) {
         auto set = (*opened)->setScalar(scalar.day, scalar.key, scalar.value);
         if (!set) return set;
+      }
+      for (const CounterState& counter : counters) {
+        if (auto set = (*opened)->setCounter(counter); !set) return set;
       }
       return Done{};
     }));
@@ -164,6 +178,7 @@ class SqliteMetricsStore final : public MetricsStore {
   std::uint64_t maximumBytes_;
   std::optional<StoreWriter> writer_;
   std::vector<Scalar> batch_;
+  std::vector<CounterState> counters_;  // of the batch too
   int batchDepth_ = 0;
 };
 

@@ -36,6 +36,12 @@ constexpr TableDefinition kTables[] = {
     {"chunks", kSampleColumns},
     {"recent", kSampleColumns},
 };
+// Tables that are made when they are first written.
+constexpr TableDefinition kOptionalTables[] = {
+    {kCountersTable, R"sql((
+  key TEXT NOT NULL PRIMARY KEY, epoch TEXT NOT NULL, last INTEGER NOT NULL, sum INTEGER NOT NULL,
+  day INTEGER NOT NULL, amount INTEGER) WITHOUT ROWID)sql"},
+};
 // Tables that SQLite itself adds for its query planner on request. They are harmless.
 constexpr TableDefinition kStatistics[] = {
     {"sqlite_stat1", "(tbl,idx,stat)"},
@@ -56,7 +62,8 @@ Status checkTables(Database& database) {
     };
     if (std::ranges::any_of(kTables, isRow)) {
       ++ours;
-    } else if (!std::ranges::any_of(kStatistics, isRow)) {
+    } else if (!std::ranges::any_of(kStatistics, isRow) &&
+               !std::ranges::any_of(kOptionalTables, isRow)) {
       ++others;
     }
   }
@@ -144,6 +151,22 @@ Status makeTables(Database& database) {
 }
 
 }  // namespace
+
+Result<bool> hasTable(Database& database, std::string_view name) {
+  auto query = database.prepare("SELECT 1 FROM sqlite_schema WHERE type = 'table' AND name = ?");
+  if (!query) return query.error();
+  const Step step = query->bind(1, name).step();
+  if (step == Step::Failed) return database.error();
+  return step == Step::Row;
+}
+
+Status makeOptionalTable(Database& database, std::string_view name) {
+  const auto exists = hasTable(database, name);
+  if (!exists) return exists.error();
+  if (*exists) return Done{};
+  const auto* const table = std::ranges::find(kOptionalTables, name, &TableDefinition::name);
+  return database.execute(table->text().c_str());
+}
 
 StoreFile metricsStoreFile(const DeviceRoot& root) {
   constexpr std::size_t kNameStart = kStorePath.rfind('/') + 1;

@@ -27,6 +27,12 @@ bool isStoreKey(std::string_view key);
 constexpr std::string_view kStoreKeyRule =
     "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
 
+// Tables that a store may lack until something is kept in them.
+constexpr std::string_view kCountersTable = "counters";
+Result<bool> hasTable(Database& database, std::string_view name);
+// Makes one of them if it is missing. REQUIRES: a transaction of a writer.
+Status makeOptionalTable(Database& database, std::string_view name);
+
 // Opens the store in its present state: later commits of others are not seen. Nothing is created.
 // Empty when there is no store yet; an error when there is something else in its place, or a store
 // of a newer version of the program.

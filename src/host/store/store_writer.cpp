@@ -245,6 +245,26 @@ Status StoreWriter::forget(std::string_view which, std::int32_t day) {
   return Done{};
 }
 
+Status StoreWriter::setCounter(const CounterState& state) {
+  if (auto checked = checkKey(state.key); !checked) return checked;
+  if (!setCounter_) {
+    if (auto made = makeOptionalTable(database_, kCountersTable); !made) return made;
+    auto prepared =
+        database_.prepare("INSERT OR REPLACE INTO counters VALUES(?, ?, ?, ?, ?, iif(?, ?, NULL))");
+    if (!prepared) return prepared.error();
+    setCounter_ = std::move(*prepared);
+  }
+  const bool kept = setCounter_->bind(1, state.key)
+                        .bind(2, state.epoch)
+                        .bind(3, static_cast<std::int64_t>(state.last))
+                        .bind(4, static_cast<std::int64_t>(state.sum))
+                        .bind(5, std::int64_t{state.day})
+                        .bind(6, std::int64_t{state.amount.has_value()})
+                        .bind(7, state.amount.value_or(0))
+                        .run();
+  return kept ? Status(Done{}) : Status(database_.error());
+}
+
 Status StoreWriter::forgetBefore(std::int32_t day) { return forget("< ?1", day); }
 
 Status StoreWriter::forgetDay(std::int32_t day) { return forget("= ?1", day); }

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "host/store/store_schema.h"
+#include "platform/counter_state.h"
 
 namespace tally {
 
@@ -38,6 +39,8 @@ class StoreWriter {
   Status foldRecent();
   // The same until the time is up, but for one row at least. False when there may be more.
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
+  // Keeps the state of a counter.
+  Status setCounter(const CounterState& state);
   Status forgetBefore(std::int32_t day);
   Status forgetDay(std::int32_t day);
 
@@ -61,6 +64,7 @@ class StoreWriter {
 
   Database database_;
   Statements statements_;
+  std::optional<Statement> setCounter_;
 };
 
 }  // namespace tally

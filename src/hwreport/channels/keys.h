@@ -12,16 +12,16 @@ struct ChannelKeys {
   KvRef<KvString> driverID = KvString::create("DriverID");
   KvRef<KvString> driverName = KvString::create("DriverName");
   KvRef<KvString> legendChannel = KvString::create("LegendChannel");
-  KvRef<KvString> group = KvString::create("HwReportGroupName");
-  KvRef<KvString> subGroup = KvString::create("HwReportSubGroupName");
-  KvRef<KvString> channelInfo = KvString::create("HwReportChannelInfo");
+  KvRef<KvString> group = KvString::create(kLegendGroupName);
+  KvRef<KvString> subGroup = KvString::create(kLegendSubGroupName);
+  KvRef<KvString> channelInfo = KvString::create(kLegendChannelInfo);
   KvRef<KvString> channelName = KvString::create("ChannelName");
   KvRef<KvString> unitLabel = KvString::create("UnitLabel");
   KvRef<KvString> rawElements = KvString::create("RawElements");
   KvRef<KvString> stateNames = KvString::create("StateNames");
   KvRef<KvString> processedConfig = KvString::create("ProcessedChannelConfig");
   // Channel information.
-  KvRef<KvString> channelUnit = KvString::create("HwReportChannelUnit");
+  KvRef<KvString> channelUnit = KvString::create(kLegendChannelUnit);
   KvRef<KvString> channelConfig = KvString::create("HwReportChannelConfig");
   // A collection.
   KvRef<KvString> queryOptions = KvString::create("QueryOpts");

@@ -14,8 +14,19 @@ constexpr std::string_view kStatisticsHubClass = "HwReportHub";
 // each channel is an array.
 constexpr std::string_view kLegendPublicProperty = "HwReportLegendPublic";
 constexpr std::string_view kLegendProperty = "HwReportLegend";
+constexpr std::string_view kLegendGroupName = "HwReportGroupName";
+constexpr std::string_view kLegendSubGroupName = "HwReportSubGroupName";
+constexpr std::string_view kLegendChannelInfo = "HwReportChannelInfo";
+constexpr std::string_view kLegendChannelUnit = "HwReportChannelUnit";
 constexpr std::string_view kLegendChannelsKey = "HwReportChannels";
 constexpr std::size_t kLegendChannelID = 0, kLegendTypeWord = 1, kLegendChannelName = 2;
+// Our own: what a source knows of a channel beyond what the library reads, a dictionary.
+constexpr std::size_t kLegendDetails = 3;
+constexpr std::string_view kDetailSemantics = "Semantics";      // "counter", "gauge", "state"
+constexpr std::string_view kDetailScope = "Scope";              // "boot", "creation", "lifetime"
+constexpr std::string_view kDetailWidth = "Width";              // bits of a counter; 0: not known
+constexpr std::string_view kDetailFile = "File";                // where it is read, "*" the device
+constexpr std::string_view kDetailDescription = "Description";  // one line
 
 // Methods of a connection to the hub.
 enum HubMethod : std::uint32_t { kHubOpen = 0, kHubConfigureInterests = 2, kHubUpdate = 3 };

@@ -67,13 +67,14 @@ class CountedCrashReporting final : public CrashReporting {
 }  // namespace
 
 // Whoever adds a service decides here whether it has effects that a dry run must keep back.
-static_assert(sizeof(Platform) == 24 * sizeof(std::shared_ptr<void>));
+static_assert(sizeof(Platform) == 25 * sizeof(std::shared_ptr<void>));
 
 Platform DryRun::variantOf(const Platform& platform) {
   Platform variant = platform;
   variant.preferences = std::make_shared<OverlayPreferences>(variant.preferences);
   variant.logSubmission = std::make_shared<KeptSubmission>(*this);
   variant.crashReporting = std::make_shared<CountedCrashReporting>(*this, variant.crashReporting);
+  variant.dailyCounters = std::make_shared<DailyCounters>();
   return variant;
 }
 

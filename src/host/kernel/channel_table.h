@@ -1,0 +1,70 @@
+// The statistics channels of the kernel: the one table from which legends, the sweep, the recorder,
+// `tallyctl channels list --verbose` and the table of docs/linux.md are made.
+#pragma once
+
+#include <algorithm>
+#include <iterator>
+#include <span>
+#include <string_view>
+
+#include "host/kernel/channel_row.h"
+
+namespace tally {
+
+namespace channel_table {
+
+using enum KernelSource;
+using namespace unit;
+constexpr auto kSimple = ChannelFormat::Simple;
+constexpr auto kState = ChannelFormat::State;
+constexpr auto kArray = ChannelFormat::Array;
+constexpr auto kCounter = Semantics::Counter;
+constexpr auto kGauge = Semantics::Gauge;
+constexpr auto kStates = Semantics::State;
+constexpr auto kBoot = CounterScope::Boot;
+constexpr auto kCreation = CounterScope::Creation;
+constexpr auto kLifetime = CounterScope::Lifetime;
+
+// The rows of a source are next to each other. Of a file with several values they are in the order
+// of its fields.
+// clang-format off
+constexpr ChannelRow kRows[] = {
+{Disk, "reads", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.reads", "reads that were completed"},
+{Disk, "merged-reads", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "", "reads that were merged with others"},
+{Disk, "read", kKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.read", "data that was read"},
+{Disk, "read-time", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "", "time that reads took, added up"},
+{Disk, "writes", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.writes", "writes that were completed"},
+{Disk, "merged-writes", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "", "writes that were merged with others"},
+{Disk, "written", kKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.written", "data that was written"},
+{Disk, "write-time", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "", "time that writes took, added up"},
+{Disk, "in-flight", kNone, kSimple, kGauge, kCreation, 0, "/sys/block/*/stat", "", "operations under way"},
+{Disk, "busy", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "disk#.busy", "time with an operation under way"},
+{Disk, "queue-time", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "", "time that operations took, added up"},
+{Disk, "discards", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "", "discards that were completed"},
+{Disk, "merged-discards", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "", "discards that were merged with others"},
+{Disk, "discarded", kKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.discarded", "data that was discarded"},
+{Disk, "discard-time", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "", "time that discards took, added up"},
+{Disk, "flushes", kEvents, kSimple, kCounter, kCreation, 64, "/sys/block/*/stat", "disk#.flushes", "flushes of the write cache"},
+{Disk, "flush-time", kMilliseconds, kSimple, kCounter, kCreation, 32, "/sys/block/*/stat", "", "time that flushes took, added up"},
+
+{Pressure, "cpu.some", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/cpu", "pressure.cpu.some", "time in which a task waited for a processor"},
+{Pressure, "memory.some", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/memory", "pressure.memory.some", "time in which a task waited for memory"},
+{Pressure, "memory.full", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/memory", "pressure.memory.full", "time in which every task waited for memory"},
+{Pressure, "io.some", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/io", "pressure.io.some", "time in which a task waited for storage"},
+{Pressure, "io.full", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/io", "pressure.io.full", "time in which every task waited for storage"},
+{Pressure, "irq.full", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/irq", "pressure.irq.full", "time in which every task waited for interrupts"},
+};
+// clang-format on
+
+}  // namespace channel_table
+
+constexpr std::span<const ChannelRow> kChannelTable = channel_table::kRows;
+
+constexpr std::span<const ChannelRow> rowsOf(KernelSource source) {
+  const auto first = std::ranges::find(kChannelTable, source, &ChannelRow::source);
+  const auto last = std::find_if(first, kChannelTable.end(),
+                                 [&](const ChannelRow& row) { return row.source != source; });
+  return {first, last};
+}
+
+}  // namespace tally

@@ -1,0 +1,65 @@
+// By how much counters rose between the first sweeps of two days.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/clock.h"
+#include "platform/counter_state.h"
+#include "platform/daily_counters.h"
+#include "platform/metrics_store.h"
+
+namespace tally {
+
+// A counter as it was just read.
+struct CounterReading {
+  std::uint64_t value = 0;
+  // As long as it is the same, the counter goes on: the boot, or the device that it belongs to.
+  std::string_view epoch;
+  std::uint8_t width = 64;
+};
+
+// How much a counter rose since its state was kept. Where it started again, what it counts since
+// then is all that is known.
+std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading);
+
+// The state after a reading on a day: the day's amount is fixed by its first reading.
+CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today);
+
+// One thread at a time.
+class DailyAmounts final : public DailyCounters {
+ public:
+  DailyAmounts(std::shared_ptr<MetricsStore> store, std::shared_ptr<const Clock> clock)
+      : store_(std::move(store)), clock_(std::move(clock)) {}
+
+  // Begins a sample of counters: what was kept is read again, what was read before is forgotten.
+  void beginSample();
+  // The amount of the day in progress; empty on the day on which the counter is first seen. What is
+  // kept does not change before commitSweep() or accumulate().
+  std::optional<std::int64_t> amount(const std::string& key, const CounterReading& reading);
+  double secondsSince1970() const { return clock_->secondsSince1970(); }
+
+  void commitSweep() override;
+  void accumulate() override;
+
+ private:
+  struct LastReading {
+    std::uint64_t value;
+    std::string epoch;
+    std::uint8_t width;
+    CounterReading reading() const { return {value, epoch, width}; }
+  };
+  const CounterState* kept(const std::string& key) const;
+
+  std::shared_ptr<MetricsStore> store_;
+  std::shared_ptr<const Clock> clock_;
+  std::int32_t today_ = 0;
+  std::map<std::string, CounterState, std::less<>> kept_;
+  std::map<std::string, LastReading, std::less<>> read_;
+};
+
+}  // namespace tally

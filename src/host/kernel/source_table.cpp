@@ -1,0 +1,24 @@
+#include "host/kernel/source_table.h"
+
+#include <algorithm>
+
+#include "host/kernel/sources/disk.h"
+#include "host/kernel/sources/pressure.h"
+
+namespace tally {
+namespace {
+
+constexpr SourceRow kSources[] = {
+    {KernelSource::Disk, "disk", "Disks", findDisks},
+    {KernelSource::Pressure, "pressure", "Pressure", findPressure},
+};
+
+}  // namespace
+
+std::span<const SourceRow> sourceTable() { return kSources; }
+
+const SourceRow& sourceRow(KernelSource source) {
+  return *std::ranges::find(kSources, source, &SourceRow::source);
+}
+
+}  // namespace tally

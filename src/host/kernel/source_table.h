@@ -1,0 +1,25 @@
+// The sources of the kernel's statistics: which there are, and how their devices are found.
+#pragma once
+
+#include <span>
+#include <string_view>
+
+#include "host/kernel/channel_row.h"
+#include "host/kernel/findings.h"
+#include "host/tree/system_tree.h"
+
+namespace tally {
+
+struct SourceRow {
+  KernelSource source;
+  std::string_view name;   // of its driver, and the front of its channels' names
+  std::string_view title;  // of its channels' group
+  // Adds what there is on the device now.
+  void (*find)(const SystemTree& tree, Findings& findings);
+};
+
+// Those that share a name are next to each other.
+std::span<const SourceRow> sourceTable();
+const SourceRow& sourceRow(KernelSource source);
+
+}  // namespace tally
