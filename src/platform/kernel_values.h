@@ -22,6 +22,8 @@ class KernelValues {
   // does not fit.
   virtual int readKernelValue(std::string_view name, std::span<std::byte> buffer,
                               std::size_t* length) = 0;
+  // Whether this kind of device has the value, though a read of it may fail.
+  virtual bool hasKernelValue(std::string_view) { return true; }
   // Ticks since boot; they stop while the device sleeps.
   virtual std::uint64_t MonotonicTicks() = 0;
   // Empty when it cannot be read.

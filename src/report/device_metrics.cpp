@@ -52,8 +52,10 @@ std::optional<std::uint64_t> readKernelNumber(KernelValues& kernel, std::string_
   return value.read<std::uint64_t>(0);
 }
 
-// A value that cannot be read is recorded as all ones in its width.
-std::int64_t measureKernelValue(KernelValues& kernel, const MeasuredMetric& metric) {
+// A value that cannot be read is recorded as all ones in its width; one that this kind of device
+// does not have is not recorded.
+Measured measureKernelValue(KernelValues& kernel, const MeasuredMetric& metric) {
+  if (!kernel.hasKernelValue(metric.kernelValue)) return std::nullopt;
   const std::uint64_t failed = metric.width == 4 ? UINT32_MAX : UINT64_MAX;
   return static_cast<std::int64_t>(
       readKernelNumber(kernel, metric.kernelValue, metric.width).value_or(failed));

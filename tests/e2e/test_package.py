@@ -52,6 +52,7 @@ class Package(unittest.TestCase):
         # The programs' manual pages are lintian's.
         wanted = ["Library/Preferences", TIMER_LINK, *(f"usr/{path}" for path in (
             "bin/tallyctl", "lib/systemd/system/tallyrun.service", "lib/systemd/system/tallyrun-day.timer",
+            "lib/systemd/system/tallyrun-counters.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
             "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",

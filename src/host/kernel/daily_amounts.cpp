@@ -74,7 +74,8 @@ void DailyAmounts::commitSweep() {
   }
 }
 
-void DailyAmounts::accumulate() {
+std::size_t DailyAmounts::accumulate() {
+  std::size_t count = 0;
   for (const auto& [key, last] : read_) {
     const CounterState* const state = kept(key);
     if (state == nullptr) continue;
@@ -83,7 +84,9 @@ void DailyAmounts::accumulate() {
     next.last = last.value;
     next.epoch = last.epoch;
     store_->setCounterState(next);
+    ++count;
   }
+  return count;
 }
 
 }  // namespace tally

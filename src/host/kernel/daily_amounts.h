@@ -44,7 +44,7 @@ class DailyAmounts final : public DailyCounters {
   double secondsSince1970() const { return clock_->secondsSince1970(); }
 
   void commitSweep() override;
-  void accumulate() override;
+  std::size_t accumulate() override;
 
  private:
   struct LastReading {

@@ -102,6 +102,12 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
   return 0;
 }
 
+// A described device is of a kind that may have any of them.
+bool LinuxKernelValues::hasKernelValue(std::string_view name) {
+  constexpr std::string_view kOfLinux[] = {"vm.swapusage", "kern.bootsessionuuid"};
+  return description_->exists() || std::ranges::find(kOfLinux, name) != std::end(kOfLinux);
+}
+
 // The answer that the description gives; empty when it gives none.
 std::optional<LinuxKernelValues::Answer> LinuxKernelValues::described(std::string_view name) {
   const auto* values = description_->getAs<KvDictionary>(Described::KernelValues);

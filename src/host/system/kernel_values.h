@@ -35,6 +35,7 @@ class LinuxKernelValues final : public KernelValues {
       : description_(std::move(description)) {}
   int readKernelValue(std::string_view name, std::span<std::byte> buffer,
                       std::size_t* length) override;
+  bool hasKernelValue(std::string_view name) override;
   std::uint64_t MonotonicTicks() override;
   std::optional<Timebase> TimebaseInfo() override;
 

@@ -18,6 +18,7 @@
 #include "platform/protocol/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
 #include "tools/channels/channel_view.h"
+#include "tools/channels/keep_command.h"
 #include "tools/frame/command.h"
 #include "tools/frame/output.h"
 
@@ -292,8 +293,9 @@ void addFilters(Command command, ChannelArguments& wanted) {
 }  // namespace
 
 void addChannelCommands(CLI::App& app, ToolContext& context) {
-  CommandGroup<ChannelArguments> channels(
-      addFamily(app, "channels", "Show the statistics channels that drivers publish"), context);
+  CLI::App& family =
+      addFamily(app, "channels", "Show the statistics channels that drivers publish");
+  CommandGroup<ChannelArguments> channels(family, context);
   ChannelArguments& wanted = channels.arguments();
   addFilters(channels.add("list", "List the statistics channels", list), wanted);
   Command command = channels.add(
@@ -303,6 +305,7 @@ void addChannelCommands(CLI::App& app, ToolContext& context) {
       .option("--delta", {"SECONDS", ValueKind::Number}, &wanted.delta,
               "Show what changes in this many seconds")
       .within(0.001, kLongestWait);
+  addKeepCommand(family, context);
 }
 
 }  // namespace tally::tools
