@@ -2,6 +2,7 @@
 
 #include "host/described/registry_description.h"
 #include "host/devices/undescribed_source.h"
+#include "host/kernel/ecc_events.h"
 #include "host/kernel/kernel_statistics.h"
 #include "host/registry/source_registry.h"
 #include "platform/protocol/hub_protocol.h"
@@ -24,6 +25,8 @@ void addDeviceRegistry(Platform& services, const DeviceRoot& root) {
   if (services.metricsStore) {
     device.days = std::make_shared<DailyAmounts>(services.metricsStore, services.clock);
     services.dailyCounters = device.days;
+    services.kernelValues =
+        std::make_shared<EccEvents>(services.kernelValues, device.tree, services.metricsStore);
   }
   auto kernel = std::make_unique<UndescribedSource>(
       std::make_unique<KernelStatistics>(std::move(device)), *described, hasChannels);
