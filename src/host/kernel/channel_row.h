@@ -9,7 +9,25 @@ namespace tally {
 // A kind of file, of which there may be one for each device.
 enum class KernelSource : std::uint8_t {
   Disk,
+  Zram,
+  Network,
   Pressure,
+  Memory,
+  Paging,
+  ProcessorTime,
+  ProcessorIdle,
+  ProcessorFrequency,
+  ProcessorThrottling,
+  Interrupts,
+  SoftInterrupts,
+  ThermalZone,
+  Cooling,
+  Sensor,
+  PowerSupply,
+  WakeupSource,
+  Suspend,
+  MemoryErrors,
+  Time,
 };
 
 // Of a type word.
@@ -18,7 +36,8 @@ enum class ChannelFormat : std::uint8_t { Simple = 1, State = 2, Array = 4 };
 enum class Semantics : std::uint8_t {
   Counter,  // only rises, until it starts again
   Gauge,
-  State,  // what a device is in, or how long it was in each
+  State,            // what a device is in, or how long it was in each
+  UnsteadyCounter,  // may fall back, which does not mean that it started again
 };
 
 // How long a counter keeps its value.
@@ -39,11 +58,16 @@ constexpr std::uint64_t kSeconds = word(1), kMilliseconds = word(1, 0x7C),
 constexpr std::uint64_t kMicrowatts = word(2, 0x79), kMicrojoules = word(3, 0x79);
 constexpr std::uint64_t kMilliamperes = word(4, 0x7C), kMicroamperes = word(4, 0x79);
 constexpr std::uint64_t kMillivolts = word(5, 0x7C), kMicrovolts = word(5, 0x79);
-constexpr std::uint64_t kKilohertz = word(8, 0x82);
-constexpr std::uint64_t kBytes = word(9, 0x8200), kKibibytes = word(9, 0x8C00);
+constexpr std::uint64_t kHertz = word(8), kKilohertz = word(8, 0x82);
+constexpr std::uint64_t kBytes = word(9, 0x8200), kKibibytes = word(9, 0x8C00),
+                        kFourKibibytes = word(9, 0x8C00, 4);
 constexpr std::uint64_t kMillidegrees = word(10, 0x7C), kDegrees = word(10);
 constexpr std::uint64_t kEvents = word(100), kPackets = word(101);
 }  // namespace unit
+
+constexpr bool isCounter(Semantics semantics) {
+  return semantics == Semantics::Counter || semantics == Semantics::UnsteadyCounter;
+}
 
 struct ChannelRow {
   KernelSource source;
@@ -55,9 +79,9 @@ struct ChannelRow {
   CounterScope scope;
   std::uint8_t width;     // bits of the counter; 0: not a counter, or not known
   std::string_view file;  // "*" for the device
-  // The channel of the daily sweep: "#" is the device's ordinal by bus path, without it the
-  // amounts of all devices are added up. Empty: not swept. A counter's is its rise since the day
-  // before.
+  // The channel of the daily sweep. In it "#" is the device's ordinal by bus path and "%" its
+  // kind; the amounts of all channels that come to the same name are added up. Empty: not swept. A
+  // counter's is its rise since the day before.
   std::string_view daily;
   std::string_view description;
 };

@@ -21,6 +21,7 @@ constexpr auto kArray = ChannelFormat::Array;
 constexpr auto kCounter = Semantics::Counter;
 constexpr auto kGauge = Semantics::Gauge;
 constexpr auto kStates = Semantics::State;
+constexpr auto kUnsteady = Semantics::UnsteadyCounter;
 constexpr auto kBoot = CounterScope::Boot;
 constexpr auto kCreation = CounterScope::Creation;
 constexpr auto kLifetime = CounterScope::Lifetime;

@@ -16,11 +16,20 @@ std::uint64_t sumOf(std::uint64_t a, std::uint64_t b) {
   return a > UINT64_MAX - b ? UINT64_MAX : a + b;
 }
 
+// What the next rise of a counter begins at. One that wavers rises above its highest value only.
+std::uint64_t nextLast(const CounterState& kept, const CounterReading& reading) {
+  constexpr std::uint64_t kWavering = 3000;  // an idle time falls by less, unless a processor went
+  const bool wavers = reading.isUnsteady && kept.epoch == reading.epoch &&
+                      reading.value < kept.last && kept.last - reading.value < kWavering;
+  return wavers ? kept.last : reading.value;
+}
+
 }  // namespace
 
 std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading) {
   if (kept.epoch != reading.epoch) return reading.value;
   if (reading.value >= kept.last) return reading.value - kept.last;
+  if (reading.isUnsteady) return 0;
   const std::uint64_t largest = largestOf(reading.width);
   const bool wrapped = reading.width != 0 && kept.last <= largest && kept.last > largest / 4 * 3;
   return wrapped ? largest - kept.last + 1 + reading.value : reading.value;
@@ -37,7 +46,7 @@ CounterState nextState(const CounterState& kept, const CounterReading& reading,
     next.amount.reset();  // the clock was set back: of which days the sum is will not be known
   }
   next.day = today;
-  next.last = reading.value;
+  next.last = nextLast(kept, reading);
   next.epoch = reading.epoch;
   return next;
 }
@@ -59,8 +68,8 @@ const CounterState* DailyAmounts::kept(const std::string& key) const {
 
 std::optional<std::int64_t> DailyAmounts::amount(const std::string& key,
                                                  const CounterReading& reading) {
-  read_.insert_or_assign(key,
-                         LastReading{reading.value, std::string(reading.epoch), reading.width});
+  read_.insert_or_assign(key, LastReading{reading.value, std::string(reading.epoch), reading.width,
+                                          reading.isUnsteady});
   const CounterState* const state = kept(key);
   return state != nullptr ? nextState(*state, reading, today_).amount : std::nullopt;
 }
@@ -81,7 +90,7 @@ std::size_t DailyAmounts::accumulate() {
     if (state == nullptr) continue;
     CounterState next = *state;
     next.sum = sumOf(state->sum, riseOf(*state, last.reading()));
-    next.last = last.value;
+    next.last = nextLast(*state, last.reading());
     next.epoch = last.epoch;
     store_->setCounterState(next);
     ++count;

@@ -21,6 +21,7 @@ struct CounterReading {
   // As long as it is the same, the counter goes on: the boot, or the device that it belongs to.
   std::string_view epoch;
   std::uint8_t width = 64;
+  bool isUnsteady = false;  // a fall does not mean that it started again
 };
 
 // How much a counter rose since its state was kept. Where it started again, what it counts since
@@ -51,7 +52,8 @@ class DailyAmounts final : public DailyCounters {
     std::uint64_t value;
     std::string epoch;
     std::uint8_t width;
-    CounterReading reading() const { return {value, epoch, width}; }
+    bool isUnsteady;
+    CounterReading reading() const { return {value, epoch, width, isUnsteady}; }
   };
   const CounterState* kept(const std::string& key) const;
 

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "host/kernel/channel_row.h"
+#include "host/tree/system_tree.h"
 #include "platform/protocol/hub_protocol.h"
 
 namespace tally {
@@ -29,6 +30,9 @@ struct FileLayout {
 using FileParser = void (*)(std::string_view text, const FileLayout& layout,
                             std::span<std::int64_t> fields);
 
+// No file but the wall clock, in seconds since 1970.
+constexpr std::string_view kClockPath = "clock";
+
 struct FoundFile {
   std::string path;
   KernelSource source;
@@ -36,10 +40,15 @@ struct FoundFile {
   FileLayout layout;
 };
 
+struct FoundField {
+  std::uint32_t file, field;
+};
 // Where the value of a slot comes from.
 struct FoundSlot {
   std::uint32_t file, field;
   std::uint16_t element = 0, slot = 0;
+  // The value is the field's percentage of this one. Only of a simple channel.
+  std::optional<FoundField> percentOf = std::nullopt;
 };
 // A value that is known beforehand: the id of a state.
 struct FoundConstant {
@@ -49,10 +58,11 @@ struct FoundConstant {
 
 // A device of a source.
 struct FoundDevice {
-  std::string name;      // unique among them and the same after each boot; empty: there is just one
-  std::string identity;  // of what lifetime counters belong to, such as a serial number
+  std::string name;  // unique among them and the same after each boot; empty: there is just one
+  std::string identity = {};  // of what lifetime counters belong to, such as a serial number
   // Among those of its class, by bus path; empty: it has no part in the sweep.
   std::optional<unsigned> ordinal = 0;
+  std::string_view kind = {};  // one of a few words that say what it is, for the sweep
 };
 
 struct FoundChannel {
@@ -61,6 +71,7 @@ struct FoundChannel {
   std::uint16_t elements = 1;
   std::vector<FoundSlot> slots;
   std::vector<FoundConstant> constants;
+  std::string item = {};  // which of several of its row the device has: "temp1"
 };
 
 class Findings {
@@ -72,9 +83,18 @@ class Findings {
   // first fields.
   void addSimple(std::span<const ChannelRow> rows, const FoundDevice& device, std::uint32_t file,
                  std::uint32_t firstField = 0);
+  // The same for rows whose files hold one number, for those files that the directory has: a row
+  // names its file at the end of its own path.
+  void addNumbers(const SystemTree& tree, const std::string& directory,
+                  std::span<const ChannelRow> rows, const FoundDevice& device, FileParser parse);
   // A channel whose elements are consecutive fields of a file.
   void addArray(const ChannelRow& row, const FoundDevice& device, std::uint32_t file,
-                std::uint32_t firstField, std::size_t count);
+                std::uint32_t firstField, std::size_t count, std::string item = {});
+
+  // A state channel whose residencies are lines of a file, named like its labels. None if there are
+  // no labels.
+  void addResidencies(const ChannelRow& row, const FoundDevice& device, std::string path,
+                      FileParser parse, FileLayout layout);
 
   const std::vector<FoundFile>& files() const { return files_; }
   const std::vector<FoundChannel>& channels() const { return channels_; }
@@ -87,5 +107,10 @@ class Findings {
 // The state id whose name the library shows: the text's first 8 characters, without those that
 // cannot be shown.
 std::uint64_t stateID(std::string_view name);
+
+// The name of a file within its path.
+constexpr std::string_view fileName(std::string_view path) {
+  return path.substr(path.rfind('/') + 1);
+}
 
 }  // namespace tally

@@ -18,20 +18,29 @@ constexpr std::string_view kDailyName = "day", kDailyTitle = "Since the day befo
 
 std::string nameOf(const FoundChannel& channel) {
   std::string name(sourceRow(channel.row->source).name);
-  for (const std::string_view part : {std::string_view(channel.device.name), channel.row->name}) {
+  for (const std::string_view part :
+       {std::string_view(channel.device.name), std::string_view(channel.item), channel.row->name}) {
     if (!part.empty()) name.append(".").append(part);
   }
   return name;
 }
 
-std::string dailyName(const ChannelRow& row, unsigned ordinal) {
-  std::string name(row.daily);
-  const std::size_t place = name.find('#');
-  return place == std::string::npos ? name : name.replace(place, 1, std::to_string(ordinal));
+std::string dailyName(const ChannelRow& row, const FoundDevice& device) {
+  std::string name;
+  for (const char letter : row.daily) {
+    if (letter == '#') {
+      name += std::to_string(*device.ordinal);
+    } else if (letter == '%') {
+      name += device.kind;
+    } else {
+      name += letter;
+    }
+  }
+  return name;
 }
 
 std::string_view textOf(Semantics semantics) {
-  constexpr std::string_view kTexts[] = {"counter", "gauge", "state"};
+  constexpr std::string_view kTexts[] = {"counter", "gauge", "state", "counter"};
   return kTexts[static_cast<std::size_t>(semantics)];
 }
 
@@ -128,7 +137,7 @@ void KernelChannels::addDaily(std::uint32_t channel) {
   if (row.daily.empty() || !found.device.ordinal) return;
   const bool ofDevice = row.daily.find('#') != std::string_view::npos;
   if (ofDevice && *found.device.ordinal >= kMostSweptDevices) return;
-  std::string name = dailyName(row, *found.device.ordinal);
+  std::string name = dailyName(row, found.device);
   const auto [place, isNew] = dailyByName_.try_emplace(name, daily_.size());
   if (isNew) {
     dailyByID_.emplace(idOf(name), static_cast<std::uint32_t>(daily_.size()));

@@ -4,6 +4,8 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
+#include <chrono>
 #include <cstring>
 
 #include "host/kernel/source_table.h"
@@ -26,6 +28,11 @@ bool isOrdinary(int error) {
   return std::ranges::find(kOrdinary, error) != std::end(kOrdinary);
 }
 
+std::int64_t percentage(std::int64_t value, std::int64_t whole) {
+  if (value < 0 || whole <= 0) return kNoReading;
+  return static_cast<std::int64_t>(100.0 * static_cast<double>(value) / static_cast<double>(whole));
+}
+
 }  // namespace
 
 KernelRegion::KernelRegion(const std::vector<Interest>& interests,
@@ -43,14 +50,17 @@ KernelRegion::KernelRegion(const std::vector<Interest>& interests,
   // A region cannot be empty. The run of nobody's channel takes its place.
   if (elements_ == 0) {
     constexpr std::uint64_t kNobody = element::kMissingValue;
-    served_.push_back({{kNobody, kNobody, 0}, 1, 0, {}, nullptr, {}});
+    served_.push_back({{kNobody, kNobody, 0}, 1, 0, nullptr, {}, {}});
     elements_ = 1;
   }
   std::size_t most = 0;
-  partsOfFile_.resize(files_.size());
+  readingsOfFile_.resize(files_.size());
   for (const File& file : files_) most = std::max(most, file.found->layout.fields());
   for (Channel& channel : served_) {
-    for (Part& part : channel.parts) partsOfFile_[part.file].push_back(&part);
+    for (Part& part : channel.parts) {
+      readingsOfFile_[part.reading.file].push_back(&part.reading);
+      if (part.percentOf) readingsOfFile_[part.percentOf->file].push_back(&*part.percentOf);
+    }
   }
   fields_.resize(most);
   buffer_.resize(kFirstBuffer);
@@ -68,12 +78,16 @@ std::uint32_t KernelRegion::fileOf(std::uint32_t found) {
 
 void KernelRegion::addChannel(const Interest& interest, const FoundChannel& found) {
   const auto number = static_cast<std::uint32_t>(served_.size());
-  Channel channel{interest,        found.elements, elements_ * element::kSize,
-                  found.constants, nullptr,        {}};
+  Channel channel{interest,  found.elements,  elements_ * element::kSize,
+                  found.row, found.constants, {}};
   if (interest.type == 0) {
     channel.interest.type = typeOf(*found.row, kRawCategory, found.elements).bits;
   }
   for (const FoundSlot& slot : found.slots) {
+    if (slot.percentOf) {
+      channel.parts.push_back(partOf(slot));
+      continue;
+    }
     const std::size_t offset =
         channel.offset + slot.element * element::kSize + element::slot(slot.slot);
     files_[fileOf(slot.file)].outputs.push_back(
@@ -83,19 +97,26 @@ void KernelRegion::addChannel(const Interest& interest, const FoundChannel& foun
   served_.push_back(std::move(channel));
 }
 
+KernelRegion::Part KernelRegion::partOf(const FoundSlot& slot) {
+  Part part{{fileOf(slot.file), slot.field}, std::nullopt, {}, {}};
+  if (slot.percentOf) part.percentOf = Reading{fileOf(slot.percentOf->file), slot.percentOf->field};
+  return part;
+}
+
 void KernelRegion::addDailyChannel(const Interest& interest, const DailyChannel& daily) {
-  const bool isCounter = daily.row->semantics == Semantics::Counter;
-  if (isCounter && !device_.days) return;
-  hasDailyCounters_ = hasDailyCounters_ || isCounter;
-  Channel channel{interest, 1, elements_ * element::kSize, {}, &daily, {}};
+  const bool counts = isCounter(daily.row->semantics);
+  if (counts && !device_.days) return;
+  hasDailyCounters_ = hasDailyCounters_ || counts;
+  Channel channel{interest, 1, elements_ * element::kSize, daily.row, {}, {}, true};
   if (interest.type == 0) channel.interest.type = typeOf(*daily.row, kSweptCategory, 1).bits;
   for (const std::uint32_t number : daily.channels) {
     const FoundChannel& found = channels_->findings().channels()[number];
     std::string key = channels_->name(number);
     if (daily.row->scope == CounterScope::Lifetime) key.append("@").append(found.device.identity);
-    const FoundSlot& slot = found.slots.front();
-    channel.parts.push_back(
-        {fileOf(slot.file), slot.field, std::move(key), epochOf(found), kNoReading});
+    Part part = partOf(found.slots.front());
+    part.key = std::move(key);
+    part.epoch = epochOf(found);
+    channel.parts.push_back(std::move(part));
   }
   ++elements_;
   served_.push_back(std::move(channel));
@@ -134,7 +155,18 @@ std::string_view KernelRegion::readOnce(const File& file, int descriptor) {
   }
 }
 
+std::string_view KernelRegion::clockText() {
+  using std::chrono::system_clock;
+  const double now = device_.days
+                         ? device_.days->secondsSince1970()
+                         : static_cast<double>(system_clock::to_time_t(system_clock::now()));
+  const auto written = std::to_chars(buffer_.data(), buffer_.data() + buffer_.size(),
+                                     static_cast<std::int64_t>(now));
+  return {buffer_.data(), written.ptr};
+}
+
 std::string_view KernelRegion::read(File& file) {
+  if (file.found->path == kClockPath) return clockText();
   errno = 0;
   if (file.open) {
     const std::string_view text = readOnce(file, file.open.get());
@@ -176,14 +208,16 @@ void KernelRegion::takeFields(File& file, std::span<std::byte> memory) {
   }
 }
 
-std::int64_t KernelRegion::dailyValue(const Channel& channel) {
+std::int64_t KernelRegion::computed(const Channel& channel) {
   std::int64_t sum = kNoReading;
   for (const Part& part : channel.parts) {
-    if (part.value == kNoReading) continue;
-    std::optional<std::int64_t> value = part.value;
-    if (channel.daily->row->semantics == Semantics::Counter) {
-      value = device_.days->amount(part.key, {static_cast<std::uint64_t>(part.value), part.epoch,
-                                              channel.daily->row->width});
+    std::optional<std::int64_t> value = part.reading.value;
+    if (part.percentOf) value = percentage(part.reading.value, part.percentOf->value);
+    if (*value == kNoReading) continue;
+    if (channel.isDaily && isCounter(channel.row->semantics)) {
+      value = device_.days->amount(
+          part.key, {static_cast<std::uint64_t>(*value), part.epoch, channel.row->width,
+                     channel.row->semantics == Semantics::UnsteadyCounter});
     }
     if (!value) continue;
     if (sum == kNoReading) sum = 0;
@@ -214,12 +248,12 @@ void KernelRegion::writeFrame(std::size_t, std::span<std::byte> memory) {
   }
   for (std::size_t i = 0; i < files_.size(); ++i) {
     takeFields(files_[i], memory);
-    for (Part* part : partsOfFile_[i]) part->value = fields_[part->field];
+    for (Reading* reading : readingsOfFile_[i]) reading->value = fields_[reading->field];
   }
   if (hasDailyCounters_) device_.days->beginSample();
   for (Channel& channel : served_) {
-    if (channel.daily != nullptr) {
-      const std::int64_t value = dailyValue(channel);
+    if (!channel.parts.empty()) {
+      const std::int64_t value = computed(channel);
       channel.present = value != kNoReading;
       put(memory, channel.offset + element::slot(simple_slot::kValue), value);
     }

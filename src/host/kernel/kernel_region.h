@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -44,20 +45,24 @@ class KernelRegion final : public HubRegion {
     std::vector<Output> outputs;
     Descriptor open;
   };
-  // A part of a daily channel: where its value is read to, and what is kept of it.
-  struct Part {
+  struct Reading {
     std::uint32_t file, field;
+    std::int64_t value = kNoReading;
+  };
+  // What a computed channel is the sum of, and what is kept of a counter.
+  struct Part {
+    Reading reading;
+    std::optional<Reading> percentOf;
     std::string key, epoch;
-    std::int64_t value;
   };
   struct Channel {
     Interest interest;
     std::uint16_t elements;
-    std::size_t offset;  // of its run
+    std::size_t offset;     // of its run
+    const ChannelRow* row;  // null for nobody's
     std::vector<FoundConstant> constants;
-    const DailyChannel* daily;  // null for one that is read as it is
-    std::vector<Part> parts;
-    bool present = false;
+    std::vector<Part> parts;  // none of one that is read as it is
+    bool isDaily = false, present = false;
   };
 
   void addChannel(const Interest& interest, const FoundChannel& found);
@@ -66,10 +71,12 @@ class KernelRegion final : public HubRegion {
   std::string epochOf(const FoundChannel& channel) const;
   // The text of a file in buffer_; empty if it cannot be read.
   std::string_view read(File& file);
+  std::string_view clockText();
   std::string_view readOnce(const File& file, int descriptor);
   void report(const File& file, int error);
   void takeFields(File& file, std::span<std::byte> memory);
-  std::int64_t dailyValue(const Channel& channel);
+  Part partOf(const FoundSlot& slot);
+  std::int64_t computed(const Channel& channel);
 
   std::shared_ptr<const KernelChannels> channels_;
   KernelDevice device_;
@@ -77,7 +84,7 @@ class KernelRegion final : public HubRegion {
   std::vector<Channel> served_;
   std::vector<File> files_;
   std::map<std::uint32_t, std::uint32_t> fileNumbers_;  // by number among what was found
-  std::vector<std::vector<Part*>> partsOfFile_;
+  std::vector<std::vector<Reading*>> readingsOfFile_;
   std::size_t elements_ = 0, open_ = 0, generation_ = 0;
   bool hasDailyCounters_ = false;
   std::string buffer_;

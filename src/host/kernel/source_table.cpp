@@ -2,8 +2,8 @@
 
 #include <algorithm>
 
-#include "host/kernel/sources/disk.h"
-#include "host/kernel/sources/pressure.h"
+#include "host/kernel/sources/storage/disk.h"
+#include "host/kernel/sources/system/pressure.h"
 
 namespace tally {
 namespace {

@@ -4,6 +4,7 @@
 #include <charconv>
 #include <cstdint>
 #include <limits>
+#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -16,10 +17,12 @@ namespace tally {
 
 // Removes the first word from a line and returns it; empty at the end.
 inline std::string_view takeWord(std::string_view& line) {
-  constexpr std::string_view kBlanks = " \t";
-  line.remove_prefix(std::min(line.find_first_not_of(kBlanks), line.size()));
-  const std::size_t end = std::min(line.find_first_of(kBlanks), line.size());
-  const std::string_view word = line.substr(0, end);
+  const auto isBlank = [](char letter) { return letter == ' ' || letter == '\t'; };
+  std::size_t begin = 0;
+  while (begin < line.size() && isBlank(line[begin])) ++begin;
+  std::size_t end = begin;
+  while (end < line.size() && !isBlank(line[end])) ++end;
+  const std::string_view word = line.substr(begin, end - begin);
   line.remove_prefix(end);
   return word;
 }
@@ -65,13 +68,48 @@ inline std::size_t labelIndex(const FileLayout& layout, std::string_view label, 
   return count;
 }
 
-// Files that are one number: a layout of one field.
-inline FileLayout oneField() { return {{""}, 1}; }
+// Files that are one number.
 inline void parseGauge(std::string_view text, const FileLayout&, std::span<std::int64_t> fields) {
   if (!fields.empty()) fields[0] = readingOf(trimmed(text));
 }
 inline void parseCounter(std::string_view text, const FileLayout&, std::span<std::int64_t> fields) {
   if (!fields.empty()) fields[0] = counterOf(trimmed(text));
+}
+
+// A line of numbers by their place.
+inline void parseNumbers(std::string_view text, const FileLayout&, std::span<std::int64_t> fields) {
+  std::string_view line = text.substr(0, text.find('\n'));
+  for (std::int64_t& field : fields) {
+    const std::string_view word = takeWord(line);
+    if (word.empty()) return;
+    field = counterOf(word);
+  }
+}
+
+// How many numbers a kernel has in such a line; most if that cannot be read now.
+inline std::size_t numberCount(const std::optional<std::string>& text, std::size_t most) {
+  std::string_view line = text ? std::string_view(*text).substr(0, text->find('\n')) : "";
+  std::size_t count = 0;
+  while (count < most && !takeWord(line).empty()) ++count;
+  return count > 0 ? count : most;
+}
+
+// Lines of a name, with or without a colon, and numbers: as many as the layout has columns, the
+// rest of a line is of no interest.
+inline void parseNamedNumbers(std::string_view text, const FileLayout& layout,
+                              std::span<std::int64_t> fields) {
+  std::size_t hint = 0;
+  eachLine(text, [&](std::string_view line) {
+    std::string_view name = takeWord(line);
+    if (name.ends_with(':')) name.remove_suffix(1);
+    const std::size_t place = labelIndex(layout, name, hint);
+    if (place == layout.labels.size()) return;
+    for (std::size_t column = 0; column < layout.columns; ++column) {
+      const std::string_view word = takeWord(line);
+      if (word.empty()) break;
+      fields[place * layout.columns + column] = counterOf(word);
+    }
+  });
 }
 
 }  // namespace tally

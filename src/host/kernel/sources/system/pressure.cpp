@@ -1,4 +1,4 @@
-#include "host/kernel/sources/pressure.h"
+#include "host/kernel/sources/system/pressure.h"
 
 #include "host/kernel/channel_table.h"
 #include "host/kernel/text_fields.h"

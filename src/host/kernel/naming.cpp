@@ -1,0 +1,96 @@
+#include "host/kernel/naming.h"
+
+#include <algorithm>
+#include <map>
+
+#include "base/natural_order.h"
+
+namespace tally {
+namespace {
+
+constexpr std::size_t kLongestName = 200;
+
+bool isNumbered(std::string_view text, std::string_view stem) {
+  return text.starts_with(stem) && text.size() > stem.size() &&
+         text.find_first_not_of("0123456789", stem.size()) == std::string_view::npos;
+}
+
+// Removes "/nvme/nvme0" and the like from the end.
+bool dropClass(std::string& path) {
+  const std::size_t last = path.rfind('/');
+  if (last == std::string::npos || last == 0) return false;
+  const std::size_t before = path.rfind('/', last - 1);
+  const std::size_t begin = before == std::string::npos ? 0 : before + 1;
+  const std::string_view parent = std::string_view(path).substr(begin, last - begin);
+  const std::string_view name = std::string_view(path).substr(last + 1);
+  constexpr std::string_view kThermal = "thermal", kWireless = "ieee80211";
+  const bool isMember = isNumbered(name, parent) ||
+                        (parent == kWireless && isNumbered(name, "phy")) ||
+                        (parent == kThermal &&
+                         (isNumbered(name, "thermal_zone") || isNumbered(name, "cooling_device")));
+  if (!isMember) return false;
+  path.resize(begin == 0 ? 0 : begin - 1);
+  return true;
+}
+
+// Those that come more than once get what tells them apart.
+template <class Mark>
+void markRepeated(std::vector<std::string>& names, const Mark& mark) {
+  std::map<std::string, unsigned> count, seen;
+  for (const std::string& name : names) ++count[name];
+  for (std::size_t i = 0; i < names.size(); ++i) {
+    if (count[names[i]] > 1) names[i] += mark(i, ++seen[names[i]]);
+  }
+}
+
+}  // namespace
+
+std::string channelWord(std::string_view text) {
+  std::string word(text.substr(0, kLongestName));
+  for (char& letter : word) {
+    if (letter == ' ' || letter == '\t') letter = '-';
+    if (letter <= ' ' || letter > '~') letter = '_';
+  }
+  return word;
+}
+
+std::string busPathOf(const SystemTree& tree, const std::string& directory) {
+  constexpr std::string_view kDevices = "/sys/devices/";
+  std::string path = tree.resolve(directory).value_or(directory);
+  if (path.starts_with(kDevices)) path.erase(0, kDevices.size());
+  while (dropClass(path)) continue;
+  return path;
+}
+
+std::vector<std::string> uniqueNames(const std::vector<std::string>& names,
+                                     const std::vector<std::string>& places) {
+  std::vector<std::string> words;
+  for (const std::string& name : names) words.push_back(channelWord(name));
+  markRepeated(words, [&](std::size_t i, unsigned) { return "@" + channelWord(places[i]); });
+  markRepeated(words, [](std::size_t, unsigned number) { return "#" + std::to_string(number); });
+  return words;
+}
+
+std::vector<NamedDevice> named(std::vector<DeviceCandidate> devices) {
+  std::ranges::sort(devices, [](const DeviceCandidate& a, const DeviceCandidate& b) {
+    return a.busPath != b.busPath ? naturalLess(a.busPath, b.busPath)
+                                  : naturalLess(a.directory, b.directory);
+  });
+  std::vector<std::string> names, places;
+  for (const DeviceCandidate& device : devices) {
+    names.push_back(device.name);
+    places.push_back(device.busPath);
+  }
+  names = uniqueNames(names, places);
+  std::vector<NamedDevice> result;
+  unsigned ordinal = 0;
+  for (std::size_t i = 0; i < devices.size(); ++i) {
+    FoundDevice device{std::move(names[i]), std::move(devices[i].identity), std::nullopt,
+                       devices[i].kind};
+    if (devices[i].isSwept) device.ordinal = ordinal++;
+    result.push_back({std::move(devices[i].directory), std::move(device)});
+  }
+  return result;
+}
+
+}  // namespace tally
