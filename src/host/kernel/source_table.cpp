@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "host/kernel/sources/storage/disk.h"
+#include "host/kernel/sources/storage/zram.h"
 #include "host/kernel/sources/system/pressure.h"
 
 namespace tally {
@@ -10,6 +11,7 @@ namespace {
 
 constexpr SourceRow kSources[] = {
     {KernelSource::Disk, "disk", "Disks", findDisks},
+    {KernelSource::Zram, "zram", "Compressed memory", findZram},
     {KernelSource::Pressure, "pressure", "Pressure", findPressure},
 };
 
