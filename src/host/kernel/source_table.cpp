@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "host/kernel/sources/network/interfaces.h"
 #include "host/kernel/sources/storage/disk.h"
 #include "host/kernel/sources/storage/zram.h"
 #include "host/kernel/sources/system/pressure.h"
@@ -12,6 +13,7 @@ namespace {
 constexpr SourceRow kSources[] = {
     {KernelSource::Disk, "disk", "Disks", findDisks},
     {KernelSource::Zram, "zram", "Compressed memory", findZram},
+    {KernelSource::Network, "net", "Network", findInterfaces},
     {KernelSource::Pressure, "pressure", "Pressure", findPressure},
 };
 
