@@ -84,6 +84,24 @@ constexpr ChannelRow kRows[] = {
 {Pressure, "io.some", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/io", "pressure.io.some", "time in which a task waited for storage"},
 {Pressure, "io.full", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/io", "pressure.io.full", "time in which every task waited for storage"},
 {Pressure, "irq.full", kMicroseconds, kSimple, kCounter, kBoot, 64, "/proc/pressure/irq", "pressure.irq.full", "time in which every task waited for interrupts"},
+
+{Memory, "total", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "memory that the kernel manages"},
+{Memory, "available", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "memory.available", "memory that programs can get without swapping"},
+{Memory, "free", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "memory that nothing is in"},
+{Memory, "cached", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "copies of files"},
+{Memory, "anonymous", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "memory.anonymous", "what programs have allocated"},
+{Memory, "shared", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "shared memory and the files of tmpfs"},
+{Memory, "swap-total", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "swap space"},
+{Memory, "swap-free", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "memory.swap-free", "swap space that is free"},
+{Memory, "slab", kKibibytes, kSimple, kGauge, kBoot, 0, "/proc/meminfo", "", "objects of the kernel"},
+
+{Paging, "read", kKibibytes, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "", "data that was read from storage"},
+{Paging, "written", kKibibytes, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "", "data that was written to storage"},
+{Paging, "swap-ins", kNone, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.swap-ins", "pages that were swapped in"},
+{Paging, "swap-outs", kNone, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.swap-outs", "pages that were swapped out"},
+{Paging, "faults", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "", "page faults"},
+{Paging, "major-faults", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.major-faults", "page faults that waited for storage"},
+{Paging, "out-of-memory-kills", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.out-of-memory-kills", "processes that were killed for want of memory"},
 };
 // clang-format on
 

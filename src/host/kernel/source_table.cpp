@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "host/kernel/sources/memory/memory.h"
 #include "host/kernel/sources/network/interfaces.h"
 #include "host/kernel/sources/storage/disk.h"
 #include "host/kernel/sources/storage/zram.h"
@@ -15,6 +16,8 @@ constexpr SourceRow kSources[] = {
     {KernelSource::Zram, "zram", "Compressed memory", findZram},
     {KernelSource::Network, "net", "Network", findInterfaces},
     {KernelSource::Pressure, "pressure", "Pressure", findPressure},
+    {KernelSource::Memory, "memory", "Memory", findMemory},
+    {KernelSource::Paging, "paging", "Paging", findPaging},
 };
 
 }  // namespace
