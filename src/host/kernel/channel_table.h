@@ -102,6 +102,40 @@ constexpr ChannelRow kRows[] = {
 {Paging, "faults", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "", "page faults"},
 {Paging, "major-faults", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.major-faults", "page faults that waited for storage"},
 {Paging, "out-of-memory-kills", kEvents, kSimple, kCounter, kBoot, 64, "/proc/vmstat", "paging.out-of-memory-kills", "processes that were killed for want of memory"},
+
+{ProcessorTime, "user", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.user", "time in programs"},
+{ProcessorTime, "nice", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.nice", "time in programs of low priority"},
+{ProcessorTime, "system", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.system", "time in the kernel"},
+{ProcessorTime, "idle", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.idle", "time with nothing to do"},
+{ProcessorTime, "iowait", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.iowait", "idle time in which a task waited for storage"},
+{ProcessorTime, "irq", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.irq", "time in interrupts"},
+{ProcessorTime, "softirq", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.irq", "time in soft interrupts"},
+{ProcessorTime, "steal", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in which the hypervisor ran something else"},
+{ProcessorTime, "guest", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in guests, which is also in user"},
+{ProcessorTime, "guest-nice", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in guests of low priority, which is also in nice"},
+{ProcessorTime, "times", kMilliseconds, kArray, kUnsteady, kBoot, 64, "/proc/stat", "", "time of one processor: user, nice, system, idle, iowait, irq, softirq, steal, guest, guest-nice"},
+{ProcessorTime, "context-switches", kEvents, kSimple, kCounter, kBoot, 64, "/proc/stat", "cpu.context-switches", "switches from one task to another"},
+{ProcessorTime, "forks", kEvents, kSimple, kCounter, kBoot, 64, "/proc/stat", "cpu.forks", "processes and threads that were started"},
+{ProcessorTime, "interrupts", kEvents, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.interrupts", "interrupts of all lines"},
+{ProcessorTime, "soft-interrupts", kEvents, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "soft interrupts of all kinds"},
+{ProcessorTime, "soft-interrupts-by-kind", kEvents, kArray, kUnsteady, kBoot, 64, "/proc/stat", "", "soft interrupts: HI, TIMER, NET_TX, NET_RX, BLOCK, IRQ_POLL, TASKLET, SCHED, HRTIMER, RCU"},
+{ProcessorTime, "running", kNone, kSimple, kGauge, kBoot, 0, "/proc/stat", "", "tasks that run or could"},
+{ProcessorTime, "blocked", kNone, kSimple, kGauge, kBoot, 0, "/proc/stat", "", "tasks that wait for storage"},
+
+{ProcessorIdle, "idle", kMicroseconds, kState, kStates, kBoot, 64, "/sys/devices/system/cpu/*/cpuidle", "", "time in each idle state"},
+
+{ProcessorFrequency, "frequencies", kMilliseconds, kState, kStates, kBoot, 64, "/sys/devices/system/cpu/*/cpufreq/stats/time_in_state", "", "time at each frequency, in kHz; of all processors that share the clock"},
+{ProcessorFrequency, "frequency", kKilohertz, kSimple, kGauge, kBoot, 0, "/sys/devices/system/cpu/*/cpufreq/scaling_cur_freq", "", "frequency now"},
+{ProcessorFrequency, "frequency-changes", kEvents, kSimple, kCounter, kBoot, 32, "/sys/devices/system/cpu/*/cpufreq/stats/total_trans", "cpu.frequency-changes", "changes of the frequency"},
+
+{ProcessorThrottling, "throttles", kEvents, kSimple, kCounter, kBoot, 64, "/sys/devices/system/cpu/*/thermal_throttle/core_throttle_count", "cpu.throttles", "times that heat slowed the core down"},
+{ProcessorThrottling, "throttled", kMilliseconds, kSimple, kCounter, kBoot, 64, "/sys/devices/system/cpu/*/thermal_throttle/core_throttle_total_time_ms", "cpu.throttled", "time for which heat slowed the core down"},
+{ProcessorThrottling, "package-throttles", kEvents, kSimple, kCounter, kBoot, 64, "/sys/devices/system/cpu/*/thermal_throttle/package_throttle_count", "", "times that heat slowed the package down"},
+{ProcessorThrottling, "package-throttled", kMilliseconds, kSimple, kCounter, kBoot, 64, "/sys/devices/system/cpu/*/thermal_throttle/package_throttle_total_time_ms", "", "time for which heat slowed the package down"},
+
+{Interrupts, "", kEvents, kArray, kCounter, kBoot, 32, "/proc/interrupts", "", "interrupts of one line by processor"},
+
+{SoftInterrupts, "", kEvents, kArray, kCounter, kBoot, 32, "/proc/softirqs", "", "soft interrupts of one kind by processor"},
 };
 // clang-format on
 

@@ -2,6 +2,9 @@
 
 #include <algorithm>
 
+#include "host/kernel/sources/cpu/interrupts.h"
+#include "host/kernel/sources/cpu/processor_time.h"
+#include "host/kernel/sources/cpu/processors.h"
 #include "host/kernel/sources/memory/memory.h"
 #include "host/kernel/sources/network/interfaces.h"
 #include "host/kernel/sources/storage/disk.h"
@@ -18,6 +21,12 @@ constexpr SourceRow kSources[] = {
     {KernelSource::Pressure, "pressure", "Pressure", findPressure},
     {KernelSource::Memory, "memory", "Memory", findMemory},
     {KernelSource::Paging, "paging", "Paging", findPaging},
+    {KernelSource::ProcessorTime, "cpu", "Processors", findProcessorTime},
+    {KernelSource::ProcessorIdle, "cpu", "Processors", findIdleStates},
+    {KernelSource::ProcessorFrequency, "cpu", "Processors", findFrequencies},
+    {KernelSource::ProcessorThrottling, "cpu", "Processors", findThrottling},
+    {KernelSource::Interrupts, "irq", "Interrupts", findInterrupts},
+    {KernelSource::SoftInterrupts, "softirq", "Soft interrupts", findSoftInterrupts},
 };
 
 }  // namespace
