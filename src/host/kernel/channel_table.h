@@ -136,6 +136,22 @@ constexpr ChannelRow kRows[] = {
 {Interrupts, "", kEvents, kArray, kCounter, kBoot, 32, "/proc/interrupts", "", "interrupts of one line by processor"},
 
 {SoftInterrupts, "", kEvents, kArray, kCounter, kBoot, 32, "/proc/softirqs", "", "soft interrupts of one kind by processor"},
+
+{ThermalZone, "temperature", kMillidegrees, kSimple, kGauge, kBoot, 0, "/sys/class/thermal/thermal_zone*/temp", "thermal#.temperature", "temperature"},
+
+{Cooling, "state", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/thermal/cooling_device*/cur_state", "", "how much it cools, from 0 to its last state"},
+{Cooling, "last-state", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/thermal/cooling_device*/max_state", "", "the most that it can cool"},
+{Cooling, "changes", kEvents, kSimple, kCounter, kCreation, 32, "/sys/class/thermal/cooling_device*/stats/total_trans", "cooling.changes", "changes of the state"},
+{Cooling, "states", kMilliseconds, kState, kStates, kCreation, 64, "/sys/class/thermal/cooling_device*/stats/time_in_state_ms", "", "time in each state"},
+
+{Sensor, "", kMillidegrees, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/temp*_input", "sensor#.temperature", "temperature"},
+{Sensor, "", kNone, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/fan*_input", "fan#.speed", "revolutions per minute"},
+{Sensor, "", kMillivolts, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/in*_input", "", "voltage"},
+{Sensor, "", kMilliamperes, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/curr*_input", "", "current"},
+{Sensor, "", kMicrowatts, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/power*_input", "", "power"},
+{Sensor, "", kMicrojoules, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/energy*_input", "", "energy that was used"},
+{Sensor, "", kHertz, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/freq*_input", "", "frequency"},
+{Sensor, "", kNone, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/humidity*_input", "", "relative humidity, in thousandths of a percent"},
 };
 // clang-format on
 

@@ -10,6 +10,8 @@
 #include "host/kernel/sources/storage/disk.h"
 #include "host/kernel/sources/storage/zram.h"
 #include "host/kernel/sources/system/pressure.h"
+#include "host/kernel/sources/thermal/sensors.h"
+#include "host/kernel/sources/thermal/thermal.h"
 
 namespace tally {
 namespace {
@@ -27,6 +29,9 @@ constexpr SourceRow kSources[] = {
     {KernelSource::ProcessorThrottling, "cpu", "Processors", findThrottling},
     {KernelSource::Interrupts, "irq", "Interrupts", findInterrupts},
     {KernelSource::SoftInterrupts, "softirq", "Soft interrupts", findSoftInterrupts},
+    {KernelSource::ThermalZone, "thermal", "Thermal zones", findThermalZones},
+    {KernelSource::Cooling, "cooling", "Cooling", findCoolingDevices},
+    {KernelSource::Sensor, "hwmon", "Sensors", findSensors},
 };
 
 }  // namespace
