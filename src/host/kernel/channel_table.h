@@ -152,6 +152,38 @@ constexpr ChannelRow kRows[] = {
 {Sensor, "", kMicrojoules, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/energy*_input", "", "energy that was used"},
 {Sensor, "", kHertz, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/freq*_input", "", "frequency"},
 {Sensor, "", kNone, kSimple, kGauge, kBoot, 0, "/sys/class/hwmon/hwmon*/humidity*_input", "", "relative humidity, in thousandths of a percent"},
+
+{PowerSupply, "health", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/*_full", "battery#.health", "capacity as a percentage of what it was designed for"},
+{PowerSupply, "charge-level", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/capacity", "battery#.level", "charge as a percentage of the capacity"},
+{PowerSupply, "cycles", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/cycle_count", "battery#.cycles", "charging cycles in the life of the battery"},
+{PowerSupply, "energy", kMicrojoules, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/energy_now", "", "energy in the battery"},
+{PowerSupply, "energy-full", kMicrojoules, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/energy_full", "", "capacity"},
+{PowerSupply, "energy-design", kMicrojoules, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/energy_full_design", "", "capacity that it was designed for"},
+{PowerSupply, "charge", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/charge_now", "", "charge in the battery, in microampere hours"},
+{PowerSupply, "charge-full", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/charge_full", "", "capacity, in microampere hours"},
+{PowerSupply, "charge-design", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/charge_full_design", "", "capacity that it was designed for, in microampere hours"},
+{PowerSupply, "voltage", kMicrovolts, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/voltage_now", "", "voltage"},
+{PowerSupply, "current", kMicroamperes, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/current_now", "", "current"},
+{PowerSupply, "power", kMicrowatts, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/power_now", "", "power"},
+{PowerSupply, "temperature", kMillidegrees, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/temp", "battery#.temperature", "temperature of the battery"},
+{PowerSupply, "online", kNone, kSimple, kGauge, kCreation, 0, "/sys/class/power_supply/*/online", "", "1: it gives power"},
+
+{WakeupSource, "activations", kEvents, kSimple, kCounter, kCreation, 64, "/sys/class/wakeup/wakeup*/active_count", "wakeup.activations", "times that it became active"},
+{WakeupSource, "events", kEvents, kSimple, kCounter, kCreation, 64, "/sys/class/wakeup/wakeup*/event_count", "", "events that it signalled"},
+{WakeupSource, "wakeups", kEvents, kSimple, kCounter, kCreation, 64, "/sys/class/wakeup/wakeup*/wakeup_count", "wakeup.%.wakeups", "times that it may have ended or prevented a sleep"},
+{WakeupSource, "active", kMilliseconds, kSimple, kCounter, kCreation, 64, "/sys/class/wakeup/wakeup*/total_time_ms", "wakeup.active", "time for which it was active"},
+
+{Suspend, "sleeps", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/success", "suspend.sleeps", "times that the machine went to sleep"},
+{Suspend, "failures", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/fail", "suspend.failures", "attempts to sleep that failed"},
+{Suspend, "hardware-sleep", kMicroseconds, kSimple, kCounter, kBoot, 64, "/sys/power/suspend_stats/total_hw_sleep", "suspend.hardware-sleep", "time in the deepest sleep of the hardware"},
+{Suspend, "failures-freezing", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_freeze", "", "attempts that failed while tasks were frozen"},
+{Suspend, "failures-preparing", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_prepare", "", "attempts that failed while devices were prepared"},
+{Suspend, "failures-suspending", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_suspend", "", "attempts that failed while devices were suspended"},
+{Suspend, "failures-suspending-late", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_suspend_late", "", "attempts that failed in the late phase of it"},
+{Suspend, "failures-suspending-noirq", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_suspend_noirq", "", "attempts that failed in the phase without interrupts"},
+{Suspend, "failures-resuming", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume", "", "devices that failed to resume"},
+{Suspend, "failures-resuming-early", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume_early", "", "devices that failed to resume in the early phase"},
+{Suspend, "failures-resuming-noirq", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume_noirq", "", "devices that failed to resume in the phase without interrupts"},
 };
 // clang-format on
 

@@ -7,6 +7,8 @@
 #include "host/kernel/sources/cpu/processors.h"
 #include "host/kernel/sources/memory/memory.h"
 #include "host/kernel/sources/network/interfaces.h"
+#include "host/kernel/sources/power/sleep.h"
+#include "host/kernel/sources/power/supplies.h"
 #include "host/kernel/sources/storage/disk.h"
 #include "host/kernel/sources/storage/zram.h"
 #include "host/kernel/sources/system/pressure.h"
@@ -32,6 +34,9 @@ constexpr SourceRow kSources[] = {
     {KernelSource::ThermalZone, "thermal", "Thermal zones", findThermalZones},
     {KernelSource::Cooling, "cooling", "Cooling", findCoolingDevices},
     {KernelSource::Sensor, "hwmon", "Sensors", findSensors},
+    {KernelSource::PowerSupply, "power", "Power supplies", findPowerSupplies},
+    {KernelSource::WakeupSource, "wakeup", "Wakeup sources", findWakeupSources},
+    {KernelSource::Suspend, "suspend", "Sleep", findSuspend},
 };
 
 }  // namespace
