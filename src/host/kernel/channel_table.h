@@ -184,6 +184,14 @@ constexpr ChannelRow kRows[] = {
 {Suspend, "failures-resuming", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume", "", "devices that failed to resume"},
 {Suspend, "failures-resuming-early", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume_early", "", "devices that failed to resume in the early phase"},
 {Suspend, "failures-resuming-noirq", kEvents, kSimple, kCounter, kBoot, 32, "/sys/power/suspend_stats/failed_resume_noirq", "", "devices that failed to resume in the phase without interrupts"},
+
+{MemoryErrors, "corrected", kEvents, kSimple, kCounter, kBoot, 32, "/sys/devices/system/edac/mc/mc*/ce_count", "memory-errors.corrected", "errors that were corrected"},
+{MemoryErrors, "uncorrected", kEvents, kSimple, kCounter, kBoot, 32, "/sys/devices/system/edac/mc/mc*/ue_count", "memory-errors.uncorrected", "errors that could not be corrected"},
+{MemoryErrors, "corrected-elsewhere", kEvents, kSimple, kCounter, kBoot, 32, "/sys/devices/system/edac/mc/mc*/ce_noinfo_count", "", "errors that were corrected, of which no place is known"},
+{MemoryErrors, "uncorrected-elsewhere", kEvents, kSimple, kCounter, kBoot, 32, "/sys/devices/system/edac/mc/mc*/ue_noinfo_count", "", "errors that could not be corrected, of which no place is known"},
+
+{Time, "uptime", kMilliseconds, kSimple, kCounter, kBoot, 64, "/proc/uptime", "day.uptime", "time since the machine was started"},
+{Time, "span", kSeconds, kSimple, kUnsteady, kLifetime, 64, "clock", "day.span", "the wall clock; its amount is the time over which the amounts of the day were counted"},
 };
 // clang-format on
 

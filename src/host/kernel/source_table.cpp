@@ -11,7 +11,9 @@
 #include "host/kernel/sources/power/supplies.h"
 #include "host/kernel/sources/storage/disk.h"
 #include "host/kernel/sources/storage/zram.h"
+#include "host/kernel/sources/system/memory_errors.h"
 #include "host/kernel/sources/system/pressure.h"
+#include "host/kernel/sources/system/time.h"
 #include "host/kernel/sources/thermal/sensors.h"
 #include "host/kernel/sources/thermal/thermal.h"
 
@@ -37,6 +39,8 @@ constexpr SourceRow kSources[] = {
     {KernelSource::PowerSupply, "power", "Power supplies", findPowerSupplies},
     {KernelSource::WakeupSource, "wakeup", "Wakeup sources", findWakeupSources},
     {KernelSource::Suspend, "suspend", "Sleep", findSuspend},
+    {KernelSource::MemoryErrors, "edac", "Memory errors", findMemoryErrors},
+    {KernelSource::Time, "time", "Time", findTime},
 };
 
 }  // namespace
