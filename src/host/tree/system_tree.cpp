@@ -166,14 +166,16 @@ bool SystemTree::exists(const std::string& path) const {
 std::optional<std::string> SystemTree::text(const std::string& path, std::size_t limit) const {
   const Descriptor file = open(path);
   if (!file) return std::nullopt;
-  std::string content(limit + 1, '\0');
+  constexpr std::size_t kFirstPiece = 4096;
+  std::string content(std::min(kFirstPiece, limit) + 1, '\0');
   std::size_t length = 0;
-  while (length < content.size()) {
+  while (true) {
     const ssize_t got = retried(
         [&] { return ::read(file.get(), content.data() + length, content.size() - length); });
     if (got < 0) return std::nullopt;
-    if (got == 0) break;
     length += static_cast<std::size_t>(got);
+    if (got == 0 || length > limit) break;
+    if (length == content.size()) content.resize(std::min(limit + 1, 2 * length));
   }
   if (length > limit) {
     errno = EFBIG;
