@@ -55,7 +55,7 @@ class Package(unittest.TestCase):
             "lib/systemd/system/tallyrun-counters.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
-            "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
+            "share/tallyrun/Whitelist_Nimbus.plist", "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
             "share/doc/tallyrun/docs/security.md", "share/doc/tallyrun/SECURITY.md"))]
         self.assertLessEqual(set(wanted), self.files(root))
         self.assertEqual(os.readlink(root / TIMER_LINK), "/usr/lib/systemd/system/tallyrun-day.timer")
