@@ -1,6 +1,7 @@
 // What is known of a statistics channel of the kernel before it is read.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 
@@ -64,6 +65,16 @@ constexpr std::uint64_t kBytes = word(9, 0x8200), kKibibytes = word(9, 0x8C00),
 constexpr std::uint64_t kMillidegrees = word(10, 0x7C), kDegrees = word(10);
 constexpr std::uint64_t kEvents = word(100), kPackets = word(101);
 }  // namespace unit
+
+// As legends have them.
+constexpr std::string_view textOf(Semantics semantics) {
+  constexpr std::string_view kTexts[] = {"counter", "gauge", "state", "counter"};
+  return kTexts[static_cast<std::size_t>(semantics)];
+}
+constexpr std::string_view textOf(CounterScope scope) {
+  constexpr std::string_view kTexts[] = {"boot", "creation", "lifetime"};
+  return kTexts[static_cast<std::size_t>(scope)];
+}
 
 constexpr bool isCounter(Semantics semantics) {
   return semantics == Semantics::Counter || semantics == Semantics::UnsteadyCounter;

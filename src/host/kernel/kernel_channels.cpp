@@ -39,16 +39,6 @@ std::string dailyName(const ChannelRow& row, const FoundDevice& device) {
   return name;
 }
 
-std::string_view textOf(Semantics semantics) {
-  constexpr std::string_view kTexts[] = {"counter", "gauge", "state", "counter"};
-  return kTexts[static_cast<std::size_t>(semantics)];
-}
-
-std::string_view textOf(CounterScope scope) {
-  constexpr std::string_view kTexts[] = {"boot", "creation", "lifetime"};
-  return kTexts[static_cast<std::size_t>(scope)];
-}
-
 // Groups of channels that share what a legend says once for a group.
 class Legend {
  public:

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <map>
+#include <utility>
 
 #include "base/natural_order.h"
 
@@ -15,21 +16,27 @@ bool isNumbered(std::string_view text, std::string_view stem) {
          text.find_first_not_of("0123456789", stem.size()) == std::string_view::npos;
 }
 
-// Removes "/nvme/nvme0" and the like from the end.
+// Removes "/nvme/nvme0" or "/hwmon3" from the end: numbers that are given out anew at each boot.
 bool dropClass(std::string& path) {
+  constexpr std::pair<std::string_view, std::string_view> kMembers[] = {
+      {"thermal", "thermal_zone"}, {"thermal", "cooling_device"}, {"ieee80211", "phy"}};
+  constexpr std::string_view kBare[] = {"hwmon", "wakeup"};
   const std::size_t last = path.rfind('/');
-  if (last == std::string::npos || last == 0) return false;
-  const std::size_t before = path.rfind('/', last - 1);
+  if (last == std::string::npos) return false;
+  const std::size_t before = last == 0 ? std::string::npos : path.rfind('/', last - 1);
   const std::size_t begin = before == std::string::npos ? 0 : before + 1;
   const std::string_view parent = std::string_view(path).substr(begin, last - begin);
   const std::string_view name = std::string_view(path).substr(last + 1);
-  constexpr std::string_view kThermal = "thermal", kWireless = "ieee80211";
-  const bool isMember = isNumbered(name, parent) ||
-                        (parent == kWireless && isNumbered(name, "phy")) ||
-                        (parent == kThermal &&
-                         (isNumbered(name, "thermal_zone") || isNumbered(name, "cooling_device")));
-  if (!isMember) return false;
-  path.resize(begin == 0 ? 0 : begin - 1);
+  if (isNumbered(name, parent) || std::ranges::any_of(kMembers, [&](const auto& member) {
+        return parent == member.first && isNumbered(name, member.second);
+      })) {
+    path.resize(begin == 0 ? 0 : begin - 1);
+    return true;
+  }
+  if (std::ranges::none_of(kBare, [&](std::string_view stem) { return isNumbered(name, stem); })) {
+    return false;
+  }
+  path.resize(last);
   return true;
 }
 
@@ -56,17 +63,20 @@ std::string channelWord(std::string_view text) {
 
 std::string busPathOf(const SystemTree& tree, const std::string& directory) {
   constexpr std::string_view kDevices = "/sys/devices/";
-  std::string path = tree.resolve(directory).value_or(directory);
-  if (path.starts_with(kDevices)) path.erase(0, kDevices.size());
+  std::string path = tree.resolve(directory).value_or("");
+  if (!path.starts_with(kDevices)) return {};  // a recording without links
+  path.erase(0, kDevices.size());
   while (dropClass(path)) continue;
-  return path;
+  return path != "virtual" ? path : std::string();
 }
 
 std::vector<std::string> uniqueNames(const std::vector<std::string>& names,
                                      const std::vector<std::string>& places) {
   std::vector<std::string> words;
   for (const std::string& name : names) words.push_back(channelWord(name));
-  markRepeated(words, [&](std::size_t i, unsigned) { return "@" + channelWord(places[i]); });
+  markRepeated(words, [&](std::size_t i, unsigned) {
+    return places[i].empty() ? std::string() : "@" + channelWord(places[i]);
+  });
   markRepeated(words, [](std::size_t, unsigned number) { return "#" + std::to_string(number); });
   return words;
 }

@@ -26,7 +26,8 @@ struct NamedDevice {
 };
 
 // Where the device of a directory in /sys is attached. The numbers that classes give their members
-// have no part in it: "pci0000:00/0000:00:1d.0/0000:3d:00.0" of ".../nvme/nvme0/hwmon3".
+// have no part in it: "pci0000:00/0000:00:1d.0/0000:3d:00.0" of ".../nvme/nvme0/hwmon3". Empty if
+// it is nowhere.
 std::string busPathOf(const SystemTree& tree, const std::string& directory);
 
 // In the order of their bus paths, each with a name of its own: the kernel's, with the bus path if
