@@ -146,6 +146,29 @@ TEST_F(ChannelCommands, PeopleSeeUnitsBarsAndTheCurrentState) {
             "    [4]  5  ms  ████████████████████████\n");
 }
 
+TEST_F(ChannelCommands, WhatASourceSaysOfAChannelIsShownOnRequest) {
+  describe(
+      {kHub, driver("kernel", std::vector<Json>{group(
+                                  kEvents, {{7,
+                                             word(1, 1, 1),
+                                             "reads",
+                                             {{"Semantics", "counter"},
+                                              {"Scope", "boot"},
+                                              {"Width", 32},
+                                              {"File", "/proc/x"},
+                                              {"Description", "what was read"}}},
+                                            {8, word(1, 1, 1), "bare", {{"Width", "wide"}}}})})});
+  const Outcome text = run({"channels", "list", "--verbose"});
+  EXPECT_THAT(text.out, HasSubstr(" >\n  what was read; counter; /proc/x; 32 bits since boot\n"));
+  const Json list = run({"channels", "list", "--verbose", "--json"}).json();
+  EXPECT_EQ(list[0]["width"], 32);
+  EXPECT_EQ(list[0]["file"], "/proc/x");
+  EXPECT_TRUE(list[1]["width"].is_null() && list[1]["file"].is_null());
+  const Outcome sample = run({"channels", "sample"});
+  EXPECT_EQ(sample.status, kSuccess) << "that may happen";
+  EXPECT_EQ(sample.out, "\n2 channels without a value now\n");
+}
+
 TEST_F(ChannelCommands, FaultsAreNamedAndCostNoMore) {
   const Json good = goodDriver();
   const Json failing = {{"Class", "HwReportHub"}, {"Hub", {{"UpdateStatus", 0xE00002BC}}}};

@@ -6,6 +6,7 @@
 #include <cmath>
 #include <map>
 #include <memory>
+#include <set>
 #include <thread>
 #include <tuple>
 #include <vector>
@@ -34,6 +35,7 @@ struct ChannelArguments {
   std::string driver, group, subgroup, format, unit;
   std::uint16_t categories = 0;  // 0: any
   double delta = 0;              // 0: a single sample
+  bool verbose = false;
 };
 
 // The library's reason, or its code where there is none.
@@ -144,8 +146,10 @@ int list(const ToolContext& context, const ChannelArguments& wanted) {
   if (context.json) {
     Json document = Json::array();
     if (channels) {
-      for (KvDictionary* channel : channelsOf(*channels))
+      for (KvDictionary* channel : channelsOf(*channels)) {
         document.push_back(jsonOfChannel(*channel));
+        if (wanted.verbose) addDetails(document.back(), *channel);
+      }
     }
     printJson(context, document);
   } else if (channels) {
@@ -153,6 +157,8 @@ int list(const ToolContext& context, const ChannelArguments& wanted) {
       std::string text = textOf(HwReportChannelCopyDescription(channel, 0, nullptr).get());
       if (text.ends_with('\n')) text.pop_back();
       printLine(context, text);
+      const std::string details = wanted.verbose ? detailsText(*channel) : "";
+      if (!details.empty()) printLine(context, "  " + details, Ink::Faint);
     }
   }
   return channels && complete ? kSuccess : kWrong;
@@ -180,8 +186,23 @@ void wait(const ToolContext& context, double seconds) {
 struct Sample {
   KvRef<KvDictionary> first, second;  // second: null without --delta
   double seconds = 0;                 // between them
-  std::int32_t missing = 0;           // channels that were wanted and are not served
+  // Channels that were wanted and are not in the sample: those that the hub does not serve, and
+  // those whose source has no value at the moment, as the kernel's may.
+  std::uint64_t unserved = 0, withoutValue = 0;
 };
+
+std::tuple<std::uint64_t, std::uint64_t> keyOf(const KvDictionary* channel) {
+  return {HwReportChannelGetDriverID(channel), HwReportChannelGetChannelID(channel)};
+}
+
+void countMissing(KvDictionary& subscribed, KvDictionary& sampled, Sample* sample) {
+  std::set<std::tuple<std::uint64_t, std::uint64_t>> present;
+  for (const KvDictionary* channel : channelsOf(sampled)) present.insert(keyOf(channel));
+  for (const KvDictionary* channel : channelsOf(subscribed)) {
+    if (present.contains(keyOf(channel))) continue;
+    ++(channelDetails(*channel) != nullptr ? sample->withoutValue : sample->unserved);
+  }
+}
 
 // False, after a complaint, if there is no sample.
 bool takeSample(const ToolContext& context, const ChannelArguments& wanted, KvDictionary& channels,
@@ -205,7 +226,7 @@ bool takeSample(const ToolContext& context, const ChannelArguments& wanted, KvDi
     complain(context, "no sample: " + reasonOf(error.get()), kWrong);
     return false;
   }
-  sample->missing = HwReportGetChannelCount(subscribed.get()) - HwReportGetChannelCount(last.get());
+  countMissing(*subscribed, *last, sample);
   return true;
 }
 
@@ -213,9 +234,6 @@ bool takeSample(const ToolContext& context, const ChannelArguments& wanted, KvDi
 std::vector<KvRef<KvDictionary>> differences(const ToolContext& context, const Sample& sample,
                                              bool* complete) {
   std::map<std::tuple<std::uint64_t, std::uint64_t>, KvDictionary*> earlier;
-  const auto keyOf = [](const KvDictionary* channel) {
-    return std::tuple(HwReportChannelGetDriverID(channel), HwReportChannelGetChannelID(channel));
-  };
   for (KvDictionary* channel : channelsOf(*sample.first)) {
     earlier.try_emplace(keyOf(channel), channel);
   }
@@ -263,12 +281,13 @@ int sample(const ToolContext& context, const ChannelArguments& wanted) {
   } else {
     printSample(context, channelsOf(*taken.first), std::nullopt);
   }
-  if (taken.missing > 0) {
-    complain(
-        context,
-        counted(static_cast<std::uint64_t>(taken.missing), "channel") + " not served by the hub",
-        kWrong);
+  if (taken.unserved > 0) {
+    complain(context, counted(taken.unserved, "channel") + " not served by the hub", kWrong);
     complete = false;
+  }
+  if (taken.withoutValue > 0 && !context.json) {
+    printLine(context, "");
+    printLine(context, counted(taken.withoutValue, "channel") + " without a value now", Ink::Faint);
   }
   return complete ? kSuccess : kWrong;
 }
@@ -297,8 +316,10 @@ void addChannelCommands(CLI::App& app, ToolContext& context) {
       addFamily(app, "channels", "Show the statistics channels that drivers publish");
   CommandGroup<ChannelArguments> channels(family, context);
   ChannelArguments& wanted = channels.arguments();
-  addFilters(channels.add("list", "List the statistics channels", list), wanted);
-  Command command = channels.add(
+  Command command = channels.add("list", "List the statistics channels", list);
+  addFilters(command, wanted);
+  command.flag("--verbose", &wanted.verbose, "Also say what each one means and where it is read");
+  command = channels.add(
       "sample", "Print the values of channels; exit status 1 if one is not served", sample);
   addFilters(command, wanted);
   command

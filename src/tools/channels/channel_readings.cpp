@@ -92,6 +92,11 @@ std::string channelName(KvDictionary& channel) {
                          : fmt::format("{:#x}", HwReportChannelGetChannelID(&channel));
 }
 
+const KvDictionary* channelDetails(const KvDictionary& channel) {
+  const auto* const line = channel.getAs<KvArray>("LegendChannel");
+  return line != nullptr ? line->getAs<KvDictionary>(kLegendDetails) : nullptr;
+}
+
 std::string textOf(const KvString* text) {
   return text != nullptr ? std::string(text->view()) : std::string();
 }

@@ -33,6 +33,9 @@ std::vector<std::optional<std::int64_t>> readArray(const KvDictionary& channel);
 
 // The channel's name, else its id in hexadecimal.
 std::string channelName(KvDictionary& channel);
+// What the channel's source says of it beyond what the library reads (kLegendDetails); null if it
+// says nothing.
+const KvDictionary* channelDetails(const KvDictionary& channel);
 // Text that may be missing; empty then.
 std::string textOf(const KvString* text);
 // "simple", "state", "histogram", "array"; "unknown" for every other format.

@@ -3,12 +3,13 @@
 #include <algorithm>
 #include <cmath>
 
-#include <fmt/core.h>
+#include <fmt/format.h>
 #include <nlohmann/json.hpp>
 
 #include "hwreport/channel.h"
 #include "hwreport/descriptions.h"
 #include "hwreport/values.h"
+#include "platform/protocol/hub_protocol.h"
 #include "tools/channels/channel_readings.h"
 
 namespace tally::tools {
@@ -193,6 +194,36 @@ Json jsonOfChannel(KvDictionary& channel) {
           {"subgroup", jsonOfText(HwReportChannelGetSubGroup(&channel))},
           {"unit", hexadecimal(HwReportChannelGetUnit(&channel))},
           {"unitLabel", jsonOfText(HwReportChannelGetUnitLabel(&channel))}};
+}
+
+void addDetails(Json& document, const KvDictionary& channel) {
+  const KvDictionary* const details = channelDetails(channel);
+  const auto textOfDetail = [&](std::string_view key) {
+    return jsonOfText(details != nullptr ? details->getAs<KvString>(key) : nullptr);
+  };
+  const auto* const width = details != nullptr ? details->getAs<KvNumber>(kDetailWidth) : nullptr;
+  document["semantics"] = textOfDetail(kDetailSemantics);
+  document["scope"] = textOfDetail(kDetailScope);
+  document["width"] = width != nullptr && width->asInt64() > 0 ? Json(width->asInt64()) : Json();
+  document["file"] = textOfDetail(kDetailFile);
+  document["description"] = textOfDetail(kDetailDescription);
+}
+
+std::string detailsText(const KvDictionary& channel) {
+  Json details;
+  addDetails(details, channel);
+  std::vector<std::string> parts;
+  for (const char* const key : {"description", "semantics", "file"}) {
+    if (details[key].is_string()) parts.push_back(details[key].get<std::string>());
+  }
+  if (parts.empty()) return {};
+  const Json& width = details["width"];
+  if (width.is_number()) {
+    parts.push_back(fmt::format("{} bits since {}", width.get<std::int64_t>(),
+                                details["scope"].is_string() ? details["scope"].get<std::string>()
+                                                             : std::string("a time unknown")));
+  }
+  return fmt::format("{}", fmt::join(parts, "; "));
 }
 
 Json jsonOfSample(KvDictionary& channel) {

@@ -42,6 +42,10 @@ class ChannelPrinter {
 // "group", "subgroup", "unit", "unitLabel". 64-bit words are hexadecimal strings, what is missing
 // is null.
 Json jsonOfChannel(KvDictionary& channel);
+// Adds "semantics", "scope", "width" in bits, "file" and "description"; null if they are not known.
+void addDetails(Json& document, const KvDictionary& channel);
+// The same in one line; empty if nothing is known.
+std::string detailsText(const KvDictionary& channel);
 // The same with its "value", "states", "buckets" or "values".
 Json jsonOfSample(KvDictionary& channel);
 
