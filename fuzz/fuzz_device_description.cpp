@@ -63,13 +63,14 @@ FUZZ_TARGET(device_description)(const std::uint8_t* data, std::size_t size) {
   device->HasInternalDiagnostics("Value");
   device->copySystemVersionDictionary();
   device->SMAOSVersion();
-  LinuxKernelValues values(description);
+  const auto tree = std::make_shared<const SystemTree>(folder.root);
+  LinuxKernelValues values(description, tree);
   askKernelValues(values);
   LinuxLocale locale(folder.root, {}, description);
   locale.PreferredLanguages();
   locale.SystemLanguages();
   locale.CurrentRegionCode();
-  LinuxLogHeaderFacts facts(device, description);
+  LinuxLogHeaderFacts facts(device, description, tree);
   for (const std::string& line : {facts.SysIdDescription(), facts.HardwareModelString()}) {
     require(line.find('\n') == line.npos, "a line of a log's header stays one");
   }

@@ -25,7 +25,8 @@ class ErrorLog final : public SystemLog {
 Platform makePlatform(std::string_view root) {
   Platform services;
   services.log = std::make_shared<ErrorLog>();
-  addDeviceRegistry(services, std::string(root));
+  const DeviceRoot device{std::string(root)};
+  addDeviceRegistry(services, device, std::make_shared<const SystemTree>(device));
   return services;
 }
 

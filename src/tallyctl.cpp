@@ -16,9 +16,11 @@ int main(int count, char** arguments) {
   context.root = deviceRootFromEnvironment();
   context.output = terminalOf(1);
   context.errors = terminalOf(2);
-  return tools::runTool(
-      std::move(context), {arguments, static_cast<std::size_t>(count)},
-      [](const std::string& root) {
-        return makeHostPlatform(root, {tools::makeToolLog(stderr), /*readOnlyPreferences=*/true});
-      });
+  return tools::runTool(std::move(context), {arguments, static_cast<std::size_t>(count)},
+                        [](const tools::ToolContext& tool) {
+                          const DeviceRoot root(tool.root);
+                          return makeHostPlatform(
+                              root, {tools::makeToolLog(stderr), /*readOnlyPreferences=*/true,
+                                     std::make_shared<const SystemTree>(root, tool.play)});
+                        });
 }

@@ -5,8 +5,10 @@
 namespace tally {
 
 Platform makeHostPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
-  Platform services = makeLinuxPlatform(root, options);
-  addDeviceRegistry(services, root);
+  LinuxPlatformOptions shared = options;
+  if (!shared.tree) shared.tree = std::make_shared<const SystemTree>(root);
+  Platform services = makeLinuxPlatform(root, shared);
+  addDeviceRegistry(services, root, shared.tree);
   return services;
 }
 

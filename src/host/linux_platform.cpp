@@ -62,6 +62,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   const auto eventLoop = std::make_shared<SdEventLoop>(log);
   const auto bus = std::make_shared<BusConnection>();
 
+  const auto tree = options.tree ? options.tree : std::make_shared<const SystemTree>(root);
   const auto consent = std::make_shared<SubmissionConsent>(root, log, preferences, description);
 
   Platform services;
@@ -89,11 +90,11 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
       LocaleEnvironment{environmentVariable("LANGUAGE"), environmentVariable("LC_ALL"),
                         environmentVariable("LC_MESSAGES"), environmentVariable("LANG")},
       description);
-  services.kernelValues = std::make_shared<LinuxKernelValues>(description);
+  services.kernelValues = std::make_shared<LinuxKernelValues>(description, tree);
   services.stackshot = std::make_shared<DescribedStackshot>(described, description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   services.logHeaderFacts =
-      std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description);
+      std::make_shared<LinuxLogHeaderFacts>(services.deviceInformation, description, tree);
   services.analyticsEvents = std::make_shared<LinuxAnalyticsEvents>(
       analyticsEventsFolder(root), log, clock, preferences, description, consent);
   return services;

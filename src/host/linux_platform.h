@@ -4,6 +4,7 @@
 #include <memory>
 
 #include "host/described/device_description.h"
+#include "host/tree/system_tree.h"
 #include "platform/platform.h"
 
 namespace tally {
@@ -12,6 +13,8 @@ namespace tally {
 struct LinuxPlatformOptions {
   std::shared_ptr<SystemLog> log;  // null: the journal or standard error
   bool readOnlyPreferences = false;
+  // Null: that of the root, of a recording its first sample.
+  std::shared_ptr<const SystemTree> tree = nullptr;
 };
 
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a

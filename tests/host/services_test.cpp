@@ -122,7 +122,7 @@ TEST_F(ServicesTest, LogHeaderFactsAreLines) {
   const auto facts = [this](const std::string& dictionary) {
     const auto description = describe(dictionary);
     return LinuxLogHeaderFacts(std::make_shared<LinuxDeviceInformation>(root, description),
-                               description);
+                               description, std::make_shared<const SystemTree>(root));
   };
   auto described = facts(
       "<key>SystemID</key><string>a\nb</string><key>HardwareModel</key><string>M,1</string>"
@@ -199,7 +199,8 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
       "<key>kern.next</key><array><data>AQ==</data><data>Ag==</data></array></dict>"
       "<key>MonotonicTicks</key><integer>99</integer>"
       "<key>Timebase</key><dict/>");
-  LinuxKernelValues kernel(description);
+  const auto tree = std::make_shared<const SystemTree>(root);
+  LinuxKernelValues kernel(description, tree);
   const struct {
     const char* name;
     std::size_t room;
@@ -231,7 +232,7 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
   EXPECT_EQ(errors().size(), 2u) << "the number too large and the text";
   EXPECT_EQ(kernel.MonotonicTicks(), 99u);
   EXPECT_FALSE(kernel.TimebaseInfo());
-  LinuxKernelValues real(std::make_shared<DeviceDescription>(folder("none"), log));
+  LinuxKernelValues real(std::make_shared<DeviceDescription>(folder("none"), log), tree);
   const auto ticks = real.MonotonicTicks();
   EXPECT_GE(real.MonotonicTicks(), ticks);
   EXPECT_EQ(real.TimebaseInfo()->denominator, 1u);

@@ -64,8 +64,8 @@ class ToolTest : public TemporaryRoot {
     std::FILE* const out = context.out = open("out");
     std::FILE* const err = context.err = open("err");
     Outcome outcome;
-    outcome.status = runTool(context, pointers, [this, err](const std::string& folder) {
-      return makePlatform(folder, err);
+    outcome.status = runTool(context, pointers, [this, err](const ToolContext& tool) {
+      return makePlatform(tool.root, err);
     });
     std::fclose(out);
     std::fclose(err);

@@ -205,6 +205,23 @@ Result<Descriptor> Directory::create(std::string_view name, unsigned mode) const
   return file;
 }
 
+Status Directory::writeNew(std::string_view name, std::string_view contents, unsigned mode) const {
+  const auto file = create(name, mode);
+  if (!file) return file.error();
+  while (!contents.empty()) {
+    const auto count =
+        retried([&] { return ::write(file->get(), contents.data(), contents.size()); });
+    if (count < 0) return systemError("cannot write", pathOf(name));
+    contents.remove_prefix(static_cast<std::size_t>(count));
+  }
+  return Done{};
+}
+
+Status Directory::makeLink(const std::string& target, std::string_view name) const {
+  if (::symlinkat(target.c_str(), descriptor(), std::string(name).c_str()) == 0) return Done{};
+  return systemError("cannot make", pathOf(name));
+}
+
 std::optional<FileIdentity> Directory::identity(std::string_view name) const {
   struct stat status {};
   if (::fstatat(descriptor(), std::string(name).c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) {
@@ -254,6 +271,20 @@ Status Directory::remove(std::string_view name) const {
   return systemError("cannot remove", pathOf(name));
 }
 
+Status Directory::removeTree(std::string_view name) const {
+  if (const auto directory = openDirectory(name)) {
+    const auto names = directory->list();
+    if (!names) return names.error();
+    for (const std::string& each : *names) {
+      if (auto removed = directory->removeTree(each); !removed) return removed;
+    }
+    const std::string text(name);
+    if (::unlinkat(descriptor(), text.c_str(), AT_REMOVEDIR) == 0) return Done{};
+    return systemError("cannot remove", pathOf(name));
+  }
+  return remove(name);
+}
+
 Status Directory::rename(std::string_view from, std::string_view to) const {
   if (::renameat(descriptor(), std::string(from).c_str(), descriptor(), std::string(to).c_str()) ==
       0) {
@@ -265,6 +296,13 @@ Status Directory::rename(std::string_view from, std::string_view to) const {
 Status Directory::sync() const {
   if (retried([&] { return ::fsync(descriptor()); }) != 0) {
     return systemError("cannot sync directory", path_);
+  }
+  return Done{};
+}
+
+Status Directory::syncVolume() const {
+  if (retried([&] { return ::syncfs(descriptor()); }) != 0) {
+    return systemError("cannot sync the volume of", path_);
   }
   return Done{};
 }

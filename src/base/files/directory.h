@@ -59,6 +59,9 @@ class Directory {
   Result<Descriptor> openForWriting(std::string_view name) const;
   // Creates a file, which must not exist yet (EEXIST).
   Result<Descriptor> create(std::string_view name, unsigned mode) const;
+  // Creates a file with its content, and a link; neither is durable before sync...() returns.
+  Status writeNew(std::string_view name, std::string_view contents, unsigned mode = 0644) const;
+  Status makeLink(const std::string& target, std::string_view name) const;
   // Whether a file that was opened in this directory meets the conditions above.
   Status check(int file, std::string_view name) const;
 
@@ -71,9 +74,13 @@ class Directory {
   Result<std::vector<std::string>> list() const;
   // Removing a missing entry succeeds.
   Status remove(std::string_view name) const;
+  // Removes a directory with everything in it; no link is followed.
+  Status removeTree(std::string_view name) const;
   Status rename(std::string_view from, std::string_view to) const;
   // Makes creations, renames and removals in this directory survive a power cut.
   Status sync() const;
+  // The same for everything on its volume.
+  Status syncVolume() const;
   // Bytes that an ordinary user can still write on the volume.
   std::optional<std::uint64_t> freeSpace() const;
 

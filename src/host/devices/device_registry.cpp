@@ -18,10 +18,11 @@ bool hasChannels(const RegistryEntry& entry) {
 
 }  // namespace
 
-void addDeviceRegistry(Platform& services, const DeviceRoot& root) {
+void addDeviceRegistry(Platform& services, const DeviceRoot& root,
+                       std::shared_ptr<const SystemTree> tree) {
   auto described =
       std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log);
-  KernelDevice device{std::make_shared<SystemTree>(root), services.log, nullptr};
+  KernelDevice device{std::move(tree), services.log, nullptr};
   if (services.metricsStore) {
     device.days = std::make_shared<DailyAmounts>(services.metricsStore, services.clock);
     services.dailyCounters = device.days;

@@ -7,7 +7,6 @@
 #include <cerrno>
 #include <cstring>
 
-#include "base/files/file.h"
 #include "base/number_text.h"
 #include "base/text_lines.h"
 #include "platform/tables/measured_metrics.h"
@@ -15,7 +14,7 @@
 namespace tally {
 namespace {
 
-constexpr std::size_t kLargestProcFile = 1u << 20;
+constexpr std::size_t kLargestMeminfo = 64u << 10;
 
 constexpr std::size_t widthOf(std::string_view name) {
   constexpr std::size_t kCounterWidth = 8;
@@ -67,6 +66,23 @@ std::optional<SwapUsage> parseSwapUsage(std::string_view meminfo, std::uint32_t 
   return SwapUsage{*total, *available, *total - *available, pageSize, 0};
 }
 
+std::optional<std::uint64_t> parseUptime(std::string_view uptime) {
+  // "123.45 456.78": seconds, of which the second figure counts the idle ones of all processors.
+  constexpr std::uint64_t kHundredth = 10'000'000, kMostHundredths = UINT64_MAX / kHundredth;
+  std::uint64_t hundredths = 0;
+  int decimals = -1;
+  for (const char letter : uptime.substr(0, uptime.find(' '))) {
+    if (letter == '.' && decimals < 0) {
+      decimals = 0;
+      continue;
+    }
+    if (letter < '0' || letter > '9' || hundredths > kMostHundredths / 10 - 1) return std::nullopt;
+    hundredths = hundredths * 10 + static_cast<std::uint64_t>(letter - '0');
+    if (decimals >= 0) ++decimals;
+  }
+  return decimals == 2 ? std::optional(hundredths * kHundredth) : std::nullopt;
+}
+
 std::optional<std::string> parseBootSession(std::string_view bootId) {
   std::string session(trimmed(bootId.substr(0, bootId.find('\n'))));
   if (session.empty()) return std::nullopt;
@@ -81,14 +97,14 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
   const std::size_t room = std::min(buffer.size(), *length);
   auto answer = described(name);
   if (!answer && name == "vm.swapusage") {
-    const auto meminfo = readFile("/proc/meminfo", kLargestProcFile);
+    const auto meminfo = tree_->fact("/proc/meminfo", kLargestMeminfo);
     const auto pageSize = static_cast<std::uint32_t>(::sysconf(_SC_PAGESIZE));
     if (const auto usage = meminfo ? parseSwapUsage(*meminfo, pageSize) : std::nullopt) {
       answer = Answer{0, bytesOf(*usage)};
     }
   }
   if (!answer && name == "kern.bootsessionuuid") {
-    const auto text = readFile("/proc/sys/kernel/random/boot_id", kLargestProcFile);
+    const auto text = tree_->fact("/proc/sys/kernel/random/boot_id");
     if (const auto session = text ? parseBootSession(*text) : std::nullopt) {
       const auto bytes = std::as_bytes(std::span(*session));
       answer = Answer{0, {bytes.begin(), bytes.end()}};
@@ -139,6 +155,9 @@ std::optional<LinuxKernelValues::Answer> LinuxKernelValues::convert(std::string_
 std::uint64_t LinuxKernelValues::MonotonicTicks() {
   if (const auto* ticks = description_->getAs<KvNumber>(Described::MonotonicTicks))
     return ticks->asUInt64();
+  if (tree_->isRecording()) {
+    return parseUptime(tree_->text("/proc/uptime").value_or("")).value_or(0);
+  }
   timespec now{};
   ::clock_gettime(CLOCK_MONOTONIC, &now);
   return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000 +

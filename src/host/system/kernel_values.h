@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "host/described/device_description.h"
+#include "host/tree/system_tree.h"
 #include "platform/kernel_values.h"
 
 namespace tally {
@@ -26,13 +27,17 @@ static_assert(sizeof(SwapUsage) == 32);
 // From the text of /proc/meminfo; empty unless it tells both the total and the free space.
 std::optional<SwapUsage> parseSwapUsage(std::string_view meminfo, std::uint32_t pageSize);
 
+// From the text of /proc/uptime: in nanoseconds.
+std::optional<std::uint64_t> parseUptime(std::string_view uptime);
+
 // From the text of the kernel's boot id: the same in upper case; empty when there is none.
 std::optional<std::string> parseBootSession(std::string_view bootId);
 
 class LinuxKernelValues final : public KernelValues {
  public:
-  explicit LinuxKernelValues(std::shared_ptr<DeviceDescription> description)
-      : description_(std::move(description)) {}
+  LinuxKernelValues(std::shared_ptr<DeviceDescription> description,
+                    std::shared_ptr<const SystemTree> tree)
+      : description_(std::move(description)), tree_(std::move(tree)) {}
   int readKernelValue(std::string_view name, std::span<std::byte> buffer,
                       std::size_t* length) override;
   bool hasKernelValue(std::string_view name) override;
@@ -48,6 +53,7 @@ class LinuxKernelValues final : public KernelValues {
   std::optional<Answer> convert(std::string_view name, const KvObject& value);
 
   std::shared_ptr<DeviceDescription> description_;
+  std::shared_ptr<const SystemTree> tree_;
   std::mutex taking_;
   std::map<std::string, std::size_t, std::less<>> taken_;  // items of described arrays
 };

@@ -7,27 +7,33 @@
 
 #include <random>
 
-#include "base/files/file.h"
 #include "base/printable.h"
 #include "base/text_lines.h"
 
 namespace tally {
 namespace {
 
-constexpr std::size_t kLargestModelFile = 4096;  // the size that such a file is said to have
 // Firmware tables first, then the tree that boards are described by, whose texts end in a zero.
 constexpr const char* kModelFiles[] = {"/sys/devices/virtual/dmi/id/product_name",
                                        "/sys/firmware/devicetree/base/model"};
 
-std::string runningKernel() {
+std::string runningKernel(const SystemTree& tree) {
+  if (tree.isRecording()) {
+    std::string text;
+    for (const char* const name : {"ostype", "osrelease", "arch"}) {
+      const auto part = tree.text("/proc/sys/kernel/" + std::string(name));
+      if (part && !part->empty()) text.append(text.empty() ? "" : " ").append(*part);
+    }
+    return text.empty() ? "unknown" : text;
+  }
   struct utsname names {};
   if (::uname(&names) != 0) return "unknown";
   return fmt::format("{} {} {}", names.sysname, names.release, names.machine);
 }
 
-std::string hardwareModel() {
+std::string hardwareModel(const SystemTree& tree) {
   for (const char* const path : kModelFiles) {
-    const auto text = readFile(path, kLargestModelFile);
+    const auto text = tree.fact(path);
     if (!text) continue;
     const std::string_view line =
         std::string_view(*text).substr(0, text->find_first_of(std::string_view("\n\0", 2)));
@@ -47,11 +53,11 @@ std::string LinuxLogHeaderFacts::describedOr(DescribedAs<KvString> entry, const 
 }
 
 std::string LinuxLogHeaderFacts::SysIdDescription() {
-  return describedOr(Described::SystemID, runningKernel());
+  return describedOr(Described::SystemID, runningKernel(*tree_));
 }
 
 std::string LinuxLogHeaderFacts::HardwareModelString() {
-  return describedOr(Described::HardwareModel, hardwareModel());
+  return describedOr(Described::HardwareModel, hardwareModel(*tree_));
 }
 
 std::string LinuxLogHeaderFacts::SystemVersionString() {

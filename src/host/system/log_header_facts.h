@@ -5,6 +5,7 @@
 #include <string>
 
 #include "host/described/device_description.h"
+#include "host/tree/system_tree.h"
 #include "platform/device_information.h"
 #include "platform/log_header_facts.h"
 
@@ -13,8 +14,9 @@ namespace tally {
 class LinuxLogHeaderFacts final : public LogHeaderFacts {
  public:
   LinuxLogHeaderFacts(std::shared_ptr<DeviceInformation> device,
-                      std::shared_ptr<DeviceDescription> description)
-      : device_(std::move(device)), description_(std::move(description)) {}
+                      std::shared_ptr<DeviceDescription> description,
+                      std::shared_ptr<const SystemTree> tree)
+      : device_(std::move(device)), description_(std::move(description)), tree_(std::move(tree)) {}
   std::string SysIdDescription() override;
   std::string HardwareModelString() override;
   std::string SystemVersionString() override;
@@ -28,6 +30,7 @@ class LinuxLogHeaderFacts final : public LogHeaderFacts {
 
   std::shared_ptr<DeviceInformation> device_;
   std::shared_ptr<DeviceDescription> description_;
+  std::shared_ptr<const SystemTree> tree_;
 };
 
 }  // namespace tally

@@ -69,9 +69,29 @@ int openBelow(int root, const std::string& path, int flags) {
   const auto opened = static_cast<int>(
       retried([&] { return ::syscall(SYS_openat2, root, name, &how, sizeof how); }));
   if (opened >= 0 || errno != ENOSYS) return opened;
-  const std::string resolved = resolvedBelow(root, relative);
+  // A last link that is not to be followed is not resolved either.
+  const bool keepsLast = (flags & O_NOFOLLOW) != 0;
+  const std::size_t last = keepsLast ? relative.rfind('/') + 1 : relative.size();
+  std::string resolved = resolvedBelow(root, relative.substr(0, last));
   if (resolved.empty()) return -1;
+  if (keepsLast) resolved += "/" + relative.substr(last);
   return retried([&] { return ::openat(root, resolved.c_str(), flags | O_NOFOLLOW | O_CLOEXEC); });
+}
+
+// The path of an open file, below the root.
+std::optional<std::string> pathBelow(int root, int file) {
+  const auto pathOf = [](int descriptor) {
+    return linkText(AT_FDCWD, "/proc/self/fd/" + std::to_string(descriptor));
+  };
+  const std::string whole = pathOf(file);
+  std::string top = pathOf(root);
+  if (top == "/") top.clear();
+  if (whole.empty() || !whole.starts_with(top)) return std::nullopt;
+  return whole.substr(top.size());
+}
+
+std::string samplePath(std::int64_t milliseconds) {
+  return "/samples/" + std::to_string(milliseconds);
 }
 
 std::vector<std::string> namesIn(int directory) {
@@ -104,11 +124,12 @@ struct SystemTree::Recording {
   }
 };
 
-SystemTree::SystemTree(const DeviceRoot& root, bool follow)
-    : prefix_(root.prefix()), follow_(follow && !prefix_.empty()) {}
+SystemTree::SystemTree(const DeviceRoot& root, bool follow, TreeObserver observer)
+    : prefix_(root.prefix()), follow_(follow && !prefix_.empty()), observer_(std::move(observer)) {}
 SystemTree::~SystemTree() = default;
 
 int SystemTree::root() const {
+  const std::lock_guard lock(opening_);
   if (!root_) {
     root_ = Descriptor(
         ::open(prefix_.empty() ? "/" : prefix_.c_str(), O_PATH | O_DIRECTORY | O_CLOEXEC));
@@ -117,25 +138,38 @@ int SystemTree::root() const {
 }
 
 int SystemTree::openAt(const std::string& path, int flags) const {
-  if (root() < 0) return -1;
-  if (follow_) {
-    (void)generation();
-    for (std::size_t sample = recording_->latest; sample > 0; --sample) {
-      const std::string changed =
-          "/samples/" + std::to_string(recording_->times[sample - 1]) + path;
-      const int opened = openBelow(root(), changed, flags);
-      if (opened >= 0) return opened;
-    }
+  if (observer_) {
+    observer_(path, (flags & O_PATH) != 0        ? TreeUse::Exists
+                    : (flags & O_DIRECTORY) != 0 ? TreeUse::List
+                                                 : TreeUse::Read);
   }
-  return openBelow(root(), path, flags);
+  if (root() < 0) return -1;
+  const int changed = follow_ ? openSample(path, flags) : -1;
+  return changed >= 0 ? changed : openBelow(root(), path, flags);
+}
+
+// The file of the latest sample that has it; -1 if it has not changed yet.
+int SystemTree::openSample(const std::string& path, int flags) const {
+  const std::size_t latest = generation();
+  // Samples hold the files alone; the links that lead to them are in the tree.
+  if (latest == 0 || (flags & (O_PATH | O_DIRECTORY)) != 0) return -1;
+  const Descriptor place(openBelow(root(), path, O_PATH));
+  const auto resolved = place ? pathBelow(root(), place.get()) : std::nullopt;
+  for (std::size_t sample = latest; sample > 0; --sample) {
+    const int opened = openBelow(
+        root(), samplePath(recording_->times[sample - 1]) + resolved.value_or(path), flags);
+    if (opened >= 0) return opened;
+  }
+  return -1;
 }
 
 std::size_t SystemTree::generation() const {
+  const int top = follow_ ? root() : -1;
   if (!follow_) return 0;
+  const std::lock_guard lock(opening_);
   if (!recording_) {
     recording_ = std::make_unique<Recording>();
-    const Descriptor samples(root() < 0 ? -1
-                                        : openBelow(root(), "/samples", O_RDONLY | O_DIRECTORY));
+    const Descriptor samples(top < 0 ? -1 : openBelow(top, "/samples", O_RDONLY | O_DIRECTORY));
     for (const std::string& name : namesIn(samples.get())) {
       if (const auto time = parseInt64(name); time && *time > 0) recording_->times.push_back(*time);
     }
@@ -190,15 +224,27 @@ std::optional<std::int64_t> SystemTree::number(const std::string& path) const {
   return content ? parseInt64(*content) : std::nullopt;
 }
 
+std::optional<std::string> SystemTree::fact(const std::string& path, std::size_t limit) const {
+  if (isThisMachine() || isRecording()) return text(path, limit);
+  const auto content = readFile(path, limit);
+  return content ? std::optional(std::string(trimmed(*content))) : std::nullopt;
+}
+
+std::optional<TreeEntry> SystemTree::examine(const std::string& path) const {
+  const Descriptor place(openAt(path, O_PATH | O_NOFOLLOW));
+  struct stat status {};
+  if (!place || ::fstat(place.get(), &status) != 0) return std::nullopt;
+  using enum TreeEntry::Type;
+  if (S_ISLNK(status.st_mode)) return TreeEntry{Link, linkText(place.get(), "")};
+  return TreeEntry{S_ISREG(status.st_mode)   ? File
+                   : S_ISDIR(status.st_mode) ? Directory
+                                             : Other,
+                   ""};
+}
+
 std::optional<std::string> SystemTree::resolve(const std::string& path) const {
   const Descriptor place(openAt(path, O_PATH));
-  if (!place) return std::nullopt;
-  const auto pathOf = [](int descriptor) {
-    return linkText(AT_FDCWD, "/proc/self/fd/" + std::to_string(descriptor));
-  };
-  const std::string whole = pathOf(place.get()), top = prefix_.empty() ? "" : pathOf(root());
-  if (whole.empty() || !whole.starts_with(top)) return std::nullopt;
-  return whole.substr(top.size());
+  return place ? pathBelow(root(), place.get()) : std::nullopt;
 }
 
 }  // namespace tally

@@ -307,6 +307,7 @@ void addFilters(Command command, ChannelArguments& wanted) {
       .oneOf({"simple", "state", "histogram", "array"});
   command.option("--unit", {"UNIT", ValueKind::Text}, &wanted.unit,
                  "Only this unit: its label, or its word (0x...)");
+  command.canPlay();
 }
 
 }  // namespace

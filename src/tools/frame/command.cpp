@@ -60,6 +60,10 @@ Option Command::flag(const char* name, const std::string& description) const {
   return Option(*app_->add_flag(name, description));
 }
 
+void Command::canPlay() const {
+  flag("--play", &context_->play, "Let the samples of a recording follow the clock");
+}
+
 void Command::hide() const { app_->group(""); }
 
 Command addCommand(CLI::App& family, ToolContext& context, const char* name,

@@ -57,6 +57,8 @@ class Command {
   Option flag(const char* name, bool* target, const std::string& description) const;
   // A flag that need not be stored.
   Option flag(const char* name, const std::string& description) const;
+  // --play, for a command that reads what a recording may be the source of.
+  void canPlay() const;
   // Neither help nor completion shows it.
   void hide() const;
 

@@ -1,6 +1,7 @@
 #include "tools/frame/command_families.h"
 
 #include "tools/channels/channel_commands.h"
+#include "tools/device/device_commands.h"
 #include "tools/doctor/doctor_command.h"
 #include "tools/endpoint/send_commands.h"
 #include "tools/frame/complete_command.h"
@@ -17,9 +18,10 @@ namespace tally::tools {
 
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
-      addStoreCommands, addWhitelistCommands, addReportCommands, addExplainCommand,
-      addNandCommands,  addChannelCommands,   addPrefsCommands,  addDoctorCommand,
-      addSendCommands,  addTaskingCommands,   addForgetCommand,  addCompleteCommand,
+      addStoreCommands,   addWhitelistCommands, addReportCommands,  addExplainCommand,
+      addNandCommands,    addChannelCommands,   addDeviceCommands,  addPrefsCommands,
+      addDoctorCommand,   addSendCommands,      addTaskingCommands, addForgetCommand,
+      addCompleteCommand,
   };
   return kFamilies;
 }

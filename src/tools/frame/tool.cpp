@@ -41,7 +41,7 @@ int runCommand(ToolContext& context, std::span<const char* const> arguments,
       break;
   }
   // The libraries hwreport and storage find the platform in force; commands are handed it.
-  PlatformScope scope(makePlatform(context.root));
+  PlatformScope scope(makePlatform(context));
   context.platform = &scope.services();
   return context.command();
 }

@@ -31,6 +31,7 @@ enum class ValueKind { Text, Number, StoreKey, Day, Domain, Preference, Log, Fil
 struct ToolContext {
   std::string root;   // the device root: --root, else what it was built with
   bool json = false;  // --json: output for programs
+  bool play = false;  // --play: the samples of a recording follow the clock
   Terminal output;    // what standard output can show
   Terminal errors;    // what standard error can show
   std::FILE* out = stdout;
@@ -46,8 +47,8 @@ struct ToolContext {
   std::function<int()> command;
 };
 
-// Makes the platform of a device root.
-using PlatformFactory = std::function<Platform(const std::string& root)>;
+// Makes the platform of the context's device root.
+using PlatformFactory = std::function<Platform(const ToolContext& context)>;
 
 // Runs the command that the arguments name (the first is the program's own name) and returns the
 // exit status, which is kWrong where context.out could not be written. Help goes to context.out,

@@ -17,11 +17,14 @@ bool hasDriver(Platform& platform) {
 
 Command addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
                        const char* description, std::function<int()> run) {
-  return addCommand(nand, context, name, description, [&context, run = std::move(run)] {
-    if (hasDriver(*context.platform)) return run();
-    return complain(context, "this device has no driver that exports figures of its flash storage",
-                    kWrong);
-  });
+  const Command command =
+      addCommand(nand, context, name, description, [&context, run = std::move(run)] {
+        if (hasDriver(*context.platform)) return run();
+        return complain(
+            context, "this device has no driver that exports figures of its flash storage", kWrong);
+      });
+  command.canPlay();
+  return command;
 }
 
 }  // namespace tally::tools
