@@ -140,6 +140,17 @@ void sweepChannels(DailyCounters& counters, StoreBatch& batch) {
   }
 }
 
+void recordWear(Platform& platform) {
+  MetricsStore& store = *platform.metricsStore;
+  for (const FlashDisk& disk : platform.flashDisks->disks()) {
+    if (disk.isRemovable || disk.identity.empty() || !disk.wear) continue;
+    const auto row = wearRowOf(*disk.wear, store.TBDaysSince1970());
+    if (row && addsToHistory(store.wearHistory(disk.identity), *row)) {
+      store.addWear(disk.identity, *row);
+    }
+  }
+}
+
 }  // namespace
 
 void runTelemetrySweep(Platform& platform) {
@@ -149,6 +160,7 @@ void runTelemetrySweep(Platform& platform) {
   sweepStorage(*platform.log, batch);
   forwardEccEvents(platform);
   sweepChannels(*platform.dailyCounters, batch);
+  recordWear(platform);
 }
 
 }  // namespace tally

@@ -11,6 +11,7 @@
 #include "base/time_text.h"
 #include "kv/value.h"
 #include "platform/counter_state.h"
+#include "platform/flash/wear_history.h"
 
 namespace tally {
 
@@ -71,6 +72,11 @@ class MetricsStore {
   // The history of the store on its default path. Never null: a store that is missing has no rows,
   // one that cannot be read has none either and the reason is logged at error level.
   virtual std::unique_ptr<HistoryStore> openHistory() = 0;
+  // The recorded wear of a disk, oldest first; none if there is no store. A failure is logged.
+  virtual std::vector<WearRow> wearHistory(std::string_view) { return {}; }
+  // Records the wear of a disk, once for each day; within a batch, as part of its transaction.
+  // Kept however old it gets. Ignored while the clock is not set.
+  virtual void addWear(std::string_view, const WearRow&) {}
 };
 
 }  // namespace tally

@@ -18,6 +18,7 @@
 #include "platform/device_registry.h"
 #include "platform/event_loop.h"
 #include "platform/files.h"
+#include "platform/flash/flash_disks.h"
 #include "platform/ipc_endpoint.h"
 #include "platform/kernel_values.h"
 #include "platform/locale.h"
@@ -63,6 +64,7 @@ struct Platform {
   std::shared_ptr<KernelValues> kernelValues;
   std::shared_ptr<DeviceRegistry> deviceRegistry;
   std::shared_ptr<DailyCounters> dailyCounters = std::make_shared<DailyCounters>();
+  std::shared_ptr<FlashDisks> flashDisks = std::make_shared<FlashDisks>();
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<LogHeaderFacts> logHeaderFacts;

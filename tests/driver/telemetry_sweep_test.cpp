@@ -204,5 +204,33 @@ TEST_F(TelemetrySweepTest, ChannelsOfTheHub) {
   }
 }
 
+TEST_F(TelemetrySweepTest, EachChangeOfADisksWearIsRecordedAndElseAWeek) {
+  auto& disks = storage.platform.flashDisks->list;
+  const auto& rows = storage.platform.metricsStore->wears;
+  Wear wear;
+  wear.used = {{{10, 20}, ""}};
+  disks = {{"sda", DiskKind::Ufs, "UFS 1", false, false, wear},
+           {"mmcblk1", DiskKind::Other, "other 2", true, false, wear},
+           {"sdb", DiskKind::Ufs, "", false, false, wear},
+           {"sdc", DiskKind::Other, "other 3", false, true, std::nullopt}};
+  std::vector<std::int32_t> days;
+  const auto sweepOn = [&](std::int32_t day, unsigned used, std::int64_t age = 0) {
+    storage.platform.clock->setDay(day, 3600);
+    disks[0].wear->used->value = {used, used + 10};
+    disks[0].wear->ageSeconds = age;
+    sweep();
+    days.clear();
+    for (const WearRow& row : rows.at("UFS 1")) days.push_back(row.day);
+    return days;
+  };
+  EXPECT_THAT(sweepOn(20000, 10), ElementsAre(20000));
+  EXPECT_THAT(sweepOn(20006, 10), ElementsAre(20000));
+  EXPECT_THAT(sweepOn(20007, 10), ElementsAre(20000, 20007));
+  EXPECT_THAT(sweepOn(20008, 20), ElementsAre(20000, 20007, 20008));
+  EXPECT_THAT(sweepOn(20100, 20, 92 * 86400), ElementsAre(20000, 20007, 20008))
+      << "figures that are as old as the last row";
+  EXPECT_EQ(rows.size(), 1u) << "neither cards nor disks without identity or wear";
+}
+
 }  // namespace
 }  // namespace tally

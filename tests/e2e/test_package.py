@@ -53,6 +53,7 @@ class Package(unittest.TestCase):
         wanted = ["Library/Preferences", TIMER_LINK, *(f"usr/{path}" for path in (
             "bin/tallyctl", "lib/systemd/system/tallyrun.service", "lib/systemd/system/tallyrun-day.timer",
             "lib/systemd/system/tallyrun-counters.service",
+            "libexec/tallyrun-nvme-health", "lib/systemd/system/tallyrun-nvme-health.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
             "share/tallyrun/Whitelist_Nimbus.plist", "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
@@ -131,7 +132,7 @@ class Package(unittest.TestCase):
         self.assertEqual((home.stat().st_mode & 0o777, list(home.iterdir())), (0o700, []))
         units = root / "usr/lib/systemd/system"
         for unit in units.glob("*.service"):  # the program is not installed on this machine
-            unit.write_text(unit.read_text().replace("/usr/bin/", f"{root}/usr/bin/"))
+            unit.write_text(re.sub("/usr/(bin|libexec)/", rf"{root}/usr/\1/", unit.read_text()))
             exposure = checked("systemd-analyze", "security", "--offline=true", "--threshold=30", unit)
             self.assertRegex(exposure, "Overall exposure level")
         result = subprocess.run(["systemd-analyze", "verify", "--man=no",

@@ -48,5 +48,22 @@ class Storage(DeviceTest):
         self.assertNotIn(f",{PREFIX}", swept)
         self.assertIn(",vellum.hwreport.wakeups,", swept)
 
+    def test_the_kernels_disk_is_reported_every_day(self):
+        device = self.device
+        (device.root / "device/device.plist").unlink()  # nor is there an analytics service then
+        card = {"type": "MMC", "life_time": "0x03 0x02", "pre_eol_info": "0x01", "cid": "150100"}
+        for day in (TODAY, TODAY + 1):
+            for name, content in card.items():
+                device.write(f"sys/block/mmcblk0/device/{name}", content.encode() + b"\n")
+            device.run("-f", day=day)
+            card["life_time"] = "0x03 0x04"
+        used = f"{PREFIX}UserPartitionPEPercentUsed"
+        self.assertEqual([device.tool("store", "dump", "--day", str(day)).split(f"{used},{day},,")[1].split()[0]
+                          for day in (TODAY, TODAY + 1)], ["10", "30"])
+        health = device.tool("nand", "health", day=TODAY + 1)
+        self.assertIn("20-30 %", health)
+        self.assertIn("1 of the 2 steps", health)
+
+
 if __name__ == "__main__":
     unittest.main()

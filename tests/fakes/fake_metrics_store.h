@@ -85,6 +85,7 @@ struct FakeMetricsStore final : MetricsStore {
   std::shared_ptr<std::vector<std::string>> calls;
   std::shared_ptr<Clock> clock;
   FakeRows rows;
+  std::map<std::string, std::vector<WearRow>, std::less<>> wears;
   int batchDepth = 0, historiesOpened = 0;
 
   std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock->secondsSince1970()); }
@@ -98,6 +99,14 @@ struct FakeMetricsStore final : MetricsStore {
   std::unique_ptr<HistoryStore> openHistory() override {
     ++historiesOpened;
     return std::make_unique<FakeHistoryStore>(rows);
+  }
+  std::vector<WearRow> wearHistory(std::string_view disk) override {
+    const auto found = wears.find(disk);
+    return found == wears.end() ? std::vector<WearRow>() : found->second;
+  }
+  void addWear(std::string_view disk, const WearRow& row) override {
+    if (batchDepth == 0) return;  // it is to be part of the sweep's transaction
+    wears[std::string(disk)].push_back(row);
   }
 
   void putScalar(std::int32_t day, std::string_view key, std::int64_t value) {

@@ -356,6 +356,15 @@ struct FakeLogHeaderFacts final : LogHeaderFacts {
   std::int32_t processIdentifier() override { return 321; }
 };
 
+struct FakeFlashDisks final : FlashDisks {
+  std::vector<FlashDisk> list;
+  std::shared_ptr<DeviceRegistry> registry;  // of any disk
+  std::vector<FlashDisk> disks() override { return list; }
+  std::shared_ptr<DeviceRegistry> registryOf(std::string_view name) override {
+    return std::ranges::count(list, name, &FlashDisk::name) > 0 ? registry : nullptr;
+  }
+};
+
 struct FakePlatform {
   std::shared_ptr<CallLog> calls = std::make_shared<CallLog>();
   std::shared_ptr<FakeSystemLog> log = std::make_shared<FakeSystemLog>();
@@ -378,6 +387,7 @@ struct FakePlatform {
   std::shared_ptr<FakeAppRegistry> appRegistry = std::make_shared<FakeAppRegistry>();
   std::shared_ptr<FakeLocale> locale = std::make_shared<FakeLocale>();
   std::shared_ptr<FakeKernelValues> kernelValues = std::make_shared<FakeKernelValues>();
+  std::shared_ptr<FakeFlashDisks> flashDisks = std::make_shared<FakeFlashDisks>();
   std::shared_ptr<FakeLogHeaderFacts> logHeaderFacts = std::make_shared<FakeLogHeaderFacts>();
 
   Platform services() const {
@@ -399,6 +409,7 @@ struct FakePlatform {
     services.appRegistry = appRegistry;
     services.locale = locale;
     services.kernelValues = kernelValues;
+    services.flashDisks = flashDisks;
     services.logHeaderFacts = logHeaderFacts;
     return services;
   }

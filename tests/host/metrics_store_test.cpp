@@ -223,5 +223,31 @@ TEST_F(StoreTest, ManyCanMakeTheStoreAndWriteAtOnce) {
   EXPECT_THAT(lengths(), ElementsAre("20514 d x120"));
 }
 
+TEST_F(StoreTest, TheWearOfDisksIsKeptInATableThatIsMadeWhenItIsNeeded) {
+  const WearRow first{kToday - 400, {0, 10}, std::nullopt, std::nullopt},
+      second{kToday, {100, std::nullopt}, 5, INT64_MAX};
+  ASSERT_TRUE(set(kToday, "a", 1));
+  EXPECT_THAT(store()->wearHistory("disk"), IsEmpty()) << "a store of before";
+  const auto writer = store();
+  writer->beginBatch();
+  writer->addWear("disk", second);
+  writer->addWear("disk", first);
+  writer->addWear("other", first);
+  writer->addWear("disk", {100, {1, 2}, std::nullopt, std::nullopt});  // the clock is not set
+  EXPECT_THAT(store()->wearHistory("disk"), IsEmpty()) << "not before the batch ends";
+  writer->endBatch();
+  writer->addWear("disk", first);
+  EXPECT_THAT(store()->wearHistory("disk"), ElementsAre(first, second));
+  store()->TBClientCheckpoint();  // forgets days, but no wear
+  EXPECT_THAT(scalars(), ElementsAre("20514 a=1"));
+  sql("INSERT INTO wear VALUES ('disk', 20000, 'x', 1, 1, 1), ('disk', 20001, 9, 8, 1, 1), "
+      "('disk', 99999999999, 1, 1, 1, 1), ('disk', -1, 1, 1, 1, 1), "
+      "('disk', 20515, 7, NULL, -1, 'y')");
+  EXPECT_THAT(store()->wearHistory("disk"),
+              ElementsAre(first, second, WearRow{20515, {7, std::nullopt}, {}, {}}))
+      << "damaged rows are left out";
+  EXPECT_THAT(errors(), IsEmpty());
+}
+
 }  // namespace
 }  // namespace tally

@@ -236,6 +236,11 @@ TEST_F(ServicesTest, KernelValuesHaveTheirWidths) {
   const auto ticks = real.MonotonicTicks();
   EXPECT_GE(real.MonotonicTicks(), ticks);
   EXPECT_EQ(real.TimebaseInfo()->denominator, 1u);
+  // Without a description there is no analytics service that takes every other day of a boot.
+  std::array<std::byte, 100> session{};
+  std::size_t length = session.size();
+  EXPECT_EQ(real.readKernelValue("kern.bootsessionuuid", session, &length), ENOENT);
+  EXPECT_EQ(kernel.readKernelValue("kern.bootsessionuuid", session, &length), 0);
 }
 
 TEST_F(ServicesTest, TurnsNestAndEnd) {

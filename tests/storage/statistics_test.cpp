@@ -6,6 +6,8 @@
 #include <string>
 
 #include "fakes/statistics_buffer.h"
+#include "platform/protocol/storage_protocol.h"
+#include "storage/nand_info.h"
 #include "storage/statistics.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
@@ -139,6 +141,15 @@ TEST(KeyMap, EveryRowIsFoundByTheNameOfACounter) {
     EXPECT_EQ(keyMapKey(row)->view(), key);
   }
   EXPECT_TRUE(keyMap.data()[keyMap.size()].name.empty()) << "the end row";
+}
+
+TEST(CounterTable, TheKernelsDisksExportStatisticsOfTheseKeys) {
+  for (const ExportedStatistic& exported : kExportedStatistics) {
+    SCOPED_TRACE(exported.key);
+    Parse parse(statisticsBuffer(
+        {{kExportVersionStatistic, {kFullExportVersion}}, {exported.statistic, {4711}}}));
+    EXPECT_EQ(buildNandInfo(parse.context, true)->getInt64(exported.key), 4711);
+  }
 }
 
 }  // namespace

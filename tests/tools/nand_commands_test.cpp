@@ -2,6 +2,7 @@
 #include <algorithm>
 
 #include "fakes/fake_storage.h"
+#include "tools/storage/wear_forecast.h"
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -226,6 +227,101 @@ TEST_F(SnapshotCommand, ShowsRecordsOfBothLayouts) {
   EXPECT_EQ(refused.status, kWrong);
   EXPECT_THAT(refused.err, HasSubstr("a label format holds anything but one integer"));
   EXPECT_EQ(show({"/nowhere"}).status, kWrong);
+}
+
+TEST(WearForecast, TheBoundsComeFromTheRangesOfTheSteps) {
+  const auto row = [](std::int32_t day, unsigned least, unsigned most,
+                      std::optional<std::int64_t> host = {},
+                      std::optional<std::int64_t> flash = {}) {
+    return WearRow{day, {least, most}, host, flash};
+  };
+  const struct {
+    const char* name;
+    std::vector<WearRow> history;
+    WearRow now;
+    std::size_t steps;
+    std::optional<Estimate> perDay, endDay;
+    std::optional<double> bytesPerDay = {}, amplification = {};
+  } cases[] = {
+      {"nothing before", {}, row(100, 3, 3), 0, {}, {}},
+      {"one step", {row(0, 0, 10, 100, 300)}, row(100, 10, 20, 300, 800), 1, {}, {}, 2, 2.5},
+      {"two steps",
+       {row(0, 0, 10), row(100, 10, 20), row(190, 10, 20)},
+       row(200, 20, 30),
+       2,
+       Estimate{10.0 / 200, 0.1, 20.0 / 100},
+       Estimate{200 + 70 / 0.2, 1000, 200 + 80 / 0.05}},
+      {"whole percents",
+       {row(0, 1, 1), row(10, 2, 2)},
+       row(20, 3, 3),
+       2,
+       Estimate{1.0 / 20, 0.1, 0.2},
+       Estimate{20 + 96 / 0.2, 990, 20 + 97 / 0.05}},
+      {"a fall begins anew, days to come do not count",
+       {row(0, 50, 60), row(10, 60, 70), row(20, 70, 80), row(30, 0, 10), row(500, 90, 100)},
+       row(40, 10, 20),
+       1,
+       {},
+       {}},
+      {"used up",
+       {row(0, 80, 90), row(10, 90, 100)},
+       WearRow{20, {100, {}}, {}, {}},
+       2,
+       Estimate{0.5, 1, 1.1},
+       {}},
+      {"counters that fell", {row(0, 0, 10, 500, 500)}, row(10, 0, 10, 100, 200), 0, {}, {}, {}, 2},
+  };
+  const auto expectNear = [](const std::optional<Estimate>& got,
+                             const std::optional<Estimate>& want) {
+    ASSERT_EQ(got.has_value(), want.has_value());
+    if (!got) return;
+    EXPECT_NEAR(got->least, want->least, 1e-6);
+    EXPECT_NEAR(got->likely, want->likely, 1e-6);
+    EXPECT_NEAR(got->most, want->most, 1e-6);
+  };
+  for (const auto& c : cases) {
+    SCOPED_TRACE(c.name);
+    const WearForecast forecast = forecastOf(wearSeries(c.history, c.now));
+    EXPECT_EQ(forecast.steps, c.steps);
+    expectNear(forecast.perDay, c.perDay);
+    expectNear(forecast.endDay, c.endDay);
+    EXPECT_EQ(forecast.bytesPerDay, c.bytesPerDay);
+    EXPECT_EQ(forecast.writeAmplification, c.amplification);
+  }
+}
+
+class NandDevices : public ToolTest {
+ protected:
+  Outcome nand(const std::vector<std::string>& arguments) { return runUnder({"nand"}, arguments); }
+};
+
+TEST_F(NandDevices, ListsDisksAndReadsTheChosenOne) {
+  for (const auto& [name, lifeTime] :
+       {std::pair("mmcblk0", "0x01 0x03"), {"mmcblk1", "0x0b 0x0b"}}) {
+    const std::string folder = std::string("device/sys/block/") + name + "/device/";
+    put(folder + "type", "MMC\n");
+    put(folder + "life_time", lifeTime + std::string("\n"));
+    put(folder + "cid", std::string("serial") + name);
+  }
+  put("device/sys/block/mmcblk0/dev", "179:0");
+  put("device/proc/self/mountinfo", "1 0 179:0 / / rw - ext4 /dev/root rw\n");
+  put("device/proc/uptime", "200000.5 1");
+  const Outcome devices = nand({"devices"});
+  EXPECT_EQ(devices.status, kSuccess);
+  expectParts(devices.out, {"mmcblk0  eMMC  20-30 %", "2 days ago  the device's storage",
+                            "mmcblk1  eMMC  100 % or more"});
+  EXPECT_THAT(devices.out, Not(HasSubstr("serial")));
+  expectValues(nand({"devices", "--json"}).json(),
+               R"({"/0/isStorage": true, "/0/wear/used/value/most": 30, "/1/isStorage": false,
+                   "/1/wear/used/value/most": null, "/1/wear/spare": "absent"})");
+  expectParts(nand({"health"}).out, {"Wear, most used part                      20 %",
+                                     "Not enough history for a forecast: 0 of the 2 steps"});
+  const Outcome other = nand({"health", "--device", "mmcblk1", "--json"});
+  expectValues(other.json(), R"({"/wear/device": "mmcblk1", "/wear/steps": 0,
+      "/health/vellum.NANDInfo.Health.MaxPercentageNANDUsed": 100})");
+  EXPECT_EQ(nand({"health", "--device", "sda"}).status, kWrong);
+  putList(kRegistry, R"({"Entries": [{"Class": "OrreryEmbeddedNVMeController"}]})");
+  EXPECT_EQ(nand({"devices"}).status, kWrong) << "the description comes first";
 }
 
 }  // namespace

@@ -1,11 +1,16 @@
 #include "host/devices/device_registry.h"
 
+#include <algorithm>
+
 #include "host/described/registry_description.h"
 #include "host/devices/undescribed_source.h"
+#include "host/flash/flash_source.h"
+#include "host/flash/linux_flash_disks.h"
 #include "host/kernel/ecc_events.h"
 #include "host/kernel/kernel_statistics.h"
 #include "host/registry/source_registry.h"
 #include "platform/protocol/hub_protocol.h"
+#include "platform/protocol/storage_protocol.h"
 
 namespace tally {
 namespace {
@@ -14,6 +19,21 @@ namespace {
 bool hasChannels(const RegistryEntry& entry) {
   return entry.className == kStatisticsHubClass ||
          entry.properties->get(kLegendPublicProperty) != nullptr;
+}
+
+bool isStorageDriver(const RegistryEntry& entry) {
+  return std::ranges::count(kStorageDriverClasses, entry.className) > 0;
+}
+
+// Whether the storage driver is another than that of a flash disk.
+bool isStorageDescribed(SourceRegistry& registry) {
+  return std::ranges::any_of(kStorageDriverClasses, [&](std::string_view name) {
+    const RegistryHandle service = registry.RegistryFindService(ServiceMatchingByClass(name));
+    std::uint64_t id = kFlashEntryID;
+    if (service != 0) registry.RegistryGetEntryID(service, &id);
+    registry.HandleRelease(service);
+    return id != kFlashEntryID;
+  });
 }
 
 }  // namespace
@@ -31,10 +51,17 @@ void addDeviceRegistry(Platform& services, const DeviceRoot& root,
   }
   auto kernel = std::make_unique<UndescribedSource>(
       std::make_unique<KernelStatistics>(std::move(device)), *described, hasChannels);
+  const DiskReader disks(root, services.clock);
+  auto flash = std::make_unique<UndescribedSource>(std::make_unique<FlashSource>(disks), *described,
+                                                   isStorageDriver);
   std::vector<std::unique_ptr<RegistrySource>> sources;
   sources.push_back(std::move(described));
   sources.push_back(std::move(kernel));
-  services.deviceRegistry = std::make_shared<SourceRegistry>(std::move(sources));
+  sources.push_back(std::move(flash));
+  const auto registry = std::make_shared<SourceRegistry>(std::move(sources));
+  services.deviceRegistry = registry;
+  services.flashDisks = std::make_shared<LinuxFlashDisks>(
+      disks, [registry] { return isStorageDescribed(*registry); });
 }
 
 }  // namespace tally

@@ -13,6 +13,7 @@
 #include "host/store/store_history.h"
 #include "host/store/store_retention.h"
 #include "host/store/store_writer.h"
+#include "host/store/wear_table.h"
 
 namespace tally {
 namespace {
@@ -62,7 +63,25 @@ class SqliteMetricsStore final : public MetricsStore {
     return openSqliteHistory(file_, [this](const std::string& message) { report(Error{message}); });
   }
 
+  std::vector<WearRow> wearHistory(std::string_view disk) override {
+    auto store = openStoreForReading(file_);
+    if (store && !*store) return {};
+    auto rows = store ? readWear(**store, disk) : Result<std::vector<WearRow>>(store.error());
+    if (rows) return std::move(*rows);
+    report(rows.error());
+    return {};
+  }
+  void addWear(std::string_view disk, const WearRow& row) override {
+    if (row.day < kFirstPlausibleDay) return;
+    wears_.push_back({std::string(disk), row});
+    if (batchDepth_ == 0) writeBatch();
+  }
+
  private:
+  struct DiskWear {
+    std::string disk;
+    WearRow row;
+  };
   struct Scalar {
     std::int32_t day;
     std::string key;
@@ -157,7 +176,8 @@ class SqliteMetricsStore final : public MetricsStore {
   void writeBatch() {
     const auto scalars = std::exchange(batch_, {});
     const auto counters = std::exchange(counters_, {});
-    if (scalars.empty() && counters.empty()) return;
+    const auto wears = std::exchange(wears_, {});
+    if (scalars.empty() && counters.empty() && wears.empty()) return;
     const auto opened = writer(IfMissing::Create);
     if (!opened) return report(opened.error());
     report(transaction(**opened, [&]() -> Status {
@@ -167,6 +187,9 @@ class SqliteMetricsStore final : public MetricsStore {
       }
       for (const CounterState& counter : counters) {
         if (auto set = (*opened)->setCounter(counter); !set) return set;
+      }
+      for (const DiskWear& wear : wears) {
+        if (auto added = (*opened)->addWear(wear.disk, wear.row); !added) return added;
       }
       return Done{};
     }));
@@ -179,6 +202,7 @@ class SqliteMetricsStore final : public MetricsStore {
   std::optional<StoreWriter> writer_;
   std::vector<Scalar> batch_;
   std::vector<CounterState> counters_;  // of the batch too
+  std::vector<DiskWear> wears_;
   int batchDepth_ = 0;
 };
 

@@ -41,6 +41,10 @@ constexpr TableDefinition kOptionalTables[] = {
     {kCountersTable, R"sql((
   key TEXT NOT NULL PRIMARY KEY, epoch TEXT NOT NULL, last INTEGER NOT NULL, sum INTEGER NOT NULL,
   day INTEGER NOT NULL, amount INTEGER) WITHOUT ROWID)sql"},
+    {kWearTable, R"sql((
+  disk TEXT NOT NULL, day INTEGER NOT NULL, least INTEGER NOT NULL, most INTEGER,
+  host_bytes INTEGER, flash_bytes INTEGER,
+  PRIMARY KEY(disk, day)) WITHOUT ROWID)sql"},
 };
 // Tables that SQLite itself adds for its query planner on request. They are harmless.
 constexpr TableDefinition kStatistics[] = {

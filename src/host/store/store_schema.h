@@ -28,7 +28,7 @@ constexpr std::string_view kStoreKeyRule =
     "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
 
 // Tables that a store may lack until something is kept in them.
-constexpr std::string_view kCountersTable = "counters";
+constexpr std::string_view kCountersTable = "counters", kWearTable = "wear";
 Result<bool> hasTable(Database& database, std::string_view name);
 // Makes one of them if it is missing. REQUIRES: a transaction of a writer.
 Status makeOptionalTable(Database& database, std::string_view name);

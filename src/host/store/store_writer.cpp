@@ -6,6 +6,7 @@
 
 #include "host/store/sample_chunk.h"
 #include "host/store/store_rows.h"
+#include "host/store/wear_table.h"
 
 namespace tally {
 namespace {
@@ -180,6 +181,11 @@ Status StoreWriter::appendToChunks(std::int32_t day, std::string_view key,
   if (auto moved = tail.moveTo(day, key); !moved) return moved;
   if (auto appended = tail.append(values, offsets); !appended) return appended;
   return tail.finish();
+}
+
+Status StoreWriter::addWear(std::string_view disk, const WearRow& row) {
+  if (auto valid = checkKey(disk); !valid) return valid;
+  return writeWear(database_, disk, row);
 }
 
 Status StoreWriter::foldRecent() {

@@ -12,6 +12,7 @@
 
 #include "host/store/store_schema.h"
 #include "platform/counter_state.h"
+#include "platform/flash/wear_history.h"
 
 namespace tally {
 
@@ -41,6 +42,8 @@ class StoreWriter {
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
   // Keeps the state of a counter.
   Status setCounter(const CounterState& state);
+  // Makes the table if it is missing.
+  Status addWear(std::string_view disk, const WearRow& row);
   Status forgetBefore(std::int32_t day);
   Status forgetDay(std::int32_t day);
 

@@ -103,7 +103,9 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
       answer = Answer{0, bytesOf(*usage)};
     }
   }
-  if (!answer && name == "kern.bootsessionuuid") {
+  // A boot session's days are shared out between the analytics service and the daily report. There
+  // is no such service without a description, and then every day is the report's.
+  if (!answer && name == "kern.bootsessionuuid" && description_->exists()) {
     const auto text = tree_->fact("/proc/sys/kernel/random/boot_id");
     if (const auto session = text ? parseBootSession(*text) : std::nullopt) {
       const auto bytes = std::as_bytes(std::span(*session));

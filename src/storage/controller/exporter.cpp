@@ -2,15 +2,16 @@
 #include "storage/exporter.h"
 
 #include "platform/platform.h"
+#include "platform/protocol/storage_protocol.h"
 
 namespace tally {
 namespace {
 
 using Selectors = std::array<std::uint32_t, 2>;
-constexpr Selectors kStatsSelector{13, 13};
-constexpr Selectors kBandStatsSelector{11, 11};
-constexpr Selectors kDefectsListSelector{15, 15};
-constexpr Selectors kTelemetryListSelectors{17, 17};
+constexpr Selectors kStatsSelector{kSelectStatistics, kSelectStatistics};
+constexpr Selectors kBandStatsSelector{kSelectValidityList, kSelectValidityList};
+constexpr Selectors kDefectsListSelector{kSelectDefectsList, kSelectDefectsList};
+constexpr Selectors kTelemetryListSelectors{kSelectTelemetryList, kSelectTelemetryList};
 constexpr Selectors kTaskSchedulerSelectors{39, 39};
 constexpr Selectors kSnapshotSelectors{22, 22};
 constexpr Selectors kSnapshotHeaderSelectors{145, 145};
@@ -45,8 +46,9 @@ const std::uint32_t* SPXGetSnapshotHeaderSelectors() { return kSnapshotHeaderSel
 const std::uint32_t* SPXGetBandStatsSelectors() { return kBandStatsSelector.data(); }
 
 constinit const std::array<NandExporter, 3> nand_exporters{{
-    exporter("SPXStorage", "Device Characteristics", 5, 8),
-    exporter("OrreryEmbeddedNVMeController", "Controller Characteristics", -1, 9),
+    exporter(kStorageDriverClass.data(), kStorageCharacteristicsProperty.data(), 5,
+             kStorageFetchMethod),
+    exporter(kStorageDriverClasses[1].data(), "Controller Characteristics", -1, 9),
     {},
 }};
 

@@ -3,13 +3,15 @@
 #include <cstdint>
 
 #include "platform/platform.h"
+#include "platform/protocol/storage_protocol.h"
 #include "platform/tables/known_preferences.h"
 #include "storage/controller/statistics_fetch.h"
 
 namespace tally {
 namespace {
 
-constexpr unsigned kHostUnitShift = 12;  // the host's writes are counted in units of 4 KiB
+constexpr unsigned kHostUnitShift = 12;
+static_assert(1u << kHostUnitShift == kHostUnitBytes);
 
 float ratio(std::uint64_t written, std::uint64_t hostWrites) {
   if (hostWrites == 0) return 0;

@@ -7,6 +7,7 @@
 
 #include "base/time_text.h"
 #include "platform/platform.h"
+#include "platform/protocol/storage_protocol.h"
 #include "platform/tables/known_preferences.h"
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
@@ -19,7 +20,6 @@ double gCurrentSysWamp = 0;
 
 namespace {
 
-constexpr std::uint32_t kFirstFullExportVersion = 0x20002;
 constexpr std::size_t kUsualEntries = 760;
 
 struct NarrowKey {
@@ -238,7 +238,7 @@ KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump) 
   }
   addFields(*info, context, kGeometryKeys);
   addFields(*info, context, kOperationKeys);
-  if (context.exportVersion < kFirstFullExportVersion) return info;
+  if (context.exportVersion < kFullExportVersion) return info;
 
   info->set(kNANDInfoFormatWeeksSince2000Key, wideNumber(weeksSince2000(context.utilFormatTime)));
   info->set(kNANDInfoNumSleepOpsKey, wideNumber(context.numSleepOps));

@@ -8,7 +8,7 @@
 #include "base/natural_order.h"
 #include "base/printable.h"
 #include "base/time_text.h"
-#include "host/linux_platform.h"
+#include "host/host_platform.h"
 #include "host/preferences/property_list_preferences.h"
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
@@ -137,6 +137,15 @@ Candidates logs(const Line& line) {
   return found;
 }
 
+Candidates disks(const Line& line) {
+  Candidates found;
+  const Platform platform = makeHostPlatform(line.root, {line.context->platform->log, true});
+  for (const FlashDisk& disk : platform.flashDisks->disks()) {
+    found.push_back({disk.name, std::string(diskKindName(disk.kind))});
+  }
+  return found;
+}
+
 Candidates valuesOf(const Line& line, const OptionHelp& option) {
   Candidates found;
   for (const std::string& choice : option.choices) found.push_back({choice, ""});
@@ -155,6 +164,8 @@ Candidates valuesOf(const Line& line, const OptionHelp& option) {
       return preferenceKeys(line);
     case ValueKind::Log:
       return logs(line);
+    case ValueKind::Disk:
+      return disks(line);
     case ValueKind::File:
       return {{":file", ""}};
     case ValueKind::Directory:

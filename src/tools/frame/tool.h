@@ -26,7 +26,18 @@ enum ExitStatus : int {
 };
 
 // What a value on the command line is: completion offers what the device has of this kind.
-enum class ValueKind { Text, Number, StoreKey, Day, Domain, Preference, Log, File, Directory };
+enum class ValueKind {
+  Text,
+  Number,
+  StoreKey,
+  Day,
+  Domain,
+  Preference,
+  Log,
+  Disk,
+  File,
+  Directory
+};
 
 struct ToolContext {
   std::string root;   // the device root: --root, else what it was built with

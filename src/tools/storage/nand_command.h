@@ -10,4 +10,7 @@ namespace tally::tools {
 Command addNandCommand(CLI::App& nand, ToolContext& context, const char* name,
                        const char* description, std::function<int()> run);
 
+bool hasStorageDriver(const ToolContext& context);
+int complainOfNoDriver(const ToolContext& context);
+
 }  // namespace tally::tools

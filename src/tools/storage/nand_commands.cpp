@@ -11,11 +11,12 @@
 #include "tools/frame/command.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
-#include "tools/storage/nand_command.h"
+#include "tools/storage/nand_devices.h"
 #include "tools/storage/nand_event_commands.h"
 #include "tools/storage/nand_groups.h"
 #include "tools/storage/nand_list_commands.h"
 #include "tools/storage/nand_snapshot_commands.h"
+#include "tools/storage/wear_view.h"
 
 namespace tally::tools {
 namespace {
@@ -141,7 +142,7 @@ void printHealth(const ToolContext& context, const KvDictionary& info, const KvD
   }
 }
 
-int runHealth(const ToolContext& context) {
+int runHealth(const ToolContext& context, const std::optional<std::string>& device) {
   const auto info = CopyNANDInfo();
   const std::string failure = failureOf(*info);
   if (!failure.empty()) return complainOf(context, failure);
@@ -150,14 +151,18 @@ int runHealth(const ToolContext& context) {
   const bool retirable =
       info->contains(kSpareKey) && lab->getInt64(kNANDInfoHealthIsNANDRetirableKey) == kOne;
   const bool deletion = NandRecommendsContentDeletion()->value();
+  const auto disk = findDisk(context, device);
   if (context.json) {
-    printJson(context, {{"health", jsonOf(health.get())},
-                        {"fixline", jsonOf(fixlineExtract(*health).get())},
-                        {"internalLab", jsonOf(lab.get())},
-                        {"ota", jsonOf(otaExtract(*health).get())},
-                        {"recommendsContentDeletion", deletion}});
+    Json document = {{"health", jsonOf(health.get())},
+                     {"fixline", jsonOf(fixlineExtract(*health).get())},
+                     {"internalLab", jsonOf(lab.get())},
+                     {"ota", jsonOf(otaExtract(*health).get())},
+                     {"recommendsContentDeletion", deletion}};
+    if (disk) document["wear"] = wearJson(context, *disk);
+    printJson(context, document);
   } else {
     printHealth(context, *info, *health, retirable, deletion);
+    if (disk) printWear(context, *disk);
   }
   return retirable ? kWrong : kSuccess;
 }
@@ -167,14 +172,16 @@ int runHealth(const ToolContext& context) {
 void addNandCommands(CLI::App& app, ToolContext& context) {
   CLI::App& nand = addFamily(app, "nand", "Show figures and health of the flash storage");
 
+  addNandDevices(nand, context);
   const auto text = std::make_shared<std::string>();
-  addNandCommand(nand, context, "info", "Show what the storage driver exports, in groups",
-                 [&context, text] { return runInfo(context, *text); })
+  const auto device = std::make_shared<std::optional<std::string>>();
+  addNandDiskCommand(nand, context, "info", "Show what the storage driver exports, in groups",
+                     device, [&context, text] { return runInfo(context, *text); })
       .optionalArgument(kTextValue, text.get(), "Only keys that contain it");
-  addNandCommand(
+  addNandDiskCommand(
       nand, context, "health",
       "Show wear, errors and spare blocks; exit status 1 when the storage should be retired",
-      [&context] { return runHealth(context); });
+      device, [&context, device] { return runHealth(context, *device); });
 
   addNandListCommands(nand, context);
   addNandEventCommands(nand, context);

@@ -1,0 +1,38 @@
+// Reads what disks say, each kind in its own way.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "base/files/device_root.h"
+#include "host/flash/disk_list.h"
+#include "platform/clock.h"
+#include "platform/flash/wear.h"
+
+namespace tally {
+
+// Copies are independent: each opens the tree again.
+class DiskReader {
+ public:
+  // Without a clock nothing is known of the age of NVMe pages.
+  DiskReader(DeviceRoot root, std::shared_ptr<Clock> clock)
+      : root_(std::move(root)), clock_(std::move(clock)) {}
+
+  std::vector<Disk> disks() const { return listDisks(SystemTree(root_)); }
+  std::string deviceDisk(const std::vector<Disk>& disks) const {
+    return tally::deviceDisk(SystemTree(root_), disks);
+  }
+  // Whether wear() may find something. Asks no disk.
+  bool mayTellWear(const Disk& disk) const;
+  std::optional<Wear> wear(const Disk& disk) const;
+  // Tells the disk from one that takes its place; empty if it cannot be told.
+  std::string identity(const Disk& disk) const;
+
+ private:
+  DeviceRoot root_;
+  std::shared_ptr<Clock> clock_;
+};
+
+}  // namespace tally
