@@ -6,6 +6,7 @@
 #include "base/printable.h"
 #include "tools/doctor/health_drivers.h"
 #include "tools/doctor/health_files.h"
+#include "tools/doctor/health_kernel.h"
 #include "tools/doctor/health_services.h"
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"
@@ -56,6 +57,7 @@ int examine(const ToolContext& context) {
   examineFiles(context, checks);
   examineServices(context, checks);
   examineDrivers(context, checks);
+  examineKernelSources(context, checks);
   const auto wrong =
       static_cast<std::size_t>(std::ranges::count(checks, Health::Wrong, &HealthCheck::health));
   if (context.json) {
