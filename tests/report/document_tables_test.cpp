@@ -6,21 +6,13 @@
 
 #include <cmath>
 
-#include "base/files/file.h"
 #include "config/whitelist_options.h"
+#include "document_table.h"
 #include "platform/tables/known_preferences.h"
 #include "platform/tables/measured_metrics.h"
 
 namespace tally {
 namespace {
-
-void expectInDocument(const char* name, const std::string& table) {
-  const auto text = readFile(std::string(DOCUMENTS "/") + name, 1 << 20);
-  ASSERT_TRUE(text) << text.error().message;
-  EXPECT_TRUE(text->find("\n\n" + table + "\n") != std::string::npos)
-      << name << " lacks this table:\n"
-      << table;
-}
 
 std::string typeText(const KnownPreference& known) {
   constexpr const char* kNames[] = {"boolean", "integer", "real",       "string",

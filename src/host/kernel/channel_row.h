@@ -16,6 +16,7 @@ enum class KernelSource : std::uint8_t {
   Memory,
   Paging,
   ProcessorTime,
+  ProcessorTimes,
   ProcessorIdle,
   ProcessorFrequency,
   ProcessorThrottling,

@@ -113,7 +113,6 @@ constexpr ChannelRow kRows[] = {
 {ProcessorTime, "steal", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in which the hypervisor ran something else"},
 {ProcessorTime, "guest", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in guests, which is also in user"},
 {ProcessorTime, "guest-nice", kMilliseconds, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "", "time in guests of low priority, which is also in nice"},
-{ProcessorTime, "times", kMilliseconds, kArray, kUnsteady, kBoot, 64, "/proc/stat", "", "time of one processor: user, nice, system, idle, iowait, irq, softirq, steal, guest, guest-nice"},
 {ProcessorTime, "context-switches", kEvents, kSimple, kCounter, kBoot, 64, "/proc/stat", "cpu.context-switches", "switches from one task to another"},
 {ProcessorTime, "forks", kEvents, kSimple, kCounter, kBoot, 64, "/proc/stat", "cpu.forks", "processes and threads that were started"},
 {ProcessorTime, "interrupts", kEvents, kSimple, kUnsteady, kBoot, 64, "/proc/stat", "cpu.interrupts", "interrupts of all lines"},
@@ -121,6 +120,8 @@ constexpr ChannelRow kRows[] = {
 {ProcessorTime, "soft-interrupts-by-kind", kEvents, kArray, kUnsteady, kBoot, 64, "/proc/stat", "", "soft interrupts: HI, TIMER, NET_TX, NET_RX, BLOCK, IRQ_POLL, TASKLET, SCHED, HRTIMER, RCU"},
 {ProcessorTime, "running", kNone, kSimple, kGauge, kBoot, 0, "/proc/stat", "", "tasks that run or could"},
 {ProcessorTime, "blocked", kNone, kSimple, kGauge, kBoot, 0, "/proc/stat", "", "tasks that wait for storage"},
+
+{ProcessorTimes, "times", kMilliseconds, kArray, kUnsteady, kBoot, 64, "/proc/stat", "", "time of one processor: user, nice, system, idle, iowait, irq, softirq, steal, guest, guest-nice"},
 
 {ProcessorIdle, "idle", kMicroseconds, kState, kStates, kBoot, 64, "/sys/devices/system/cpu/*/cpuidle", "", "time in each idle state"},
 

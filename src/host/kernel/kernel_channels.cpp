@@ -110,7 +110,9 @@ TypeWord typeOf(const ChannelRow& row, std::uint16_t category, std::uint16_t ele
 
 KernelChannels::KernelChannels(const SystemTree& tree) {
   Findings found;
-  for (const SourceRow& source : sourceTable()) source.find(tree, found);
+  for (const SourceRow& source : sourceTable()) {
+    if (source.find != nullptr) source.find(tree, found);
+  }
   findings_ = std::move(found);
   const auto& channels = findings_.channels();
   names_.resize(channels.size());

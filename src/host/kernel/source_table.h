@@ -14,7 +14,9 @@ struct SourceRow {
   KernelSource source;
   std::string_view name;   // of its driver, and the front of its channels' names
   std::string_view title;  // of its channels' group
-  // Adds what there is on the device now.
+  std::string_view
+      device;  // what a channel's name has between the source's and its own, for people
+  // Adds what there is on the device now. Null: the source before it does, whose file it shares.
   void (*find)(const SystemTree& tree, Findings& findings);
 };
 

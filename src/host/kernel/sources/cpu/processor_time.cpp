@@ -23,7 +23,7 @@ constexpr EventLine kEventLines[] = {
     {"ctxt"},          {"processes"},     {"intr"},          {"softirq"},
     {"softirq", true}, {"procs_running"}, {"procs_blocked"},
 };
-static_assert(rowsOf(KernelSource::ProcessorTime).size() == kTimes + 1 + std::size(kEventLines));
+static_assert(rowsOf(KernelSource::ProcessorTime).size() == kTimes + std::size(kEventLines));
 
 bool isTime(std::string_view label) { return label.starts_with("cpu"); }
 
@@ -65,11 +65,12 @@ void findProcessorTime(const SystemTree& tree, Findings& findings) {
     if (label == "cpu") {
       findings.addSimple(rows.first(count), {}, file, first);
     } else if (isTime(label)) {
-      findings.addArray(rows[kTimes], {channelWord(label)}, file, first, count);
+      findings.addArray(rowsOf(KernelSource::ProcessorTimes).front(), {channelWord(label)}, file,
+                        first, count);
     }
     for (std::size_t event = 0; event < std::size(kEventLines); ++event) {
       if (kEventLines[event].label != label) continue;
-      const ChannelRow& row = rows[kTimes + 1 + event];
+      const ChannelRow& row = rows[kTimes + event];
       if (kEventLines[event].isArray) {
         findings.addArray(row, {}, file, first + 1, counts[i] - 1);
       } else {
