@@ -163,7 +163,7 @@ TEST_F(KernelTest, WhatCannotBeReadIsMissingOnceAndTheRestIsThere) {
          {battery + "charge_full", "45\n"},
          {battery + "charge_full_design", "50\n"},
          {battery + "capacity", "80\n"},
-         {"sys/class/wakeup/w/name", "rtc"},
+         {"sys/class/wakeup/w/name", "rtc0"},
          {"sys/class/wakeup/w/wakeup_count", "3"},
          {"sys/power/suspend_stats/success", "7"}});
   const auto channels = std::make_shared<const KernelChannels>(*tree());
@@ -190,7 +190,7 @@ TEST_F(KernelTest, WhatCannotBeReadIsMissingOnceAndTheRestIsThere) {
   };
   EXPECT_EQ(sample(),
             "power.B.health=90 power.B.charge-level=80 power.B.charge-full=45 "
-            "power.B.charge-design=50 wakeup.rtc.wakeups=3 suspend.sleeps=7 "
+            "power.B.charge-design=50 wakeup.rtc0.wakeups=3 suspend.sleeps=7 "
             "time.uptime=5000 ");
   EXPECT_THAT(daily(), testing::Contains("wakeup.clock.wakeups"));
   std::filesystem::remove_all(at("/sys/class/wakeup"));

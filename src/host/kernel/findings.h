@@ -23,6 +23,7 @@ struct FileLayout {
   std::vector<std::string> labels;
   std::size_t columns = 1;
   std::size_t fields() const { return labels.size() * columns; }
+  bool operator==(const FileLayout&) const = default;
 };
 
 // Fills the fields that the text has, label by label; those that it lacks or that are malformed

@@ -123,6 +123,18 @@ KernelChannels::KernelChannels(const SystemTree& tree) {
   }
 }
 
+bool KernelChannels::isSame(const KernelChannels& other) const {
+  const auto isSameFile = [](const FoundFile& a, const FoundFile& b) {
+    return a.path == b.path && a.layout == b.layout;
+  };
+  const auto isSameDevice = [](const FoundChannel& a, const FoundChannel& b) {
+    return a.device.identity == b.device.identity && a.device.ordinal == b.device.ordinal;
+  };
+  return names_ == other.names_ &&
+         std::ranges::equal(findings_.files(), other.findings_.files(), isSameFile) &&
+         std::ranges::equal(findings_.channels(), other.findings_.channels(), isSameDevice);
+}
+
 void KernelChannels::addDaily(std::uint32_t channel) {
   const FoundChannel& found = findings_.channels()[channel];
   const ChannelRow& row = *found.row;

@@ -35,6 +35,8 @@ class KernelChannels {
   const std::string& name(std::size_t channel) const { return names_[channel]; }
   const std::vector<std::string>& names() const { return names_; }
   const std::vector<DailyChannel>& daily() const { return daily_; }
+  // Whether nothing came, went or was made again since the other was found.
+  bool isSame(const KernelChannels& other) const;
   // By channel id; null if there is none.
   const FoundChannel* channel(std::uint64_t id) const;
   const DailyChannel* dailyChannel(std::uint64_t id) const;

@@ -17,7 +17,7 @@ std::shared_ptr<const RegistrySource::Entries> KernelStatistics::entries() {
   if (looked_ && now - *looked_ < kBetweenLooks) return entries_;
   looked_ = now;
   auto channels = std::make_shared<const KernelChannels>(*device_.tree);
-  if (channels_ && channels->names() == channels_->names()) return entries_;
+  if (channels_ && channels->isSame(*channels_)) return entries_;
   channels_ = std::move(channels);
   entries_ = std::make_shared<const Entries>(channels_->entries());
   return entries_;

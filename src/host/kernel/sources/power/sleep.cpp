@@ -9,12 +9,12 @@ namespace {
 
 const std::string kWakeups = "/sys/class/wakeup/";
 
-// The first that is in the path or the name decides.
+// The first that is in the path or the name decides; "/" is where a part of a path begins.
 struct WakeupMark {
   std::string_view mark, kind;
 };
 constexpr WakeupMark kWakeupMarks[] = {
-    {"rtc", "clock"},          {"alarmtimer", "clock"}, {"PNP0C0C", "button"},
+    {"/rtc", "clock"},         {"alarmtimer", "clock"}, {"PNP0C0C", "button"},
     {"PNP0C0D", "button"},     {"PNP0C0E", "button"},   {"LNXPWRBN", "button"},
     {"LNXSLPBN", "button"},    {"gpio-keys", "button"}, {"gpio_keys", "button"},
     {"power_supply", "power"}, {"PNP0C0A", "power"},    {"ACPI0003", "power"},
@@ -27,9 +27,8 @@ constexpr WakeupMark kWakeupMarks[] = {
 
 std::string_view wakeupKind(std::string_view path, std::string_view name) {
   for (const auto& [mark, kind] : kWakeupMarks) {
-    if (path.find(mark) != std::string_view::npos || name.find(mark) != std::string_view::npos) {
-      return kind;
-    }
+    const bool begins = mark.front() == '/' && name.starts_with(mark.substr(1));
+    if (begins || path.find(mark) != path.npos || name.find(mark) != name.npos) return kind;
   }
   return "other";
 }
