@@ -203,6 +203,9 @@ TEST_F(KernelTest, WhatCannotBeReadIsMissingOnceAndTheRestIsThere) {
     EXPECT_THAT(rest, testing::Not(HasSubstr(gone))) << "it is empty or makes no sense";
   }
   EXPECT_THAT(errors(), testing::IsEmpty()) << "that is ordinary";
+  write({{"proc/uptime", std::string(5u << 20, '1')}});
+  EXPECT_EQ(sample(), sample());
+  EXPECT_THAT(errors(), ElementsAre(HasSubstr("/proc/uptime: File too large"))) << "once";
 }
 
 }  // namespace
