@@ -73,6 +73,7 @@ std::string busPathOf(const SystemTree& tree, const std::string& directory) {
 std::vector<std::string> uniqueNames(const std::vector<std::string>& names,
                                      const std::vector<std::string>& places) {
   std::vector<std::string> words;
+  words.reserve(names.size());
   for (const std::string& name : names) words.push_back(channelWord(name));
   markRepeated(words, [&](std::size_t i, unsigned) {
     return places[i].empty() ? std::string() : "@" + channelWord(places[i]);
