@@ -27,7 +27,7 @@ RUN_BY_OTHERS = {
     "scripts/demo": ".ci/run", "scripts/test": ".ci/run", "scripts/test --sanitize": ".ci/run",
     "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
     "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "the test bench.load, at a smaller size",
-    "scripts/test --arch armhf": ".ci/run",
+    "scripts/test --arch armhf": ".ci/run", "scripts/vm --resets 5": ".ci/run",
     "scripts/bench": "by hand, when docs/performance.md is made anew",
 }
 STANDS_IN = "#!/bin/sh\necho \"$TALLYRUN_SHOWN $*\" >> \"$TALLYRUN_CALLS\"\n"
