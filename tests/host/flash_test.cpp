@@ -124,6 +124,10 @@ TEST(Flash, HealthPages) {
       {"128 bits", healthPage({{48, huge}, {160, huge}}),
        "used 3-3;spare 100-100;written 18446744073709551615;unsafe 0;errors "
        "18446744073709551615;celsius 40;"},
+      {"no spare, as emulated disks", healthPage({{3, std::string(2, '\0')}}),
+       "used 3-3;unsafe 0;errors 0;celsius 40;"},
+      {"no spare is left", healthPage({{0, "\x01"}, {3, std::string(2, '\0')}}),
+       "used 3-3;spare 0-0;unsafe 0;errors 0;celsius 40;"},
       {"blank", std::string(512, '\0'), "nothing"},
       {"erased", std::string(512, '\xff'), "nothing"},
       {"short", healthPage().substr(1), "nothing"},

@@ -10,7 +10,7 @@ namespace tally {
 namespace {
 
 // Where the fields lie.
-constexpr std::size_t kWarnings = 0, kKelvin = 1, kSpare = 3, kPercentUsed = 5;
+constexpr std::size_t kWarnings = 0, kKelvin = 1, kSpare = 3, kSpareThreshold = 4, kPercentUsed = 5;
 constexpr std::size_t kUnitsRead = 32, kUnitsWritten = 48, kPowerOnHours = 128,
                       kUnsafeShutdowns = 144, kMediaErrors = 160;
 constexpr std::uint64_t kUnitBytes = 1000 * 512;
@@ -45,8 +45,14 @@ std::optional<Wear> parseHealthPage(std::span<const std::byte> bytes) {
   const unsigned used = page.read<std::uint8_t>(kPercentUsed).value_or(0);
   wear.used = {{{used, used == kAbove254 ? std::nullopt : std::optional(used)}, "percentage used"}};
   const unsigned spare = page.read<std::uint8_t>(kSpare).value_or(0);
-  if (spare <= 100) wear.spare = {{{spare, spare}, "available spare"}};
-  wear.warnings = {{page.read<std::uint8_t>(kWarnings).value_or(0), "critical warning"}};
+  const unsigned warnings = page.read<std::uint8_t>(kWarnings).value_or(0);
+  // Emulated disks leave out the spare and its threshold. A disk whose spare is used up warns of
+  // it.
+  constexpr unsigned kSpareWarning = 1;
+  const bool hasSpare =
+      spare > 0 || page.read<std::uint8_t>(kSpareThreshold) != 0 || (warnings & kSpareWarning) != 0;
+  if (hasSpare && spare <= 100) wear.spare = {{{spare, spare}, "available spare"}};
+  wear.warnings = {{warnings, "critical warning"}};
   constexpr int kFreezing = 273, kHottest = 1000;
   const int kelvin = page.read<std::uint16_t>(kKelvin).value_or(0);
   if (kelvin > 0 && kelvin < kHottest) {

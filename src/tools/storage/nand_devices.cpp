@@ -37,8 +37,7 @@ Cell figureCell(const Figure<PercentRange>& figure) {
 Cell usedCell(const Wear& wear) {
   Cell cell = figureCell(wear.mostUsed());
   if (!wear.mostUsed() && wear.maximumErases) {  // of raw NAND the rated life is not known
-    const auto erases = std::min<std::uint64_t>(wear.maximumErases->value, INT64_MAX);
-    return integerText(static_cast<std::int64_t>(erases)) + " erasures";
+    return counted(wear.maximumErases->value, "erasure");
   }
   constexpr unsigned kDoubtful = 80, kBad = 100;
   if (const auto& used = wear.mostUsed()) {
