@@ -1,10 +1,16 @@
-// The texts of /proc and /sys that statistics are read from, and the names in them.
+// The texts of /proc and /sys that statistics and the wear of disks are read from, the names in
+// them, and the health page of an NVMe disk.
 #include <algorithm>
 #include <string>
 #include <vector>
 
 #include "base/printable.h"
 #include "fuzz.h"
+#include "host/flash/emmc.h"
+#include "host/flash/mount_table.h"
+#include "host/flash/nvme.h"
+#include "host/flash/raw_nand.h"
+#include "host/flash/ufs.h"
 #include "host/kernel/naming.h"
 #include "host/kernel/sources/cpu/interrupts.h"
 #include "host/kernel/sources/cpu/processor_time.h"
@@ -47,6 +53,25 @@ FileLayout layoutOf(std::string_view text, std::size_t columns) {
   return layout;
 }
 
+void requireSound(const std::optional<Wear>& wear) {
+  if (!wear) return;
+  for (const auto& range : {wear->used, wear->fastUsed, wear->spare}) {
+    require(!range || !range->value.most || range->value.least <= *range->value.most,
+            "a range has a lower end");
+  }
+}
+
+void readWear(std::span<const std::byte> bytes, std::string_view text) {
+  const std::string_view word = trimmed(text.substr(0, text.find('\n')));
+  requireSound(parseEmmc({"MMC", "0x8", word, word}));
+  requireSound(parseExtendedRegisters(text));
+  requireSound(parseUfs({word, word, word}));
+  requireSound(parseRawNand({word, word, word, word, word, word, word, text}));
+  requireSound(parseHealthPage(bytes));
+  const auto mount = mountOf(text, "/var/mobile");
+  if (mount) (void)ubiDeviceOf(mount->source);
+}
+
 }  // namespace
 
 FUZZ_TARGET(kernel_texts)(const std::uint8_t* data, std::size_t size) {
@@ -56,6 +81,7 @@ FUZZ_TARGET(kernel_texts)(const std::uint8_t* data, std::size_t size) {
   const auto bytes = input.takeRest();
   const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
 
+  readWear(bytes, text);
   const FileLayout layout = layoutOf(text, columns);
   std::vector<std::int64_t> fields(layout.fields(), kNoReading), again = fields;
   parser.parse(text, layout, fields);

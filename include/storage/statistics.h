@@ -57,6 +57,10 @@ struct SPXParseContext {
   std::uint64_t maxHighEnduranceBlockErases = 0;
   std::array<std::uint64_t, 5> readCountHisto{};
 
+  // The driver exports what it knows alone: a field above of which the buffer has no counter is not
+  // known, and is not reported.
+  bool exportsKnownAlone = false;
+
   // Every counter of the buffer, in its order.
   SPXCounterBlock* firstBlock = nullptr;
   SPXCounterBlock* lastBlock = nullptr;

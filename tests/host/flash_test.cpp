@@ -298,7 +298,7 @@ TEST_F(FlashTreeTest, TheDriverExportsWhatIsKnown) {
     return std::pair(status, made.structOutputSize);
   };
   using Answer = std::pair<RegistryResult, std::size_t>;
-  const std::size_t size = 3 * 16;  // the version and both figures
+  const std::size_t size = 4 * 16;  // the version, the mark and both figures
   EXPECT_EQ(call(8, 13, 1), Answer(kRegistrySuccess, 4));
   EXPECT_EQ(ByteReader(output).read<std::uint32_t>(0), size);
   EXPECT_EQ(call(8, 13, 0), Answer(kRegistrySuccess, size));

@@ -7,6 +7,7 @@
 
 #include "fakes/fake_storage.h"
 #include "fakes/kcdata.h"
+#include "platform/protocol/storage_protocol.h"
 #include "storage/auxiliary/health.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
@@ -143,6 +144,12 @@ TEST_F(NandInfoTest, DemoModeIsAPreferenceThatIsTrue) {
     storage.platform.preferences->put("StoreDemoMode", preference, "vellum.demo-settings");
     EXPECT_EQ(figure("DemoMode", {}), mode);
   }
+}
+
+TEST_F(NandInfoTest, ADriverOfWhatIsKnownAloneHasNoOtherFigures) {
+  EXPECT_EQ(text(*infoOf(kFull, {{kKnownAloneStatistic, {1}}, {4, {9}}, {431, {7}}})),
+            "ExportVersion=131074 DemoMode=0L NumLogicalWrites=9L UserPartitionPEPercentUsed=7L" +
+                kReclaim);
 }
 
 TEST_F(NandInfoTest, Failures) {

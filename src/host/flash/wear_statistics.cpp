@@ -80,7 +80,10 @@ std::vector<std::byte> statisticsBuffer(DiskKind kind, const Wear& wear) {
   for (const WearStatistic& row : kStatistics) {
     const Value value = row.kind == kind ? row.value(wear) : std::nullopt;
     if (!value) continue;
-    if (buffer.empty()) appendRecord(buffer, kExportVersionStatistic, kFullExportVersion);
+    if (buffer.empty()) {
+      appendRecord(buffer, kExportVersionStatistic, kFullExportVersion);
+      appendRecord(buffer, kKnownAloneStatistic, 1);
+    }
     // Reports hold signed numbers.
     appendRecord(buffer, row.exported.statistic, std::min<std::uint64_t>(*value, INT64_MAX));
   }

@@ -26,6 +26,9 @@ enum StorageSelector : std::uint32_t {
 // A statistics buffer is little-endian records: a 32-bit statistic, a 32-bit count, and that many
 // 64-bit values.
 constexpr std::uint32_t kExportVersionStatistic = 53;
+// A buffer with this record has every figure that its driver knows. Those that it lacks are not
+// known, and are not reported; from other drivers they are 0.
+constexpr std::uint32_t kKnownAloneStatistic = 0x2FFF'FF00;
 // The lowest version whose buffers may have more than the oldest figures.
 constexpr std::uint32_t kFullExportVersion = 0x20002;
 // Host traffic is counted in units of this size.

@@ -1,6 +1,7 @@
 // From a parsed context to the NAND info dictionary.
 #include "storage/nand_info.h"
 
+#include <algorithm>
 #include <array>
 #include <optional>
 #include <string_view>
@@ -12,6 +13,7 @@
 #include "storage/nand_info/nand_info_failure.h"
 #include "storage/statistics/counter_names.h"
 #include "storage/statistics/key_map.h"
+#include "storage/statistics/statistic_keys.h"
 
 namespace tally {
 
@@ -225,6 +227,59 @@ void addDerivedFigures(KvDictionary& info, const DerivedFigures& derived) {
   info.set(kNANDInfoMaintenanceFailedEraseKey, wideNumber(derived.failedErases));
 }
 
+// The figures that are always there, and the statistic of each; 0: no buffer has it.
+struct FixedFigure {
+  std::string_view key;
+  std::uint32_t statistic;
+};
+constexpr FixedFigure kFixedFigures[] = {
+    {kNANDInfoDriverVersionKey, 0},
+    {kNANDInfoNumVirtualBlocksKey, 52},
+    {kNANDInfoPagesPerVirtualBlockKey, 50},
+    {kNANDInfoBytesPerPageKey, 49},
+    {kNANDInfoNumLogicalReadsKey, 7},
+    {kNANDInfoNumLogicalWritesKey, 4},
+    {kNANDInfoNumFreeVirtualBlocksKey, 48},
+    {kNANDInfoNumWearLevelOpsKey, 17},
+    {kNANDInfoNumPhysicalReadsKey, 19},
+    {kNANDInfoNumPhysicalWritesKey, 18},
+    {kNANDInfoNumPhysicalErasesKey, 20},
+    {kNANDInfoNumNodesFreeKey, 12},
+    {kNANDInfoNumNodesTotalKey, 13},
+    {kNANDInfoFormatWeeksSince2000Key, 56},
+    {kNANDInfoNumSleepOpsKey, 28},
+    {kNANDInfoHighEnduranceBlockEraseCountKey, 45},
+    {kNANDInfoBlocksPerVirtualBlock, 51},
+    {kNANDInfoReadsBeforeErasureKeys[0], 265},
+    {kNANDInfoReadsBeforeErasureKeys[1], 265},
+    {kNANDInfoReadsBeforeErasureKeys[2], 265},
+    {kNANDInfoReadsBeforeErasureKeys[3], 265},
+    {kNANDInfoReadsBeforeErasureKeys[4], 265},
+    {kNANDInfoNumMaintenanceRequestsKey, 0},
+    {kNANDInfoMaintenanceFailedReadKey, 0},
+    {kNANDInfoMaintenanceFailedProgKey, 0},
+    {kNANDInfoMaintenanceFailedEraseKey, 0},
+};
+
+bool hasStatistic(const SPXParseContext& context, std::uint32_t key) {
+  const Statistic* const statistic = findStatistic(key);
+  for (const auto* block = context.firstBlock; block != nullptr; block = block->next) {
+    const auto* const names = block->names();
+    const auto isOfStatistic = [&](std::uint16_t name) {
+      return name >= statistic->name && name <= statistic->name + statistic->elements;
+    };
+    if (statistic != nullptr && std::any_of(names, names + block->count, isOfStatistic))
+      return true;
+  }
+  return false;
+}
+
+void removeUnknown(KvDictionary& info, const SPXParseContext& context) {
+  for (const auto& [key, statistic] : kFixedFigures) {
+    if (!hasStatistic(context, statistic)) info.remove(key);
+  }
+}
+
 }  // namespace
 
 KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump) {
@@ -249,6 +304,7 @@ KvRef<KvDictionary> buildNandInfo(const SPXParseContext& context, bool forDump) 
     info->set(kNANDInfoReadsBeforeErasureKeys[i], wideNumber(context.readCountHisto[i]));
   }
   addDerivedFigures(*info, addCounters(*info, context));
+  if (context.exportsKnownAlone) removeUnknown(*info, context);
   return info;
 }
 

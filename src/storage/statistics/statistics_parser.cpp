@@ -6,6 +6,7 @@
 #include <span>
 
 #include "base/byte_reader.h"
+#include "platform/protocol/storage_protocol.h"
 #include "storage/statistics/counter_list.h"
 #include "storage/statistics/statistic_keys.h"
 
@@ -76,6 +77,7 @@ class Values {
 };
 
 bool appendRecord(SPXParseContext& context, std::uint32_t key, const Values& values) {
+  if (key == kKnownAloneStatistic) context.exportsKnownAlone = true;
   const Statistic* const statistic = findStatistic(key);
   if (statistic == nullptr) return true;
   const std::size_t taken = std::min<std::size_t>(values.size(), statistic->elements);
