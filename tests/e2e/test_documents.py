@@ -1,6 +1,7 @@
 """What the documents show is true: commands run, examples are those that are built, links lead somewhere."""
 import os
 import pathlib
+import plistlib
 import re
 import shutil
 import subprocess
@@ -114,6 +115,19 @@ class Documents(unittest.TestCase):
         self.assertEqual(read, shown)
 
     @unittest.skipUnless(shutil.which("man"), "man is missing")
+    def test_the_whitelist_for_makers_admits_what_a_linux_device_sweeps(self):
+        """Every daily key of the table, and none that the sweep cannot store."""
+        rows = [row.split("|") for row in (TOP / "docs/linux.md").read_text().splitlines() if row.startswith("| `")]
+        kinds = re.search(r"kind of a wakeup source: (.*?)\. ", (TOP / "docs/linux.md").read_text())[1]
+        swept = {f"vellum.hwreport.{key}".replace("#", str(number)).replace("%", kind)
+                 for row in rows if len(row) > 8 and (key := row[7].strip(" `"))
+                 for number in range(4) for kind in re.findall("`(.*?)`", kinds)}
+        whitelist = plistlib.loads((TOP / "packaging/Whitelist_Nimbus.plist").read_bytes())
+        listed = [key for group in whitelist.values() for key in group["ScalarKeys"]]
+        self.assertEqual({key for key in listed if key.startswith("vellum.hwreport.")}, swept)
+        self.assertEqual(len(listed), len(set(listed)))
+        self.assertTrue(all(set(group) == {"ScalarKeys"} for group in whitelist.values()))
+
     def test_every_command_of_the_tool_is_documented(self):
         def rows(*words):
             out = checked(BIN / "tallyctl", *words, "--help")

@@ -302,8 +302,8 @@ TEST_F(FlashTreeTest, TheDriverExportsWhatIsKnown) {
   EXPECT_EQ(call(8, 13, 1), Answer(kRegistrySuccess, 4));
   EXPECT_EQ(ByteReader(output).read<std::uint32_t>(0), size);
   EXPECT_EQ(call(8, 13, 0), Answer(kRegistrySuccess, size));
-  EXPECT_EQ(ByteReader(output).read<std::uint32_t>(16), 430u);
-  EXPECT_EQ(ByteReader(output).read<std::uint64_t>(24), 10u);
+  EXPECT_EQ(ByteReader(output).read<std::uint32_t>(32), 430u);
+  EXPECT_EQ(ByteReader(output).read<std::uint64_t>(40), 10u);
   EXPECT_EQ(call(8, 17, 1), Answer(kRegistrySuccess, 4)) << "a list without a byte";
   EXPECT_EQ(call(8, 22, 1).first, kRegistryUnsupported);
   EXPECT_EQ(call(5, 13, 1).first, kRegistryUnsupported);

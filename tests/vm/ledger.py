@@ -84,21 +84,16 @@ class Action:
 
     def parts(self, files):
         """How many of its parts the files hold, and how many it has. Later actions have higher numbers."""
-        key, before = f"vm.{self.kind}.{self.number}", self.day - 1
-        if self.kind == "set":
-            return files.scalars.get((key, before)) == self.number, 1
+        number, before = self.number, self.day - 1
+        rows = {"set": [f"vm.set.{number}"], "import": [f"vm.import.{number}.{row}" for row in range(1, IMPORTED + 1)]}
+        if self.kind in rows:
+            return sum(files.scalars.get((key, before)) == number for key in rows[self.kind]), len(rows[self.kind])
         if self.kind == "push":
-            return sum((before, self.number + part) in files.samples for part in (0, 0.25, 0.5)), 3
-        if self.kind == "import":
-            return sum(files.scalars.get((f"{key}.{row}", before)) == self.number
-                       for row in range(1, IMPORTED + 1)), IMPORTED
-        if self.kind == "prefs":
-            return (files.preference("mobile", "vm.own", "number") or 0) >= self.number, 1
-        if self.kind == "tasking":
-            return int(files.tasking() or 0) >= self.number, 1
-        if self.kind == "report":
-            return any(f"vm.set.{self.number}" in log for log in files.reports), 1
-        return (files.own("LastCrashLogSerializationDateInDaysSince1970") or 0) >= before, 1
+            return sum((before, number + part) in files.samples for part in (0, 0.25, 0.5)), 3
+        latest = {"prefs": files.preference("mobile", "vm.own", "number"), "tasking": files.tasking(),
+                  "report": number if any(f"vm.set.{number}" in log for log in files.reports) else 0,
+                  "day": files.own("LastCrashLogSerializationDateInDaysSince1970")}
+        return int(latest[self.kind] or 0) >= (before if self.kind == "day" else number), 1
 
 
 class Ledger:
@@ -129,17 +124,7 @@ class Ledger:
                 faults.append(f"{'lost' if action.done else 'half'}: {action}, {int(found)} of {whole} parts")
         # What was interrupted is there from now on, or never will be.
         self.actions = [action for action in self.actions if action.done]
-        return faults + self.check_reports(files) + self.check_sweeps(files) + self.check_tasking(files)
-
-    def check_reports(self, files):
-        """A report holds what was acknowledged for its day before it."""
-        faults = []
-        for report in (action for action in self.actions if action.kind == "report"):
-            wanted = {f"vm.set.{action.number}": action.number for action in self.actions if action.kind == "set"
-                      and action.day == report.day and action.number <= report.number}
-            faults += [f"{report} lacks {wanted.items() - log.items()}" for log in files.reports
-                       if f"vm.set.{report.number}" in log and wanted.items() - log.items()]
-        return faults
+        return faults + self.check_sweeps(files) + self.check_tasking(files)
 
     def check_sweeps(self, files):
         """A sweep is in the store as a whole; what it finds depends on whether the day is even."""

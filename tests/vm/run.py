@@ -23,10 +23,11 @@ VOLUME = {
     "var/mobile/Library/Preferences/vellum.tallyd.tallyrun.plist": {"SpoolMaximumLogs": KEPT_LOGS},
 }
 # Each must lose something; else the resets show nothing. The store and the events use fdatasync.
-CONTROLS = {**{f"no fsync of {what}": {"PRELOAD": "/no-sync.so", "UNSYNCED": what} for what in ("files", "directories")},
+CONTROLS = {"no fsync of files": {"PRELOAD": "/no-sync.so", "UNSYNCED": "files"},
+            "no fsync of directories": {"PRELOAD": "/no-sync.so", "UNSYNCED": "directories"},
             "no fdatasync": {"PRELOAD": "/no-sync.so", "UNSYNCED": "data"},
             "no flush of the disk": {"VOLUME_OPTIONS": "nobarrier"}}
-CONTROL_RESETS = 10  # at most
+CONTROL_RESETS = 20  # at most
 
 
 def prepare(root):

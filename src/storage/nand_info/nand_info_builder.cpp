@@ -265,8 +265,10 @@ bool hasStatistic(const SPXParseContext& context, std::uint32_t key) {
   const Statistic* const statistic = findStatistic(key);
   for (const auto* block = context.firstBlock; block != nullptr; block = block->next) {
     const auto* const names = block->names();
+    // The plain name, and those of the elements where there are several.
     const auto isOfStatistic = [&](std::uint16_t name) {
-      return name >= statistic->name && name <= statistic->name + statistic->elements;
+      const std::uint16_t last = statistic->elements > 1 ? statistic->elements : 0;
+      return name >= statistic->name && name <= statistic->name + last;
     };
     if (statistic != nullptr && std::any_of(names, names + block->count, isOfStatistic))
       return true;
