@@ -1,6 +1,8 @@
 """Recorded devices: recorded once more they are the same, and two days on one give the amounts of the second."""
 import json
+import os
 import pathlib
+import subprocess
 import sys
 import tempfile
 import unittest
@@ -49,6 +51,20 @@ class Recording(unittest.TestCase):
         for options, reads in ((("--play",), 10), ((), 0)):
             changes = self.sample(device, "--group", "Disks", "--delta", "1.1", *options)
             self.assertEqual({channel["name"]: channel["value"] for channel in changes}["disk.nvme0n1.reads"], reads)
+
+    @unittest.skipUnless(os.geteuid() == 0, "only root can be refused as another user")
+    def test_doctor_says_what_is_refused(self):
+        device = self.unpacked(TREES[[tree.stem for tree in TREES].index("laptop")])
+        device.parent.chmod(0o755)
+        (device / DISK).chmod(0)
+        lines = subprocess.run([BIN / "tallyctl", "--root", device, "doctor"], capture_output=True, text=True, user=12345,
+                               check=False).stdout.splitlines()
+        said = {line[11:31].strip(): line for line in lines}
+        self.assertIn("17 channels, of which a file is not permitted", said["Disks"])
+        self.assertIn("[ok]       Sleep", said["Sleep"])
+        self.assertNotIn("absent", said["Sensors"])
+        board = Device(self.unpacked(TREES[0])).tool("doctor", status=None)
+        self.assertRegex(board, "Memory errors +absent on this hardware")
 
     def test_the_second_day_has_its_amounts(self):
         device = Device(self.unpacked(TREES[[tree.stem for tree in TREES].index("laptop")]))

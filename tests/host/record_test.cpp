@@ -70,6 +70,7 @@ TEST_F(RecordTest, WhatIdentifiesIsANumber) {
        "25 24 0:3 / /home/dir1/dir2 rw - nfs none rw\n"
        "26 24 0:9 / /rom rw - overlay none rw,upperdir=/overlay/dir1\n"
        "27 24 0:8 / /var rw - ubifs ubi0:volume1 rw\n"},
+      {"/data/alice", nullptr, "/data/dir1", nullptr},
       // What is not a text is left out, except pages of numbers.
       {"/sys/block/sda/device/vpd_pg80", "\x01\x02S4EV", "/sys/block/sda/device/vpd_pg80", ""},
       {"/run/tallyd/nvme-health-nvme0", "\x01\x02", "/run/tallyd/nvme-health-nvme0", "\x01\x02"},
@@ -81,6 +82,7 @@ TEST_F(RecordTest, WhatIdentifiesIsANumber) {
                                 c.text != nullptr ? c.text : ""};
   }
   recorded.entries["/sys/bus/link"] = {TreeEntry::Type::Link, "../../devices/net/wlp3s0"};
+  recorded.entries["/var/mobile"] = {TreeEntry::Type::Link, "../data/alice"};
   recorded.samples[1000]["/sys/devices/virtual/net/cpu/statistics/rx_bytes"] = "8\n";
   const RecordedTree hidden = anonymous(recorded);
   for (const auto& c : cases) {
@@ -91,6 +93,7 @@ TEST_F(RecordTest, WhatIdentifiesIsANumber) {
   EXPECT_THAT(hidden.samples.at(1000),
               ElementsAre(std::pair("/sys/devices/virtual/net/if1/statistics/rx_bytes", "8\n")));
   EXPECT_EQ(hidden.entries.at("/sys/bus/link").text, "../../devices/net/if3");
+  EXPECT_EQ(hidden.entries.at("/var/mobile").text, "../data/dir1");
   EXPECT_THAT(hidden.faults, ElementsAre(HasSubstr("vpd_pg80: not a text")));
 }
 

@@ -99,6 +99,12 @@ bool isKernelDisk(std::string_view name) {
   return true;
 }
 
+// Other paths are the user's.
+bool isOfKernel(std::string_view path) {
+  constexpr std::string_view kFolders[] = {"/proc/", "/sys/", "/run/", "/etc/", "/usr/"};
+  return std::ranges::any_of(kFolders, [&](auto folder) { return path.starts_with(folder); });
+}
+
 // A name that cannot be taken for a word or a number of the kernel's.
 bool isDistinctive(std::string_view name) {
   constexpr std::size_t kShortest = 6;
@@ -254,7 +260,14 @@ std::string Pseudonyms::component(std::string_view above, std::string_view name)
 }
 
 std::string Pseudonyms::path(std::string_view path) {
-  const bool isOfProcesses = path.starts_with("/proc/");
+  return isOfKernel(path) ? kernelPath(path, path.starts_with("/proc/")) : folders(path);
+}
+
+std::string Pseudonyms::target(std::string_view path, std::string_view target) {
+  return isOfKernel(path) ? kernelPath(target, false) : folders(target);
+}
+
+std::string Pseudonyms::kernelPath(std::string_view path, bool isOfProcesses) {
   std::string result;
   std::string_view above;
   while (!path.empty()) {
@@ -420,7 +433,7 @@ RecordedTree anonymous(const RecordedTree& recorded) {
   for (const auto& [path, entry] : recorded.entries) {
     using enum TreeEntry::Type;
     std::string text = entry.type == File   ? pseudonyms.content(path, entry.text)
-                       : entry.type == Link ? pseudonyms.path(entry.text)
+                       : entry.type == Link ? pseudonyms.target(path, entry.text)
                                             : std::string();
     if (entry.type == File && text.empty() && !entry.text.empty()) {
       result.faults.push_back(path + ": not a text; left out without --raw");

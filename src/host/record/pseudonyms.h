@@ -21,6 +21,8 @@ class Pseudonyms {
   void learn(std::string_view path, std::string_view text);
 
   std::string path(std::string_view path);
+  // Of the link at a path.
+  std::string target(std::string_view path, std::string_view target);
   std::string content(std::string_view path, std::string_view text);
 
  private:
@@ -37,6 +39,7 @@ class Pseudonyms {
   std::string words(std::string_view text, Where where);
   std::string shapes(std::string_view text, bool isPath);
   std::string folders(std::string_view path);
+  std::string kernelPath(std::string_view path, bool isOfProcesses);
   std::string component(std::string_view above, std::string_view name);
   std::string freeText(std::string_view text);
   std::string secret(std::string_view name, std::string_view text);
