@@ -1,7 +1,9 @@
 // Recordings: what is copied, what is hidden, and how they are written.
 #include <gmock/gmock.h>
 
+#include <atomic>
 #include <filesystem>
+#include <thread>
 
 #include "host/record/pseudonyms.h"
 #include "host/record/recording_folder.h"
@@ -144,6 +146,27 @@ TEST_F(RecordTest, WhatWasAskedForIsThereAgain) {
   impossible.entries["/sys/" + std::string(300, 'x')] = {TreeEntry::Type::File, ""};
   EXPECT_FALSE(writeRecording(impossible, at("s")));
   EXPECT_FALSE(fs::exists(at("s")) || fs::exists(at("s.incomplete")));
+}
+
+TEST_F(RecordTest, AFileIsFoundWhileOthersAreRenamed) {
+  put("d/sys/devices/a/type", "x\n");
+  std::filesystem::create_directories(at("d/sys/class"));
+  std::filesystem::create_symlink("../devices/a", at("d/sys/class/a"));
+  put("one", "");
+  const SystemTree tree{DeviceRoot(at("d"))};
+  std::atomic<bool> done = false;
+  std::thread renaming([&] {
+    while (!done) {
+      std::filesystem::rename(at("one"), at("two"));
+      std::filesystem::rename(at("two"), at("one"));
+    }
+  });
+  int found = 0;
+  constexpr int kTimes = 5000;
+  for (int i = 0; i < kTimes; ++i) found += tree.text("/sys/class/a/type") == "x" ? 1 : 0;
+  done = true;
+  renaming.join();
+  EXPECT_EQ(found, kTimes);
 }
 
 }  // namespace

@@ -66,9 +66,14 @@ int openBelow(int root, const std::string& path, int flags) {
   how.flags = static_cast<std::uint64_t>(flags | O_CLOEXEC);
   how.resolve = RESOLVE_IN_ROOT | RESOLVE_NO_MAGICLINKS;
   const char* const name = relative.empty() ? "." : relative.c_str();
-  const auto opened = static_cast<int>(
-      retried([&] { return ::syscall(SYS_openat2, root, name, &how, sizeof how); }));
-  if (opened >= 0 || errno != ENOSYS) return opened;
+  // A link that leads up fails while anything on the machine is renamed, unless it is tried again.
+  constexpr int kTries = 8;
+  for (int i = 0; i < kTries; ++i) {
+    const auto opened = static_cast<int>(
+        retried([&] { return ::syscall(SYS_openat2, root, name, &how, sizeof how); }));
+    if (opened >= 0 || (errno != ENOSYS && errno != EAGAIN)) return opened;
+    if (errno == ENOSYS) break;
+  }
   // A last link that is not to be followed is not resolved either.
   const bool keepsLast = (flags & O_NOFOLLOW) != 0;
   const std::size_t last = keepsLast ? relative.rfind('/') + 1 : relative.size();
