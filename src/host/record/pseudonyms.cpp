@@ -14,7 +14,6 @@ namespace {
 
 constexpr std::string_view kInterface = "if", kDisk = "disk", kHost = "host", kFolder = "dir";
 
-bool isDigit(char letter) { return letter >= '0' && letter <= '9'; }
 bool isLower(char letter) { return letter >= 'a' && letter <= 'z'; }
 bool isWordLetter(char letter) {
   return isDigit(letter) || isLower(letter) || (letter >= 'A' && letter <= 'Z') ||

@@ -5,7 +5,6 @@
 namespace tally {
 namespace {
 
-bool isDigit(char letter) { return letter >= '0' && letter <= '9'; }
 bool isHex(char letter) {
   return isDigit(letter) || (letter >= 'a' && letter <= 'f') || (letter >= 'A' && letter <= 'F');
 }

@@ -23,6 +23,7 @@ std::optional<FoundShape> shapeAt(std::string_view text, std::size_t place, bool
 // A number in the shape of the original: "00:00:00:00:00:02".
 std::string shaped(Shape shape, std::string_view original, std::uint32_t number);
 
+inline bool isDigit(char letter) { return letter >= '0' && letter <= '9'; }
 // Between words of the kernel's texts.
 bool isSeparator(char letter);
 
