@@ -27,7 +27,7 @@ std::vector<SourceSurvey> surveySources(const SystemTree& tree) {
     if (source.name != name) surveys.push_back({source.title, 0, 0, ""});
     name = source.name;
     Findings findings;
-    source.find(tree, findings);
+    if (source.find != nullptr) source.find(tree, findings);
     SourceSurvey& survey = surveys.back();
     survey.channels += findings.channels().size();
     std::set<std::string> asked;
