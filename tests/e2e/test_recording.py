@@ -30,6 +30,10 @@ class Recording(unittest.TestCase):
         out = Device(root).tool("--json", "channels", "sample", "--category", "1", *options, status=None)
         return [channel for channel in json.loads(out)["channels"] if channel["name"] != "time.span"]
 
+    def disks(self, root):
+        disks = json.loads(Device(root).tool("--json", "nand", "devices", status=None))
+        return [{key: value for key, value in disk.items() if key != "identity"} for disk in disks]
+
     def test_a_recording_is_recorded_without_a_loss(self):
         for tree in TREES:
             with self.subTest(tree.stem):
@@ -39,6 +43,7 @@ class Recording(unittest.TestCase):
                 checked(BIN / "tallyctl", "device", "record", copy, "--seconds", "0", TALLYRUN_ROOT=str(device))
                 again = self.unpacked(tree)
                 self.assertEqual(self.sample(copy), self.sample(again))
+                self.assertEqual(self.disks(copy), self.disks(again))
                 content = "".join(str(path) + (path.read_text("latin1") if path.is_file() else "")
                                   for path in copy.rglob("*"))
                 for name in ("0011223344aa", "enp0s31f6", "alice", "S4EVN0"):
@@ -63,6 +68,7 @@ class Recording(unittest.TestCase):
         self.assertIn("17 channels, of which a file is not permitted", said["Disks"])
         self.assertIn("[ok]       Sleep", said["Sleep"])
         self.assertNotIn("absent", said["Sensors"])
+        self.assertIn("NVMe, available", said["wear of nvme0n1"])
         board = Device(self.unpacked(TREES[0])).tool("doctor", status=None)
         self.assertRegex(board, "Memory errors +absent on this hardware")
 

@@ -4,6 +4,7 @@
 #include <cstring>
 #include <map>
 
+#include "host/flash/linux_flash_disks.h"
 #include "host/kernel/kernel_region.h"
 #include "host/temporary_root.h"
 
@@ -123,6 +124,27 @@ TEST_F(DevicesTest, SayWhatTheirFilesSay) {
     }
   }
   EXPECT_EQ(errors().size(), 0u);
+}
+
+TEST_F(DevicesTest, SayWhichDiskIsTheirsAndHowWornItIs) {
+  const struct {
+    const char *device, *disk;
+    std::optional<unsigned> used;  // at least so many percent
+  } cases[] = {
+      {"laptop", "nvme0n1", 3}, {"board", "mmcblk0", 10}, {"router", "ubi0", std::nullopt},
+      {"phone", "sda", 30},     {"kernel32", "sda", {}},  {"machine", "vda", {}},
+  };
+  for (const auto& c : cases) {
+    const DeviceRoot place(std::string(DEVICES) + "/" + c.device);
+    const auto tree = std::make_shared<const SystemTree>(place);
+    LinuxFlashDisks disks(DiskReader(place, clock, tree), [] { return false; });
+    for (const FlashDisk& disk : disks.disks()) {
+      EXPECT_EQ(disk.isStorage, disk.name == c.disk) << c.device << " " << disk.name;
+      if (!disk.isStorage) continue;
+      const auto used = disk.wear ? disk.wear->mostUsed() : std::nullopt;
+      EXPECT_EQ(used ? std::optional(used->value.least) : std::nullopt, c.used) << c.device;
+    }
+  }
 }
 
 }  // namespace

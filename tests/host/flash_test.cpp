@@ -183,7 +183,8 @@ class FlashTreeTest : public TemporaryRoot {
     }
   }
   LinuxFlashDisks flashDisks() const {
-    return {DiskReader(DeviceRoot(root), clock), [] { return false; }};
+    return {DiskReader(DeviceRoot(root), clock, std::make_shared<const SystemTree>(root)),
+            [] { return false; }};
   }
   // "mmcblk0 eMMC; *nvme0n1 NVMe": the starred one is the device's.
   std::string disks() const {
@@ -278,7 +279,7 @@ TEST_F(FlashTreeTest, WhatADiskIsKnownBy) {
 }
 
 TEST_F(FlashTreeTest, TheDriverExportsWhatIsKnown) {
-  FlashSource source(DiskReader(DeviceRoot(root), clock));
+  FlashSource source(DiskReader(DeviceRoot(root), clock, std::make_shared<const SystemTree>(root)));
   putAll(kEmmc);
   ASSERT_EQ(source.entries()->size(), 1u);
   EXPECT_EQ(source.entries(), source.entries()) << "nothing has changed";

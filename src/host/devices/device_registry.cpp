@@ -42,7 +42,7 @@ void addDeviceRegistry(Platform& services, const DeviceRoot& root,
                        std::shared_ptr<const SystemTree> tree) {
   auto described =
       std::make_unique<RegistryDescription>(DeviceDirectory(root, "/device"), services.log);
-  KernelDevice device{std::move(tree), services.log, nullptr};
+  KernelDevice device{tree, services.log, nullptr};
   if (services.metricsStore) {
     device.days = std::make_shared<DailyAmounts>(services.metricsStore, services.clock);
     services.dailyCounters = device.days;
@@ -51,7 +51,7 @@ void addDeviceRegistry(Platform& services, const DeviceRoot& root,
   }
   auto kernel = std::make_unique<UndescribedSource>(
       std::make_unique<KernelStatistics>(std::move(device)), *described, hasChannels);
-  const DiskReader disks(root, services.clock);
+  const DiskReader disks(root, services.clock, std::move(tree));
   auto flash = std::make_unique<UndescribedSource>(std::make_unique<FlashSource>(disks), *described,
                                                    isStorageDriver);
   std::vector<std::unique_ptr<RegistrySource>> sources;

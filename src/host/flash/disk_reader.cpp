@@ -44,7 +44,7 @@ bool DiskReader::mayTellWear(const Disk& disk) const {
 }
 
 std::optional<Wear> DiskReader::wear(const Disk& disk) const {
-  const SystemTree tree(root_);
+  const SystemTree& tree = *tree_;
   switch (disk.kind) {
     case DiskKind::Emmc:
       return readEmmc(tree, disk.name);
@@ -70,7 +70,7 @@ std::optional<Wear> DiskReader::wear(const Disk& disk) const {
 
 std::string DiskReader::identity(const Disk& disk) const {
   constexpr std::size_t kLongest = 128;
-  const std::string text = identityText(SystemTree(root_), disk);
+  const std::string text = identityText(*tree_, disk);
   // Serial numbers may have blanks inside; those that are all blanks or zeros tell nothing.
   std::string plain;
   for (const char c : text) {

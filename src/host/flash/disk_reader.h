@@ -13,16 +13,16 @@
 
 namespace tally {
 
-// Copies are independent: each opens the tree again.
+// Copies share the tree.
 class DiskReader {
  public:
-  // Without a clock nothing is known of the age of NVMe pages.
-  DiskReader(DeviceRoot root, std::shared_ptr<Clock> clock)
-      : root_(std::move(root)), clock_(std::move(clock)) {}
+  // Without a clock nothing is known of the age of NVMe pages. The tree is that of the root.
+  DiskReader(DeviceRoot root, std::shared_ptr<Clock> clock, std::shared_ptr<const SystemTree> tree)
+      : root_(std::move(root)), clock_(std::move(clock)), tree_(std::move(tree)) {}
 
-  std::vector<Disk> disks() const { return listDisks(SystemTree(root_)); }
+  std::vector<Disk> disks() const { return listDisks(*tree_); }
   std::string deviceDisk(const std::vector<Disk>& disks) const {
-    return tally::deviceDisk(SystemTree(root_), disks);
+    return tally::deviceDisk(*tree_, disks);
   }
   // Whether wear() may find something. Asks no disk.
   bool mayTellWear(const Disk& disk) const;
@@ -33,6 +33,7 @@ class DiskReader {
  private:
   DeviceRoot root_;
   std::shared_ptr<Clock> clock_;
+  std::shared_ptr<const SystemTree> tree_;
 };
 
 }  // namespace tally

@@ -52,6 +52,7 @@ void readDevice(const DeviceRoot& root, std::shared_ptr<const SystemTree> tree) 
     services.deviceRegistry->HandleRelease(storage);
     CopyNANDInfo();
   }
+  services.flashDisks->disks();
   for (const KernelValueName& value : kernelValuesOfReport()) {
     std::byte buffer[32];
     std::size_t length = std::min(sizeof buffer, value.width);

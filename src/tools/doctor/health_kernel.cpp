@@ -30,9 +30,23 @@ HealthCheck checkOf(const SourceSurvey& survey) {
                       survey.example)};
 }
 
+HealthCheck checkOf(const FlashDisk& disk) {
+  const std::string subject = fmt::format("wear of {}", disk.name);
+  const std::string_view kind = diskKindName(disk.kind);
+  if (disk.wear) return {Health::Ok, subject, fmt::format("{}, available", kind)};
+  if (disk.kind != DiskKind::Nvme) return {Health::Missing, subject, "absent on this hardware"};
+  return {Health::Missing, subject,
+          fmt::format("{}, not permitted; tallyrun-nvme-health.service, which has CAP_SYS_ADMIN, "
+                      "would leave the page in /run/tallyd",
+                      kind)};
+}
+
 }  // namespace
 
 void examineKernelSources(const ToolContext& context, HealthChecks& checks) {
+  for (const FlashDisk& disk : context.platform->flashDisks->disks()) {
+    checks.push_back(checkOf(disk));
+  }
   const SystemTree tree{DeviceRoot(context.root)};
   if (!tree.isThisMachine() && !tree.isRecording()) return;
   if (areChannelsDescribed(*context.platform->deviceRegistry)) return;

@@ -1,4 +1,4 @@
-// Checks of the kernel's statistics, source by source.
+// Checks of what the kernel shows: the wear of flash disks, and its statistics source by source.
 #pragma once
 
 #include "tools/doctor/health_check.h"
@@ -6,7 +6,8 @@
 
 namespace tally::tools {
 
-// Nothing for a device whose description has channels of its own.
+// No statistics for a device whose description has channels of its own, no disks for one that
+// describes its storage driver.
 void examineKernelSources(const ToolContext& context, HealthChecks& checks);
 
 }  // namespace tally::tools

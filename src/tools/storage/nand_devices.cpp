@@ -150,7 +150,8 @@ std::optional<FlashDisk> findDisk(const ToolContext& context,
 void addNandDevices(CLI::App& nand, ToolContext& context) {
   addCommand(nand, context, "devices",
              "List the flash disks, how worn they are, and which is the device's storage",
-             [&context] { return runDevices(context); });
+             [&context] { return runDevices(context); })
+      .canPlay();
 }
 
 Command addNandDiskCommand(CLI::App& nand, ToolContext& context, const char* name,
@@ -169,6 +170,7 @@ Command addNandDiskCommand(CLI::App& nand, ToolContext& context, const char* nam
   const Command command = addCommand(nand, context, name, description, runOn);
   command.option("--device", {"NAME", ValueKind::Disk}, device.get(),
                  "Another disk than that of the device's storage");
+  command.canPlay();
   return command;
 }
 
