@@ -3,6 +3,11 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
+
+#include "base/byte_reader.h"
+#include "fakes/fake_platform.h"
+#include "host/kernel/ecc_events.h"
 #include "host/store_fixture.h"
 
 namespace tally {
@@ -69,6 +74,66 @@ TEST_F(DailyAmountsOfStore, AmountRunsFromTheFirstSweepOfADayToTheNextDays) {
     EXPECT_EQ(step.action == Accumulate ? days.accumulate() : 1, 1u);
     metrics->endBatch();
   }
+}
+
+TEST_F(DailyAmountsOfStore, ACounterThatMissedASweepHasNoAmountOfThatDay) {
+  const auto sweep = [&](std::int32_t day, const std::vector<std::string>& present) {
+    clock->setDay(day, 7);
+    const auto metrics = store();
+    DailyAmounts days(metrics, clock);
+    days.beginSample();
+    std::string amounts;
+    for (const std::string& key : present) {
+      const auto value = static_cast<std::uint64_t>(day) * 10;
+      const auto amount = days.amount(key, {value, "boot", 64});
+      amounts += " " + (amount ? std::to_string(*amount) : std::string("none"));
+    }
+    metrics->beginBatch();
+    days.commitSweep();
+    metrics->endBatch();
+    return amounts;
+  };
+  EXPECT_EQ(sweep(100, {"sda", "sdb"}), " none none");
+  EXPECT_EQ(sweep(101, {"sda"}), " 10");
+  EXPECT_EQ(sweep(102, {"sda", "sdb"}), " 10 none");
+  EXPECT_EQ(sweep(103, {"sda", "sdb"}), " 10 10");
+  EXPECT_EQ(sweep(140, {"sda"}), " 370") << "the machine was off";
+  EXPECT_EQ(store()->counterStates().size(), 1u) << "unseen for more than 30 days";
+}
+
+TEST_F(DailyAmountsOfStore, MemoryErrorsAreForwardedOnceThoughTheyWereKeptBeforeTheSweep) {
+  put("proc/sys/kernel/random/boot_id", "boot\n");
+  const auto errors = [&](int corrected) {
+    put("sys/devices/system/edac/mc/mc1/ce_count", std::to_string(corrected) + "\n");
+    put("sys/devices/system/edac/mc/mc1/ue_count", "0\n");
+  };
+  const auto tree = std::make_shared<const SystemTree>(DeviceRoot(root));
+  const auto nextEvent = [&] {
+    EccEvents values(std::make_shared<fakes::FakeKernelValues>(), tree, store());
+    std::array<std::byte, 72> record{};
+    std::size_t length = record.size();
+    const int error = values.readKernelValue("kern.next_ecc_event", record, &length);
+    if (error != 0) return std::string(error == 2 ? "none" : "error");
+    const ByteReader reader(record);
+    return std::to_string(*reader.read<std::uint8_t>(0)) + ": " +
+           std::to_string(*reader.read<std::int64_t>(8)) + " corrected, " +
+           std::to_string(*reader.read<std::int64_t>(16)) + " not";
+  };
+  const auto keep = [&](std::uint64_t value) {
+    const auto metrics = store();
+    DailyAmounts days(metrics, clock);
+    days.beginSample();
+    (void)days.amount("edac.mc1.corrected", {value, "boot", 32});
+    days.accumulate();
+  };
+  errors(5);
+  EXPECT_EQ(nextEvent(), "none") << "since when it counts is not known";
+  store()->setCounterState({"edac.mc1.corrected", "boot", 5, 0, kToday, {}});
+  errors(8);
+  keep(8);
+  errors(9);
+  EXPECT_EQ(nextEvent(), "1: 4 corrected, 0 not");
+  EXPECT_EQ(nextEvent(), "none");
 }
 
 }  // namespace

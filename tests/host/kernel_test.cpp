@@ -88,7 +88,7 @@ TEST(KernelTexts, AFallOfAnUnsteadyCounterIsNoRestart) {
                {1000, true, 100, 1000},  // a processor went
                {1000, false, 1100, 1000}};
   for (const auto& c : cases) {
-    const CounterState next = nextState(kept, {c.value, "boot", 64, c.isUnsteady}, 5);
+    const CounterState next = nextState(kept, {c.value, "boot", 64, c.isUnsteady}, 5, 0);
     EXPECT_EQ(next.sum, c.sum) << c.value;
     EXPECT_EQ(next.last, c.last) << c.value;
   }

@@ -1,5 +1,7 @@
 #include "host/kernel/daily_amounts.h"
 
+#include <algorithm>
+
 namespace tally {
 namespace {
 
@@ -35,12 +37,13 @@ std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading) {
   return wrapped ? largest - kept.last + 1 + reading.value : reading.value;
 }
 
-CounterState nextState(const CounterState& kept, const CounterReading& reading,
-                       std::int32_t today) {
+CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today,
+                       std::int32_t lastSweep) {
   CounterState next = kept;
   next.sum = sumOf(kept.sum, riseOf(kept, reading));
   if (today > kept.day) {
-    next.amount = saturated(next.sum);
+    next.amount.reset();
+    if (kept.day >= lastSweep) next.amount = saturated(next.sum);
     next.sum = 0;
   } else if (today < kept.day) {
     next.amount.reset();  // the clock was set back: of which days the sum is will not be known
@@ -51,11 +54,15 @@ CounterState nextState(const CounterState& kept, const CounterReading& reading,
   return next;
 }
 
+std::string eventKey(std::string_view key) { return std::string(key).append("/event"); }
+
 void DailyAmounts::beginSample() {
   today_ = store_->TBDaysSince1970();
   kept_.clear();
   read_.clear();
+  lastSweep_ = 0;
   for (CounterState& state : store_->counterStates()) {
+    lastSweep_ = std::max(lastSweep_, state.day);
     std::string key = state.key;
     kept_.emplace(std::move(key), std::move(state));
   }
@@ -71,14 +78,14 @@ std::optional<std::int64_t> DailyAmounts::amount(const std::string& key,
   read_.insert_or_assign(key, LastReading{reading.value, std::string(reading.epoch), reading.width,
                                           reading.isUnsteady});
   const CounterState* const state = kept(key);
-  return state != nullptr ? nextState(*state, reading, today_).amount : std::nullopt;
+  return state != nullptr ? nextState(*state, reading, today_, lastSweep_).amount : std::nullopt;
 }
 
 void DailyAmounts::commitSweep() {
   for (const auto& [key, last] : read_) {
     const CounterState* const state = kept(key);
     store_->setCounterState(state != nullptr
-                                ? nextState(*state, last.reading(), today_)
+                                ? nextState(*state, last.reading(), today_, lastSweep_)
                                 : CounterState{key, last.epoch, last.value, 0, today_, {}});
   }
 }
@@ -94,6 +101,15 @@ std::size_t DailyAmounts::accumulate() {
     next.epoch = last.epoch;
     store_->setCounterState(next);
     ++count;
+    // What waits for the sweep as an event.
+    if (const CounterState* const event = kept(eventKey(key))) {
+      CounterState waiting = next;
+      waiting.key = event->key;
+      waiting.sum = sumOf(event->sum, riseOf(*event, last.reading()));
+      waiting.day = event->day;
+      waiting.amount.reset();
+      store_->setCounterState(waiting);
+    }
   }
   return count;
 }

@@ -28,8 +28,13 @@ struct CounterReading {
 // then is all that is known.
 std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading);
 
-// The state after a reading on a day: the day's amount is fixed by its first reading.
-CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today);
+// The state after a reading on a day: the day's amount is fixed by its first reading. lastSweep is
+// the day of the sweep before; a counter that was missing from it has no amount of that day.
+CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today,
+                       std::int32_t lastSweep);
+
+// Under which what a counter rose by is kept until a sweep forwards it as an event.
+std::string eventKey(std::string_view key);
 
 // One thread at a time.
 class DailyAmounts final : public DailyCounters {
@@ -59,7 +64,7 @@ class DailyAmounts final : public DailyCounters {
 
   std::shared_ptr<MetricsStore> store_;
   std::shared_ptr<const Clock> clock_;
-  std::int32_t today_ = 0;
+  std::int32_t today_ = 0, lastSweep_ = 0;
   std::map<std::string, CounterState, std::less<>> kept_;
   std::map<std::string, LastReading, std::less<>> read_;
 };

@@ -41,13 +41,18 @@ void EccEvents::findEvents() {
   if (names.empty()) return;
   const std::string boot = tree_->text("/proc/sys/kernel/random/boot_id").value_or("");
   const auto states = store_->counterStates();
-  // Nothing when the counter was never kept: since when it counts is not known.
+  // Nothing when the counter was never kept: since when it counts is not known. Events are read
+  // once, by the sweep, so what is read is forwarded, and the counter is kept as of now.
   const auto riseOfCounter = [&](const std::string& name, const char* file, const char* channel) {
     const auto value = tree_->number(controllers + name + "/" + file);
-    const auto kept = std::ranges::find(states, "edac." + name + "." + channel, &CounterState::key);
-    if (!value || *value < 0 || kept == states.end()) return std::int64_t{0};
+    if (!value || *value < 0) return std::int64_t{0};
+    const std::string key = eventKey("edac." + name + "." + channel);
+    const auto kept = std::ranges::find(states, key, &CounterState::key);
     const CounterReading reading{static_cast<std::uint64_t>(*value), boot, kCounterWidth};
-    return static_cast<std::int64_t>(riseOf(*kept, reading));
+    store_->setCounterState({key, boot, reading.value, 0, store_->TBDaysSince1970(), {}});
+    if (kept == states.end()) return std::int64_t{0};
+    const std::uint64_t rise = kept->sum + riseOf(*kept, reading);
+    return static_cast<std::int64_t>(std::min<std::uint64_t>(rise, INT64_MAX));
   };
   for (std::size_t i = names.size(); i-- > 0;) {
     const std::string& name = names[i];

@@ -63,6 +63,8 @@ struct FoundDevice {
   std::string identity = {};  // of what lifetime counters belong to, such as a serial number
   // Among those of its class, by bus path; empty: it has no part in the sweep.
   std::optional<unsigned> ordinal = 0;
+  // Its name in the store, which does not depend on what other devices there are; empty: the name.
+  std::string lasting = {};
   std::string_view kind = {};  // one of a few words that say what it is, for the sweep
 };
 

@@ -16,10 +16,9 @@ constexpr unsigned kMostSweptDevices = 4;
 constexpr std::string_view kDriverClass = "KernelStatistics";
 constexpr std::string_view kDailyName = "day", kDailyTitle = "Since the day before";
 
-std::string nameOf(const FoundChannel& channel) {
+std::string nameOf(const FoundChannel& channel, std::string_view device) {
   std::string name(sourceRow(channel.row->source).name);
-  for (const std::string_view part :
-       {std::string_view(channel.device.name), std::string_view(channel.item), channel.row->name}) {
+  for (const std::string_view part : {device, std::string_view(channel.item), channel.row->name}) {
     if (!part.empty()) name.append(".").append(part);
   }
   return name;
@@ -117,7 +116,7 @@ KernelChannels::KernelChannels(const SystemTree& tree) {
   const auto& channels = findings_.channels();
   names_.resize(channels.size());
   for (std::uint32_t i = 0; i < channels.size(); ++i) {
-    names_[i] = nameOf(channels[i]);
+    names_[i] = nameOf(channels[i], channels[i].device.name);
     // Two of one name could not be told apart: the first stays.
     if (byID_.try_emplace(idOf(names_[i]), i).second) addDaily(i);
   }
@@ -157,6 +156,12 @@ std::uint64_t KernelChannels::idOf(std::string_view name) {
   }
   // The library's mark of a missing number is not an id.
   return hash != element::kMissingValue ? hash : hash + 1;
+}
+
+std::string KernelChannels::lastingName(std::size_t channel) const {
+  const FoundChannel& found = findings_.channels()[channel];
+  const FoundDevice& device = found.device;
+  return nameOf(found, device.lasting.empty() ? device.name : device.lasting);
 }
 
 const FoundChannel* KernelChannels::channel(std::uint64_t id) const {

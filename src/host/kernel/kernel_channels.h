@@ -34,6 +34,8 @@ class KernelChannels {
   const Findings& findings() const { return findings_; }
   const std::string& name(std::size_t channel) const { return names_[channel]; }
   const std::vector<std::string>& names() const { return names_; }
+  // The channel's name in the store.
+  std::string lastingName(std::size_t channel) const;
   const std::vector<DailyChannel>& daily() const { return daily_; }
   // Whether nothing came, went or was made again since the other was found.
   bool isSame(const KernelChannels& other) const;

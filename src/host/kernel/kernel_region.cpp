@@ -111,7 +111,7 @@ void KernelRegion::addDailyChannel(const Interest& interest, const DailyChannel&
   if (interest.type == 0) channel.interest.type = typeOf(*daily.row, kSweptCategory, 1).bits;
   for (const std::uint32_t number : daily.channels) {
     const FoundChannel& found = channels_->findings().channels()[number];
-    std::string key = channels_->name(number);
+    std::string key = channels_->lastingName(number);
     if (daily.row->scope == CounterScope::Lifetime) key.append("@").append(found.device.identity);
     Part part = partOf(found.slots.front());
     part.key = std::move(key);

@@ -40,6 +40,11 @@ bool dropClass(std::string& path) {
   return true;
 }
 
+// What is plugged in comes after what is built in, whose ordinals must not move.
+bool isPluggable(const DeviceCandidate& device) {
+  return device.isRemovable || device.busPath.find("/usb") != std::string::npos;
+}
+
 // Those that come more than once get what tells them apart.
 template <class Mark>
 void markRepeated(std::vector<std::string>& names, const Mark& mark) {
@@ -92,14 +97,25 @@ std::vector<NamedDevice> named(std::vector<DeviceCandidate> devices) {
     names.push_back(device.name);
     places.push_back(device.busPath);
   }
+  std::vector<std::string> lasting;
+  for (std::size_t i = 0; i < names.size(); ++i) {
+    lasting.push_back(channelWord(names[i]) + "@" + channelWord(places[i]));
+  }
+  markRepeated(lasting, [](std::size_t, unsigned number) { return "#" + std::to_string(number); });
   names = uniqueNames(names, places);
   std::vector<NamedDevice> result;
-  unsigned ordinal = 0;
   for (std::size_t i = 0; i < devices.size(); ++i) {
-    FoundDevice device{std::move(names[i]), std::move(devices[i].identity), std::nullopt,
-                       devices[i].kind};
-    if (devices[i].isSwept) device.ordinal = ordinal++;
-    result.push_back({std::move(devices[i].directory), std::move(device)});
+    result.push_back({std::move(devices[i].directory),
+                      {std::move(names[i]), std::move(devices[i].identity), std::nullopt,
+                       std::move(lasting[i]), devices[i].kind}});
+  }
+  unsigned ordinal = 0;
+  for (const bool pluggable : {false, true}) {
+    for (std::size_t i = 0; i < devices.size(); ++i) {
+      if (devices[i].isSwept && isPluggable(devices[i]) == pluggable) {
+        result[i].device.ordinal = ordinal++;
+      }
+    }
   }
   return result;
 }

@@ -18,6 +18,7 @@ struct DeviceCandidate {
   std::string identity = {};
   bool isSwept = true;
   std::string_view kind = {};
+  bool isRemovable = false;
 };
 
 struct NamedDevice {
@@ -31,7 +32,8 @@ struct NamedDevice {
 std::string busPathOf(const SystemTree& tree, const std::string& directory);
 
 // In the order of their bus paths, each with a name of its own: the kernel's, with the bus path if
-// others have it too, else with a number. The swept ones have ordinals.
+// others have it too, else with a number. The swept ones have ordinals: first those that are built
+// in, then those that are plugged in.
 std::vector<NamedDevice> named(std::vector<DeviceCandidate> devices);
 
 // The same for texts that are in order already.

@@ -22,6 +22,8 @@ namespace {
 // releases the lock in between, long enough for writers that try only ten times a second.
 constexpr std::chrono::seconds kLongestTurn{2};
 constexpr std::chrono::milliseconds kPauseForOthers{150};
+// A device that was away for longer counts anew.
+constexpr std::int32_t kDaysOfUnseenCounter = 30;
 
 class SqliteMetricsStore final : public MetricsStore {
  public:
@@ -187,6 +189,10 @@ class SqliteMetricsStore final : public MetricsStore {
       }
       for (const CounterState& counter : counters) {
         if (auto set = (*opened)->setCounter(counter); !set) return set;
+      }
+      if (!counters.empty()) {
+        const std::int32_t first = TBDaysSince1970() - kDaysOfUnseenCounter;
+        if (auto done = (*opened)->forgetCountersBefore(first); !done) return done;
       }
       for (const DiskWear& wear : wears) {
         if (auto added = (*opened)->addWear(wear.disk, wear.row); !added) return added;

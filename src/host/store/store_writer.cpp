@@ -271,6 +271,10 @@ Status StoreWriter::setCounter(const CounterState& state) {
   return kept ? Status(Done{}) : Status(database_.error());
 }
 
+Status StoreWriter::forgetCountersBefore(std::int32_t day) {
+  return database_.execute(("DELETE FROM counters WHERE day < " + std::to_string(day)).c_str());
+}
+
 Status StoreWriter::forgetBefore(std::int32_t day) { return forget("< ?1", day); }
 
 Status StoreWriter::forgetDay(std::int32_t day) { return forget("= ?1", day); }

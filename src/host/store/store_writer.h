@@ -42,6 +42,8 @@ class StoreWriter {
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
   // Keeps the state of a counter.
   Status setCounter(const CounterState& state);
+  // Forgets those that no sweep has seen since the day. REQUIRES: setCounter() in this transaction.
+  Status forgetCountersBefore(std::int32_t day);
   // Makes the table if it is missing.
   Status addWear(std::string_view disk, const WearRow& row);
   Status forgetBefore(std::int32_t day);

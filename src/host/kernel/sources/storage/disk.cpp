@@ -55,9 +55,13 @@ void findDisks(const SystemTree& tree, Findings& findings) {
     const std::string directory = "/sys/block/" + name;
     if (!isPhysical(tree, directory, name) || !tree.exists(directory + "/stat")) continue;
     // A disk that was taken away and came back counts anew.
-    disks.push_back({directory, name, busPathOf(tree, directory),
+    disks.push_back({directory,
+                     name,
+                     busPathOf(tree, directory),
                      tree.text(directory + "/diskseq").value_or(""),
-                     !isNumbered(name, "mtdblock")});  // partitions of one chip
+                     !isNumbered(name, "mtdblock"),  // partitions of one chip
+                     {},
+                     tree.number(directory + "/removable") == 1});
   }
   for (const auto& [directory, device] : named(std::move(disks))) {
     const std::string path = directory + "/stat";
