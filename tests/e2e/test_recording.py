@@ -62,10 +62,15 @@ class Recording(unittest.TestCase):
         device = self.unpacked(TREES[[tree.stem for tree in TREES].index("laptop")])
         device.parent.chmod(0o755)
         (device / DISK).chmod(0)
+        (device / "proc/interrupts").chmod(0)
+        (device / "proc/pressure/cpu").unlink()
+        (device / "proc/pressure/cpu").mkdir()
         lines = subprocess.run([BIN / "tallyctl", "--root", device, "doctor"], capture_output=True, text=True, user=12345,
                                check=False).stdout.splitlines()
         said = {line[11:31].strip(): line for line in lines}
         self.assertIn("17 channels, of which a file is not permitted", said["Disks"])
+        self.assertIn("a file is not permitted (/proc/interrupts)", said["Interrupts"])
+        self.assertRegex(said["Pressure"], r" [1-9] channels; a file is unreadable: .*cpu")
         self.assertIn("[ok]       Sleep", said["Sleep"])
         self.assertNotIn("absent", said["Sensors"])
         self.assertIn("NVMe, available", said["wear of nvme0n1"])

@@ -1,5 +1,8 @@
 #include "tools/doctor/health_kernel.h"
 
+#include <cerrno>
+#include <cstring>
+
 #include "host/kernel/kernel_channels.h"
 #include "host/kernel/source_survey.h"
 #include "platform/protocol/hub_protocol.h"
@@ -18,16 +21,31 @@ bool areChannelsDescribed(DeviceRegistry& registry) {
   return id != KernelChannels::kHubID;
 }
 
+std::string filesThatAre(std::string_view state, const UnreadableFiles& files) {
+  return fmt::format("{} {} ({})",
+                     files.count == 1 ? "a file is" : counted(files.count, "file") + " are", state,
+                     files.example);
+}
+
 HealthCheck checkOf(const SourceSurvey& survey) {
   const std::string subject(survey.title);
-  if (survey.channels == 0) return {Health::Missing, subject, "absent on this hardware"};
-  if (survey.refused == 0) return {Health::Ok, subject, counted(survey.channels, "channel")};
-  return {Health::Missing, subject,
-          fmt::format("{}, of which {} not permitted ({}); the user root or CAP_DAC_READ_SEARCH "
-                      "would permit it",
-                      counted(survey.channels, "channel"),
-                      survey.refused == 1 ? "a file is" : counted(survey.refused, "file") + " are",
-                      survey.example)};
+  const bool isRefused = survey.refused.count > 0, isBroken = survey.broken.count > 0;
+  std::string text = survey.channels > 0 ? counted(survey.channels, "channel") : "";
+  if (!isRefused && !isBroken) {
+    if (text.empty()) return {Health::Missing, subject, "absent on this hardware"};
+    return {Health::Ok, subject, text};
+  }
+  if (isRefused) {
+    text += (text.empty() ? "" : ", of which ") + filesThatAre("not permitted", survey.refused) +
+            "; the user root or CAP_DAC_READ_SEARCH would permit it";
+  }
+  if (isBroken) {
+    const int error = survey.broken.error;
+    const std::string state =
+        error == EOPNOTSUPP ? "switched off" : fmt::format("unreadable: {}", std::strerror(error));
+    text += (text.empty() ? "" : "; ") + filesThatAre(state, survey.broken);
+  }
+  return {Health::Missing, subject, text};
 }
 
 HealthCheck checkOf(const FlashDisk& disk) {
