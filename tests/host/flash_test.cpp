@@ -268,14 +268,19 @@ TEST_F(FlashTreeTest, TheDisksAndTheDevicesOwn) {
 TEST_F(FlashTreeTest, WhatADiskIsKnownBy) {
   putAll(kEmmc);
   putAll(kNvme);
-  putAll({"sys/block/mmcblk0/device/serial=0x00000000",
+  std::string registers(1024, '0');
+  registers.replace(2 * 192, 2, "08").replace(2 * 268, 4, "0204");
+  putAll({"sys/block/mmcblk1/device>../../devices/mmc1:0001", "sys/devices/mmc1:0001/type=MMC",
+          "sys/kernel/debug/mmc1/mmc1:0001/ext_csd=" + registers,
+          "sys/block/mmcblk0/device/serial=0x00000000",
           "run/tallyd/nvme-health-nvme0=" + healthPage(), "proc/uptime=90061.25 12.5"});
   const auto found = flashDisks().disks();
-  ASSERT_EQ(found.size(), 2u);
+  ASSERT_EQ(found.size(), 3u);
+  EXPECT_EQ(textOf(found[1].wear), "fast 10-20;used 30-40;") << "of the registers alone";
   EXPECT_EQ(found[0].identity, "") << "a number of zeros tells nothing";
   EXPECT_EQ(found[0].wear->ageSeconds, 90061);
-  EXPECT_EQ(found[1].identity, "NVMe S1");
-  EXPECT_EQ(textOf(found[1].wear), "used 3-3;spare 100-100;unsafe 0;errors 0;celsius 40;");
+  EXPECT_EQ(found[2].identity, "NVMe S1");
+  EXPECT_EQ(textOf(found[2].wear), "used 3-3;spare 100-100;unsafe 0;errors 0;celsius 40;");
 }
 
 TEST_F(FlashTreeTest, TheDriverExportsWhatIsKnown) {

@@ -7,6 +7,7 @@
 namespace tally {
 namespace {
 
+constexpr std::string_view kType = "MMC";  // and not "SD"
 constexpr unsigned kFirstRevisionWithLife = 7;
 constexpr std::size_t kRegisters = 512;
 constexpr std::size_t kRevisionAt = 192, kPreEndOfLifeAt = 267, kFastLifeAt = 268, kLifeAt = 269;
@@ -44,7 +45,7 @@ std::optional<Wear> readLive(const SystemTree& tree, const std::string& name) {
 }  // namespace
 
 std::optional<Wear> parseEmmc(const EmmcAttributes& attributes) {
-  if (attributes.type != "MMC") return std::nullopt;
+  if (attributes.type != kType) return std::nullopt;
   // Older kernels do not have the revision, but show a life of 0 where the card has none.
   if (!attributes.revision.empty()) {
     const auto revision = parseHexByte(attributes.revision);
@@ -72,10 +73,11 @@ std::optional<Wear> readEmmc(const SystemTree& tree, const std::string& name) {
   };
   const std::string type = attribute("type"), revision = attribute("rev"),
                     lifeTime = attribute("life_time"), preEndOfLife = attribute("pre_eol_info");
-  auto wear = parseEmmc({type, revision, lifeTime, preEndOfLife});
-  if (!wear) return std::nullopt;
+  if (type != kType) return std::nullopt;
+  // Older kernels have the registers, but no attributes for the life.
   if (auto live = readLive(tree, name)) return live;
-  wear->ageSeconds = uptimeSeconds(tree);
+  auto wear = parseEmmc({type, revision, lifeTime, preEndOfLife});
+  if (wear) wear->ageSeconds = uptimeSeconds(tree);
   return wear;
 }
 
