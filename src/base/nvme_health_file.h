@@ -25,4 +25,9 @@ inline std::string healthPageName(std::string_view controller) {
   return std::string(kHealthPagePrefix) + std::string(controller);
 }
 
+inline bool isHealthPageName(std::string_view name) {
+  return name.starts_with(kHealthPagePrefix) &&
+         isNvmeController(name.substr(kHealthPagePrefix.size()));
+}
+
 }  // namespace tally

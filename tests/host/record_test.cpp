@@ -19,6 +19,7 @@ using ::testing::HasSubstr;
 class RecordTest : public TemporaryRoot {};
 
 TEST_F(RecordTest, WhatIdentifiesIsANumber) {
+  const std::string page(512, '\x01');
   const struct {
     const char *path, *text, *newPath, *newText;
   } cases[] = {
@@ -75,7 +76,21 @@ TEST_F(RecordTest, WhatIdentifiesIsANumber) {
       {"/data/alice", nullptr, "/data/dir1", nullptr},
       // What is not a text is left out, except pages of numbers.
       {"/sys/block/sda/device/vpd_pg80", "\x01\x02S4EV", "/sys/block/sda/device/vpd_pg80", ""},
-      {"/run/tallyd/nvme-health-nvme0", "\x01\x02", "/run/tallyd/nvme-health-nvme0", "\x01\x02"},
+      {"/run/tallyd/nvme-health-nvme0", page.c_str(), "/run/tallyd/nvme-health-nvme0",
+       page.c_str()},
+      // What a person may have named, unless it is what anyone's machine has.
+      {"/proc/sys/kernel/osrelease", "6.1.0-18-cloud-amd64-alice-2\n", "/proc/sys/kernel/osrelease",
+       "6.1.0-18-cloud-amd64\n"},
+      {"/etc/os-release", "NAME=\"A b\"\nHOME_URL=https://alice.example\nVERSION_ID=12",
+       "/etc/os-release", "NAME=\"A b\"\nVERSION_ID=12\n"},
+      {"/sys/class/power_supply/hid-S4EVN0X-battery", nullptr, "/sys/class/power_supply/supply1",
+       nullptr},
+      {"/sys/class/power_supply/axp20x-battery", nullptr, "/sys/class/power_supply/axp20x-battery",
+       nullptr},
+      {"/sys/class/hwmon/hwmon0/name", "Alice\n", "/sys/class/hwmon/hwmon0/name", "sensor1\n"},
+      {"/sys/class/hwmon/hwmon1/name", "ab123456\n", "/sys/class/hwmon/hwmon1/name", "sensor2\n"},
+      {"/sys/class/hwmon/hwmon2/name", "k10temp\n", "/sys/class/hwmon/hwmon2/name", "k10temp\n"},
+      {"/sys/class/hwmon/hwmon3/name", "BAT0\n", "/sys/class/hwmon/hwmon3/name", "BAT0\n"},
   };
   RecordedTree recorded;
   for (const auto& c : cases) {
@@ -105,6 +120,9 @@ TEST_F(RecordTest, WhatWasAskedForIsThereAgain) {
   put("d/sys/devices/pci0/block/sda/unasked", "x");
   put("d/sys/devices/pci0/huge", std::string(kLargestRecordedFile + 1, 'x'));
   put("d/proc/uptime", "1.00 2.00\n");
+  put("d/run/tallyd/nvme-health-nvme0", std::string(512, '\x01'));
+  put("d/run/tallyd/nvme-health-nvme1", "short");
+  put("d/run/tallyd/notes", std::string(512, 'x'));
   fs::create_directories(at("d/sys/block"));
   fs::create_symlink("../devices/pci0/block/sda", at("d/sys/block/sda"));
   fs::create_symlink("loop", at("d/sys/block/loop"));
@@ -130,6 +148,7 @@ TEST_F(RecordTest, WhatWasAskedForIsThereAgain) {
   ASSERT_TRUE(checkRecordingFolder(at("r/")));
   ASSERT_TRUE(writeRecording(recorded, at("r")));
   EXPECT_FALSE(fs::exists(at("r/sys/devices/pci0/block/sda/unasked")));
+  EXPECT_THAT(this->names("r/run/tallyd"), ElementsAre("nvme-health-nvme0"));
   const SystemTree replayed{DeviceRoot(at("r"))};
   EXPECT_TRUE(replayed.isRecording());
   EXPECT_EQ(replayed.list("/sys/block"), names);

@@ -6,26 +6,20 @@
 
 #include "base/natural_order.h"
 #include "base/number_text.h"
+#include "base/nvme_health_file.h"
 #include "base/text_lines.h"
+#include "host/record/plain_names.h"
 #include "host/record/shapes.h"
 
 namespace tally {
 namespace {
 
-constexpr std::string_view kInterface = "if", kDisk = "disk", kHost = "host", kFolder = "dir";
+constexpr std::string_view kInterface = "if", kDisk = "disk", kHost = "host", kFolder = "dir",
+                           kSupply = "supply", kSensor = "sensor";
 
-bool isLower(char letter) { return letter >= 'a' && letter <= 'z'; }
 bool isWordLetter(char letter) {
   return isDigit(letter) || isLower(letter) || (letter >= 'A' && letter <= 'Z') ||
          static_cast<unsigned char>(letter) >= 0x80;
-}
-
-std::string lower(std::string_view text) {
-  std::string result(text);
-  for (char& letter : result) {
-    if (letter >= 'A' && letter <= 'Z') letter = static_cast<char>(letter - 'A' + 'a');
-  }
-  return result;
 }
 
 std::string_view lastName(std::string_view path) { return path.substr(path.rfind('/') + 1); }
@@ -50,8 +44,15 @@ bool isSecret(std::string_view name) {
   });
 }
 
+// "…/hwmon3/name" has the name that a driver, or a driver's user, gave a sensor.
+bool isChipName(std::string_view path) {
+  const std::string_view folder = path.substr(0, path.rfind('/'));
+  return path.ends_with("/name") && lastName(folder).starts_with("hwmon");
+}
+
 // Of a mapped disk or an array the name is what its owner called it.
-std::string_view secretKind(std::string_view path) {
+std::string_view secretKind(std::string_view path, std::string_view text) {
+  if (isChipName(path)) return isDriverName(trimmed(text)) ? std::string_view() : kSensor;
   if (path.ends_with("/dm/name") || path.ends_with("/md/array_name")) return kDisk;
   return isSecret(lastName(path)) ? lastName(path) : std::string_view();
 }
@@ -64,7 +65,11 @@ bool isFixedText(std::string_view path) {
       "/proc/loadavg", "/proc/schedstat", "/proc/buddyinfo", "/proc/zoneinfo",
   };
   return std::ranges::count(kFixed, path) > 0 || path.starts_with("/proc/pressure/") ||
-         path.ends_with("/os-release") || path.ends_with("/ext_csd");
+         path.ends_with("/ext_csd");
+}
+
+bool isLogPage(std::string_view path) {
+  return path.starts_with(kLogPageFolder) && isHealthPageName(lastName(path));
 }
 
 // Names that every system has, on the way to a file.
@@ -172,7 +177,7 @@ std::string Pseudonyms::secret(std::string_view name, std::string_view text) {
 }
 
 void Pseudonyms::learn(std::string_view path, std::string_view text) {
-  const std::string_view kind = secretKind(path);
+  const std::string_view kind = secretKind(path, text);
   if (!kind.empty()) (void)secret(kind, text);
 }
 
@@ -254,6 +259,9 @@ std::string Pseudonyms::component(std::string_view above, std::string_view name)
   const bool isNumber = name.find_first_not_of("0123456789:.") == name.npos;
   if (above == "block" && !isNumber && !isKernelDisk(name)) {
     return named(kDisk, std::string(name), true);
+  }
+  if (above == "power_supply" && !isSupplyName(name)) {
+    return named(kSupply, std::string(name), true);
   }
   return shapes(words(name, Where::Path), true);
 }
@@ -377,11 +385,15 @@ std::string Pseudonyms::mounts(std::string_view table) {
 }
 
 std::string Pseudonyms::content(std::string_view path, std::string_view text) {
-  if (path.starts_with(kLogPageFolder) || isFixedText(path)) return std::string(text);
+  if (isFixedText(path)) return std::string(text);
+  if (isLogPage(path)) return std::string(text.size() == kHealthPageSize ? text : "");
   while (text.ends_with('\0')) text.remove_suffix(1);
   if (!isText(text)) return {};
-  if (const std::string_view kind = secretKind(path); !kind.empty()) return secret(kind, text);
+  const std::string_view kind = secretKind(path, text);
+  if (!kind.empty()) return secret(kind, text);
   const std::string_view name = lastName(path);
+  if (name == "os-release") return nameAndVersion(text);
+  if (path == "/proc/sys/kernel/osrelease") return plainRelease(text);
   if (name == "mountinfo") return mounts(text);
   if (name == "uevent") return eventLines(text);
   // A file that is one path may have blanks in it.

@@ -80,6 +80,14 @@ std::size_t hexLength(std::string_view text, std::size_t place, bool isPath) {
 
 }  // namespace
 
+std::string lower(std::string_view text) {
+  std::string result(text);
+  for (char& letter : result) {
+    if (letter >= 'A' && letter <= 'Z') letter = static_cast<char>(letter - 'A' + 'a');
+  }
+  return result;
+}
+
 bool isSeparator(char letter) {
   return std::string_view(" \t\r\n,;=:()[]{}<>|\"'").find(letter) != std::string_view::npos;
 }

@@ -24,6 +24,8 @@ std::optional<FoundShape> shapeAt(std::string_view text, std::size_t place, bool
 std::string shaped(Shape shape, std::string_view original, std::uint32_t number);
 
 inline bool isDigit(char letter) { return letter >= '0' && letter <= '9'; }
+inline bool isLower(char letter) { return letter >= 'a' && letter <= 'z'; }
+std::string lower(std::string_view text);
 // Between words of the kernel's texts.
 bool isSeparator(char letter);
 

@@ -4,6 +4,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "base/nvme_health_file.h"
+
 namespace tally {
 namespace {
 
@@ -141,8 +143,12 @@ void TreeRecorder::take() {
     paths = asked_->paths;
   }
   for (const char* const path : kAlways) paths[path].insert(TreeUse::Read);
-  for (const std::string& page : tree_.list(kLogPageFolder)) {
-    paths[std::string(kLogPageFolder) + "/" + page].insert(TreeUse::Read);
+  for (const std::string& name : tree_.list(kLogPageFolder)) {
+    const std::string page = std::string(kLogPageFolder) + "/" + name;
+    if (!isHealthPageName(name)) continue;
+    const auto entry = tree_.examine(page);
+    const bool isPage = entry && entry->type == Type::File && read(page).size() == kHealthPageSize;
+    if (isPage) paths[page].insert(TreeUse::Read);
   }
   for (const auto& [path, uses] : paths) add(path, uses);
 }
