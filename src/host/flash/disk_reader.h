@@ -27,7 +27,7 @@ class DiskReader {
   // Whether wear() may find something. Asks no disk.
   bool mayTellWear(const Disk& disk) const;
   std::optional<Wear> wear(const Disk& disk) const;
-  // Tells the disk from one that takes its place; empty if it cannot be told.
+  // What distinguishes the disk from one that replaces it; empty if nothing does.
   std::string identity(const Disk& disk) const;
 
  private:

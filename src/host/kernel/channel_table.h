@@ -57,9 +57,9 @@ constexpr ChannelRow kRows[] = {
 {Zram, "compacted-pages", kNone, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/mm_stat", "", "pages that compaction freed"},
 {Zram, "huge-pages", kNone, kSimple, kGauge, kCreation, 0, "/sys/block/zram*/mm_stat", "", "pages that cannot be compressed"},
 {Zram, "huge-pages-ever", kNone, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/mm_stat", "", "pages that could not be compressed since the disk was set up"},
-{Zram, "written-back", kFourKibibytes, kSimple, kGauge, kCreation, 0, "/sys/block/zram*/bd_stat", "", "data that is on the disk behind it"},
-{Zram, "read-back", kFourKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/bd_stat", "", "data that was read from the disk behind it"},
-{Zram, "write-back", kFourKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/bd_stat", "zram.write-back", "data that was written to the disk behind it"},
+{Zram, "written-back", kFourKibibytes, kSimple, kGauge, kCreation, 0, "/sys/block/zram*/bd_stat", "", "data that is on its backing device"},
+{Zram, "read-back", kFourKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/bd_stat", "", "data that was read from its backing device"},
+{Zram, "write-back", kFourKibibytes, kSimple, kCounter, kCreation, 64, "/sys/block/zram*/bd_stat", "zram.write-back", "data that was written to its backing device"},
 
 {Network, "received", kBytes, kSimple, kCounter, kCreation, 64, "/proc/net/dev", "net#.received", "data that was received"},
 {Network, "received-packets", kPackets, kSimple, kCounter, kCreation, 64, "/proc/net/dev", "", "packets that were received"},
