@@ -7,6 +7,7 @@
 #include <map>
 
 #include "host/kernel/kernel_region.h"
+#include "host/kernel/naming.h"
 #include "host/kernel/sources/cpu/interrupts.h"
 #include "host/kernel/sources/cpu/processor_time.h"
 #include "host/kernel/sources/cpu/processors.h"
@@ -136,6 +137,20 @@ TEST_F(KernelTest, NamesAreUniquePrintableAndOfNoNumberThatChanges) {
                           "hwmon.chip@a.temp10", "hwmon.chip@b.temp1"));
   EXPECT_THAT(daily(), ElementsAre("thermal0.temperature", "thermal1.temperature",
                                    "sensor0.temperature", "sensor1.temperature"));
+}
+
+TEST(KernelNames, WhatIsPluggedInMovesNeitherOrdinalsNorTheNamesInTheStore) {
+  const auto found = named({{"fixed", "disk", "pci/z"},
+                            {"stick", "stick", "pci/usb1/1"},
+                            {"card", "card", "pci/m", "", true, "", true},
+                            {"twin", "disk", "pci/y"}});
+  Names names;
+  for (const auto& [directory, device] : found) {
+    names.push_back(directory + " " + std::to_string(*device.ordinal) + " " + device.lasting);
+  }
+  EXPECT_THAT(names,
+              testing::UnorderedElementsAre("twin 0 disk@pci/y", "fixed 1 disk@pci/z",
+                                            "card 2 card@pci/m", "stick 3 stick@pci/usb1/1"));
 }
 
 TEST_F(KernelTest, PhysicalDisksAloneAreCounted) {
