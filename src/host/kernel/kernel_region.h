@@ -34,6 +34,7 @@ class KernelRegion final : public HubRegion {
                std::shared_ptr<const KernelChannels> channels, KernelDevice device);
 
   std::size_t size() const override;
+  bool hasFirstFrame() const override { return false; }
   void writeFrame(std::size_t refresh, std::span<std::byte> memory) override;
 
  private:

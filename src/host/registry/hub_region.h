@@ -17,8 +17,10 @@ class HubRegion {
   virtual ~HubRegion() = default;
   // In bytes, never 0; the same for every frame.
   virtual std::size_t size() const = 0;
-  // Writes the region as of that refresh, counted from 0. Frame 0 is also written before the first
-  // refresh.
+  // Whether the region has a frame before the first refresh, the same as that of the refresh. Not
+  // so where a frame is what is read at that moment.
+  virtual bool hasFirstFrame() const { return true; }
+  // Writes the region as of that refresh, counted from 0.
   virtual void writeFrame(std::size_t refresh, std::span<std::byte> memory) = 0;
 };
 

@@ -87,7 +87,7 @@ class StatisticsHubClient final : public UserClient {
     if (!region_) return kRegistryNoMemory;
     memory_ = SharedMemory::create(region_->size());
     if (!memory_) return kRegistryNoMemory;
-    region_->writeFrame(0, memory_->writable());
+    if (region_->hasFirstFrame()) region_->writeFrame(0, memory_->writable());
     call.scalarOutput[0] = kToken;
     call.scalarOutputCount = 1;
     return kRegistrySuccess;
