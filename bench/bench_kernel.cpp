@@ -58,6 +58,7 @@ double readAll(const std::vector<std::string>& paths) {
 
 double readOpen(const std::vector<std::string>& paths) {
   std::vector<int> files;
+  files.reserve(paths.size());
   for (const std::string& path : paths) files.push_back(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
   const double cost = costOf([&] {
     for (const int file : files) (void)!::pread(file, buffer, sizeof buffer, 0);

@@ -28,11 +28,13 @@ class Tree {
   std::string root_;
 };
 
+std::uint64_t counterOf(int device) { return static_cast<std::uint64_t>(device) + 1; }
+
 // Numbers that look like counters.
 std::string columns(int count, std::uint64_t first) {
   std::string text;
   for (int i = 0; i < count; ++i)
-    text += fmt::format(" {:10}", first * (i + 3) * 7919 % 100'000'007);
+    text += fmt::format(" {:10}", first * static_cast<std::uint64_t>(i + 3) * 7919 % 100'000'007);
   return text;
 }
 
@@ -43,13 +45,14 @@ std::string perCpu(const std::string& name, std::uint64_t first, const std::stri
 void addTables(const Tree& tree) {
   std::string stat = "cpu " + columns(10, 99) + "\n", header, interrupts, soft;
   for (int i = 0; i < kCpus; ++i) {
-    stat += fmt::format("cpu{}{}\n", i, columns(10, i + 1u));
+    stat += fmt::format("cpu{}{}\n", i, columns(10, counterOf(i)));
     header += fmt::format(" {:>10}", fmt::format("CPU{}", i));
   }
   stat += "intr 123456789" + columns(kInterrupts, 5) + "\nctxt 987654321\nbtime 1700000000\n" +
           "processes 4321\nprocs_running 1\nprocs_blocked 0\nsoftirq 1234" + columns(10, 3) + "\n";
   for (int i = 0; i < kInterrupts; ++i) {
-    interrupts += perCpu(std::to_string(i), i + 1u, fmt::format("PCI-MSI {}-edge nvme0q{}", i, i));
+    interrupts +=
+        perCpu(std::to_string(i), counterOf(i), fmt::format("PCI-MSI {}-edge nvme0q{}", i, i));
   }
   for (const char* kind : {"HI", "TIMER", "NET_TX", "NET_RX", "BLOCK", "IRQ_POLL", "TASKLET",
                            "SCHED", "HRTIMER", "RCU"}) {
@@ -89,7 +92,7 @@ void addDevices(const Tree& tree) {
   for (int i = 0; i < kDisks; ++i) {
     const std::string disk = fmt::format("sd{}", static_cast<char>('a' + i));
     const std::string device = fmt::format("/sys/devices/pci0000:00/0000:00:{:02x}.0/", i);
-    tree.file(device + "block/" + disk + "/stat", columns(17, i + 1u) + "\n");
+    tree.file(device + "block/" + disk + "/stat", columns(17, counterOf(i)) + "\n");
     tree.file(device + "block/" + disk + "/diskseq", std::to_string(i + 1) + "\n");
     tree.link(device + "block/" + disk + "/device", "../..");
     tree.link("/sys/block/" + disk, "../" + (device + "block/" + disk).substr(5));
@@ -97,7 +100,7 @@ void addDevices(const Tree& tree) {
   for (int i = 0; i < kInterfaces; ++i) {
     const std::string name = fmt::format("eth{}", i);
     const std::string device = fmt::format("/sys/devices/pci0000:00/0000:01:{:02x}.0/", i);
-    net += fmt::format("{:>6}:{}\n", name, columns(16, i + 1u));
+    net += fmt::format("{:>6}:{}\n", name, columns(16, counterOf(i)));
     tree.file(device + "net/" + name + "/ifindex", std::to_string(i + 2) + "\n");
     tree.link(device + "net/" + name + "/device", "../..");
     tree.link("/sys/class/net/" + name, "../../" + (device + "net/" + name).substr(5));

@@ -13,7 +13,7 @@ namespace {
 constexpr std::size_t kWarnings = 0, kKelvin = 1, kSpare = 3, kSpareThreshold = 4, kPercentUsed = 5;
 constexpr std::size_t kUnitsRead = 32, kUnitsWritten = 48, kPowerOnHours = 128,
                       kUnsafeShutdowns = 144, kMediaErrors = 160;
-constexpr std::uint64_t kUnitBytes = 1000 * 512;
+constexpr std::uint64_t kUnitBytes = std::uint64_t{1000} * 512;
 constexpr unsigned kAbove254 = 255;
 constexpr std::uint64_t kLargest = std::numeric_limits<std::uint64_t>::max();
 

@@ -5,6 +5,8 @@
 #include <optional>
 #include <string_view>
 
+#include "base/time_text.h"
+
 namespace tally {
 
 enum class DiskKind : std::uint8_t { Emmc, Ufs, RawNand, Nvme, Other };
@@ -62,6 +64,6 @@ constexpr std::string_view kWearWarnings[] = {
     "volatile memory backup failed", "persistent memory region unreliable"};
 
 // Figures that are older do not speak for today.
-constexpr std::int64_t kFreshSeconds = 2 * 24 * 60 * 60;
+constexpr std::int64_t kFreshSeconds = 2 * kSecondsPerDay;
 
 }  // namespace tally

@@ -20,9 +20,8 @@ struct WearRow {
 
 // Of a disk whose percentage is known; of the day of the figures, which may be before today.
 inline std::optional<WearRow> wearRowOf(const Wear& wear, std::int32_t today) {
-  constexpr std::int64_t kSecondsOfDay = 24 * 60 * 60;
   const auto& used = wear.mostUsed();
-  const std::int64_t day = today - wear.ageSeconds.value_or(0) / kSecondsOfDay;
+  const std::int64_t day = today - wear.ageSeconds.value_or(0) / kSecondsPerDay;
   if (!used || day < 0) return std::nullopt;
   const auto bytes = [](const Figure<std::uint64_t>& figure) {
     return figure ? std::optional(static_cast<std::int64_t>(
