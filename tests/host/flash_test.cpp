@@ -121,7 +121,7 @@ TEST(Flash, HealthPages) {
        "used 255-;unsafe 0;errors 0;"},
       {"counts", healthPage({{32, "\x02"}, {48, "\x03"}, {144, "\x05"}, {160, "\x06"}}),
        "used 3-3;spare 100-100;written 1536000;read 1024000;unsafe 5;errors 6;celsius 40;"},
-      {"128 bits", healthPage({{48, huge}, {160, huge}}),
+      {"128 bits", healthPage({{48, huge}, {160, std::string(8, '\0') + "\x01"}}),
        "used 3-3;spare 100-100;written 18446744073709551615;unsafe 0;errors "
        "18446744073709551615;celsius 40;"},
       {"no spare, as emulated disks", healthPage({{3, std::string(2, '\0')}}),
