@@ -221,7 +221,7 @@ TEST_F(FlashTreeTest, TheDisksAndTheDevicesOwn) {
       {"no disk", {{"sys/block/loop0/dev=7:0", "sys/block/sr0/device/x="}}, ""},
       {"a partition", {kEmmc, kNvme, {mounted("179:2")}}, "*mmcblk0 eMMC; nvme0n1 NVMe"},
       {"nothing says it", {kEmmc, kNvme}, "mmcblk0 eMMC; nvme0n1 NVMe"},
-      {"the only fixed one; boot areas and paths are no disks",
+      {"the only fixed one; boot areas and paths are not disks",
        {kEmmc,
         {"sys/block/mmcblk0boot0/device/type=MMC", "sys/block/mmcblk1/device/type=SD",
          "sys/block/sda/device/x=", "sys/block/sda/removable=1", "sys/block/nvme0c0n1/device/x="}},

@@ -4,6 +4,7 @@
 #include <array>
 
 #include "base/text_lines.h"
+#include "host/tree/escaped_text.h"
 
 namespace tally {
 namespace {
@@ -13,24 +14,6 @@ std::string_view takeWord(std::string_view& text) {
   const std::string_view word = text.substr(0, end);
   text.remove_prefix(std::min(end + 1, text.size()));
   return word;
-}
-
-// Blanks and the like are octal: "\040".
-std::string unescaped(std::string_view text) {
-  std::string plain;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    const auto isOctal = [&](std::size_t at) {
-      return at < text.size() && text[at] >= '0' && text[at] <= '7';
-    };
-    if (text[i] == '\\' && isOctal(i + 1) && isOctal(i + 2) && isOctal(i + 3)) {
-      const int code = (text[i + 1] - '0') * 64 + (text[i + 2] - '0') * 8 + (text[i + 3] - '0');
-      plain += static_cast<char>(code);
-      i += 3;
-    } else {
-      plain += text[i];
-    }
-  }
-  return plain;
 }
 
 std::optional<Mount> parseMount(std::string_view line) {

@@ -10,7 +10,7 @@
 
 namespace tally {
 
-// Looks for devices when it is asked, at most every ten seconds. There are no entries when the
+// Looks for devices when it is asked, at most every ten seconds. No entries exist when the
 // device shows nothing.
 class KernelStatistics final : public RegistrySource {
  public:

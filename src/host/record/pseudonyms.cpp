@@ -10,6 +10,7 @@
 #include "base/text_lines.h"
 #include "host/record/plain_names.h"
 #include "host/record/shapes.h"
+#include "host/tree/escaped_text.h"
 
 namespace tally {
 namespace {
@@ -127,24 +128,6 @@ bool isText(std::string_view text) {
     return static_cast<unsigned char>(letter) >= ' ' || letter == '\n' || letter == '\t' ||
            letter == '\r';
   });
-}
-
-// "a\040b" is how the kernel writes "a b" in its tables.
-std::string unescaped(std::string_view text) {
-  std::string result;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    const auto isOctal = [&](std::size_t at) {
-      return at < text.size() && text[at] >= '0' && text[at] <= '7';
-    };
-    if (text[i] == '\\' && isOctal(i + 1) && isOctal(i + 2) && isOctal(i + 3)) {
-      result += static_cast<char>((text[i + 1] - '0') << 6 | (text[i + 2] - '0') << 3 |
-                                  (text[i + 3] - '0'));
-      i += 3;
-    } else {
-      result += text[i];
-    }
-  }
-  return result;
 }
 
 }  // namespace

@@ -89,7 +89,7 @@ void TreeRecorder::addFile(const std::string& path, bool isRead) {
 void TreeRecorder::addNames(const std::string& directory) {
   for (const std::string& name : tree_.list(directory)) {
     const std::string path = (directory == "/" ? "" : directory) + "/" + name;
-    // Processes are no devices.
+    // Processes are not devices.
     if (directory == "/proc" && name.find_first_not_of("0123456789") == std::string::npos) continue;
     const auto entry = tree_.examine(path);
     if (!entry || (entry->type != Type::Link && entry->type != Type::Directory)) continue;

@@ -13,7 +13,7 @@
 namespace tally {
 
 // Whatever is read through the observed tree is in the recording, so there is no list of files that
-// could lag behind the sources.
+// could miss new sources.
 class TreeRecorder {
  public:
   explicit TreeRecorder(const DeviceRoot& root);

@@ -104,7 +104,7 @@ int LinuxKernelValues::readKernelValue(std::string_view name, std::span<std::byt
     }
   }
   // A boot session's days are shared out between the analytics service and the daily report. There
-  // is no such service without a description, and then every day is the report's.
+  // is such a service only where it is described; otherwise every day is the report's.
   if (!answer && name == "kern.bootsessionuuid" && description_->exists()) {
     const auto text = tree_->fact("/proc/sys/kernel/random/boot_id");
     if (const auto session = text ? parseBootSession(*text) : std::nullopt) {

@@ -14,7 +14,7 @@ namespace tally {
 struct FlashDisk {
   std::string name;  // as the kernel calls it: "mmcblk0"
   DiskKind kind = DiskKind::Other;
-  std::string identity;  // tells it from a disk that takes its place; empty: cannot be told
+  std::string identity;  // distinguishes it from a disk that replaces it; empty: not known
   bool isRemovable = false;
   bool isStorage = false;  // the disk that the device's data lies on
   std::optional<Wear> wear;

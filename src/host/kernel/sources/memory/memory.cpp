@@ -25,7 +25,7 @@ void findLines(const SystemTree& tree, Findings& findings, KernelSource source,
   std::vector<std::int64_t> fields(layout.fields(), kNoReading);
   parseNamedNumbers(text, layout, fields);
   const std::uint32_t file = findings.addFile(source, path, parseNamedNumbers, std::move(layout));
-  // What this kernel does not count is no channel.
+  // Counters that this kernel lacks have no channel.
   for (std::uint32_t i = 0; i < rows.size(); ++i) {
     if (fields[i] != kNoReading) findings.addSimple(rows.subspan(i, 1), {}, file, i);
   }
