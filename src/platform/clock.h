@@ -1,7 +1,12 @@
 // The wall clock.
 #pragma once
 
+#include <cstdint>
+
 namespace tally {
+
+// 2024-01-01, before the first device that runs this was made: an earlier clock was never set.
+constexpr std::int32_t kFirstPlausibleDay = 19723;
 
 class Clock {
  public:

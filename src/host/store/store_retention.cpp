@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <tuple>
 
+#include "platform/clock.h"
+
 namespace tally {
 namespace {
 

@@ -9,9 +9,6 @@
 
 namespace tally {
 
-// 2024-01-01, before the first device that runs this was made: an earlier clock was never set.
-constexpr std::int32_t kFirstPlausibleDay = 19723;
-
 // Each stretch of days keeps this many.
 constexpr std::size_t kDaysKept = 30;
 // The most days that hold data, and the most that their pages take together.

@@ -31,9 +31,9 @@ struct KeyOwner {
 
 // How a key changed; borrows.
 struct RecordedChange {
-  enum class Kind { Add, Set, Samples } kind = Kind::Add;
+  enum class Kind { Add, Set, Move, Samples } kind = Kind::Add;
   std::string_view key;
-  std::int64_t value = 0;  // of Add and Set
+  std::int64_t value = 0;  // of Add, Set and Move
   SampleColumns samples;   // of Samples
   std::int64_t user = 0;   // who recorded it, for changes that are not dated yet
 };
@@ -54,10 +54,11 @@ struct UndatedChange {
 class RecordingTransaction {
  public:
   virtual ~RecordingTransaction() = default;
-  // Add: to the day's scalar, or to 0; saturates at 64 bits. Set: it alone. Samples: after those
-  // that the key has.
+  // Add: to the day's scalar, or to 0; saturates at 64 bits. Set: it alone. Move: as Add, but a
+  // day without the scalar begins with that of the day before. Samples: after those that the key
+  // has.
   virtual Status apply(std::int32_t day, const RecordedChange& change) = 0;
-  // Replaces the owner that the key has on that day, if any.
+  // Ignored when the key has an owner on that day.
   virtual Status setOwner(std::int32_t day, const KeyOwner& owner) = 0;
 
   // Keeps a change under a boot (its id) and the seconds since that boot, from which its samples'

@@ -8,7 +8,6 @@
 
 #include "base/time_text.h"
 #include "config/internal_device.h"
-#include "host/store/store_retention.h"
 #include "host/system/system_log.h"
 #include "platform/platform.h"
 #include "platform/tables/known_preferences.h"

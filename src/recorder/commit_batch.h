@@ -1,0 +1,42 @@
+// What one commit writes.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/recording/recording_store.h"
+#include "recorder/held_keys.h"
+
+namespace tally {
+
+// The changes of some keys of one day, or of the time before the clock was set.
+struct CommitBatch {
+  struct Change {
+    std::string_view key;
+    RecordedChange::Kind kind = RecordedChange::Kind::Add;
+    std::int64_t value = 0;
+    std::unique_ptr<SampleStream> samples;
+    std::uint32_t user = 0;  // index
+    std::int64_t userNumber = 0;
+  };
+  std::shared_ptr<HeldKeys> keys;  // whose texts the changes borrow
+  std::optional<std::int32_t> day;
+  std::int64_t origin = 0;              // seconds since boot from which offsets count without a day
+  std::optional<double> originOnClock;  // the same in seconds since 1970, once that is known
+  std::vector<Change> changes;
+  std::vector<KeyOwner> owners;  // of keys that are new
+};
+
+struct CommitJob {
+  std::vector<CommitBatch> batches;
+  // Once the clock is set, undated changes of this boot are dated by this, and old ones forgotten.
+  std::optional<double> wallMinusBoot;
+  std::int32_t today = 0;
+};
+
+}  // namespace tally

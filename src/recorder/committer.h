@@ -1,0 +1,63 @@
+// Writes to the store while the recorder goes on receiving.
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <functional>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <thread>
+
+#include "base/result.h"
+#include "platform/recording/recording_store.h"
+#include "recorder/commit_batch.h"
+
+namespace tally {
+
+// A thread for each commit, since most of the time there is none. A store may be locked for a
+// minute, and a flash may take seconds.
+class Committer {
+ public:
+  struct Outcome {
+    Status status = Done{};
+    CommitJob job;  // as it was given, also when it failed
+    std::uint64_t undatedForgotten = 0;
+  };
+  // Both are called by the thread: `afterCommit` when a commit has succeeded, then, in any case,
+  // `onDone`, after which there is an outcome.
+  Committer(RecordingStore& store, std::string bootId, std::function<void()> onDone,
+            std::function<void()> afterCommit)
+      : store_(store),
+        bootId_(std::move(bootId)),
+        onDone_(std::move(onDone)),
+        afterCommit_(std::move(afterCommit)) {}
+  ~Committer();
+  Committer(const Committer&) = delete;
+  Committer& operator=(const Committer&) = delete;
+
+  bool isBusy() const { return thread_.joinable(); }
+  // REQUIRES: it is not busy.
+  void start(CommitJob job);
+  // The outcome of the commit that has ended, once.
+  std::optional<Outcome> takeOutcome();
+  // Calls it with the store, after the commit in hand.
+  template <class Work>
+  auto withStore(const Work& work) {
+    const std::lock_guard guard(storeInUse_);
+    return work(store_);
+  }
+
+ private:
+  Status write(CommitJob& job, std::uint64_t& undatedForgotten);
+
+  RecordingStore& store_;
+  const std::string bootId_;
+  std::function<void()> onDone_, afterCommit_;
+  std::mutex storeInUse_;
+  std::thread thread_;
+  std::atomic<bool> ended_ = false;
+  Outcome outcome_;
+};
+
+}  // namespace tally

@@ -1,0 +1,146 @@
+#include "recorder/statsd_line.h"
+
+#include <charconv>
+#include <cmath>
+#include <cstring>
+#include <system_error>
+
+namespace tally {
+namespace {
+
+// So many digits are exact in a double.
+constexpr std::size_t kExactDigits = 15;
+
+std::size_t findIn(std::string_view text, char wanted) {
+  const void* const found = text.empty() ? nullptr : std::memchr(text.data(), wanted, text.size());
+  return found == nullptr ? std::string_view::npos
+                          : static_cast<std::size_t>(static_cast<const char*>(found) - text.data());
+}
+
+// The text up to the separator, which is removed with it; all of it when there is none.
+std::string_view takeUpTo(std::string_view& text, char separator) {
+  const std::size_t end = findIn(text, separator);
+  const std::string_view taken = text.substr(0, end);
+  text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
+  return taken;
+}
+
+// Decimal, with an exponent or without; "1." and ".5" are numbers, "inf" and blanks are not.
+std::optional<double> parseNumber(std::string_view text) {
+  const bool negative = !text.empty() && text.front() == '-';
+  if (negative || (!text.empty() && text.front() == '+')) text.remove_prefix(1);
+  if (text.empty()) return std::nullopt;
+  if (text.size() <= kExactDigits) {
+    std::int64_t whole = 0;
+    std::size_t i = 0;
+    for (; i < text.size() && text[i] >= '0' && text[i] <= '9'; ++i) {
+      whole = whole * 10 + (text[i] - '0');
+    }
+    if (i == text.size())
+      return negative ? -static_cast<double>(whole) : static_cast<double>(whole);
+  }
+  if (text.front() != '.' && (text.front() < '0' || text.front() > '9')) return std::nullopt;
+  double number = 0;
+  const char* const end = text.data() + text.size();
+  const auto [stopped, error] = std::from_chars(text.data(), end, number);
+  if (stopped != end) return std::nullopt;
+  // Out of range: too large is no number, too small is none that matters.
+  if (error == std::errc::result_out_of_range && !(std::fabs(number) < 1)) return std::nullopt;
+  if (error == std::errc::invalid_argument || !std::isfinite(number)) return std::nullopt;
+  return negative ? -number : number;
+}
+
+std::optional<Refusal> typeOf(std::string_view text, MetricType& type) {
+  if (text == "ms") {
+    type = MetricType::Duration;
+    return std::nullopt;
+  }
+  if (text.size() != 1) return text.empty() ? Refusal::Malformed : Refusal::Type;
+  switch (text.front()) {
+    case 'c':
+      type = MetricType::Counter;
+      return std::nullopt;
+    case 'g':
+      type = MetricType::Gauge;
+      return std::nullopt;
+    case 'h':
+    case 'd':
+      type = MetricType::Sample;
+      return std::nullopt;
+    case 's':
+      return Refusal::Set;
+    default:
+      return Refusal::Type;
+  }
+}
+
+bool isKnownUnused(std::string_view section) {
+  return section.starts_with("c:") || section.starts_with("e:") || section.starts_with("card:") ||
+         section.front() == 'T';
+}
+
+std::optional<Refusal> readSections(std::string_view text, MetricLine& metric) {
+  while (!text.empty()) {
+    const std::string_view section = takeUpTo(text, '|');
+    if (section.empty()) continue;
+    if (section.front() == '@') {
+      const auto rate = parseNumber(section.substr(1));
+      if (!rate || !(*rate > 0 && *rate <= 1)) return Refusal::SampleRate;
+      metric.rate = metric.type == MetricType::Gauge ? 1 : *rate;  // a sampled gauge is the gauge
+    } else if (section.front() == '#') {
+      metric.tags = section.substr(1);
+    } else if (!isKnownUnused(section)) {
+      ++metric.skippedSections;
+    }
+  }
+  return std::nullopt;
+}
+
+std::optional<Refusal> readValues(std::string_view text, MetricType type,
+                                  std::vector<MetricValue>& values) {
+  values.clear();
+  while (!text.empty()) {
+    const std::string_view value = takeUpTo(text, ':');
+    if (value.empty()) continue;
+    const auto number = parseNumber(value);
+    if (!number || (type == MetricType::Duration && *number < 0)) return Refusal::Value;
+    values.push_back({*number, value.front() == '+' || value.front() == '-'});
+  }
+  if (values.empty()) return Refusal::Value;
+  return std::nullopt;
+}
+
+}  // namespace
+
+std::optional<Refusal> parseMetricLine(std::string_view line, MetricLine& metric,
+                                       std::vector<MetricValue>& values) {
+  if (line.starts_with("_e{") || line.starts_with("_sc|")) return Refusal::Event;
+  const std::size_t colon = findIn(line, ':');
+  if (colon == std::string_view::npos) return Refusal::Malformed;
+  metric.name = line.substr(0, colon);
+  if (findIn(metric.name, '|') != std::string_view::npos) return Refusal::Malformed;
+  if (metric.name.empty()) return Refusal::Name;
+  std::string_view rest = line.substr(colon + 1);
+  const std::size_t bar = findIn(rest, '|');
+  if (bar == std::string_view::npos) return Refusal::Malformed;
+  const std::string_view valueText = rest.substr(0, bar);
+  rest.remove_prefix(bar + 1);
+  if (const auto refused = typeOf(takeUpTo(rest, '|'), metric.type)) return refused;
+  metric.tags = {};
+  metric.rate = 1;
+  metric.skippedSections = 0;
+  if (const auto refused = readSections(rest, metric)) return refused;
+  return readValues(valueText, metric.type, values);
+}
+
+std::optional<std::string_view> tagValue(std::string_view tags, std::string_view tag) {
+  while (!tags.empty()) {
+    const std::string_view entry = takeUpTo(tags, ',');
+    if (!entry.starts_with(tag)) continue;
+    if (entry.size() == tag.size()) return std::string_view();
+    if (entry[tag.size()] == ':') return entry.substr(tag.size() + 1);
+  }
+  return std::nullopt;
+}
+
+}  // namespace tally
