@@ -3,7 +3,7 @@
 #include <cmath>
 #include <cstring>
 
-#include "host/store/sample_chunk.h"
+#include "host/store/samples/sample_chunk.h"
 #include "host/store/store_history.h"
 #include "host/store/store_importer.h"
 #include "host/store_fixture.h"

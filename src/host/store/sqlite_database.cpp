@@ -236,6 +236,20 @@ Result<std::int64_t> Database::integer(std::string_view sql) {
   return statement->integer(0);
 }
 
+std::int64_t Database::changes() const { return ::sqlite3_changes64(handle_.get()); }
+
+Status Database::limitMemory(std::size_t bytes) {
+  return execute(("PRAGMA cache_size = -" + std::to_string(bytes / 1024)).c_str());
+}
+
+void Database::releaseMemory() { ::sqlite3_db_release_memory(handle_.get()); }
+
+bool Database::wasReplaced() const {
+  int moved = 0;
+  const int code = ::sqlite3_file_control(handle_.get(), "main", SQLITE_FCNTL_HAS_MOVED, &moved);
+  return code != SQLITE_OK || moved != 0;
+}
+
 Error Database::error() const {
   if (auto refusal = takeStoreFileRefusal(); !refusal.empty()) return {"metrics store: " + refusal};
   if (handle_ && ::sqlite3_errcode(handle_.get()) == SQLITE_INTERRUPT) {

@@ -74,6 +74,14 @@ class Database {
   Result<Statement> prepare(std::string_view sql);
   // The one integer that a query or pragma answers with.
   Result<std::int64_t> integer(std::string_view sql);
+  // How many rows the last statement that ended has written or removed.
+  std::int64_t changes() const;
+  // Keeps at most so many bytes of pages in memory, but for those that a transaction needs.
+  Status limitMemory(std::size_t bytes);
+  // Frees the pages that are kept for later.
+  void releaseMemory();
+  // Whether the file is no longer the one that its directory has under this name.
+  bool wasReplaced() const;
   // A failure, in words that name the file; without a reason, the last call's.
   Error error() const;
   Error error(std::string_view reason) const;

@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "base/files/file.h"
-#include "host/store/sample_chunk.h"
+#include "host/store/samples/sample_chunk.h"
 #include "host/store/store_rows.h"
 #include "host/store/store_schema.h"
 

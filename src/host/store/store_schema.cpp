@@ -45,6 +45,22 @@ constexpr TableDefinition kOptionalTables[] = {
   disk TEXT NOT NULL, day INTEGER NOT NULL, least INTEGER NOT NULL, most INTEGER,
   host_bytes INTEGER, flash_bytes INTEGER,
   PRIMARY KEY(disk, day)) WITHOUT ROWID)sql"},
+    // In the order of arrival: a commit of many keys fills a few pages that follow each other. In
+    // the order of keys, each would be written to a page of its own.
+    {kArrivalsTable, R"sql((
+  number INTEGER PRIMARY KEY, day INTEGER NOT NULL, key TEXT NOT NULL,
+  samples INTEGER NOT NULL, weight INTEGER NOT NULL, data BLOB NOT NULL))sql"},
+    {kPackedTable, R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL,
+  samples INTEGER NOT NULL, weight INTEGER NOT NULL, data BLOB NOT NULL,
+  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql"},
+    {kOwnersTable, R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, user INTEGER NOT NULL, distribution INTEGER NOT NULL,
+  PRIMARY KEY(day, key)) WITHOUT ROWID)sql"},
+    {kUndatedTable, R"sql((
+  number INTEGER PRIMARY KEY, boot TEXT NOT NULL, seconds INTEGER NOT NULL, kind INTEGER NOT NULL,
+  key TEXT NOT NULL, value INTEGER NOT NULL, data BLOB, user INTEGER NOT NULL,
+  first_day INTEGER))sql"},
 };
 // Tables that SQLite itself adds for its query planner on request. They are harmless.
 constexpr TableDefinition kStatistics[] = {

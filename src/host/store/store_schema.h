@@ -29,6 +29,10 @@ constexpr std::string_view kStoreKeyRule =
 
 // Tables that a store may lack until something is kept in them.
 constexpr std::string_view kCountersTable = "counters", kWearTable = "wear";
+// Of what the recorder commits: new samples, those that a checkpoint has put in order, who owns a
+// key, and changes that wait for a day.
+constexpr std::string_view kArrivalsTable = "arrivals", kPackedTable = "packed",
+                           kOwnersTable = "owners", kUndatedTable = "undated";
 Result<bool> hasTable(Database& database, std::string_view name);
 // Makes one of them if it is missing. REQUIRES: a transaction of a writer.
 Status makeOptionalTable(Database& database, std::string_view name);

@@ -4,7 +4,8 @@
 #include <limits>
 #include <vector>
 
-#include "host/store/sample_chunk.h"
+#include "host/store/samples/sample_chunk.h"
+#include "host/store/store_days.h"
 #include "host/store/store_rows.h"
 #include "host/store/wear_table.h"
 
@@ -241,16 +242,6 @@ Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point 
   return step == Step::Done;
 }
 
-Status StoreWriter::forget(std::string_view which, std::int32_t day) {
-  for (const char* table : {"scalars", "chunks", "recent"}) {
-    auto statement =
-        database_.prepare("DELETE FROM " + std::string(table) + " WHERE day " + std::string(which));
-    if (!statement) return statement.error();
-    if (!statement->bind(1, std::int64_t{day}).run()) return database_.error();
-  }
-  return Done{};
-}
-
 Status StoreWriter::setCounter(const CounterState& state) {
   if (auto checked = checkKey(state.key); !checked) return checked;
   if (!setCounter_) {
@@ -275,34 +266,27 @@ Status StoreWriter::forgetCountersBefore(std::int32_t day) {
   return database_.execute(("DELETE FROM counters WHERE day < " + std::to_string(day)).c_str());
 }
 
-Status StoreWriter::forgetBefore(std::int32_t day) { return forget("< ?1", day); }
+Status StoreWriter::forgetBefore(std::int32_t day) {
+  return forgetDaysOfStore(database_, "< ?1", day);
+}
 
-Status StoreWriter::forgetDay(std::int32_t day) { return forget("= ?1", day); }
+Status StoreWriter::forgetDay(std::int32_t day) {
+  return forgetDaysOfStore(database_, "= ?1", day);
+}
 
 Result<bool> StoreWriter::hasRecent() {
   const auto some = database_.integer("SELECT EXISTS(SELECT 1 FROM recent)");
   if (!some) return some.error();
-  return *some != 0;
+  if (*some != 0) return true;
+  const auto mayArrive = hasTable(database_, kArrivalsTable);
+  if (!mayArrive || !*mayArrive) return mayArrive;
+  const auto arrivals = database_.integer("SELECT EXISTS(SELECT 1 FROM arrivals)");
+  if (!arrivals) return arrivals.error();
+  return *arrivals != 0;
 }
 
 Result<std::vector<std::int32_t>> StoreWriter::days() {
-  auto query = database_.prepare(
-      "SELECT max(day) FROM (SELECT max(day) AS day FROM scalars WHERE day < ?1 "
-      "UNION ALL SELECT max(day) FROM chunks WHERE day < ?1 "
-      "UNION ALL SELECT max(day) FROM recent WHERE day < ?1)");
-  if (!query) return query.error();
-  using Limits = std::numeric_limits<std::int32_t>;
-  std::vector<std::int32_t> found;
-  std::int64_t before = std::int64_t{Limits::max()} + 1;
-  while (found.size() < kMostDaysListed && before > Limits::min()) {
-    if (query->bind(1, before).step() != Step::Row) return database_.error();
-    if (query->type(0) == ColumnType::Null) break;
-    // A damaged row's day may be a real, which is cut to a whole number that is not below it.
-    before = std::min(query->integer(0), before - 1);
-    query->reset();
-    if (before >= Limits::min()) found.push_back(static_cast<std::int32_t>(before));
-  }
-  return found;
+  return daysOfStore(database_, kMostDaysListed);
 }
 
 Result<std::uint64_t> StoreWriter::usedBytes() {

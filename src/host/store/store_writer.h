@@ -51,8 +51,7 @@ class StoreWriter {
 
   // Whether foldRecent() would find something to do.
   Result<bool> hasRecent();
-  // The days that hold data, from the newest on; of more than 4096 the newest. Takes one look-up in
-  // the tables for each day, however many rows it has.
+  // The days that hold data, from the newest on; of more than 4096 the newest.
   Result<std::vector<std::int32_t>> days();
   // The bytes of all pages in use.
   Result<std::uint64_t> usedBytes();
@@ -65,7 +64,6 @@ class StoreWriter {
   StoreWriter(Database database, Statements statements)
       : database_(std::move(database)), statements_(std::move(statements)) {}
   Status checkKey(std::string_view key) const;
-  Status forget(std::string_view which, std::int32_t day);
 
   Database database_;
   Statements statements_;

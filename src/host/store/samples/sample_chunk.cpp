@@ -1,4 +1,4 @@
-#include "host/store/sample_chunk.h"
+#include "host/store/samples/sample_chunk.h"
 
 #include <bit>
 #include <cstring>
