@@ -38,21 +38,11 @@ std::string userDataFolder(const DeviceRoot& root) {
   return home.starts_with('/') ? home + "/.local/share" : "";
 }
 
-std::shared_ptr<SystemLog> systemLogOfEnvironment() {
-  const SystemLogEnvironment environment = systemLogEnvironment();
-  auto log = makeLinuxSystemLog(environment.settings);
-  if (!environment.fault.empty()) {
-    log->fault("environment", "{}; the messages are those of level {}", environment.fault,
-               levelText(environment.settings.lowest));
-  }
-  return log;
-}
-
 }  // namespace
 
 Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
   const DeviceDirectory described(root, "/device");
-  const auto log = options.log ? options.log : systemLogOfEnvironment();
+  const auto log = options.log ? options.log : makeSystemLogOfEnvironment();
   const auto clock = std::make_shared<LinuxClock>();
   const auto description = std::make_shared<DeviceDescription>(described, log);
   const auto access = options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly

@@ -89,7 +89,7 @@ class BatchWriter {
   RecordingTransaction& transaction_;
   const std::string& bootId_;
   const CommitBatch& batch_;
-  SampleVectors samples_;
+  StreamSamples samples_;
 };
 
 Status dateUndated(RecordingTransaction& transaction, const std::string& bootId,
@@ -129,7 +129,6 @@ void Committer::start(CommitJob job) {
       outcome_.status = write(outcome_.job, outcome_.undatedForgotten);
       store_.releaseMemory();
     }
-    if (outcome_.status) afterCommit_();
     ended_ = true;
     onDone_();
   });

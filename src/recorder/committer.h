@@ -24,14 +24,9 @@ class Committer {
     CommitJob job;  // as it was given, also when it failed
     std::uint64_t undatedForgotten = 0;
   };
-  // Both are called by the thread: `afterCommit` when a commit has succeeded, then, in any case,
-  // `onDone`, after which there is an outcome.
-  Committer(RecordingStore& store, std::string bootId, std::function<void()> onDone,
-            std::function<void()> afterCommit)
-      : store_(store),
-        bootId_(std::move(bootId)),
-        onDone_(std::move(onDone)),
-        afterCommit_(std::move(afterCommit)) {}
+  // onDone is called by the thread when there is an outcome.
+  Committer(RecordingStore& store, std::string bootId, std::function<void()> onDone)
+      : store_(store), bootId_(std::move(bootId)), onDone_(std::move(onDone)) {}
   ~Committer();
   Committer(const Committer&) = delete;
   Committer& operator=(const Committer&) = delete;
@@ -53,7 +48,7 @@ class Committer {
 
   RecordingStore& store_;
   const std::string bootId_;
-  std::function<void()> onDone_, afterCommit_;
+  std::function<void()> onDone_;
   std::mutex storeInUse_;
   std::thread thread_;
   std::atomic<bool> ended_ = false;

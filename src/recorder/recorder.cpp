@@ -1,8 +1,6 @@
 #include "recorder/recorder.h"
 
 #include <algorithm>
-#include <cmath>
-#include <cstring>
 #include <utility>
 
 #include "base/time_text.h"
@@ -10,32 +8,29 @@
 namespace tally {
 namespace {
 
-constexpr std::int64_t kNanoseconds = 1'000'000'000;
-// Rates below are taken as this: a weight stays a number that a day can have.
-constexpr double kLeastRate = 1e-6;
-// What the program takes beside what it holds: its code's data, the store's buffers, the stack of
-// the commit.
-constexpr std::size_t kMemoryOfProgram = 5 << 20;
+constexpr std::int64_t kSecond = 1'000'000'000;  // in nanoseconds
+// After a commit that failed: a full disk or a locked store may take a while.
+constexpr std::int64_t kRetryAfter = 60 * kSecond;
+// A socket-activated recorder ends after so many intervals without a metric: who records now and
+// then is not to start it each time.
+constexpr std::int64_t kQuietIntervals = 2;
 
 }  // namespace
 
 Recorder::Recorder(RecorderParts parts)
     : parts_(std::move(parts)),
-      rules_(parts_.readSettings()),
+      intake_(parts_.readSettings(), parts_.log),
       clock_(parts_.clockIsSynchronised),
-      committer_(
-          parts_.store, parts_.bootId, [this] { parts_.ingress.wake(); }, parts_.afterCommit) {}
+      committer_(parts_.store, parts_.bootId, [this] { parts_.ingress.wake(); }) {}
 
-std::size_t Recorder::memoryForData() const {
-  return static_cast<std::size_t>(rules_.settings().number(RecorderNumber::MemoryLimit)) -
-         kMemoryOfProgram;
+std::int64_t Recorder::interval() const {
+  return intake_.settings().number(RecorderNumber::CommitInterval) * kSecond;
 }
 
 void Recorder::beginRound(std::int64_t bootNanoseconds, double secondsSince1970) {
-  bootNanoseconds_ = bootNanoseconds;
   secondsSince1970_ = secondsSince1970;
-  if (!keys_) {
-    startedAt_ = lastLineAt_ = bootNanoseconds;
+  if (intake_.keys() == nullptr) {
+    commits_.startedAt = bootNanoseconds;
     const auto newest = parts_.store.newestDay();
     if (newest) {
       clock_.setNewestDay(*newest);
@@ -44,243 +39,197 @@ void Recorder::beginRound(std::int64_t bootNanoseconds, double secondsSince1970)
     }
   }
   now_ = clock_.at(bootNanoseconds, secondsSince1970);
-  if (!keys_ || keys_->day() != now_.day) beginDay();
+  if (intake_.keys() == nullptr || intake_.keys()->day() != now_.day) {
+    beginDay();
+  } else {
+    intake_.setNow(now_);
+  }
 }
 
 void Recorder::beginDay() {
-  // After a day that came to its end nobody else has recorded in the next one yet.
-  const bool mayHaveOwners = !keys_ || !keys_->day() || (now_.day && *keys_->day() > *now_.day);
-  if (keys_) {
-    CommitBatch batch = takeBatch(/*durableAlone=*/false, /*atEnd=*/true);
-    if (!batch.changes.empty()) ended_.push_back(std::move(batch));
-  }
-  if (now_.day) {
-    // What was recorded before the clock was set, in memory and in the store, is dated now.
-    dateUndated_ = true;
-    for (CommitBatch& batch : ended_) {
-      if (!batch.day && !batch.originOnClock) {
-        batch.originOnClock = now_.wallMinusBoot + static_cast<double>(batch.origin);
-      }
+  const HeldKeys* const former = intake_.keys();
+  std::vector<KeyOwner> owners;
+  // After a day that came to its end nobody has recorded in the next one yet.
+  if (now_.day && (former == nullptr || !former->day() || *former->day() > *now_.day)) {
+    auto read =
+        committer_.withStore([&](RecordingStore& store) { return store.owners(*now_.day); });
+    if (read) {
+      owners = *std::move(read);
+    } else {
+      parts_.log.fault("recorder: store", "{}", read.error().message);
     }
   }
-  users_.beginDay();
-  keyBytes_ = 0;  // the former keys go with their last batch
-  keys_ = std::make_shared<HeldKeys>(now_.day, now_.bootSeconds);
-  if (now_.day && mayHaveOwners) loadOwners();
-}
-
-void Recorder::loadOwners() {
-  const auto owners =
-      committer_.withStore([&](RecordingStore& store) { return store.owners(*now_.day); });
-  if (!owners) return parts_.log.fault("recorder: store", "{}", owners.error().message);
-  for (const KeyOwner& owner : *owners) {
-    if (keys_->findKey(owner.key) != HeldKeys::kNone) continue;
-    const std::uint32_t user = users_.indexOf({owner.user}, rules_.settings());
-    std::size_t grown = 0;
-    HeldKey& key = keys_->at(keys_->add(owner.key, owner.key, grown));
-    key.user = user;
-    key.type = owner.distribution ? HeldType::Distribution : HeldType::None;
-    key.durable = rules_.isDurable(owner.key);
-    ++users_.at(user).keysToday;
-    keyBytes_ += grown;
-  }
+  dateUndated_ = dateUndated_ || (now_.day && former != nullptr && !former->day());
+  intake_.beginDay(now_, owners);
 }
 
 void Recorder::onLines(Sender sender, std::string_view lines) {
-  lastLineAt_ = bootNanoseconds_;
-  const std::uint32_t user = users_.indexOf(sender, rules_.settings());
-  MetricLine metric;
-  while (!lines.empty()) {
-    const void* const newline = std::memchr(lines.data(), '\n', lines.size());
-    const std::size_t end =
-        newline == nullptr
-            ? lines.size()
-            : static_cast<std::size_t>(static_cast<const char*>(newline) - lines.data());
-    std::string_view line = lines.substr(0, end);
-    lines.remove_prefix(std::min(end + 1, lines.size()));
-    if (line.ends_with('\r')) line.remove_suffix(1);
-    if (line.empty()) continue;
-    if (const auto refused = parseMetricLine(line, metric, values_)) {
-      refuse(user, *refused);
-    } else {
-      record(user, metric);
-    }
-  }
-}
-
-void Recorder::record(std::uint32_t user, const MetricLine& metric) {
-  if (!users_.admit(users_.at(user), values_.size(), bootNanoseconds_, rules_.settings())) {
-    return refuse(user, Refusal::MetricsPerSecond, values_.size());
-  }
-  const std::uint32_t index = keyFor(user, metric);
-  if (index == HeldKeys::kNone) return;
-  HeldKey& key = keys_->at(index);
-  if (key.user != user && !key.anyUser) return refuse(user, Refusal::Owner, values_.size());
-  if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
-  keys_->markDirty(index);
-  addValues(key, user, metric);
-  durableWaits_ = durableWaits_ || key.durable;
-  if (!heldSince_) heldSince_ = bootNanoseconds_;
-  users_.at(user).metrics += values_.size();
-  metrics_ += values_.size();
-}
-
-std::uint32_t Recorder::keyFor(std::uint32_t user, const MetricLine& metric) {
-  const std::string_view identity = rules_.identityOf(metric.name, metric.tags, identity_);
-  const std::uint32_t index = keys_->find(identity);
-  if (index != HeldKeys::kNone) return index;
-  if (const auto loss = clientLossOf(metric.name)) {
-    double lost = 0;
-    for (const MetricValue& value : values_) lost += std::max(value.number, 0.0) / metric.rate;
-    constexpr double kMostBelieved = 1e15;
-    count(*loss, static_cast<std::uint64_t>(std::min(lost, kMostBelieved)));
-    return HeldKeys::kNone;
-  }
-  return addKey(user, metric, identity);
-}
-
-std::uint32_t Recorder::addKey(std::uint32_t user, const MetricLine& metric,
-                               std::string_view identity) {
-  const auto refused = [&](Refusal refusal) {
-    refuse(user, refusal, values_.size());
-    return HeldKeys::kNone;
-  };
-  if (!isRecordableName(identity)) return refused(Refusal::Name);
-  const std::string key = rules_.keyOf(metric.name, identity);
-  if (!isRecordableName(key)) return refused(Refusal::Name);
-  std::size_t grown = 0;
-  std::uint32_t index = rules_.isIdentity() ? HeldKeys::kNone : keys_->findKey(key);
-  if (index != HeldKeys::kNone) {
-    keys_->addIdentity(identity, index, grown);
-    keyBytes_ += grown;
-    return index;
-  }
-  RecordingUser& recording = users_.at(user);
-  const RecorderSettings& settings = rules_.settings();
-  const auto limit = [&](RecorderNumber which) {
-    return static_cast<std::uint64_t>(settings.number(which));
-  };
-  if (!rules_.mayRecord(recording.sender.user, key)) return refused(Refusal::Permission);
-  if (recording.keysToday >= limit(RecorderNumber::KeysOfUser)) return refused(Refusal::KeysOfUser);
-  if (keys_->size() >= limit(RecorderNumber::KeysOfDay)) return refused(Refusal::KeysOfDay);
-  if (bytes() >= memoryForData()) return refused(Refusal::Memory);
-  index = keys_->add(identity, key, grown);
-  HeldKey& held = keys_->at(index);
-  held.user = user;
-  held.isNew = true;
-  held.durable = rules_.isDurable(key);
-  ++recording.keysToday;
-  keyBytes_ += grown;
-  return index;
-}
-
-void Recorder::noteType(HeldKey& key, MetricType type) {
-  const HeldType now = type == MetricType::Counter ? HeldType::Counter
-                       : type == MetricType::Gauge ? HeldType::Gauge
-                                                   : HeldType::Distribution;
-  if (key.type == now) return;
-  // Of a key that an earlier process recorded only this is known: it is not a distribution.
-  const bool first = key.type == HeldType::None && (key.isNew || now != HeldType::Distribution);
-  key.type = now;
-  if (first || key.twoTypes) return;
-  key.twoTypes = true;
-  count(RecorderCount::KeysOfTwoTypes);
-  parts_.log.repeated(LogLevel::Default, "recorder: keys of two types",
-                      "the key {} is recorded as two types", key.key);
-}
-
-void Recorder::addValues(HeldKey& key, std::uint32_t user, const MetricLine& metric) {
-  noteType(key, metric.type);
-  double rate = metric.rate;
-  if (rate < kLeastRate) {
-    rate = kLeastRate;
-    count(RecorderCount::RatesBounded);
-  }
-  for (const MetricValue& value : values_) {
-    switch (metric.type) {
-      case MetricType::Counter:
-        key.scalar.add(value.number / rate);
-        break;
-      case MetricType::Gauge:
-        if (value.isSigned) {
-          key.scalar.move(value.number);
-        } else {
-          key.scalar.set(value.number);
-        }
-        break;
-      case MetricType::Duration:
-      case MetricType::Sample:
-        addSample(key, user, value.number, rate);
-        break;
-    }
-  }
-}
-
-void Recorder::addSample(HeldKey& key, std::uint32_t user, double value, double rate) {
-  std::uint32_t weight = 1;
-  if (rate != 1) {
-    // A weight is whole; what it leaves is added to the next one, so that counts are right.
-    const double exact = 1 / rate + static_cast<double>(key.weightLeft);
-    weight = static_cast<std::uint32_t>(std::max(std::round(exact), 1.0));
-    key.weightLeft = static_cast<float>(exact - weight);
-  }
-  if (bytes() > memoryForData()) {
-    thin();
-    // Everything may be in the commit that is under way.
-    if (bytes() > memoryForData()) return refuse(user, Refusal::Memory);
-  }
-  if (!key.samples) {
-    key.samples = std::make_unique<SampleStream>();
-    growSamples(user, sizeof(SampleStream));
-  }
-  const std::int64_t offset =
-      now_.day ? static_cast<std::int64_t>(secondsSince1970_ -
-                                           static_cast<double>(*now_.day) * kSecondsPerDay)
-               : now_.bootSeconds - keys_->origin();
-  growSamples(user,
-              key.samples->add(value, static_cast<std::uint32_t>(std::max<std::int64_t>(offset, 0)),
-                               weight));
-  ++samplesHeld_;
-}
-
-void Recorder::refuse(std::uint32_t user, Refusal refusal, std::uint64_t count) {
-  const auto which = static_cast<std::size_t>(refusal);
-  refused_[which] += count;
-  users_.at(user).refused[which] += count;
-  if (!heldSince_) heldSince_ = bootNanoseconds_;
-}
-
-void Recorder::count(RecorderCount which, std::uint64_t amount) {
-  counts_[static_cast<std::size_t>(which)] += amount;
-  if (!heldSince_) heldSince_ = bootNanoseconds_;
-}
-
-void Recorder::growSamples(std::uint32_t user, std::size_t bytes) {
-  sampleBytes_ += bytes;
-  users_.at(user).bytes += bytes;
+  intake_.recordLines(sender, lines);
 }
 
 void Recorder::onLoss(IngressLoss loss, Sender sender, std::uint64_t count) {
   static constexpr Refusal kOfLoss[] = {Refusal::Truncated, Refusal::LongLine,
                                         Refusal::SocketOverflow, Refusal::NoCredentials,
                                         Refusal::Connections};
-  refuse(users_.indexOf(sender, rules_.settings()), kOfLoss[static_cast<std::size_t>(loss)], count);
+  intake_.refuse(sender, kOfLoss[static_cast<std::size_t>(loss)], count);
 }
 
-std::size_t Recorder::streamQuota(Sender sender) {
-  constexpr std::size_t kMost = 64 << 10;
-  constexpr double kBytesOfMetric = 2;  // the shortest, in a line of many values
-  constexpr double kLeast = 64;         // metrics, so that reading is worth it
-  RecordingUser& user = users_.at(users_.indexOf(sender, rules_.settings()));
-  (void)users_.admit(user, 0, bootNanoseconds_, rules_.settings());
-  if (user.allowance < kLeast) return 0;
-  return static_cast<std::size_t>(std::min(user.allowance * kBytesOfMetric, double{kMost}));
-}
+std::size_t Recorder::streamQuota(Sender sender) { return intake_.allowedBytes(sender); }
 
 void Recorder::onReload() {
-  // The day's keys stay as they are; the rules decide on new ones.
-  rules_ = KeyRules(parts_.readSettings());
+  intake_.setSettings(parts_.readSettings());
   parts_.log.write(LogLevel::Default, "settings read again");
+}
+
+void Recorder::onControl(ControlRequest request, std::string_view line) {
+  if (line == "status") {
+    parts_.ingress.answer(request, recorderStatusText(intake_, commits_, now_));
+  } else if (line == "commit") {
+    controls_.push_back({request, Control::State::Received, 0});
+  } else {
+    parts_.ingress.answer(request, "failed: not a request\n");
+  }
+}
+
+void Recorder::takeUpControls() {
+  for (Control& control : controls_) {
+    if (control.state == Control::State::Received) {
+      // Datagrams that are queued came before the request: they are read in the next round.
+      control.state = Control::State::Due;
+    } else if (control.state == Control::State::Due) {
+      // A commit that is under way may have begun before what is asked for had arrived.
+      control = {control.request, Control::State::Waiting, commits_.started + 1};
+      askedToCommit_ = true;
+    }
+  }
+}
+
+void Recorder::answerControls() {
+  std::erase_if(controls_, [&](const Control& control) {
+    if (control.state != Control::State::Waiting || commits_.ended < control.afterCommit) {
+      return false;
+    }
+    parts_.ingress.answer(control.request, commits_.failure.empty()
+                                               ? "done\n"
+                                               : "failed: " + commits_.failure + "\n");
+    return true;
+  });
+}
+
+bool Recorder::commitIsDue() const {
+  const bool asked = terminating_ || askedToCommit_;
+  if (!asked && now_.bootNanoseconds < retryAt_) return false;
+  if (asked || intake_.hasWaiting() || intake_.hasDurable()) return true;
+  const auto since = intake_.heldSince();
+  return since && (now_.bootNanoseconds - *since >= interval() ||
+                   intake_.sampleBytes() >= intake_.mostBytes() / 2);
+}
+
+bool Recorder::startCommit() {
+  const bool durableAlone = intake_.hasDurable() && !askedToCommit_ && !intake_.hasWaiting();
+  CommitJob job;
+  job.batches = intake_.take(terminating_   ? MetricIntake::Take::AllAtEnd
+                             : durableAlone ? MetricIntake::Take::Durable
+                                            : MetricIntake::Take::All);
+  askedToCommit_ = false;
+  if (now_.day && std::exchange(dateUndated_, false)) {
+    job.wallMinusBoot = now_.wallMinusBoot;
+    job.today = *now_.day;
+  }
+  if (job.batches.empty() && !job.wallMinusBoot) return false;
+  ++commits_.started;
+  committer_.start(std::move(job));
+  return true;
+}
+
+bool Recorder::endCommit() {
+  auto outcome = committer_.takeOutcome();
+  if (!outcome) return false;
+  ++commits_.ended;
+  if (outcome->status) {
+    for (const CommitBatch& batch : outcome->job.batches) intake_.forget(batch);
+    if (outcome->undatedForgotten > 0) {
+      intake_.count(RecorderCount::UndatedDropped, outcome->undatedForgotten);
+    }
+    commits_.lastSuccess = secondsSince1970_;
+    retryAt_ = 0;
+    if (!std::exchange(commits_.failure, {}).empty()) {
+      parts_.log.write(LogLevel::Default, "the store can be written again");
+    }
+    return true;
+  }
+  ++commits_.failed;
+  const std::string& message = outcome->status.error().message;
+  if (message != commits_.failure) {
+    parts_.log.message(LogLevel::Error, "{}; what was recorded stays in memory", message);
+  }
+  commits_.failure = message;
+  retryAt_ = now_.bootNanoseconds + kRetryAfter;
+  dateUndated_ = dateUndated_ || outcome->job.wallMinusBoot.has_value();
+  intake_.putBack(std::move(outcome->job.batches));
+  return false;
+}
+
+bool Recorder::mayEnd() const {
+  return parts_.ingress.isActivated() && !parts_.ingress.hasConnections() && !intake_.heldSince() &&
+         !intake_.hasWaiting() && !committer_.isBusy() &&
+         now_.bootNanoseconds - std::max(intake_.lastLineAt(), commits_.startedAt) >=
+             kQuietIntervals * interval();
+}
+
+void Recorder::end() {
+  if (hasUncommitted()) {
+    parts_.log.message(LogLevel::Error, "ending with {} samples that could not be committed",
+                       intake_.samples());
+  }
+  parts_.ingress.stop();
+}
+
+std::optional<std::int64_t> Recorder::endRound() {
+  const bool committed = endCommit();
+  if (intake_.bytes() > intake_.mostBytes()) intake_.thin();
+  takeUpControls();
+  if (!committer_.isBusy()) {
+    if (terminating_ && finalCommitBegan_) {
+      end();
+    } else if (commitIsDue()) {
+      finalCommitBegan_ = terminating_;
+      if (!startCommit()) {
+        // Nothing was left to do for those who asked.
+        for (Control& control : controls_) {
+          control.afterCommit = std::min(control.afterCommit, commits_.ended);
+        }
+        if (terminating_) end();
+      }
+    }
+  }
+  answerControls();
+  if (committed) parts_.onCommitted();
+  if (mayEnd()) parts_.ingress.stop();
+  return nextRound();
+}
+
+std::optional<std::int64_t> Recorder::nextRound() const {
+  const auto isDue = [](const Control& control) { return control.state == Control::State::Due; };
+  if (std::ranges::any_of(controls_, isDue)) return 0;
+  if (committer_.isBusy()) return std::nullopt;  // its end begins a round
+  std::optional<std::int64_t> at;
+  const auto noLaterThan = [&](std::int64_t other) { at = at ? std::min(*at, other) : other; };
+  if (const auto since = intake_.heldSince()) {
+    noLaterThan(*since + interval());
+    const double untilMidnight =
+        static_cast<double>(dayOfSeconds(secondsSince1970_) + 1) * kSecondsPerDay -
+        secondsSince1970_;
+    noLaterThan(now_.bootNanoseconds +
+                static_cast<std::int64_t>((untilMidnight + 1) * static_cast<double>(kSecond)));
+  }
+  if (intake_.hasWaiting()) noLaterThan(now_.bootNanoseconds);
+  if (at && retryAt_ > 0) at = std::max(*at, retryAt_);
+  if (parts_.ingress.isActivated() && !parts_.ingress.hasConnections()) {
+    noLaterThan(std::max(intake_.lastLineAt(), commits_.startedAt) + kQuietIntervals * interval());
+  }
+  if (!at) return std::nullopt;
+  return std::max<std::int64_t>(*at - now_.bootNanoseconds, 0);
 }
 
 }  // namespace tally

@@ -1,12 +1,8 @@
-// The recorder: takes the metrics of other programs in, keeps them in memory and commits them.
+// The recorder: takes the metrics of other programs in, and decides when they are committed.
 #pragma once
 
-#include <array>
-#include <cstddef>
 #include <cstdint>
-#include <deque>
 #include <functional>
-#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -15,17 +11,14 @@
 #include "platform/recording/ingress.h"
 #include "platform/recording/recording_store.h"
 #include "platform/system_log.h"
-#include "recorder/commit_batch.h"
 #include "recorder/committer.h"
-#include "recorder/held_keys.h"
-#include "recorder/key_rules.h"
+#include "recorder/metric_intake.h"
+#include "recorder/recorder_status.h"
 #include "recorder/recording_clock.h"
-#include "recorder/recording_users.h"
-#include "recorder/statsd_line.h"
 
 namespace tally {
 
-// What the recorder is given; all of it outlives the recorder.
+// What the recorder is given; all that is referred to outlives it.
 struct RecorderParts {
   RecordingStore& store;
   Ingress& ingress;
@@ -33,7 +26,7 @@ struct RecorderParts {
   std::string bootId;
   std::function<RecorderSettings()> readSettings;
   std::function<bool()> clockIsSynchronised;
-  std::function<void()> afterCommit;  // called by another thread
+  std::function<void()> onCommitted;  // called after each commit
 };
 
 class Recorder final : public IngressHandler {
@@ -49,40 +42,10 @@ class Recorder final : public IngressHandler {
   void onReload() override;
   std::optional<std::int64_t> endRound() override;
 
+  // Whether something was recorded that is not in the store.
+  bool hasUncommitted() const { return intake_.samples() > 0 || intake_.hasWaiting(); }
+
  private:
-  // A metric whose line was read.
-  void record(std::uint32_t user, const MetricLine& metric);
-  std::uint32_t keyFor(std::uint32_t user, const MetricLine& metric);
-  std::uint32_t addKey(std::uint32_t user, const MetricLine& metric, std::string_view identity);
-  void addValues(HeldKey& key, std::uint32_t user, const MetricLine& metric);
-  void addSample(HeldKey& key, std::uint32_t user, double value, double rate);
-  void noteType(HeldKey& key, MetricType type);
-  void refuse(std::uint32_t user, Refusal refusal, std::uint64_t count = 1);
-  void count(RecorderCount which, std::uint64_t amount = 1);
-  void growSamples(std::uint32_t user, std::size_t bytes);
-  std::size_t bytes() const { return keyBytes_ + sampleBytes_; }
-  std::size_t memoryForData() const;
-
-  void beginDay();
-  void loadOwners();
-  // Moves what is held, or of durable keys alone, out of the keys of the day.
-  CommitBatch takeBatch(bool durableAlone, bool atEnd);
-  void takeChange(CommitBatch& batch, HeldKey& key, bool atEnd);
-  void takeCounts(CommitBatch& batch);
-  void endCommit();
-  void returnMemory(const CommitBatch& batch);
-  bool commitIsDue() const;
-  void startCommit(bool durableAlone);
-  void answerControls();
-  // Thins samples until memory is within its limit, or nothing more can be thinned.
-  void thin();
-  // One layer of the user's samples, the oldest that has any; false when nothing is left to thin.
-  bool thinOldest(std::uint32_t user);
-  std::uint64_t thinned(SampleStream& samples, std::uint32_t user);
-  bool mayEnd() const;
-  std::optional<std::int64_t> nextRound() const;
-  std::string statusText() const;
-
   struct Control {
     enum class State { Received, Due, Waiting };
     ControlRequest request;
@@ -90,33 +53,29 @@ class Recorder final : public IngressHandler {
     std::uint64_t afterCommit;  // answered when so many commits have ended
   };
 
+  void beginDay();
+  std::int64_t interval() const;  // nanoseconds
+  bool commitIsDue() const;
+  // False when there was nothing to commit.
+  bool startCommit();
+  // Whether a commit has ended, and well.
+  bool endCommit();
+  void takeUpControls();
+  void answerControls();
+  bool mayEnd() const;
+  void end();
+  std::optional<std::int64_t> nextRound() const;
+
   RecorderParts parts_;
-  KeyRules rules_;
+  MetricIntake intake_;
   RecordingClock clock_;
-  RecordingUsers users_;
   Committer committer_;
-  std::shared_ptr<HeldKeys> keys_;
-  std::deque<CommitBatch> ended_;  // of former days and of commits that failed, oldest first
-  std::vector<MetricValue> values_;
-  std::string identity_;
-
   RecordingMoment now_;
-  std::int64_t bootNanoseconds_ = 0, startedAt_ = 0, lastLineAt_ = 0;
   double secondsSince1970_ = 0;
-  std::optional<std::int64_t> heldSince_;  // since when something waits to be committed
-  std::int64_t retryAt_ = 0;               // after a commit that failed
-  std::optional<double> commitFailedSince_;
-  bool durableWaits_ = false, dateUndated_ = true, terminating_ = false, askedToCommit_ = false;
   std::vector<Control> controls_;
-  std::uint64_t commitsStarted_ = 0, commitsEnded_ = 0, commitsFailed_ = 0;
-  std::string lastFailure_;
-  std::optional<double> lastCommitAt_;
-
-  std::size_t keyBytes_ = 0, sampleBytes_ = 0;  // samples that are being committed included
-  std::uint64_t samplesHeld_ = 0, metrics_ = 0;
-  // Since the start, and what of it has been put into batches.
-  RefusalCounts refused_{}, refusedTaken_{};
-  std::array<std::uint64_t, kRecorderCountCount> counts_{}, countsTaken_{};
+  std::int64_t retryAt_ = 0;  // after a commit that failed
+  bool dateUndated_ = true, terminating_ = false, askedToCommit_ = false, finalCommitBegan_ = false;
+  CommitFigures commits_;
 };
 
 }  // namespace tally

@@ -1,8 +1,6 @@
-// What the recorder says about itself.
-#include <algorithm>
+#include "recorder/recorder_status.h"
 
 #include "kv/plist_codec.h"
-#include "recorder/recorder.h"
 
 namespace tally {
 namespace {
@@ -20,40 +18,48 @@ KvRef<KvDictionary> countsOf(const Rows& rows, const Counts& counts) {
   return dictionary;
 }
 
-}  // namespace
+KvRef<KvObject> secondsBetween(std::int64_t from, std::int64_t to) {
+  constexpr double kNanoseconds = 1e9;
+  return KvNumber::float64(static_cast<double>(to - from) / kNanoseconds);
+}
 
-std::string Recorder::statusText() const {
-  auto users = KvArray::create();
-  for (const RecordingUser& user : users_.all()) {
+KvRef<KvArray> usersOf(const RecordingUsers& users) {
+  auto rows = KvArray::create();
+  for (const RecordingUser& user : users.all()) {
     auto row = KvDictionary::create();
     row->set("user", KvNumber::int64(user.sender.user));
     row->set("metrics", number(user.metrics));
     row->set("keys", number(user.keysToday));
     row->set("bytes", number(user.bytes));
     row->set("refused", countsOf(kRefusals, user.refused));
-    users->append(std::move(row));
+    rows->append(std::move(row));
   }
+  return rows;
+}
+
+}  // namespace
+
+std::string recorderStatusText(const MetricIntake& intake, const CommitFigures& commits,
+                               const RecordingMoment& now) {
   auto status = KvDictionary::create();
-  constexpr double kNanoseconds = 1e9;
-  const auto seconds = [&](std::int64_t since) {
-    return KvNumber::float64(static_cast<double>(bootNanoseconds_ - since) / kNanoseconds);
-  };
-  status->set("seconds", seconds(startedAt_));
-  if (now_.day) status->set("day", KvNumber::int32(*now_.day));
-  status->set("metrics", number(metrics_));
-  status->set("keys", number(keys_ ? keys_->size() : 0));
-  status->set("keys_changed", number(keys_ ? keys_->dirty().size() : 0));
-  status->set("samples_held", number(samplesHeld_));
-  status->set("bytes_held", number(bytes()));
-  status->set("bytes_limit", number(memoryForData()));
-  if (heldSince_) status->set("held_seconds", seconds(*heldSince_));
-  status->set("commits", number(commitsEnded_ - commitsFailed_));
-  status->set("commits_failed", number(commitsFailed_));
-  if (!lastFailure_.empty()) status->set("failure", KvString::create(lastFailure_));
-  if (lastCommitAt_) status->set("last_commit", KvNumber::float64(*lastCommitAt_));
-  status->set("refused", countsOf(kRefusals, refused_));
-  status->set("counts", countsOf(kRecorderCounts, counts_));
-  status->set("users", std::move(users));
+  status->set("seconds", secondsBetween(commits.startedAt, now.bootNanoseconds));
+  if (now.day) status->set("day", KvNumber::int32(*now.day));
+  status->set("metrics", number(intake.metrics()));
+  status->set("keys", number(intake.keys()->size()));
+  status->set("keys_changed", number(intake.keys()->dirty().size()));
+  status->set("samples_held", number(intake.samples()));
+  status->set("bytes_held", number(intake.bytes()));
+  status->set("bytes_limit", number(intake.mostBytes()));
+  if (intake.heldSince()) {
+    status->set("held_seconds", secondsBetween(*intake.heldSince(), now.bootNanoseconds));
+  }
+  status->set("commits", number(commits.ended - commits.failed));
+  status->set("commits_failed", number(commits.failed));
+  if (!commits.failure.empty()) status->set("failure", KvString::create(commits.failure));
+  if (commits.lastSuccess) status->set("last_commit", KvNumber::float64(*commits.lastSuccess));
+  status->set("refused", countsOf(kRefusals, intake.refused()));
+  status->set("counts", countsOf(kRecorderCounts, intake.counts()));
+  status->set("users", usersOf(intake.users()));
   const auto text = encodeXmlPlist(*status);
   return text ? *text : "failed: " + text.error().message + "\n";
 }

@@ -8,12 +8,15 @@ namespace tally {
 RecordingMoment RecordingClock::at(std::int64_t bootNanoseconds, double secondsSince1970) {
   constexpr std::int64_t kNanoseconds = 1'000'000'000;
   RecordingMoment moment;
+  moment.bootNanoseconds = bootNanoseconds;
   moment.bootSeconds = bootNanoseconds / kNanoseconds;
   moment.wallMinusBoot =
       secondsSince1970 - static_cast<double>(bootNanoseconds) / static_cast<double>(kNanoseconds);
   const std::int32_t day = dayOfSeconds(secondsSince1970);
   if (isBelieved(day, moment.bootSeconds)) {
     moment.day = day;
+    moment.secondOfDay =
+        static_cast<std::int64_t>(secondsSince1970 - static_cast<double>(day) * kSecondsPerDay);
     newestDay_ = day;
     behindSince_.reset();
   }

@@ -8,9 +8,11 @@
 namespace tally {
 
 struct RecordingMoment {
-  std::optional<std::int32_t> day;  // empty while the clock is not set
-  std::int64_t bootSeconds = 0;     // since boot, suspension included
-  double wallMinusBoot = 0;         // what turns seconds since boot into seconds since 1970
+  std::optional<std::int32_t> day;   // empty while the clock is not set
+  std::int64_t secondOfDay = 0;      // with a day
+  std::int64_t bootNanoseconds = 0;  // since boot, suspension included
+  std::int64_t bootSeconds = 0;      // the same
+  double wallMinusBoot = 0;          // what turns seconds since boot into seconds since 1970
 };
 
 // A clock is not set while it shows a day before the first device was made, or one before the

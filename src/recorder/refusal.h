@@ -95,6 +95,7 @@ inline constexpr RefusalRow kRecorderCounts[] = {
      "bytes that clients say they had to drop"},
 };
 inline constexpr std::size_t kRecorderCountCount = std::size(kRecorderCounts);
+using RecorderCounts = std::array<std::uint64_t, kRecorderCountCount>;
 static_assert(kRecorderCountCount == std::size_t(RecorderCount::ClientBytesDropped) + 1);
 
 }  // namespace tally

@@ -36,7 +36,7 @@ bool isWhole(double value) {
 
 }  // namespace
 
-void SampleVectors::clear() {
+void StreamSamples::clear() {
   values.clear();
   offsets.clear();
   weights.clear();
@@ -109,7 +109,7 @@ std::uint64_t SampleStream::Reader::takeVarint() {
   }
 }
 
-bool SampleStream::Reader::next(SampleVectors& samples, std::size_t most) {
+bool SampleStream::Reader::next(StreamSamples& samples, std::size_t most) {
   samples.clear();
   bool weighted = false;
   for (; left_ > 0 && samples.values.size() < most; --left_) {
@@ -142,7 +142,7 @@ std::uint64_t SampleStream::thin() {
   constexpr std::size_t kAtATime = 1024;  // even, so that pairs stay together
   SampleStream kept;
   Reader reader(*this);
-  SampleVectors samples;
+  StreamSamples samples;
   while (reader.next(samples, kAtATime)) {
     const auto weightOf = [&](std::size_t i) -> std::uint64_t {
       return samples.weights.empty() ? 1 : samples.weights[i];

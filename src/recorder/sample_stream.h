@@ -12,7 +12,7 @@
 namespace tally {
 
 // Unpacked samples.
-struct SampleVectors {
+struct StreamSamples {
   std::vector<double> values;
   std::vector<std::uint32_t> offsets, weights;
   SampleColumns columns() const { return {values, offsets, weights}; }
@@ -33,7 +33,7 @@ class SampleStream {
    public:
     explicit Reader(const SampleStream& stream);
     // Replaces the vectors' content by up to `most` further samples; false at the end.
-    bool next(SampleVectors& samples, std::size_t most);
+    bool next(StreamSamples& samples, std::size_t most);
 
    private:
     std::byte take();

@@ -135,4 +135,14 @@ std::string standardErrorLine(LogLevel level, std::string_view message) {
   return line;
 }
 
+std::shared_ptr<SystemLog> makeSystemLogOfEnvironment() {
+  const SystemLogEnvironment environment = systemLogEnvironment();
+  auto log = makeLinuxSystemLog(environment.settings);
+  if (!environment.fault.empty()) {
+    log->fault("environment", "{}; the messages are those of level {}", environment.fault,
+               levelText(environment.settings.lowest));
+  }
+  return log;
+}
+
 }  // namespace tally

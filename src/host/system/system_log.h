@@ -31,6 +31,8 @@ bool journalIsThere();
 
 // Whether there is a journal is found out at the first message.
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings);
+// The one that the environment asks for; it says itself what of that is not understood.
+std::shared_ptr<SystemLog> makeSystemLogOfEnvironment();
 
 // A message as one line of standard error, ending in a newline: control characters are written as
 // escapes ("\n", "\x1b"), so that no message can look like two, and bytes that are not UTF-8 as

@@ -68,8 +68,11 @@ class SqliteTransaction final : public RecordingTransaction {
       return addSamples(day, change.key, change.samples);
     }
     std::int64_t value = change.value;
-    if (change.kind == RecordedChange::Kind::Add) {
-      const auto former = connection_->scalar(day, change.key);
+    if (change.kind != RecordedChange::Kind::Set) {
+      auto former = connection_->scalar(day, change.key);
+      if (former && !*former && change.kind == RecordedChange::Kind::Move) {
+        former = connection_->scalar(day - 1, change.key);
+      }
       if (!former) return former.error();
       value = saturatedSum(former->value_or(0), value);
     }
@@ -83,7 +86,7 @@ class SqliteTransaction final : public RecordingTransaction {
     if (!isStoreKey(owner.key)) return database_.error(kStoreKeyRule);
     if (auto made = make(kOwnersTable, hasOwners_); !made) return made;
     const auto set = connection_->prepared(connection_->setOwner,
-                                           "INSERT OR REPLACE INTO owners VALUES (?1, ?2, ?3, ?4)");
+                                           "INSERT OR IGNORE INTO owners VALUES (?1, ?2, ?3, ?4)");
     if (!set) return set.error();
     return done((*set)
                     ->bind(1, std::int64_t{day})

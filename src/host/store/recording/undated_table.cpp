@@ -18,7 +18,7 @@ using Kind = RecordedChange::Kind;
 constexpr struct {
   Kind kind;
   std::int64_t number;
-} kKinds[] = {{Kind::Add, 0}, {Kind::Set, 1}, {Kind::Samples, 2}};
+} kKinds[] = {{Kind::Add, 0}, {Kind::Set, 1}, {Kind::Samples, 2}, {Kind::Move, 3}};
 
 std::int64_t numberOf(Kind kind) {
   for (const auto& entry : kKinds) {

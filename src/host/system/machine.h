@@ -1,0 +1,27 @@
+// Questions to this machine, whatever device root the program works on.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/result.h"
+
+namespace tally {
+
+// Different after each boot; empty if the kernel does not say.
+std::string bootId();
+// Whether the kernel knows that its clock follows a reference.
+bool clockIsSynchronised();
+// The number of a user; empty when there is none of that name.
+std::optional<std::int64_t> userNumber(std::string_view name);
+// The name of a user; its number as text when it has none.
+std::string userName(std::int64_t user);
+
+// Starts a program of the directory that this one is in, without waiting for its end. It gets no
+// descriptors but the standard ones, and all signals.
+Status startNeighbour(std::string_view program, const std::vector<std::string>& arguments);
+
+}  // namespace tally

@@ -1,0 +1,369 @@
+#include "recorder/metric_intake.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstring>
+#include <iterator>
+#include <utility>
+
+#include "base/time_text.h"
+
+namespace tally {
+namespace {
+
+// Rates below are taken as this: a weight stays a number that a day can have.
+constexpr double kLeastRate = 1e-6;
+// What the program takes beside what it holds: its code's data, the store's buffers, the stack of
+// the commit.
+constexpr std::size_t kMemoryOfProgram = 5 << 20;
+
+}  // namespace
+
+std::size_t MetricIntake::mostBytes() const {
+  return static_cast<std::size_t>(settings().number(RecorderNumber::MemoryLimit)) -
+         kMemoryOfProgram;
+}
+
+void MetricIntake::beginDay(const RecordingMoment& moment, std::span<const KeyOwner> owners) {
+  if (keys_) {
+    CommitBatch batch = takeBatch(Take::AllAtEnd);
+    if (!batch.changes.empty()) waiting_.push_back(std::move(batch));
+  }
+  setNow(moment);
+  dateWaiting();
+  users_.beginDay();
+  keyBytes_ = 0;  // the former keys go with their last batch
+  keys_ = std::make_shared<HeldKeys>(moment.day, moment.bootSeconds);
+  for (const KeyOwner& owner : owners) addOwned(owner);
+}
+
+// What was recorded before the clock was set is dated once it is.
+void MetricIntake::dateWaiting() {
+  if (!now_.day) return;
+  for (CommitBatch& batch : waiting_) {
+    if (batch.day || batch.originOnClock) continue;
+    batch.originOnClock = now_.wallMinusBoot + static_cast<double>(batch.origin);
+  }
+}
+
+void MetricIntake::addOwned(const KeyOwner& owner) {
+  if (keys_->findKey(owner.key) != HeldKeys::kNone) return;
+  const std::uint32_t user = users_.indexOf({owner.user}, settings());
+  HeldKey& key = keys_->at(keys_->add(owner.key, owner.key, keyBytes_));
+  key.user = user;
+  key.type = owner.distribution ? HeldType::Distribution : HeldType::None;
+  key.durable = rules_.isDurable(owner.key);
+  ++users_.at(user).keysToday;
+}
+
+void MetricIntake::recordLines(Sender sender, std::string_view lines) {
+  lastLineAt_ = now_.bootNanoseconds;
+  const std::uint32_t user = users_.indexOf(sender, settings());
+  MetricLine metric;
+  while (!lines.empty()) {
+    const void* const newline = std::memchr(lines.data(), '\n', lines.size());
+    const std::size_t end =
+        newline == nullptr
+            ? lines.size()
+            : static_cast<std::size_t>(static_cast<const char*>(newline) - lines.data());
+    std::string_view line = lines.substr(0, end);
+    lines.remove_prefix(std::min(end + 1, lines.size()));
+    if (line.ends_with('\r')) line.remove_suffix(1);
+    if (line.empty()) continue;
+    if (const auto refused = parseMetricLine(line, metric, values_)) {
+      refuseFor(user, *refused, 1);
+    } else {
+      record(user, metric);
+    }
+  }
+}
+
+void MetricIntake::record(std::uint32_t user, const MetricLine& metric) {
+  if (!users_.admit(users_.at(user), values_.size(), now_.bootNanoseconds, settings())) {
+    return refuseFor(user, Refusal::MetricsPerSecond, values_.size());
+  }
+  const std::uint32_t index = keyFor(user, metric);
+  if (index == HeldKeys::kNone) return;
+  HeldKey& key = keys_->at(index);
+  if (key.user != user && !key.anyUser) return refuseFor(user, Refusal::Owner, values_.size());
+  if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
+  keys_->markDirty(index);
+  addValues(key, user, metric);
+  hasDurable_ = hasDurable_ || key.durable;
+  markHeld();
+  users_.at(user).metrics += values_.size();
+  metrics_ += values_.size();
+}
+
+std::uint32_t MetricIntake::keyFor(std::uint32_t user, const MetricLine& metric) {
+  const std::string_view identity = rules_.identityOf(metric.name, metric.tags, identity_);
+  const std::uint32_t index = keys_->find(identity);
+  if (index != HeldKeys::kNone) return index;
+  if (const auto loss = clientLossOf(metric.name)) {
+    double lost = 0;
+    for (const MetricValue& value : values_) lost += std::max(value.number, 0.0) / metric.rate;
+    constexpr double kMostBelieved = 1e15;
+    count(*loss, static_cast<std::uint64_t>(std::min(lost, kMostBelieved)));
+    return HeldKeys::kNone;
+  }
+  return addKey(user, metric, identity);
+}
+
+std::uint32_t MetricIntake::addKey(std::uint32_t user, const MetricLine& metric,
+                                   std::string_view identity) {
+  const auto refused = [&](Refusal refusal) {
+    refuseFor(user, refusal, values_.size());
+    return HeldKeys::kNone;
+  };
+  if (!isRecordableName(identity)) return refused(Refusal::Name);
+  const std::string key = rules_.keyOf(metric.name, identity);
+  if (!isRecordableName(key)) return refused(Refusal::Name);
+  std::uint32_t index = rules_.isIdentity() ? HeldKeys::kNone : keys_->findKey(key);
+  if (index != HeldKeys::kNone) {
+    keys_->addIdentity(identity, index, keyBytes_);
+    return index;
+  }
+  RecordingUser& recording = users_.at(user);
+  const auto limit = [&](RecorderNumber which) {
+    return static_cast<std::uint64_t>(settings().number(which));
+  };
+  if (!rules_.mayRecord(recording.sender.user, key)) return refused(Refusal::Permission);
+  if (recording.keysToday >= limit(RecorderNumber::KeysOfUser)) return refused(Refusal::KeysOfUser);
+  if (keys_->size() >= limit(RecorderNumber::KeysOfDay)) return refused(Refusal::KeysOfDay);
+  if (bytes() >= mostBytes()) return refused(Refusal::Memory);
+  index = keys_->add(identity, key, keyBytes_);
+  HeldKey& held = keys_->at(index);
+  held.user = user;
+  held.isNew = true;
+  held.durable = rules_.isDurable(key);
+  ++recording.keysToday;
+  return index;
+}
+
+void MetricIntake::noteType(HeldKey& key, MetricType type) {
+  const HeldType now = type == MetricType::Counter ? HeldType::Counter
+                       : type == MetricType::Gauge ? HeldType::Gauge
+                                                   : HeldType::Distribution;
+  if (key.type == now) return;
+  // Of a key that an earlier process recorded only this is known: it is not a distribution.
+  const bool first = key.type == HeldType::None && (key.isNew || now != HeldType::Distribution);
+  key.type = now;
+  if (first || key.twoTypes) return;
+  key.twoTypes = true;
+  count(RecorderCount::KeysOfTwoTypes);
+  log_.repeated(LogLevel::Default, "recorder: keys of two types",
+                "the key {} is recorded as two types", key.key);
+}
+
+void MetricIntake::addValues(HeldKey& key, std::uint32_t user, const MetricLine& metric) {
+  noteType(key, metric.type);
+  double rate = metric.rate;
+  if (rate < kLeastRate) {
+    rate = kLeastRate;
+    count(RecorderCount::RatesBounded);
+  }
+  for (const MetricValue& value : values_) {
+    switch (metric.type) {
+      case MetricType::Counter:
+        key.scalar.add(value.number / rate);
+        break;
+      case MetricType::Gauge:
+        if (value.isSigned) {
+          key.scalar.move(value.number);
+        } else {
+          key.scalar.set(value.number);
+        }
+        break;
+      case MetricType::Duration:
+      case MetricType::Sample:
+        addSample(key, user, value.number, rate);
+        break;
+    }
+  }
+}
+
+void MetricIntake::addSample(HeldKey& key, std::uint32_t user, double value, double rate) {
+  std::uint32_t weight = 1;
+  if (rate != 1) {
+    // A weight is whole; what it leaves is added to the next one, so that counts are right.
+    const double exact = 1 / rate + static_cast<double>(key.weightLeft);
+    weight = static_cast<std::uint32_t>(std::max(std::round(exact), 1.0));
+    key.weightLeft = static_cast<float>(exact - weight);
+  }
+  if (bytes() > mostBytes()) {
+    thin();
+    // Everything may be in the commit that is under way.
+    if (bytes() > mostBytes()) return refuseFor(user, Refusal::Memory, 1);
+  }
+  if (!key.samples) {
+    key.samples = std::make_unique<SampleStream>();
+    growSamples(user, sizeof(SampleStream));
+  }
+  const std::int64_t offset = now_.day ? now_.secondOfDay : now_.bootSeconds - keys_->origin();
+  growSamples(user,
+              key.samples->add(value, static_cast<std::uint32_t>(std::max<std::int64_t>(offset, 0)),
+                               weight));
+  ++samples_;
+}
+
+void MetricIntake::refuse(Sender sender, Refusal refusal, std::uint64_t count) {
+  refuseFor(users_.indexOf(sender, settings()), refusal, count);
+}
+
+void MetricIntake::refuseFor(std::uint32_t user, Refusal refusal, std::uint64_t count) {
+  const auto which = static_cast<std::size_t>(refusal);
+  refused_[which] += count;
+  users_.at(user).refused[which] += count;
+  markHeld();
+}
+
+void MetricIntake::markHeld() {
+  if (!heldSince_) heldSince_ = now_.bootNanoseconds;
+}
+
+void MetricIntake::count(RecorderCount which, std::uint64_t amount) {
+  counts_[static_cast<std::size_t>(which)] += amount;
+  markHeld();
+}
+
+void MetricIntake::growSamples(std::uint32_t user, std::size_t bytes) {
+  sampleBytes_ += bytes;
+  users_.at(user).bytes += bytes;
+}
+
+std::size_t MetricIntake::allowedBytes(Sender sender) {
+  constexpr double kBytesOfMetric = 2;  // the shortest, in a line of many values
+  constexpr double kLeast = 64;         // metrics, so that reading is worth it
+  constexpr double kMost = 1 << 20;
+  RecordingUser& user = users_.at(users_.indexOf(sender, settings()));
+  (void)users_.admit(user, 0, now_.bootNanoseconds, settings());
+  if (user.allowance < kLeast) return 0;
+  return static_cast<std::size_t>(std::min(user.allowance * kBytesOfMetric, kMost));
+}
+
+std::vector<CommitBatch> MetricIntake::take(Take which) {
+  std::vector<CommitBatch> batches(std::make_move_iterator(waiting_.begin()),
+                                   std::make_move_iterator(waiting_.end()));
+  waiting_.clear();
+  CommitBatch batch = takeBatch(which);
+  if (!batch.changes.empty()) batches.push_back(std::move(batch));
+  return batches;
+}
+
+void MetricIntake::putBack(std::vector<CommitBatch> batches) {
+  waiting_.insert(waiting_.begin(), std::make_move_iterator(batches.begin()),
+                  std::make_move_iterator(batches.end()));
+  dateWaiting();
+}
+
+CommitBatch MetricIntake::takeBatch(Take which) {
+  CommitBatch batch;
+  batch.keys = keys_;
+  batch.day = keys_->day();
+  batch.origin = keys_->origin();
+  if (which == Take::AllAtEnd) {
+    // What is left below one is in keys that may not have changed since the last commit.
+    for (std::uint32_t i = 0; i < keys_->size(); ++i) keys_->markDirty(i);
+  }
+  for (const std::uint32_t index : keys_->takeDirty()) {
+    HeldKey& key = keys_->at(index);
+    key.dirty = false;
+    if (which == Take::Durable && !key.durable) {
+      keys_->markDirty(index);
+    } else {
+      takeChange(batch, key, which == Take::AllAtEnd);
+    }
+  }
+  hasDurable_ = false;
+  if (which != Take::Durable) {
+    takeCounts(batch);
+    heldSince_.reset();
+  }
+  return batch;
+}
+
+void MetricIntake::takeChange(CommitBatch& batch, HeldKey& key, bool atEnd) {
+  const std::int64_t user = users_.at(key.user).sender.user;
+  if (const auto change = key.scalar.take(atEnd)) {
+    if (change->clamped) count(RecorderCount::ValuesClamped);
+    batch.changes.push_back({key.key, change->kind, change->value, nullptr, key.user, user});
+  }
+  if (key.samples) {
+    batch.changes.push_back({key.key, RecordedChange::Kind::Samples, 0,
+                             std::exchange(key.samples, nullptr), key.user, user});
+  }
+  if (std::exchange(key.isNew, false)) {
+    batch.owners.push_back({std::string(key.key), user, key.type == HeldType::Distribution});
+  }
+}
+
+void MetricIntake::takeCounts(CommitBatch& batch) {
+  const auto take = [&](std::string_view key, std::uint64_t now, std::uint64_t& taken) {
+    const std::uint64_t more = now - std::exchange(taken, now);
+    if (more == 0) return;
+    batch.changes.push_back(
+        {key, RecordedChange::Kind::Add, static_cast<std::int64_t>(more), nullptr, 0, 0});
+  };
+  for (std::size_t i = 0; i < kRefusalCount; ++i) {
+    take(kRefusals[i].key, refused_[i], refusedTaken_[i]);
+  }
+  for (std::size_t i = 0; i < kRecorderCountCount; ++i) {
+    take(kRecorderCounts[i].key, counts_[i], countsTaken_[i]);
+  }
+}
+
+void MetricIntake::forget(const CommitBatch& batch) {
+  for (const CommitBatch::Change& change : batch.changes) {
+    if (!change.samples) continue;
+    const std::size_t bytes = change.samples->bytes() + sizeof(SampleStream);
+    sampleBytes_ -= bytes;
+    users_.at(change.user).bytes -= bytes;
+    samples_ -= change.samples->count();
+  }
+}
+
+std::uint64_t MetricIntake::thinned(SampleStream& samples, std::uint32_t user) {
+  const std::size_t before = samples.bytes();
+  const std::uint64_t gone = samples.thin();
+  const std::size_t less = before - std::min(before, samples.bytes());
+  sampleBytes_ -= less;
+  users_.at(user).bytes -= less;
+  samples_ -= gone;
+  return gone;
+}
+
+bool MetricIntake::thinOldest(std::uint32_t user) {
+  std::uint64_t gone = 0;
+  for (std::size_t i = 0; i < waiting_.size() && gone == 0; ++i) {
+    for (CommitBatch::Change& change : waiting_[i].changes) {
+      if (change.samples && change.user == user) gone += thinned(*change.samples, user);
+    }
+  }
+  for (const std::uint32_t index : gone == 0 ? keys_->dirty() : std::vector<std::uint32_t>()) {
+    HeldKey& key = keys_->at(index);
+    if (key.samples && key.user == user) gone += thinned(*key.samples, user);
+  }
+  count(RecorderCount::SamplesThinned, gone);
+  return gone > 0;
+}
+
+void MetricIntake::thin() {
+  // Whoever takes most gives first, so that a flood displaces its own samples alone. A margin, so
+  // that not every further sample thins again.
+  const std::size_t enough = mostBytes() - mostBytes() / 8;
+  std::vector<bool> exhausted(users_.all().size(), false);
+  while (bytes() > enough) {
+    std::size_t most = users_.all().size();
+    for (std::size_t i = 0; i < users_.all().size(); ++i) {
+      const bool has = !exhausted[i] && users_.all()[i].bytes > 0;
+      if (has &&
+          (most == users_.all().size() || users_.all()[i].bytes > users_.all()[most].bytes)) {
+        most = i;
+      }
+    }
+    if (most == users_.all().size()) return;
+    if (!thinOldest(static_cast<std::uint32_t>(most))) exhausted[most] = true;
+  }
+}
+
+}  // namespace tally

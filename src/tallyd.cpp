@@ -1,0 +1,112 @@
+// tallyd: records metrics for other programs.
+#include <malloc.h>
+
+#include <chrono>
+#include <cstdio>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/process.h"
+#include "base/version.h"
+#include "host/ingress/socket_ingress.h"
+#include "host/store/recording/recording_store.h"
+#include "host/store/store_schema.h"
+#include "host/system/environment.h"
+#include "host/system/machine.h"
+#include "host/system/system_log.h"
+#include "recorder/recorder.h"
+
+namespace tally {
+namespace {
+
+constexpr int kFailed = 1, kBadUsage = 2;
+constexpr std::string_view kHelp =
+    "Usage: tallyd [--udp ADDRESS]...\n"
+    "\n"
+    "Records the metrics that other programs send in StatsD lines, on the sockets that systemd\n"
+    "passes or, started by hand, on its own ones in run/tallyd below TALLYRUN_ROOT.\n"
+    "\n"
+    "  --udp ADDRESS  also listen there: 127.0.0.1:8125, [::1]:8125, or another loopback port\n"
+    "  --version      print the version\n"
+    "  --help         print this text\n";
+
+struct Arguments {
+  std::vector<std::string> udpAddresses;
+  std::optional<int> exitStatus;  // set when there is nothing to run
+};
+
+int print(std::FILE* file, std::string_view text, int status) {
+  const bool written = std::fwrite(text.data(), 1, text.size(), file) == text.size();
+  return std::fflush(file) == 0 && written ? status : kFailed;
+}
+
+Arguments readArguments(int count, char** texts) {
+  Arguments arguments;
+  for (int i = 1; i < count; ++i) {
+    const std::string_view text = texts[i];
+    if (text == "--version") {
+      arguments.exitStatus = print(stdout, "tallyd " + std::string(kProgramVersion) + "\n", 0);
+    } else if (text == "--help" || text == "-h") {
+      arguments.exitStatus = print(stdout, kHelp, 0);
+    } else if (text == "--udp" && i + 1 < count) {
+      arguments.udpAddresses.emplace_back(texts[++i]);
+      continue;
+    } else {
+      arguments.exitStatus = print(stderr, kHelp, kBadUsage);
+    }
+    break;
+  }
+  return arguments;
+}
+
+// The kernel's counters restart with the next boot, which nobody may announce: they are kept every
+// hour in which something is committed anyway. By a process of its own, since it takes more memory
+// than everything here.
+std::function<void()> keepCountersHourly(SystemLog& log) {
+  constexpr std::chrono::hours kEvery{1};
+  return [&log, kEvery, last = std::chrono::steady_clock::now()]() mutable {
+    const auto now = std::chrono::steady_clock::now();
+    if (now - last < kEvery) return;
+    last = now;
+    const auto started = startNeighbour("tallyctl", {"channels", "keep"});
+    if (!started) log.fault("recorder: counters", "{}", started.error().message);
+  };
+}
+
+int run(const Arguments& arguments) {
+  const DeviceRoot root(deviceRootFromEnvironment());
+  const auto log = makeSystemLogOfEnvironment();
+  auto ingress = openIngress(root, {arguments.udpAddresses}, *log);
+  if (!ingress) {
+    log->message(LogLevel::Error, "{}", ingress.error().message);
+    return kFailed;
+  }
+  const auto store = makeSqliteRecordingStore(metricsStoreFile(root));
+  Recorder recorder({.store = *store,
+                     .ingress = **ingress,
+                     .log = *log,
+                     .bootId = bootId(),
+                     .readSettings = [&] { return readRecorderSettings(root, userNumber, *log); },
+                     .clockIsSynchronised = clockIsSynchronised,
+                     .onCommitted = keepCountersHourly(*log)});
+  const auto served = (*ingress)->run(recorder);
+  if (!served) log->message(LogLevel::Error, "{}", served.error().message);
+  log->writeOmitted();
+  return served && !recorder.hasUncommitted() ? 0 : kFailed;
+}
+
+}  // namespace
+}  // namespace tally
+
+int main(int count, char** texts) {
+  tally::surviveFailedWrites();
+  const auto arguments = tally::readArguments(count, texts);
+  if (arguments.exitStatus) return *arguments.exitStatus;
+  // One heap for both threads, and what is freed goes back: the daemon is there all day.
+  ::mallopt(M_ARENA_MAX, 1);
+  constexpr int kKeptBytes = 256 << 10;
+  ::mallopt(M_TRIM_THRESHOLD, kKeptBytes);
+  return tally::run(arguments);
+}
