@@ -90,7 +90,10 @@ int run(const Arguments& arguments) {
                      .bootId = bootId(),
                      .readSettings = [&] { return readRecorderSettings(root, userNumber, *log); },
                      .clockIsSynchronised = clockIsSynchronised,
-                     .onCommitted = keepCountersHourly(*log)});
+                     .onCommitted = [keepCounters = keepCountersHourly(*log)]() mutable {
+                       ::malloc_trim(0);  // what was committed, spread over the heap
+                       keepCounters();
+                     }});
   const auto served = (*ingress)->run(recorder);
   if (!served) log->message(LogLevel::Error, "{}", served.error().message);
   log->writeOmitted();
