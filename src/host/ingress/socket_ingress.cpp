@@ -201,7 +201,10 @@ Status SocketIngress::run(IngressHandler& handler) {
     serveListeners(events, count, handler);
     if (auto served = serveSignals(handler); !served) return served;
     const auto delay = handler.endRound();
-    if (stopped_.exchange(false)) return Done{};
+    if (stopped_.exchange(false)) {
+      takeCount(wake_.get());
+      return Done{};
+    }
     if (auto set = setDeadline(delay); !set) return set;
     const auto arrived = wait(events);
     if (!arrived) return arrived.error();
