@@ -1,6 +1,7 @@
 #include "driver/daily_tasks.h"
 
 #include <cerrno>
+#include <chrono>
 
 #include "config/whitelist_file.h"
 #include "platform/tables/known_preferences.h"
@@ -15,6 +16,13 @@ bool whitelistIsMissing(Files& files) {
   // With the limit 0, a file that exists is rejected by its size without being read.
   const auto bytes = files.readFile(kWhitelistPath, 0);
   return !bytes && bytes.error().systemError == ENOENT;
+}
+
+// What the recorder holds in memory of the day that is to be reported.
+void commitRecorded(Platform& platform) {
+  constexpr std::chrono::seconds kPatience{30};
+  const auto committed = platform.recorder->commit(kPatience);
+  if (!committed) platform.log->fault("recorder", "{}", committed.error().message);
 }
 
 }  // namespace
@@ -56,6 +64,7 @@ void DailyTasks::runDaily(std::int32_t day, const KvArray* appInfo) {
   const RunTurn turn(*platform_.runLock);
   if (!turn) return;
   platform_.log->message(LogLevel::Default, "daily tasks for day {}", day);
+  commitRecorded(platform_);
   platform_.metricsStore->TBClientCheckpoint();
   CrashReporting& crashReporting = *platform_.crashReporting;
   if (crashReporting.isDiagnosticSubmissionEnabled()) writeDailyLog(platform_, day, appInfo);

@@ -4,6 +4,7 @@
 #include "host/bus/bus_notifications.h"
 #include "host/described/described_purgeable_space.h"
 #include "host/described/described_stackshot.h"
+#include "host/ingress/recorder_client.h"
 #include "host/preferences/preference_services.h"
 #include "host/preferences/property_list_preferences.h"
 #include "host/spool/analytics_events.h"
@@ -81,6 +82,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
                         environmentVariable("LC_MESSAGES"), environmentVariable("LANG")},
       description);
   services.kernelValues = std::make_shared<LinuxKernelValues>(description, tree);
+  services.recorder = std::make_shared<SocketRecorderLink>(root);
   services.stackshot = std::make_shared<DescribedStackshot>(described, description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   services.logHeaderFacts =

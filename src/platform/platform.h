@@ -28,6 +28,7 @@
 #include "platform/notifications.h"
 #include "platform/preferences.h"
 #include "platform/purgeable_space.h"
+#include "platform/recording/recorder_link.h"
 #include "platform/run_lock.h"
 #include "platform/stackshot.h"
 #include "platform/system_configuration.h"
@@ -65,6 +66,7 @@ struct Platform {
   std::shared_ptr<DeviceRegistry> deviceRegistry;
   std::shared_ptr<DailyCounters> dailyCounters = std::make_shared<DailyCounters>();
   std::shared_ptr<FlashDisks> flashDisks = std::make_shared<FlashDisks>();
+  std::shared_ptr<RecorderLink> recorder = std::make_shared<RecorderLink>();
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<LogHeaderFacts> logHeaderFacts;

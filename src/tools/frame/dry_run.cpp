@@ -67,7 +67,7 @@ class CountedCrashReporting final : public CrashReporting {
 }  // namespace
 
 // Whoever adds a service decides here whether it has effects that a dry run must keep back.
-static_assert(sizeof(Platform) == 26 * sizeof(std::shared_ptr<void>));
+static_assert(sizeof(Platform) == 27 * sizeof(std::shared_ptr<void>));
 
 Platform DryRun::variantOf(const Platform& platform) {
   Platform variant = platform;
@@ -75,6 +75,7 @@ Platform DryRun::variantOf(const Platform& platform) {
   variant.logSubmission = std::make_shared<KeptSubmission>(*this);
   variant.crashReporting = std::make_shared<CountedCrashReporting>(*this, variant.crashReporting);
   variant.dailyCounters = std::make_shared<DailyCounters>();
+  variant.recorder = std::make_shared<RecorderLink>();
   return variant;
 }
 
