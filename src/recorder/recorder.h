@@ -42,6 +42,7 @@ class Recorder final : public IngressHandler {
   void onReload() override;
   std::optional<std::int64_t> endRound() override;
 
+  bool isCommitting() const { return committer_.isBusy(); }
   // Whether something was recorded that is not in the store.
   bool hasUncommitted() const { return intake_.samples() > 0 || intake_.hasWaiting(); }
 
