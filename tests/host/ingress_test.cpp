@@ -1,10 +1,12 @@
 // What clients send through the sockets of the recorder.
 #include <netinet/in.h>
 #include <signal.h>
+#include <sys/resource.h>
 
 #include <filesystem>
 #include <thread>
 
+#include "host/ingress/drain_pace.h"
 #include "host/ingress_fixture.h"
 
 namespace tally {
@@ -145,6 +147,36 @@ TEST_F(IngressTest, AThousandConnections) {
   EXPECT_LE(idleRounds(), 2u);
   sockets.clear();
   EXPECT_TRUE(serveUntil([&] { return !ingress->hasConnections(); }));
+}
+
+TEST_F(IngressTest, ConnectionsWaitWhileTheProcessHasNoDescriptors) {
+  ASSERT_EQ(open(), "");
+  const Descriptor sockets[] = {connectTo(kStreamSocket), connectTo(kStreamSocket)};
+  for (const Descriptor& socket : sockets) ASSERT_TRUE(sendTo(socket, "a\n"));
+  rlimit before{};
+  ASSERT_EQ(::getrlimit(RLIMIT_NOFILE, &before), 0);
+  const rlimit low{openDescriptors() - 1, before.rlim_max};
+  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &low), 0);
+  EXPECT_LT(idleRounds(), 20u) << "it tries again each 50 ms";
+  ASSERT_EQ(::setrlimit(RLIMIT_NOFILE, &before), 0);
+  EXPECT_TRUE(serveUntil([&] { return handler.lines.size() == 2; }));
+}
+
+TEST(DrainPaceTest, LeavesBatchesButNeverFillsTheQueue) {
+  constexpr std::int64_t kMicrosecond = 1000;
+  const struct {
+    std::size_t count;
+    std::int64_t interval, pause;
+  } cases[] = {{1, 100'000, 0},   {1, 50, 0},      {1, 10, 250},   {10, 250, 250},
+               {64, 250, 250},    {128, 250, 125}, {256, 250, 62}, {0, 250, 0},
+               {256, 1'000, 250}, {1, 0, 0},       {100, -5, 0}};
+  for (const auto& c : cases) {
+    DrainPace pace;
+    const std::int64_t start = 1'000'000'000'000;
+    (void)pace.pauseAfter(0, start);
+    const auto pause = pace.pauseAfter(c.count, start + c.interval * kMicrosecond) / kMicrosecond;
+    EXPECT_EQ(pause, c.pause) << c.count << " in " << c.interval;
+  }
 }
 
 TEST_F(IngressTest, ControlAnswersItsOwnUser) {

@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
 #include <cstring>
 #include <optional>
 #include <string_view>
@@ -42,6 +43,22 @@ std::optional<Value> controlValue(const msghdr& header, int type) {
   return value;
 }
 
+// Whether the socket's queue holds so many datagrams as DrainPace asks for.
+bool isDeep(const ListeningSocket& socket) {
+  constexpr std::size_t kQueued = 2304;  // what a large UDP datagram takes in the kernel
+  int size = 0;
+  socklen_t length = sizeof size;
+  if (!socket.hasCredentials) {
+    return ::getsockopt(socket.descriptor.get(), SOL_SOCKET, SO_RCVBUF, &size, &length) == 0 &&
+           static_cast<std::size_t>(size) >= DrainPace::kDeepQueue * kQueued;
+  }
+  // What the socket got when it was made; systemd raises it before it makes any.
+  const auto text = readFile("/proc/sys/net/unix/max_dgram_qlen", 64);
+  std::size_t queue = 0;
+  if (text) (void)std::from_chars(text->data(), text->data() + text->size(), queue);
+  return queue >= DrainPace::kDeepQueue;
+}
+
 // A datagram that was queued before credentials were asked for has neither process nor user.
 bool isKnown(const ucred& credentials) {
   constexpr uid_t kOverflowUser = 65534;
@@ -50,17 +67,17 @@ bool isKnown(const ucred& credentials) {
 
 }  // namespace
 
-Result<DatagramReceiver> DatagramReceiver::create() {
+Result<DatagramReceiver> DatagramReceiver::create(PollSet& poll) {
   void* const slab = ::mmap(nullptr, kSlots * kStride, PROT_READ | PROT_WRITE,
                             MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
   if (slab == MAP_FAILED) return systemError("cannot map", "memory for datagrams");
   // A large page for each slot would make all of the slab memory in use.
   (void)::madvise(slab, kSlots * kStride, MADV_NOHUGEPAGE);
-  return DatagramReceiver(static_cast<std::byte*>(slab));
+  return DatagramReceiver(poll, static_cast<std::byte*>(slab));
 }
 
-DatagramReceiver::DatagramReceiver(std::byte* slab)
-    : headers_(std::make_unique<Headers>()), slab_(slab) {
+DatagramReceiver::DatagramReceiver(PollSet& poll, std::byte* slab)
+    : poll_(poll), headers_(std::make_unique<Headers>()), slab_(slab) {
   for (std::size_t i = 0; i < kSlots; ++i) {
     headers_->buffers[i] = {slab_ + i * kStride + i % kStaggers * kStagger, kLongestDatagram};
     msghdr& header = headers_->messages[i].msg_hdr;
@@ -72,7 +89,8 @@ DatagramReceiver::DatagramReceiver(std::byte* slab)
 }
 
 DatagramReceiver::DatagramReceiver(DatagramReceiver&& other) noexcept
-    : sockets_(std::move(other.sockets_)),
+    : poll_(other.poll_),
+      sockets_(std::move(other.sockets_)),
       headers_(std::move(other.headers_)),
       slab_(std::exchange(other.slab_, nullptr)),
       holdsMemory_(other.holdsMemory_) {}
@@ -81,9 +99,11 @@ DatagramReceiver::~DatagramReceiver() {
   if (slab_ != nullptr) ::munmap(slab_, kSlots * kStride);
 }
 
-void DatagramReceiver::add(const ListeningSocket& socket) {
+bool DatagramReceiver::add(const ListeningSocket& socket) {
   const int descriptor = socket.descriptor.get();
-  sockets_.push_back({descriptor, socket.hasCredentials, droppedSoFar(descriptor)});
+  const auto index = static_cast<std::uint32_t>(sockets_.size());
+  sockets_.push_back({descriptor, socket.hasCredentials, droppedSoFar(descriptor), isDeep(socket)});
+  return poll_.add(descriptor, {PollTag::Kind::Datagrams, index});
 }
 
 void DatagramReceiver::releaseMemory() {
@@ -139,17 +159,49 @@ void DatagramReceiver::handOver(Socket& socket, mmsghdr& message, IngressHandler
   if (!lines.empty()) handler.onLines(sender, lines);
 }
 
-Result<bool> DatagramReceiver::drain(std::size_t socket, IngressHandler& handler) {
-  Socket& from = sockets_[socket];
-  const auto count = receive(from);
-  if (!count) return count.error();
-  for (std::size_t i = 0; i < *count; ++i) handOver(from, headers_->messages[i], handler);
-  return *count == kSlots;
+Result<std::size_t> DatagramReceiver::drain(Socket& socket, IngressHandler& handler) {
+  const auto count = receive(socket);
+  if (!count) return count;
+  for (std::size_t i = 0; i < *count; ++i) handOver(socket, headers_->messages[i], handler);
+  return count;
 }
 
-Status DatagramReceiver::drainAll(IngressHandler& handler) {
-  for (std::size_t i = 0; i < sockets_.size(); ++i) {
-    if (auto drained = drain(i, handler); !drained) return drained.error();
+Status DatagramReceiver::serve(std::uint32_t index, std::int64_t now, IngressHandler& handler) {
+  Socket& socket = sockets_[index];
+  const auto count = drain(socket, handler);
+  if (!count) return count.error();
+  const std::int64_t pause = socket.isDeep ? socket.pace.pauseAfter(*count, now) : 0;
+  const PollTag tag{PollTag::Kind::Datagrams, index};
+  if (pause > 0) {
+    if (!socket.pausedUntil && !poll_.change(socket.descriptor, tag, 0)) return Done{};
+    // If slots ran out, the rest is read without a pause.
+    socket.pausedUntil = *count == kSlots ? now : now + pause;
+  } else if (std::exchange(socket.pausedUntil, std::nullopt)) {
+    if (!poll_.change(socket.descriptor, tag, EPOLLIN)) socket.pausedUntil = now;
+  }
+  return Done{};
+}
+
+Status DatagramReceiver::servePaused(std::int64_t now, IngressHandler& handler) {
+  for (std::uint32_t i = 0; i < sockets_.size(); ++i) {
+    if (!sockets_[i].pausedUntil || *sockets_[i].pausedUntil > now) continue;
+    if (auto served = serve(i, now, handler); !served) return served;
+  }
+  return Done{};
+}
+
+std::optional<std::int64_t> DatagramReceiver::due() const {
+  std::optional<std::int64_t> first;
+  for (const Socket& socket : sockets_) {
+    if (socket.pausedUntil)
+      first = std::min(first.value_or(*socket.pausedUntil), *socket.pausedUntil);
+  }
+  return first;
+}
+
+Status DatagramReceiver::serveAll(IngressHandler& handler) {
+  for (Socket& socket : sockets_) {
+    if (auto drained = drain(socket, handler); !drained) return drained.error();
   }
   return Done{};
 }

@@ -8,10 +8,13 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <vector>
 
 #include "base/result.h"
+#include "host/ingress/drain_pace.h"
 #include "host/ingress/listening_sockets.h"
+#include "host/ingress/poll_set.h"
 #include "platform/recording/ingress.h"
 
 namespace tally {
@@ -23,19 +26,24 @@ class DatagramReceiver {
  public:
   static constexpr std::size_t kLongestDatagram = 64u << 10;
 
-  static Result<DatagramReceiver> create();
+  // Borrows the poll set for its life.
+  static Result<DatagramReceiver> create(PollSet& poll);
   DatagramReceiver(DatagramReceiver&&) noexcept;
   DatagramReceiver& operator=(DatagramReceiver&&) = delete;
   ~DatagramReceiver();
 
-  // Borrows the descriptor.
-  void add(const ListeningSocket& socket);
-  std::size_t socketCount() const { return sockets_.size(); }
-  // Hands over what the socket has, at most so many datagrams as there are slots. True if more may
-  // be there. An error: the socket does not work any longer.
-  Result<bool> drain(std::size_t socket, IngressHandler& handler);
-  // The same for all of them.
-  Status drainAll(IngressHandler& handler);
+  // Borrows the descriptor and has the poll set watch it. False with errno if that fails.
+  bool add(const ListeningSocket& socket);
+  // Hands over what the socket has that the poll set has under this index, at most so many
+  // datagrams as there are slots. Times are nanoseconds of CLOCK_BOOTTIME. An error: the socket
+  // does not work any longer.
+  Status serve(std::uint32_t index, std::int64_t now, IngressHandler& handler);
+  // The same for sockets that were left alone for a moment, if that is over.
+  Status servePaused(std::int64_t now, IngressHandler& handler);
+  // When the first of those is due.
+  std::optional<std::int64_t> due() const;
+  // The same for all sockets.
+  Status serveAll(IngressHandler& handler);
   // Whether slots hold memory that is worth returning when nothing arrives for a while.
   bool holdsMemory() const { return holdsMemory_; }
   void releaseMemory();
@@ -46,6 +54,9 @@ class DatagramReceiver {
     int descriptor;
     bool hasCredentials;
     std::uint32_t dropped;  // as the kernel counts, of UDP
+    bool isDeep;            // its queue holds what comes during a pause
+    DrainPace pace = {};
+    std::optional<std::int64_t> pausedUntil = {};  // the poll set does not watch it
   };
   // No space for anything but the credentials: descriptors that a sender passes along are then
   // closed by the kernel and never arrive.
@@ -59,10 +70,12 @@ class DatagramReceiver {
     std::array<Control, kSlots> controls;
   };
 
-  explicit DatagramReceiver(std::byte* slab);
+  DatagramReceiver(PollSet& poll, std::byte* slab);
+  Result<std::size_t> drain(Socket& socket, IngressHandler& handler);
   Result<std::size_t> receive(const Socket& socket);
   void handOver(Socket& socket, mmsghdr& message, IngressHandler& handler);
 
+  PollSet& poll_;
   std::vector<Socket> sockets_;
   std::unique_ptr<Headers> headers_;
   std::byte* slab_;

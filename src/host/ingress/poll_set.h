@@ -1,9 +1,14 @@
 // The descriptors that the ingress waits for.
 #pragma once
 
+#include <poll.h>
 #include <sys/epoll.h>
+#include <time.h>
 
+#include <algorithm>
 #include <cstdint>
+#include <optional>
+#include <utility>
 
 #include "base/files/file.h"
 #include "base/result.h"
@@ -48,8 +53,18 @@ class PollSet {
   void remove(int descriptor) {
     (void)::epoll_ctl(descriptor_.get(), EPOLL_CTL_DEL, descriptor, nullptr);
   }
-  // As epoll_wait.
-  int wait(epoll_event* events, int most, int milliseconds) {
+  // As epoll_wait, for so many nanoseconds at most; empty: for ever.
+  int wait(epoll_event* events, int most, std::optional<std::int64_t> nanoseconds) {
+    constexpr std::int64_t kMillisecond = 1'000'000, kLongest = 1'000'000 * kMillisecond;
+    const std::int64_t time = std::clamp<std::int64_t>(nanoseconds.value_or(0), 0, kLongest);
+    int milliseconds =
+        nanoseconds ? static_cast<int>((time + kMillisecond - 1) / kMillisecond) : -1;
+    if (nanoseconds && time < kMillisecond) {
+      pollfd ready{descriptor_.get(), POLLIN, 0};
+      const timespec shortTime{0, static_cast<long>(time)};
+      (void)::ppoll(&ready, 1, &shortTime, nullptr);
+      milliseconds = 0;
+    }
     return ::epoll_wait(descriptor_.get(), events, most, milliseconds);
   }
 

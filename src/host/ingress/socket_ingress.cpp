@@ -104,9 +104,11 @@ class TakenSignals {
 
 class SocketIngress final : public Ingress {
  public:
-  SocketIngress(ListeningSockets sockets, PollSet poll, DatagramReceiver datagrams, SystemLog& log)
+  SocketIngress(ListeningSockets sockets, std::unique_ptr<PollSet> poll, DatagramReceiver datagrams,
+                SystemLog& log)
       : sockets_(std::move(sockets)),
-        poll_(std::move(poll)),
+        ownedPoll_(std::move(poll)),
+        poll_(*ownedPoll_),
         datagrams_(std::move(datagrams)),
         streams_(poll_, raiseDescriptorLimit()),
         control_(poll_, log),
@@ -136,7 +138,7 @@ class SocketIngress final : public Ingress {
   using Events = std::array<epoll_event, kMostEvents>;
 
   Result<int> wait(Events& events);
-  int waitingTime() const;
+  std::optional<std::int64_t> waitingTime() const;
   Status serveDatagrams(const Events& events, int count, IngressHandler& handler);
   Status serveConnections(const Events& events, int count, IngressHandler& handler);
   void serveListeners(const Events& events, int count, IngressHandler& handler);
@@ -148,7 +150,8 @@ class SocketIngress final : public Ingress {
 
   TakenSignals signals_;
   ListeningSockets sockets_;
-  PollSet poll_;
+  std::unique_ptr<PollSet> ownedPoll_;  // stays in its place
+  PollSet& poll_;
   DatagramReceiver datagrams_;
   StreamConnections streams_;
   ControlConnections control_;
@@ -174,11 +177,7 @@ Status SocketIngress::start() {
       if (!watch(i)) return systemError("cannot wait for", "a socket");
       continue;
     }
-    const auto index = static_cast<std::uint32_t>(datagrams_.socketCount());
-    datagrams_.add(socket);
-    if (!poll_.add(socket.descriptor.get(), {Kind::Datagrams, index})) {
-      return systemError("cannot wait for", "a socket");
-    }
+    if (!datagrams_.add(socket)) return systemError("cannot wait for", "a socket");
   }
   return Done{};
 }
@@ -212,23 +211,24 @@ Status SocketIngress::run(IngressHandler& handler) {
   }
 }
 
-// Milliseconds until something is to be done although nothing arrives; -1: never.
-int SocketIngress::waitingTime() const {
-  std::optional<std::int64_t> first = control_.deadline();
-  const auto also = [&](std::int64_t time) { first = std::min(first.value_or(time), time); };
-  if (streams_.hasWaiting() || !restingListeners_.empty()) also(resumed_ + kWaitingTime);
-  if (!first) return -1;
-  constexpr std::int64_t kLongest = std::numeric_limits<int>::max();
-  const std::int64_t left = *first - bootNanoseconds();
-  return static_cast<int>(std::clamp<std::int64_t>(left / kMillisecond + 1, 0, kLongest));
+// Nanoseconds until something is to be done although nothing arrives; empty: never.
+std::optional<std::int64_t> SocketIngress::waitingTime() const {
+  constexpr std::int64_t kNever = std::numeric_limits<std::int64_t>::max();
+  std::int64_t first = std::min(control_.deadline().value_or(kNever),  //
+                                datagrams_.due().value_or(kNever));
+  if (streams_.hasWaiting() || !restingListeners_.empty()) {
+    first = std::min(first, resumed_ + kWaitingTime);
+  }
+  if (first == kNever) return std::nullopt;
+  return std::max<std::int64_t>(first - bootNanoseconds(), 0);
 }
 
 Result<int> SocketIngress::wait(Events& events) {
   for (;;) {
-    const int time = waitingTime();
-    constexpr int kQuiet = kQuietTime / kMillisecond;
-    const bool returnsMemory = datagrams_.holdsMemory() && (time < 0 || time > kQuiet);
-    const int count = poll_.wait(events.data(), kMostEvents, returnsMemory ? kQuiet : time);
+    const auto time = waitingTime();
+    const bool returnsMemory = datagrams_.holdsMemory() && (!time || *time > kQuietTime);
+    const int count =
+        poll_.wait(events.data(), kMostEvents, returnsMemory ? std::optional(kQuietTime) : time);
     if (count < 0 && errno != EINTR) return systemError("cannot wait for", "the sockets");
     if (count == 0 && returnsMemory) {
       datagrams_.releaseMemory();
@@ -242,9 +242,9 @@ Status SocketIngress::serveDatagrams(const Events& events, int count, IngressHan
   for (int i = 0; i < count; ++i) {
     const PollTag tag = PollTag::of(events[static_cast<std::size_t>(i)]);
     if (tag.kind != Kind::Datagrams) continue;
-    if (auto drained = datagrams_.drain(tag.index, handler); !drained) return drained.error();
+    if (auto served = datagrams_.serve(tag.index, now_, handler); !served) return served;
   }
-  return Done{};
+  return datagrams_.servePaused(now_, handler);
 }
 
 // Datagrams are asked for again while much comes in streams: their queue is short.
@@ -265,7 +265,7 @@ Status SocketIngress::serveConnections(const Events& events, int count, IngressH
     }
     if (bytes < kMuch) continue;
     bytes = 0;
-    if (auto drained = datagrams_.drainAll(handler); !drained) return drained;
+    if (auto drained = datagrams_.serveAll(handler); !drained) return drained;
   }
   control_.closeLate(now_);
   if (now_ - resumed_ >= kWaitingTime) {
@@ -322,9 +322,9 @@ Status SocketIngress::serveSignals(IngressHandler& handler) {
 }
 
 Status SocketIngress::takeEverything(IngressHandler& handler) {
-  constexpr int kPasses = 8;
+  constexpr int kPasses = 4;  // what the buffer of a stream socket commonly holds
   for (int pass = 0; pass < kPasses; ++pass) {
-    if (auto drained = datagrams_.drainAll(handler); !drained) return drained;
+    if (auto drained = datagrams_.serveAll(handler); !drained) return drained;
     streams_.readAll(handler);
   }
   return Done{};
@@ -365,11 +365,12 @@ Result<std::unique_ptr<Ingress>> openIngress(const DeviceRoot& root, const Ingre
     if (!opened) return opened.error();
     sockets.emplace(*std::move(opened));
   }
-  auto poll = PollSet::create();
-  if (!poll) return poll.error();
-  auto datagrams = DatagramReceiver::create();
+  auto created = PollSet::create();
+  if (!created) return created.error();
+  auto poll = std::make_unique<PollSet>(*std::move(created));
+  auto datagrams = DatagramReceiver::create(*poll);
   if (!datagrams) return datagrams.error();
-  auto ingress = std::make_unique<SocketIngress>(*std::move(sockets), *std::move(poll),
+  auto ingress = std::make_unique<SocketIngress>(*std::move(sockets), std::move(poll),
                                                  *std::move(datagrams), log);
   if (auto started = ingress->start(); !started) return started.error();
   return std::unique_ptr<Ingress>(std::move(ingress));

@@ -47,7 +47,8 @@ class IngressHandler {
   // A line from a client of the control socket, who is root or the program's own user. The answer
   // is given by Ingress::answer(), now or later.
   virtual void onControl(ControlRequest request, std::string_view line) = 0;
-  // The program is to end (SIGTERM, SIGINT), to read its settings again (SIGHUP).
+  // The program is to end (SIGTERM, SIGINT), after what had been sent was handed over; is to read
+  // its settings again (SIGHUP).
   virtual void onTerminate() = 0;
   virtual void onReload() = 0;
   // At the end of each round. Returns after how many nanoseconds the next one comes at the latest,
@@ -60,12 +61,15 @@ class IngressHandler {
 class Ingress {
  public:
   virtual ~Ingress() = default;
-  // Serves until stop(). An error: the sockets failed.
+  // Serves until stop(). Begins with a round, so that the handler can set a time. An error: the
+  // sockets failed.
   virtual Status run(IngressHandler& handler) = 0;
-  // Ends run() after this round.
+  // Ends run() after this round; from any thread.
   virtual void stop() = 0;
   // Begins a round; from any thread.
   virtual void wake() = 0;
+  // From the loop's thread, also within onControl(). A client that has gone, or has its answer, is
+  // ignored.
   virtual void answer(ControlRequest request, std::string_view text) = 0;
   // Whether clients are connected that would notice the program's end.
   virtual bool hasConnections() const = 0;
