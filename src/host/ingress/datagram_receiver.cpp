@@ -45,16 +45,17 @@ std::optional<Value> controlValue(const msghdr& header, int type) {
 
 // Whether the socket's queue holds so many datagrams as DrainPace asks for.
 bool isDeep(const ListeningSocket& socket) {
-  constexpr std::size_t kQueued = 2304;  // what a large UDP datagram takes in the kernel
+  // Of small UDP datagrams, each of which takes 768 bytes in the kernel; large ones come slower.
+  constexpr int kDeepBuffer = 768 * DrainPace::kDeepQueue;
   int size = 0;
   socklen_t length = sizeof size;
   if (!socket.hasCredentials) {
     return ::getsockopt(socket.descriptor.get(), SOL_SOCKET, SO_RCVBUF, &size, &length) == 0 &&
-           static_cast<std::size_t>(size) >= DrainPace::kDeepQueue * kQueued;
+           size >= kDeepBuffer;
   }
   // What the socket got when it was made; systemd raises it before it makes any.
   const auto text = readFile("/proc/sys/net/unix/max_dgram_qlen", 64);
-  std::size_t queue = 0;
+  int queue = 0;
   if (text) (void)std::from_chars(text->data(), text->data() + text->size(), queue);
   return queue >= DrainPace::kDeepQueue;
 }

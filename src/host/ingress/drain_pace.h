@@ -11,7 +11,7 @@ namespace tally {
 // for what comes meanwhile is then left alone for a moment, so that one call reads a batch.
 class DrainPace {
  public:
-  static constexpr std::size_t kDeepQueue = 512;  // what a queue must hold for that
+  static constexpr int kDeepQueue = 512;  // what a queue must hold for that
 
   // After a call at this time (in nanoseconds) that read so many and left the queue empty: for how
   // long nothing is to be read. 0: to be read as soon as something comes.

@@ -173,7 +173,7 @@ Result<ListeningSocket> bindAt(const Directory& directory, const RecorderSocket&
 }
 
 Result<ListeningSocket> bindUdp(const std::string& text) {
-  constexpr int kReceiveBuffer = 8 << 20;  // the kernel takes its own limit if that is lower
+  constexpr int kReceiveBuffer = 8 << 20;
   const auto address = parseLoopback(text);
   if (!address) return address.error();
   ListeningSocket socket;
@@ -181,7 +181,10 @@ Result<ListeningSocket> bindUdp(const std::string& text) {
       ::socket(address->storage.ss_family, SOCK_DGRAM | SOCK_NONBLOCK | SOCK_CLOEXEC, 0));
   const int descriptor = socket.descriptor.get();
   if (descriptor < 0) return systemError("cannot make a socket for", "UDP address " + text);
-  (void)::setsockopt(descriptor, SOL_SOCKET, SO_RCVBUF, &kReceiveBuffer, sizeof kReceiveBuffer);
+  // The system's limit for others holds unless this process may exceed it.
+  for (const int name : {SO_RCVBUF, SO_RCVBUFFORCE}) {
+    (void)::setsockopt(descriptor, SOL_SOCKET, name, &kReceiveBuffer, sizeof kReceiveBuffer);
+  }
   if (auto prepared = prepare(socket); !prepared) return prepared.error();
   if (::bind(descriptor, reinterpret_cast<const sockaddr*>(&address->storage), address->size) !=
       0) {

@@ -268,10 +268,8 @@ Status SocketIngress::serveConnections(const Events& events, int count, IngressH
     if (auto drained = datagrams_.serveAll(handler); !drained) return drained;
   }
   control_.closeLate(now_);
-  if (now_ - resumed_ >= kWaitingTime) {
-    resumed_ = now_;
-    streams_.resume(handler);
-  }
+  // If it has not come to all, the next round follows at once.
+  if (now_ - resumed_ >= kWaitingTime && streams_.resume(handler)) resumed_ = now_;
   return Done{};
 }
 

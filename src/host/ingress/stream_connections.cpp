@@ -148,12 +148,18 @@ void StreamConnections::dropPartial(Connection& connection) {
   connection.partial.reset();
 }
 
-void StreamConnections::resume(IngressHandler& handler) {
-  for (const std::uint32_t index : std::exchange(waiting_, {})) read(index, handler);
+bool StreamConnections::resume(IngressHandler& handler) {
+  constexpr std::size_t kMuch = 1u << 20;
+  const std::vector<std::uint32_t> waited = std::exchange(waiting_, {});
+  std::size_t bytes = 0;
+  auto next = waited.begin();
+  while (next != waited.end() && bytes < kMuch) bytes += read(*next++, handler);
+  waiting_.insert(waiting_.begin(), next, waited.end());
+  return next == waited.end();
 }
 
 void StreamConnections::readAll(IngressHandler& handler) {
-  resume(handler);
+  (void)resume(handler);
   for (std::uint32_t i = 0; i < connections_.size(); ++i) {
     if (connections_[i].descriptor >= 0 && !connections_[i].waits) read(i, handler);
   }

@@ -32,8 +32,9 @@ class StreamConnections {
   void add(Descriptor socket, IngressHandler& handler);
   // Reads once from the connection that the poll set has under this index; returns the bytes read.
   std::size_t read(std::uint32_t index, IngressHandler& handler);
-  // Reads from those that had to wait and need not wait any longer.
-  void resume(IngressHandler& handler);
+  // Reads from those that had to wait and need not wait any longer. False if it has not come to all
+  // of them, since much was read.
+  bool resume(IngressHandler& handler);
   bool hasWaiting() const { return !waiting_.empty(); }
   // Reads from each connection once.
   void readAll(IngressHandler& handler);
