@@ -9,7 +9,6 @@
 
 #include "host/devices/device_registry.h"
 #include "host/system/environment.h"
-#include "platform/platform.h"
 
 namespace tally {
 namespace {
@@ -22,17 +21,9 @@ class ErrorLog final : public SystemLog {
   }
 };
 
-Platform makePlatform(std::string_view root) {
-  Platform services;
-  services.log = std::make_shared<ErrorLog>();
-  const DeviceRoot device{std::string(root)};
-  addDeviceRegistry(services, device, std::make_shared<const SystemTree>(device));
-  return services;
-}
-
 // Never destroyed: what a program still holds at its end may ask for it.
 Platform& libraryPlatform() {
-  static auto* const services = new Platform(makePlatform(deviceRootFromEnvironment()));
+  static auto* const services = new Platform(makeLibraryPlatform(deviceRootFromEnvironment()));
   return *services;
 }
 
@@ -40,6 +31,14 @@ Platform& libraryPlatform() {
 
 }  // namespace
 
-void useDeviceRoot(std::string_view root) { libraryPlatform() = makePlatform(root); }
+Platform makeLibraryPlatform(std::string_view root) {
+  Platform services;
+  services.log = std::make_shared<ErrorLog>();
+  const DeviceRoot device{std::string(root)};
+  addDeviceRegistry(services, device, std::make_shared<const SystemTree>(device));
+  return services;
+}
+
+void useDeviceRoot(std::string_view root) { libraryPlatform() = makeLibraryPlatform(root); }
 
 }  // namespace tally

@@ -88,6 +88,7 @@ class TALLY_API KvString final : public KvObject {
  public:
   static constexpr KvType kType = KvType::String;
   static KvRef<KvString> create(std::string_view text);
+  // A zero byte follows it, so that C can read it; there may be others in it.
   std::string_view view() const noexcept {
     return {reinterpret_cast<const char*>(this + 1), size_};  // the text follows the object
   }

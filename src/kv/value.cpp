@@ -54,10 +54,11 @@ void kvFreeItems(void* memory, std::size_t size) noexcept { freeSized(memory, si
 KvRef<KvString> KvString::create(std::string_view text) {
   std::string repaired;
   if (!isValidUtf8(text)) text = repaired = repairUtf8(text);
-  auto string = KvMaker::make<KvString>(nullptr, text.size());
+  auto string = KvMaker::make<KvString>(nullptr, text.size() + 1);
   string->hash_ = hashBytes(text);
   string->size_ = text.size();
-  if (!text.empty()) std::memcpy(static_cast<void*>(string.get() + 1), text.data(), text.size());
+  auto* const bytes = reinterpret_cast<char*>(string.get() + 1);
+  *std::ranges::copy(text, bytes).out = '\0';
   return string;
 }
 

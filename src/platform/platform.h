@@ -94,6 +94,22 @@ class PlatformScope {
   Platform* former_;
 };
 
+// Puts services in force for the calling thread alone, for a scope, which they outlive: a program
+// that uses the C functions looks at several devices at once.
+class ThreadPlatformScope {
+ public:
+  explicit ThreadPlatformScope(Platform& services) noexcept;
+  ~ThreadPlatformScope();
+  ThreadPlatformScope(const ThreadPlatformScope&) = delete;
+  ThreadPlatformScope& operator=(const ThreadPlatformScope&) = delete;
+
+ private:
+  Platform* const former_;
+};
+
+// Services that a handle of a C program owns. While they end, what they log goes to their own log.
+std::shared_ptr<Platform> sharePlatform(Platform services);
+
 // A fault in the program's own words; see SystemLog::fault.
 template <class... Arguments>
 void logFault(std::string_view kind, fmt::format_string<Arguments...> format,
