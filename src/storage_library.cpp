@@ -4,6 +4,8 @@
 
 #include "host/host_platform.h"
 #include "host/system/environment.h"
+#include "library_root.h"
+#include "storage/c_api/handles.h"
 #include "storage/device_root.h"
 
 namespace tally {
@@ -24,3 +26,14 @@ void StorageSetDeviceRoot(std::string_view root) {
 }
 
 }  // namespace tally
+
+int tallystorage_open(const char* root, tallystorage_device** device) {
+  using namespace tally;
+  return cCall([&] {
+    if (!cClear(device)) return cBadArgument("the device's output is NULL");
+    const auto path = rootOfCaller(root);
+    if (!path) return cFailure(kCNotFound, path.error().message);
+    *device = new tallystorage_device{{}, sharePlatform(makeHostPlatform(*path))};
+    return kCOk;
+  });
+}
