@@ -16,6 +16,9 @@ if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
   export CCACHE_DIR="$root_dir/build/ccache"
 fi
 
+# What tests use if it is installed: without it they are skipped, and say so.
+optional_test_packages=(rustc)
+
 say() { printf '\n== %s\n' "$*"; }
 fail() {
   printf '%s: %s\n' "$(basename "$0")" "$*" >&2

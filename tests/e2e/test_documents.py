@@ -90,12 +90,13 @@ class Documents(unittest.TestCase):
         self.assertGreater(ran, 15)
 
     def test_blocks_say_what_they_are_and_examples_are_those_that_are_built(self):
-        sources = [path.read_text() for path in (TOP / "examples").rglob("*.cpp")]
+        sources = {language: [path.read_text() for path in (TOP / "examples").rglob(f"*.{language}")]
+                   for language in ("cpp", "c")}
         for document in DOCUMENTS:
             for language, content in FENCE.findall(document.read_text()):
-                self.assertIn(language, {"sh", "xml", "csv", "json", "cpp", "text"}, document.name)
-                if language == "cpp":
-                    self.assertTrue(any(content.strip() in source for source in sources), content)
+                self.assertIn(language, {"sh", "xml", "csv", "json", "text", *sources}, document.name)
+                if language in sources:
+                    self.assertTrue(any(content.strip() in source for source in sources[language]), content)
 
     def test_an_example_replaces_a_service(self):
         device = Device(self.clone() / "build/demo-root")
