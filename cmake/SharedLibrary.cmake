@@ -9,6 +9,7 @@ include(CMakePackageConfigHelpers)
 
 # tally_shared_library(NAME DESCRIPTION text
 #                      [HEADERS folder of include/]
+#                      [LANGUAGE C]          of its headers and all that is in it; C++ by default
 #                      [SOURCES file...]     compiled into it
 #                      [WHOLE room...]       rooms that are in it as a whole
 #                      [HIDDEN room...]      rooms of which it takes what it needs
@@ -16,7 +17,7 @@ include(CMakePackageConfigHelpers)
 # Makes libNAME.so and installs it as the component NAME; as NAME-dev its headers, a CMake package
 # (NAME::NAME) and a pkg-config file.
 function(tally_shared_library name)
-  cmake_parse_arguments(LIB "" "DESCRIPTION;HEADERS" "SOURCES;WHOLE;HIDDEN;NEEDS" ${ARGN})
+  cmake_parse_arguments(LIB "" "DESCRIPTION;HEADERS;LANGUAGE" "SOURCES;WHOLE;HIDDEN;NEEDS" ${ARGN})
   set(exports ${PROJECT_SOURCE_DIR}/cmake/exports.map)
   list(TRANSFORM LIB_WHOLE REPLACE "(.+)" "$<LINK_LIBRARY:WHOLE_ARCHIVE,\\1>")
 
@@ -24,7 +25,9 @@ function(tally_shared_library name)
   add_library(${name}::${name} ALIAS ${name})
   set_target_properties(${name} PROPERTIES
     VERSION ${PROJECT_VERSION} SOVERSION ${PROJECT_VERSION_MAJOR} LINK_DEPENDS ${exports})
-  target_compile_features(${name} INTERFACE cxx_std_20)
+  if(NOT LIB_LANGUAGE STREQUAL C)
+    target_compile_features(${name} INTERFACE cxx_std_20)
+  endif()
   target_include_directories(${name}
     PRIVATE ${PROJECT_SOURCE_DIR}/src
     PUBLIC $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include> $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)

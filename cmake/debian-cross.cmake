@@ -6,6 +6,7 @@ set(CMAKE_SYSROOT ${CMAKE_CURRENT_LIST_DIR}/../build-${tally_architecture}/sysro
 file(REAL_PATH ${CMAKE_SYSROOT} CMAKE_SYSROOT)
 set(CMAKE_LIBRARY_ARCHITECTURE ${tally_triplet})
 set(CMAKE_CXX_COMPILER ${tally_triplet}-g++)
+set(CMAKE_C_COMPILER ${tally_triplet}-gcc)
 
 # Programs are the host's; headers, libraries and packages are the sysroot's alone.
 set(CMAKE_FIND_ROOT_PATH_MODE_PROGRAM NEVER)

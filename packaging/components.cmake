@@ -10,7 +10,9 @@ set(TALLYRUN_PACKAGES
   "hwreport|libhwreport0|libs|libtallykv0 (= @VERSION@)|statistics channels of drivers"
   "hwreport-dev|libhwreport-dev|libdevel|libhwreport0 (= @VERSION@), libtallykv-dev (= @VERSION@)|statistics channels of drivers, development files"
   "tallystorage|libtallystorage0|libs|libtallykv0 (= @VERSION@)|flash-storage telemetry"
-  "tallystorage-dev|libtallystorage-dev|libdevel|libtallystorage0 (= @VERSION@), libtallykv-dev (= @VERSION@)|flash-storage telemetry, development files")
+  "tallystorage-dev|libtallystorage-dev|libdevel|libtallystorage0 (= @VERSION@), libtallykv-dev (= @VERSION@)|flash-storage telemetry, development files"
+  "tallyclient|libtallyclient0|libs||metrics of programs for the daily log"
+  "tallyclient-dev|libtallyclient-dev|libdevel|libtallyclient0 (= @VERSION@)|metrics of programs for the daily log, development files")
 set(TALLYRUN_LONG_DESCRIPTION
 "Part of the daily job of a device: whitelisted counters and statistics of
 the day that has ended become one log, the state of the storage is

@@ -13,7 +13,7 @@ BUILD = BIN.parent
 DATA = {"var", "Library"}  # what a device recorded stays
 TIMER_LINK = "etc/systemd/system/timers.target.wants/tallyrun-day.timer"
 LIBRARIES = {"libtallykv0": "libtallykv.so.0", "libhwreport0": "libhwreport.so.0",
-             "libtallystorage0": "libtallystorage.so.0"}
+             "libtallystorage0": "libtallystorage.so.0", "libtallyclient0": "libtallyclient.so.0"}
 # Files that packages of the first release had at other paths.
 FORMER_FILES = {"tallyrun": ["bin/tallyrun", "lib/systemd/system/timers.target.wants/tallyrun-day.timer"],
                 **{package: [f"lib/{name}", f"lib/{name}.1.0"] for package, name in LIBRARIES.items()},

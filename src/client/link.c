@@ -1,0 +1,61 @@
+#define _GNU_SOURCE
+#include "client/link.h"
+
+#include <errno.h>
+#include <string.h>
+#include <unistd.h>
+
+static int reconnect(struct client_link* link) {
+  client_link_close(link);
+  const int made = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
+  if (made < 0) return errno;
+  if (connect(made, (const struct sockaddr*)&link->address, sizeof link->address) != 0) {
+    const int fault = errno;
+    close(made);
+    return fault;
+  }
+  link->descriptor = made;
+  return 0;
+}
+
+int client_link_open(struct client_link* link, const char* path) {
+  const size_t length = strlen(path);
+  memset(link, 0, sizeof *link);
+  link->descriptor = -1;
+  if (length == 0) return EINVAL;
+  if (length >= sizeof link->address.sun_path) return ENAMETOOLONG;
+  link->address.sun_family = AF_UNIX;
+  memcpy(link->address.sun_path, path, length);
+  (void)reconnect(link);
+  return 0;
+}
+
+static int send_once(const struct client_link* link, const void* datagram, size_t size) {
+  if (link->descriptor < 0) return ENOTCONN;
+  if (send(link->descriptor, datagram, size, MSG_DONTWAIT | MSG_NOSIGNAL) >= 0) return 0;
+  switch (errno) {
+    case EWOULDBLOCK:
+    case EINTR:
+    case ENOBUFS:
+    case ENOMEM:
+      return EAGAIN;
+    default:
+      return errno;
+  }
+}
+
+int client_link_send(struct client_link* link, const void* datagram, size_t size) {
+  int fault = send_once(link, datagram, size);
+  if (fault == 0 || fault == EAGAIN) return fault;
+  /* The program closed the descriptor along with all others; it may be another file's by now. */
+  if (fault == EBADF || fault == ENOTSOCK) link->descriptor = -1;
+  /* A daemon that was started again listens at the same path. */
+  fault = reconnect(link);
+  return fault != 0 ? fault : send_once(link, datagram, size);
+}
+
+void client_link_close(struct client_link* link) {
+  const int descriptor = link->descriptor;
+  link->descriptor = -1; /* first: a child of a fork in between must not close what is another's */
+  if (descriptor >= 0) close(descriptor);
+}
