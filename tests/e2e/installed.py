@@ -35,7 +35,7 @@ class Installed(unittest.TestCase):
         cls.folder = pathlib.Path(tempfile.mkdtemp(prefix="tally-library-"))
         cls.addClassCleanup(shutil.rmtree, cls.folder, ignore_errors=True)
         cls.prefix = cls.folder / "prefix"
-        for component in ("tallykv", "hwreport", "tallystorage"):
+        for component in ("tallykv", "hwreport", "tallystorage", "tallyclient"):
             for part in (component, f"{component}-dev"):
                 checked("cmake", "--install", BUILD, "--prefix", cls.prefix, "--component", part)
         cls.library = next(cls.prefix.glob("**/libhwreport.so")).parent

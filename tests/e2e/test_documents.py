@@ -24,7 +24,8 @@ RUN_BY_OTHERS = {
     "apt install ./build/packages-debian/tallyrun_*.deb": "test_package.py",
     **dict.fromkeys(("cmake -S examples/hwreport -B example", "cmake --build example", "example/channels", *(
         f"cmake --install build --prefix /usr/local --component {name}"
-        for name in ("tallykv", "tallykv-dev", "hwreport", "hwreport-dev"))), "test_library.py"),
+        for name in ("tallykv", "tallykv-dev", "hwreport", "hwreport-dev", "tallyclient", "tallyclient-dev")),
+        "cmake -S examples/client -B example", "example/record"), "test_library.py"),
     "scripts/demo": ".ci/run", "scripts/test": ".ci/run", "scripts/test --sanitize": ".ci/run",
     "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
     "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "the test bench.load, at a smaller size",
@@ -50,7 +51,7 @@ class Documents(unittest.TestCase):
         shutil.copytree(self.demo, clone / "build/demo-root")
         (clone / "build/bin").symlink_to(BIN)
         (clone / "examples").symlink_to(TOP / "examples")
-        for name in ("stand-ins/cmake", "stand-ins/cpack", "stand-ins/apt", "example/channels",
+        for name in ("stand-ins/cmake", "stand-ins/cpack", "stand-ins/apt", "example/channels", "example/record",
                      *(f"scripts/{path.name}" for path in (TOP / "scripts").iterdir())):
             program = clone / name
             program.parent.mkdir(exist_ok=True)
@@ -92,6 +93,7 @@ class Documents(unittest.TestCase):
     def test_blocks_say_what_they_are_and_examples_are_those_that_are_built(self):
         sources = {language: [path.read_text() for path in (TOP / "examples").rglob(f"*.{language}")]
                    for language in ("cpp", "c")}
+        sources["python"] = [path.read_text() for path in (TOP / "examples").rglob("*.py")]
         for document in DOCUMENTS:
             for language, content in FENCE.findall(document.read_text()):
                 self.assertIn(language, {"sh", "xml", "csv", "json", "text", *sources}, document.name)

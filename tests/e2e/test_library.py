@@ -1,5 +1,6 @@
 """The libraries as other programs get them: installed, found, built against and run."""
 import re
+import socket
 import sys
 import unittest
 
@@ -13,9 +14,12 @@ EXPECTED = (
     "                  Mode[     OFF] = { # 4        3.000e+01 s / 75.0% }\n"
     "                  Mode[      ON] = { # 5        1.000e+01 s / 25.0% }\n")
 
+RECORDED = ("com.example.pump.temperature:0|g\ncom.example.pump.temperature:-4|g\ncom.example.pump.starts:1|c\n"
+            "com.example.pump.pressure:1.8|h\ncom.example.pump.wait:12.5:0.75:3|h\n")
+
 
 class Library(Installed):
-    def built(self, example, source, library):
+    def built(self, example, source, library, *compiler):
         """A folder of the example's programs as CMake builds them, and the one of a source by pkg-config."""
         folder = self.folder / example
         checked("cmake", "-S", TOP / "examples" / example, "-B", folder, f"-DCMAKE_PREFIX_PATH={self.prefix}")
@@ -23,7 +27,8 @@ class Library(Installed):
         flags = checked("pkg-config", "--cflags", "--libs", library,
                         PKG_CONFIG_PATH=str(self.library / "pkgconfig")).split()
         program = folder / "by-pkg-config"
-        checked("g++", "-std=c++20", TOP / "examples" / example / source, "-o", program, *flags)
+        compiler = compiler or ("g++", "-std=c++20")
+        checked(*compiler, TOP / "examples" / example / source, "-o", program, *flags)
         return folder, program
 
     def test_channels_example(self):
@@ -50,6 +55,20 @@ class Library(Installed):
         self.check_health(folder / "health")
         self.check_health(sys.executable, TOP / "examples/storage/health.py")
 
+    def test_client_examples(self):
+        folder, program = self.built("client", "record.c", "tallyclient",
+                                     "gcc", "-std=c99", "-pedantic-errors", "-Wall", "-Wextra", "-Werror")
+        path = str(self.folder / "statsd.sock")
+        found = {"LD_LIBRARY_PATH": str(self.library), "TALLYCLIENT_SOCKET": path}
+        script = TOP / "examples/client/record.py"
+        errors = checked(sys.executable, script, status=1, **found)
+        self.assertEqual(errors, "not recorded: No such file or directory\n")
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as daemon:
+            daemon.bind(path)
+            for example in ([folder / "record"], [program], [sys.executable, script]):
+                checked(*example, **found)
+                self.assertEqual(daemon.recv(8192, socket.MSG_DONTWAIT).decode(), RECORDED)
+
     def test_only_what_is_declared_is_exported(self):
         declared = set(re.findall(r"TALLY_API[^;{(=]*?(\w+)[(;]", "".join(
             header.read_text() for folder in ("hwreport", "storage")
@@ -62,6 +81,10 @@ class Library(Installed):
         # Beyond the functions only members of the public classes.
         self.assertEqual({name for name in declared ^ names
                           if not re.match("HwReport(Error|Subscription)::", name)}, set())
+        header = (self.prefix / "include/tallyclient/tallyclient.h").read_text()
+        self.assertEqual(set(re.findall(r"^TALLYCLIENT_API [^(]*?(\w+)\(", header, re.M)),
+                         set(re.findall(r"^\w+ \w (.*)", checked(
+                             "nm", "-D", "--defined-only", self.library / "libtallyclient.so"), re.M)))
         for symbol in exported["tallykv"]:
             self.assertRegex(symbol, r"^[Kk]v[A-Z]")
 
