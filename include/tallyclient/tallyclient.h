@@ -51,7 +51,8 @@ TALLYCLIENT_API int tallyclient_add(tallyclient* client, const char* name, int64
 TALLYCLIENT_API int tallyclient_push(tallyclient* client, const char* name, double value);
 
 /* Adds samples, with one check of the name and as few bytes as possible. When one of the values is
-   not accepted, none is recorded; ENOBUFS means that those from some value on were dropped. */
+   not accepted, none is recorded; ENOBUFS means that those from some value on were dropped. A count
+   of 0 only checks the name. */
 TALLYCLIENT_API int tallyclient_push_many(tallyclient* client, const char* name,
                                           const double* values, size_t count);
 

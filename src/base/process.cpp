@@ -5,6 +5,8 @@
 #include <cerrno>
 #include <csignal>
 
+#include "base/files/file.h"
+
 namespace tally {
 
 std::string programName() { return ::program_invocation_short_name; }
@@ -18,6 +20,10 @@ void surviveFailedWrites() {
 
 std::ptrdiff_t writeOnce(int descriptor, std::string_view bytes) {
   return ::write(descriptor, bytes.data(), bytes.size());
+}
+
+std::ptrdiff_t readOnce(int descriptor, std::span<char> bytes) {
+  return retried([&] { return ::read(descriptor, bytes.data(), bytes.size()); });
 }
 
 }  // namespace tally

@@ -1,7 +1,8 @@
-// The process's name, protection against fatal signals, and the one write that is not to a file.
+// The process's name, protection against fatal signals, and reads and writes beyond files.
 #pragma once
 
 #include <cstddef>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -15,5 +16,8 @@ int processID();
 void surviveFailedWrites();
 // One write call: how many bytes it took, or a negative number.
 std::ptrdiff_t writeOnce(int descriptor, std::string_view bytes);
+// One read call, repeated while signals interrupt it: how many bytes came, 0 at the end, or a
+// negative number.
+std::ptrdiff_t readOnce(int descriptor, std::span<char> bytes);
 
 }  // namespace tally

@@ -4,8 +4,6 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <sys/socket.h>
-#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -16,7 +14,6 @@
 #include <chrono>
 #include <cmath>
 #include <cstring>
-#include <filesystem>
 #include <limits>
 #include <map>
 #include <memory>
@@ -24,6 +21,9 @@
 #include <string>
 #include <thread>
 #include <vector>
+
+#include "fakes/recorder_socket.h"
+#include "fakes/temporary_folder.h"
 
 // Every allocation of the process, the C library's own included.
 static std::atomic<long> allocations;
@@ -42,49 +42,12 @@ namespace {
 
 using std::chrono::steady_clock;
 
-class ClientTest : public testing::Test {
+class ClientTest : public testing::Test, protected tally::TemporaryFolder {
  protected:
-  ClientTest() {
-    folder = (std::filesystem::temp_directory_path() / "tally-client-XXXXXX").string();
-    if (::mkdtemp(folder.data()) == nullptr) std::abort();
-    path = folder + "/statsd.sock";
-  }
-  ~ClientTest() override {
-    unbind();
-    std::filesystem::remove_all(folder);
-  }
-  void bind() {
-    socket = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    std::strcpy(address.sun_path, path.c_str());
-    ASSERT_EQ(::bind(socket, reinterpret_cast<sockaddr*>(&address), sizeof address), 0);
-  }
-  void unbind() {
-    if (socket >= 0) ::close(socket);
-    std::filesystem::remove(path);
-    socket = -1;
-  }
-  void open() { client.reset(tallyclient_open(path.c_str())); }
-  // The datagrams that wait in the queue, which must consist of whole lines.
-  std::vector<std::string> datagrams() const {
-    std::vector<std::string> found;
-    std::string buffer(100'000, '\0');
-    for (ssize_t size; (size = ::recv(socket, buffer.data(), buffer.size(), 0)) >= 0;) {
-      EXPECT_LE(size, 8192);
-      found.push_back(buffer.substr(0, static_cast<std::size_t>(size)));
-      EXPECT_TRUE(found.back().ends_with('\n'));
-    }
-    return found;
-  }
-  std::string received() const {
-    std::string all;
-    for (const std::string& datagram : datagrams()) all += datagram;
-    return all;
-  }
+  void open() { client.reset(tallyclient_open(daemon.path().c_str())); }
   // What arrived of each name: the sum of a counter, the number of samples.
   void tally(std::map<std::string, long>& into) const {
-    const std::string text = received();
+    const std::string text = daemon.received();
     for (std::size_t at = 0; at < text.size();) {
       const std::size_t end = text.find('\n', at), colon = text.find(':', at);
       const std::string line = text.substr(at, end - at);
@@ -98,15 +61,14 @@ class ClientTest : public testing::Test {
   struct Close {
     void operator()(tallyclient* handle) const { tallyclient_close(handle); }
   };
-  std::string folder, path;
-  int socket = -1;
+  tally::fakes::RecorderSocket daemon{at("statsd.sock")};
   std::unique_ptr<tallyclient, Close> client;
 };
 
 constexpr auto kLowest = std::numeric_limits<std::int64_t>::min();
 
 TEST_F(ClientTest, CallsAreTheLinesOfTheProtocol) {
-  bind();
+  daemon.bind();
   open();
   tallyclient* const c = client.get();
   const double many[] = {1, -2.5, 0.001, 1e300};
@@ -118,16 +80,16 @@ TEST_F(ClientTest, CallsAreTheLinesOfTheProtocol) {
   EXPECT_EQ(tallyclient_push(c, "hh", -0.1), 0);
   EXPECT_EQ(tallyclient_push_many(c, "hh", many, 4), 0);
   EXPECT_EQ(tallyclient_push_many(c, "none", nullptr, 0), 0);
-  EXPECT_EQ(received(), "") << "sent before it was full or old";
+  EXPECT_EQ(daemon.received(), "") << "sent before it was full or old";
   EXPECT_EQ(tallyclient_flush(c), 0);
-  EXPECT_EQ(datagrams(),
+  EXPECT_EQ(daemon.datagrams(),
             std::vector<std::string>{"g:7|g\ng:0|g\ng:-9223372036854775808|g\nc:-3|c\n"
                                      "h:12.5:1000000000000000|h\n"
                                      "hh:-0.1:1:-2.5:0.001:1.0000000000000001e+300|h\n"});
 }
 
 TEST_F(ClientTest, WhatCannotArriveIsRefusedAndNotADrop) {
-  bind();
+  daemon.bind();
   open();
   tallyclient* const c = client.get();
   const std::string longest(512, 'n');
@@ -151,14 +113,14 @@ TEST_F(ClientTest, WhatCannotArriveIsRefusedAndNotADrop) {
   for (const std::string& name : {longest, std::string("ä €\xf0\x9f\x98\x80")}) {
     EXPECT_EQ(tallyclient_add(c, name.c_str(), 1), 0);
     EXPECT_EQ(tallyclient_flush(c), 0);
-    EXPECT_EQ(received(), name + ":1|c\n");
+    EXPECT_EQ(daemon.received(), name + ":1|c\n");
   }
   EXPECT_EQ(tallyclient_open(std::string(108, 'p').c_str()), nullptr);
   EXPECT_EQ(errno, ENAMETOOLONG);
 }
 
 TEST_F(ClientTest, RealNumbersReadBackAsTheyWere) {
-  bind();
+  daemon.bind();
   open();
   std::mt19937_64 random(1);
   std::vector<double> values = {5e-324,
@@ -182,7 +144,7 @@ TEST_F(ClientTest, RealNumbersReadBackAsTheyWere) {
   for (const double value : values) {
     ASSERT_EQ(tallyclient_push(client.get(), "n", value), 0);
     ASSERT_EQ(tallyclient_flush(client.get()), 0);
-    const std::string line = received();
+    const std::string line = daemon.received();
     double read = 0;
     const auto [end, fault] = std::from_chars(line.data() + 2, line.data() + line.size(), read);
     ASSERT_EQ(std::string_view(end), "|h\n") << line;
@@ -191,7 +153,7 @@ TEST_F(ClientTest, RealNumbersReadBackAsTheyWere) {
 }
 
 TEST_F(ClientTest, ABlockedDaemonLosesOnlyWhatIsReported) {
-  bind();
+  daemon.bind();
   open();
   std::map<std::string, long> arrived;
   constexpr int kCalls = 100'000;
@@ -220,7 +182,7 @@ TEST_F(ClientTest, ABlockedDaemonLosesOnlyWhatIsReported) {
   EXPECT_EQ(arrived["tallyclient.dropped"], dropped);
   EXPECT_EQ(arrived["n"] + arrived["gauge"] + arrived["scientific"] + dropped, kCalls * 5L);
   EXPECT_EQ(tallyclient_flush(client.get()), 0);
-  EXPECT_EQ(received(), "") << "reported twice";
+  EXPECT_EQ(daemon.received(), "") << "reported twice";
 }
 
 TEST_F(ClientTest, ADaemonMayComeLateAndStartAgain) {
@@ -228,21 +190,21 @@ TEST_F(ClientTest, ADaemonMayComeLateAndStartAgain) {
   ASSERT_NE(client, nullptr);
   EXPECT_EQ(tallyclient_add(client.get(), "early", 1), 0);
   EXPECT_EQ(tallyclient_flush(client.get()), ENOENT);
-  bind();
+  daemon.bind();
   EXPECT_EQ(tallyclient_flush(client.get()), ENOENT) << "tried again at once";
   std::this_thread::sleep_for(std::chrono::milliseconds(1050));
   EXPECT_EQ(tallyclient_add(client.get(), "late", 1), 0);  // the buffer is old by now
-  EXPECT_EQ(received(), "early:1|c\nlate:1|c\n");
-  unbind();
-  bind();
+  EXPECT_EQ(daemon.received(), "early:1|c\nlate:1|c\n");
+  daemon.unbind();
+  daemon.bind();
   EXPECT_EQ(tallyclient_add(client.get(), "again", 1), 0);
   EXPECT_EQ(tallyclient_flush(client.get()), 0);
-  EXPECT_EQ(received(), "again:1|c\n");
+  EXPECT_EQ(daemon.received(), "again:1|c\n");
 }
 
 TEST_F(ClientTest, ADescriptorThatTheProgramClosedIsNotTouched) {
-  bind();
-  const int number = ::dup(socket);
+  daemon.bind();
+  const int number = ::dup(daemon.descriptor());
   ::close(number);
   open();
   for (const bool isReused : {false, true}) {
@@ -252,7 +214,7 @@ TEST_F(ClientTest, ADescriptorThatTheProgramClosedIsNotTouched) {
     }
     tallyclient_add(client.get(), "n", 1);
     EXPECT_EQ(tallyclient_flush(client.get()), 0);
-    EXPECT_EQ(received(), "n:1|c\n");
+    EXPECT_EQ(daemon.received(), "n:1|c\n");
     EXPECT_EQ(::lseek(number, 0, SEEK_SET), isReused ? 0 : -1) << "the program's file was closed";
   }
   ::close(number);
@@ -260,7 +222,7 @@ TEST_F(ClientTest, ADescriptorThatTheProgramClosedIsNotTouched) {
 
 // Threads record while the process forks; each child finds the lock free and the buffer empty.
 TEST_F(ClientTest, ThreadsAndForksLoseAndRepeatNothing) {
-  bind();
+  daemon.bind();
   open();
   constexpr int kThreads = 3, kForks = 100;
   constexpr long kEach = 30'000;

@@ -23,7 +23,7 @@ TEST_F(CommandLine, WhatIsRefusedIsNamedWithWhatMayBeMeant) {
     std::vector<std::string> arguments;
     const char* says;
   } cases[] = {
-      {{}, "tallyctl needs a command: store, whitelist"},
+      {{}, "tallyctl needs a command: store, record, whitelist"},
       {{"stroe", "keys"}, "has no command \"stroe\"; did you mean store?"},
       {{"store"}, "tallyctl store needs a command: set, push, import, dump or keys"},
       {{"store", "\x1b[31m"}, "has no command \"\\x1b[31m\", only set, push"},
@@ -74,6 +74,8 @@ TEST_F(CommandLine, CompletionKnowsWhatTheDeviceHolds) {
   putList(kPreferences + "vellum.da.plist", R"({"G": true})");
   EXPECT_THAT(completed({"sto"}), ElementsAre("store"));
   EXPECT_THAT(completed({"store", ""}), ElementsAre("set", "push", "import", "dump", "keys"));
+  EXPECT_THAT(completed({"record", "time", "b", "--", "--r"}), ElementsAre(":file"));
+  EXPECT_THAT(completed({"record", "time", "b", "ls", "--r"}), ElementsAre(":file"));
   EXPECT_THAT(completed({"explain", "b"}), ElementsAre("bus2", "bus10"));
   EXPECT_THAT(completed({"whitelist", "test", "x", "d"}), ElementsAre("d"));
   EXPECT_THAT(completed({"store", "dump", "--day", "20"}), ElementsAre("2024-10-04", "2024-10-03"));

@@ -64,6 +64,8 @@ void Command::canPlay() const {
   flag("--play", &context_->play, "Let the samples of a recording follow the clock");
 }
 
+void Command::endsWithCommandLine() const { app_->prefix_command(); }
+
 void Command::hide() const { app_->group(""); }
 
 Command addCommand(CLI::App& family, ToolContext& context, const char* name,

@@ -59,6 +59,9 @@ class Command {
   Option flag(const char* name, const std::string& description) const;
   // --play, for a command that reads what a recording may be the source of.
   void canPlay() const;
+  // The words of the last argument are another command's line: options and names of commands among
+  // them are not ours.
+  void endsWithCommandLine() const;
   // Neither help nor completion shows it.
   void hide() const;
 

@@ -6,6 +6,7 @@
 #include "tools/endpoint/send_commands.h"
 #include "tools/frame/complete_command.h"
 #include "tools/preferences/prefs_commands.h"
+#include "tools/record/record_commands.h"
 #include "tools/recorder/recorder_command.h"
 #include "tools/report/report_commands.h"
 #include "tools/storage/nand_commands.h"
@@ -19,10 +20,10 @@ namespace tally::tools {
 
 std::span<const CommandFamily> commandFamilies() {
   static constexpr CommandFamily kFamilies[] = {
-      addStoreCommands,   addWhitelistCommands, addReportCommands, addExplainCommand,
-      addNandCommands,    addChannelCommands,   addDeviceCommands, addPrefsCommands,
-      addRecorderCommand, addDoctorCommand,     addSendCommands,   addTaskingCommands,
-      addForgetCommand,   addCompleteCommand,
+      addStoreCommands,   addRecordCommands, addRecorderCommand, addWhitelistCommands,
+      addReportCommands,  addExplainCommand, addNandCommands,    addChannelCommands,
+      addDeviceCommands,  addPrefsCommands,  addDoctorCommand,   addSendCommands,
+      addTaskingCommands, addForgetCommand,  addCompleteCommand,
   };
   return kFamilies;
 }

@@ -77,6 +77,28 @@ CommandLine::CommandLine(ToolContext& context) : app_(std::make_unique<CLI::App>
 
 CommandLine::~CommandLine() = default;
 
+std::vector<const char*> CommandLine::separated(std::span<const char* const> arguments) const {
+  std::vector<const char*> words(arguments.begin(), arguments.end());
+  const CLI::App* command = app_.get();
+  std::size_t given = 0;  // arguments of the command
+  for (std::size_t i = 1; i < words.size(); ++i) {
+    const std::string_view word = words[i];
+    if (word == "--") break;
+    if (word.starts_with('-')) {
+      const std::string name(word);
+      const CLI::Option* option = command->get_option_no_throw(name);
+      if (option == nullptr) option = app_->get_option_no_throw(name);
+      if (option != nullptr && option->get_items_expected_max() > 0) ++i;
+    } else if (const CLI::App* const next = findCommand(*command, word)) {
+      command = next;
+    } else if (command->get_prefix_command() && ++given == describe(*command).arguments.size()) {
+      words.insert(words.begin() + static_cast<std::ptrdiff_t>(i), "--");
+      break;
+    }
+  }
+  return words;
+}
+
 CommandLine::Request CommandLine::parse(std::span<const char* const> arguments) {
   try {
     app_->parse(static_cast<int>(arguments.size()), arguments.data());

@@ -27,6 +27,10 @@ class CommandLine {
   CommandLine(const CommandLine&) = delete;
   CommandLine& operator=(const CommandLine&) = delete;
 
+  // The arguments with "--" before the words that are another command's line, if the command takes
+  // one. Borrows them.
+  std::vector<const char*> separated(std::span<const char* const> arguments) const;
+
   enum class Request { Command, Help, Version, Refused };
   // Chooses a command: context.command. When refused, fault() says why.
   Request parse(std::span<const char* const> arguments);

@@ -1,5 +1,6 @@
 #include "tools/frame/complete_command.h"
 
+#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <limits>
 #include <memory>
@@ -70,8 +71,8 @@ void takeWord(Line& line, const std::string& word) {
   } else if (const CLI::App* const next = findCommand(*line.command, word)) {
     line.command = next;
     line.help = describe(*next);
-  } else {
-    ++line.arguments;
+  } else if (++line.arguments >= line.help.arguments.size()) {
+    line.onlyArguments = line.onlyArguments || line.command->get_prefix_command();
   }
 }
 

@@ -21,9 +21,8 @@ bool asksForJson(std::span<const char* const> arguments) {
   return std::find(arguments.begin(), end, std::string_view("--json")) != end;
 }
 
-int runCommand(ToolContext& context, std::span<const char* const> arguments,
+int runCommand(ToolContext& context, CommandLine& line, std::span<const char* const> arguments,
                const PlatformFactory& makePlatform) {
-  CommandLine line(context);
   switch (line.parse(arguments)) {
     case CommandLine::Request::Help:
       print(context.out, helpText(describe(line.chosen()), context.output));
@@ -74,8 +73,10 @@ int runTool(ToolContext context, std::span<const char* const> arguments,
             const PlatformFactory& makePlatform) {
   std::vector<std::string> complaints;
   context.complaints = &complaints;
-  context.json = asksForJson(arguments);  // also for what is wrong with the arguments themselves
-  const int status = finishOutput(context, runCommand(context, arguments, makePlatform));
+  CommandLine line(context);
+  const std::vector<const char*> words = line.separated(arguments);
+  context.json = asksForJson(words);  // also for what is wrong with the arguments themselves
+  const int status = finishOutput(context, runCommand(context, line, words, makePlatform));
   if (!context.json) return status;
   if (status != kSuccess) {
     reportFailure(context, status);

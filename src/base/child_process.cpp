@@ -1,0 +1,77 @@
+#include "base/child_process.h"
+
+#include <signal.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <vector>
+
+#include "base/files/file.h"
+
+namespace tally {
+namespace {
+
+constexpr std::array kTerminalSignals = {SIGINT, SIGQUIT};
+
+// Ignores the terminal's signals while it lives.
+class TerminalSignals {
+ public:
+  TerminalSignals() {
+    struct sigaction ignore {};
+    ignore.sa_handler = SIG_IGN;
+    for (std::size_t i = 0; i < kTerminalSignals.size(); ++i) {
+      ::sigaction(kTerminalSignals[i], &ignore, &before_[i]);
+    }
+  }
+  ~TerminalSignals() {
+    for (std::size_t i = 0; i < kTerminalSignals.size(); ++i) {
+      ::sigaction(kTerminalSignals[i], &before_[i], nullptr);
+    }
+  }
+  TerminalSignals(const TerminalSignals&) = delete;
+  TerminalSignals& operator=(const TerminalSignals&) = delete;
+
+  // What the program is to handle as it would without us: these, unless they were ignored before,
+  // and those that surviveFailedWrites() ignores.
+  sigset_t childDefaults() const {
+    sigset_t set;
+    ::sigemptyset(&set);
+    ::sigaddset(&set, SIGPIPE);
+    ::sigaddset(&set, SIGXFSZ);
+    for (std::size_t i = 0; i < kTerminalSignals.size(); ++i) {
+      if (before_[i].sa_handler != SIG_IGN) ::sigaddset(&set, kTerminalSignals[i]);
+    }
+    return set;
+  }
+
+ private:
+  struct sigaction before_[kTerminalSignals.size()];
+};
+
+}  // namespace
+
+Result<int> runInForeground(std::span<const std::string> words) {
+  std::vector<char*> arguments;
+  for (const std::string& word : words) arguments.push_back(const_cast<char*>(word.c_str()));
+  arguments.push_back(nullptr);
+  const TerminalSignals signals;
+  const sigset_t defaults = signals.childDefaults();
+  posix_spawnattr_t attributes;
+  ::posix_spawnattr_init(&attributes);
+  ::posix_spawnattr_setsigdefault(&attributes, &defaults);
+  ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
+  pid_t child = -1;
+  const int fault =
+      ::posix_spawnp(&child, arguments[0], nullptr, &attributes, arguments.data(), environ);
+  ::posix_spawnattr_destroy(&attributes);
+  if (fault != 0) return systemError("cannot run", words.front(), fault);
+  int status = 0;
+  if (retried([&] { return ::waitpid(child, &status, 0); }) < 0) {
+    return systemError("cannot wait for", words.front());
+  }
+  return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status);
+}
+
+}  // namespace tally
