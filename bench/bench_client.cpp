@@ -67,9 +67,10 @@ void print(const char* label, double cost, double yardstick) {
 // One call is one datagram.
 double costOfSendto(int sender, bool printsLine) {
   return costOf(kDatagramsPerRound, 1, [&](int i) {
+    constexpr int kLineBytes = sizeof kName + 5;
     char text[128] = "com.example.subsystem.requests:1|c\n";
     const int printed =
-        printsLine ? std::snprintf(text, sizeof text, "%s:%d|c\n", kName, i) : sizeof kName + 5;
+        printsLine ? std::snprintf(text, sizeof text, "%s:%d|c\n", kName, i) : kLineBytes;
     require(::sendto(sender, text, static_cast<std::size_t>(printed), MSG_DONTWAIT | MSG_NOSIGNAL,
                      reinterpret_cast<const sockaddr*>(&address), sizeof address) > 0);
   });

@@ -1,4 +1,3 @@
-#define _GNU_SOURCE
 #include "client/link.h"
 
 #include <errno.h>

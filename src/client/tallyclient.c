@@ -1,4 +1,3 @@
-#define _GNU_SOURCE
 #include "tallyclient/tallyclient.h"
 
 #include <errno.h>
