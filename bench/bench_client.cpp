@@ -128,6 +128,17 @@ int measure(const std::string& path) {
   const double bare = costOfSendto(sender, false);
   print("sendto, one datagram a value", bare, bare);
   print("snprintf and sendto", costOfSendto(sender, true), bare);
+  const int connected = ::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+  require(::connect(connected, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0);
+  const std::string line = std::string(kName) + ":1|c\n";
+  print("send on a connected socket",
+        costOf(kDatagramsPerRound, 1,
+               [&](int) {
+                 require(::send(connected, line.data(), line.size(), MSG_DONTWAIT | MSG_NOSIGNAL) >
+                         0);
+               }),
+        bare);
+  ::close(connected);
   measureCalls(client, bare);
   measureDrops(client, "tallyclient_add, the daemon's queue is full", bare);
   ::close(receiver);
