@@ -143,14 +143,14 @@ std::optional<Committer::Outcome> Committer::takeOutcome() {
 Status Committer::write(CommitJob& job, std::uint64_t& undatedForgotten) {
   auto transaction = store_.begin();
   if (!transaction) return transaction.error();
+  if (job.wallMinusBoot) {
+    auto dated = dateUndated(**transaction, bootId_, *job.wallMinusBoot);
+    if (!dated) return dated;
+  }
   bool hasUndated = false;
   for (const CommitBatch& batch : job.batches) {
     if (auto written = BatchWriter(**transaction, bootId_, batch).write(); !written) return written;
     hasUndated = hasUndated || (!batch.day && !batch.originOnClock);
-  }
-  if (job.wallMinusBoot) {
-    auto dated = dateUndated(**transaction, bootId_, *job.wallMinusBoot);
-    if (!dated) return dated;
   }
   if (job.wallMinusBoot || hasUndated) {
     const auto forgotten =

@@ -25,6 +25,13 @@ std::string_view takeUpTo(std::string_view& text, char separator) {
   return taken;
 }
 
+// Whether a decimal number that no double can hold is too small for it.
+bool isBelowOne(std::string_view text) {
+  const std::size_t exponent = text.find_first_of("eE");
+  if (exponent != std::string_view::npos) return text.substr(exponent + 1).starts_with('-');
+  return text.substr(0, text.find('.')).find_first_not_of('0') == std::string_view::npos;
+}
+
 // Decimal, with an exponent or without; "1." and ".5" are numbers, "inf" and blanks are not.
 std::optional<double> parseNumber(std::string_view text) {
   const bool negative = !text.empty() && text.front() == '-';
@@ -44,8 +51,11 @@ std::optional<double> parseNumber(std::string_view text) {
   const char* const end = text.data() + text.size();
   const auto [stopped, error] = std::from_chars(text.data(), end, number);
   if (stopped != end) return std::nullopt;
-  // Out of range: too large is no number, too small is none that matters.
-  if (error == std::errc::result_out_of_range && !(std::fabs(number) < 1)) return std::nullopt;
+  // What is too small for a double is as good as 0; what is too large has no meaning.
+  if (error == std::errc::result_out_of_range) {
+    if (!isBelowOne(text)) return std::nullopt;
+    number = 0;
+  }
   if (error == std::errc::invalid_argument || !std::isfinite(number)) return std::nullopt;
   return negative ? -number : number;
 }

@@ -85,7 +85,7 @@ TEST(RecorderSettings, ComeFromTheSystemThenFromTheStoresOwner) {
       "<key>Tags</key><array><string>x</string><string>y</string><integer>1</integer></array>"
       "<key>Allow</key><dict><key>net.</key><array><string>ada</string><string>nobody-here</string>"
       "<integer>7</integer></array><key>shut.</key><string>?</string></dict>");
-  FakeSystemLog log;
+  fakes::FakeSystemLog log;
   const auto settings = readRecorderSettings(
       DeviceRoot(folder.root),
       [](std::string_view name) {

@@ -196,7 +196,7 @@ class RecorderTest : public ::testing::Test {
 
   FakeRecordingStore store;
   FakeIngress ingress;
-  std::shared_ptr<FakeSystemLog> log = std::make_shared<FakeSystemLog>();
+  std::shared_ptr<fakes::FakeSystemLog> log = std::make_shared<fakes::FakeSystemLog>();
   RecorderSettings settings;
   bool synchronised = false;
   std::unique_ptr<Recorder> recorder;
