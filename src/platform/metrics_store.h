@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <span>
 #include <string_view>
 #include <vector>
 
@@ -25,6 +26,9 @@ class DistributionValues {
   // Copies up to capacity further samples to values, and each one's seconds into the day to
   // offsets unless that is null. Returns how many; 0 at the end.
   virtual std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) = 0;
+  // How many samples each of those stands for that the last call delivered, 1 or more; empty if
+  // each counts once. Valid until the next call.
+  virtual std::span<const std::uint32_t> weights() const { return {}; }
   // The next sample and its seconds into the day; false at the end.
   bool nextValue(double* value, std::uint32_t* offset) { return nextValues(value, offset, 1) == 1; }
 };
@@ -45,6 +49,8 @@ class HistoryStore {
   virtual void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
                                       std::int32_t maximumDay,
                                       const DistributionHandler& handler) = 0;
+  // Whether any sample counts for more than one.
+  virtual bool hasWeights() { return false; }
 };
 
 // The instant at which a day begins (UTC).

@@ -19,12 +19,13 @@ struct DistributionSummary {
   double maximum = 0;
   double mean = 0;
   double squaredDeviations = 0;  // sum over the samples, from the mean, not divided by the count
-  std::int64_t count = 0;
+  std::int64_t count = 0;        // sum of the weights
 
-  // Adds further samples, in the order in which they were recorded. With intervals, counts has one
-  // counter per bucket, and each sample increments that of its bucket.
-  void add(std::span<const double> samples, const HistogramIntervals* intervals,
-           std::span<std::uint32_t> counts);
+  // Adds further samples, in the order in which they were recorded. A sample with a weight counts
+  // as so many; without weights, each counts once. With intervals, counts has one counter per
+  // bucket, and each sample is counted in that of its bucket.
+  void add(std::span<const double> samples, std::span<const std::uint32_t> weights,
+           const HistogramIntervals* intervals, std::span<std::uint64_t> counts);
   // [minimum, maximum, mean, squared deviations, count]: four doubles and a signed 32-bit integer,
   // which saturates.
   KvRef<KvArray> toArray() const;

@@ -1,5 +1,6 @@
 #include "report/histogram.h"
 
+#include <algorithm>
 #include <bit>
 #include <cmath>
 #include <limits>
@@ -37,12 +38,14 @@ std::string HistogramIntervals::label(std::size_t bucket) const {
 }
 
 KvRef<KvDictionary> makeHistogramDictionary(const HistogramIntervals& intervals,
-                                            std::span<const std::uint32_t> counts) {
+                                            std::span<const std::uint64_t> counts) {
+  constexpr std::uint64_t kMost = std::numeric_limits<std::uint32_t>::max();
   KvRef<KvDictionary> histogram;
   for (std::size_t i = 0; i < counts.size(); ++i) {
     if (counts[i] == 0) continue;
     if (!histogram) histogram = KvDictionary::create(counts.size());
-    histogram->set(intervals.label(i), KvNumber::uint32(counts[i]));
+    histogram->set(intervals.label(i),
+                   KvNumber::uint32(static_cast<std::uint32_t>(std::min(counts[i], kMost))));
   }
   return histogram;
 }

@@ -44,8 +44,8 @@ class HistogramIntervals {
 };
 
 // The counters of the buckets that have samples, under their labels in bucket order; null when no
-// bucket has any. There must be intervals.bucketCount() counters.
+// bucket has any. There must be intervals.bucketCount() counters, which saturate at 32 bits here.
 KvRef<KvDictionary> makeHistogramDictionary(const HistogramIntervals& intervals,
-                                            std::span<const std::uint32_t> counts);
+                                            std::span<const std::uint64_t> counts);
 
 }  // namespace tally

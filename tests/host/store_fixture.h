@@ -71,7 +71,7 @@ class StoreTest : public TemporaryRoot {
     std::int32_t day;
     std::string key;
     std::vector<double> values;
-    std::vector<std::uint32_t> offsets;
+    std::vector<std::uint32_t> offsets, weights;
   };
   std::vector<Distribution> distributions(std::string_view prefix = "",
                                           std::int32_t minimum = kFirst,
@@ -81,13 +81,16 @@ class StoreTest : public TemporaryRoot {
     store()->openHistory()->enumerateDistributions(
         prefix, minimum, maximum,
         [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
-          Distribution row{day, std::string(key), {}, {}};
+          Distribution row{day, std::string(key), {}, {}, {}};
           for (std::size_t count = batch, size = 0; count > 0;) {
             row.values.resize(size + batch);
             row.offsets.resize(size + batch);
             count = values.nextValues(&row.values[size], &row.offsets[size], batch);
             row.values.resize(size += count);
             row.offsets.resize(size);
+            const auto weights = values.weights();
+            row.weights.insert(row.weights.end(), weights.begin(), weights.end());
+            row.weights.resize(size, 1);
           }
           rows.push_back(std::move(row));
         });
@@ -96,8 +99,9 @@ class StoreTest : public TemporaryRoot {
   // As "20513 key x3" for each row.
   std::vector<std::string> lengths() const {
     std::vector<std::string> rows;
-    for (const auto& [day, key, values, offsets] : distributions()) {
-      rows.push_back(std::to_string(day) + " " + key + " x" + std::to_string(values.size()));
+    for (const Distribution& row : distributions()) {
+      rows.push_back(std::to_string(row.day) + " " + row.key + " x" +
+                     std::to_string(row.values.size()));
     }
     return rows;
   }

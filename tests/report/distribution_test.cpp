@@ -100,7 +100,7 @@ TEST(DistributionSummary, TheFiveNumbers) {
       DistributionSummary summary;
       for (std::size_t i = 0; i < c.samples.size(); i += batch) {
         const std::size_t count = std::min(batch, c.samples.size() - i);
-        summary.add(std::span(c.samples).subspan(i, count), nullptr, {});
+        summary.add(std::span(c.samples).subspan(i, count), {}, nullptr, {});
       }
       std::string text;
       const auto array = summary.toArray();
@@ -114,6 +114,40 @@ TEST(DistributionSummary, TheCountSaturates) {
   DistributionSummary summary;
   summary.count = std::int64_t{1} << 40;
   EXPECT_EQ(kvText(summary.toArray()->get(4)), "2147483647");
+  const double sample = 1;
+  const std::uint32_t weight = UINT32_MAX;
+  summary.count = INT64_MAX - 1;
+  summary.add({&sample, 1}, {&weight, 1}, nullptr, {});
+  EXPECT_GT(summary.count, std::int64_t{1} << 61);
+}
+
+TEST(DistributionSummary, AWeightCountsAsSoManySamples) {
+  std::mt19937 random(3);
+  const auto array = boundaries({0, 1, 2});
+  const HistogramIntervals intervals(*array);
+  DistributionSummary weighted, repeated;
+  std::uint64_t weightedCounts[4] = {}, repeatedCounts[4] = {};
+  for (int batch = 0; batch < 20; ++batch) {
+    const bool withWeights = batch % 3 != 1;
+    std::vector<double> samples, all;
+    std::vector<std::uint32_t> weights;
+    for (int i = 0; i < 30; ++i) {
+      samples.push_back(static_cast<double>(random() % 4000) / 1000 - 1);
+      weights.push_back(withWeights ? static_cast<std::uint32_t>(random() % 9 + 1) : 1);
+      all.insert(all.end(), weights.back(), samples.back());
+    }
+    if (!withWeights) weights.clear();
+    weighted.add(samples, weights, &intervals, weightedCounts);
+    repeated.add(all, {}, &intervals, repeatedCounts);
+  }
+  EXPECT_EQ(weighted.count, repeated.count);
+  EXPECT_EQ(weighted.minimum, repeated.minimum);
+  EXPECT_EQ(weighted.maximum, repeated.maximum);
+  EXPECT_NEAR(weighted.mean, repeated.mean, 1e-12);
+  EXPECT_NEAR(weighted.squaredDeviations, repeated.squaredDeviations, 1e-8);
+  EXPECT_TRUE(std::ranges::equal(weightedCounts, repeatedCounts));
+  std::uint64_t counts[4] = {5, 0, std::uint64_t{UINT32_MAX} + 7, 0};
+  EXPECT_EQ(kvText(makeHistogramDictionary(intervals, counts)->get("(1, 2]")), "4294967295");
 }
 
 }  // namespace

@@ -2,8 +2,10 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "host/store/sqlite_database.h"
 
@@ -43,6 +45,66 @@ class RowOrder {
   bool started_ = false, blobs_ = false;
   std::int64_t day_ = 0, number_ = 0;
   std::string key_;
+};
+
+// The least text above every one that begins with the prefix; empty when there is none.
+inline std::string endOfPrefix(std::string_view prefix) {
+  std::string end(prefix);
+  while (!end.empty() && end.back() == '\xff') end.pop_back();
+  if (!end.empty()) end.back() = static_cast<char>(static_cast<unsigned char>(end.back()) + 1);
+  return end;
+}
+
+// The rows that an enumeration is asked for: of days in (minimum, maximum], and of keys that begin
+// with the prefix, which is borrowed.
+struct StoreRange {
+  static constexpr std::string_view kCondition =
+      " WHERE day > ?1 AND day <= ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4)";
+
+  StoreRange(std::string_view keyPrefix, std::int32_t minimumDay, std::int32_t maximumDay)
+      : prefix(keyPrefix), end(endOfPrefix(keyPrefix)), minimum(minimumDay), maximum(maximumDay) {}
+  void bindTo(Statement& statement) const {
+    statement.bind(1, std::int64_t{minimum}).bind(2, std::int64_t{maximum}).bind(3, prefix);
+    if (!end.empty()) statement.bind(4, std::string_view(end));
+  }
+  std::string_view prefix;
+  std::string end;
+  std::int32_t minimum, maximum;
+};
+
+// Counts what one enumeration leaves out, and reports it as one line.
+class StoreFaults {
+ public:
+  StoreFaults(const Database& database, const std::function<void(const std::string&)>& report)
+      : database_(database), report_(report) {}
+  ~StoreFaults() {
+    if (failed_) {
+      report_(reason_);
+    } else if (damaged_ > 0) {
+      report_(database_
+                  .error(std::to_string(damaged_) + " damaged rows are left out, the first for " +
+                         reason_)
+                  .message);
+    }
+  }
+  StoreFaults(const StoreFaults&) = delete;
+  StoreFaults& operator=(const StoreFaults&) = delete;
+
+  void addDamaged(std::string_view key, std::int64_t day) {
+    if (damaged_++ == 0)
+      reason_ = "the key \"" + std::string(key) + "\" on day " + std::to_string(day);
+  }
+  // Nothing after this could be read.
+  void fail(const Error& error) {
+    if (!std::exchange(failed_, true)) reason_ = error.message;
+  }
+
+ private:
+  const Database& database_;
+  const std::function<void(const std::string&)>& report_;
+  std::size_t damaged_ = 0;
+  bool failed_ = false;
+  std::string reason_;
 };
 
 inline Error damagedTree(const Database& database) {

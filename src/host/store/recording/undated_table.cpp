@@ -101,9 +101,8 @@ Result<std::vector<UndatedChange>> takeUndatedChanges(Database& database, std::s
   if (!exists) return exists.error();
   if (!*exists) return taken;
   auto rows =
-      database.prepare("SELECT number, seconds, kind, key, value, user, iif(length(data) <= " +
-                       std::to_string(kLongestPacked) +
-                       ", data, NULL) FROM undated WHERE boot = ?1 ORDER BY number");
+      database.prepare("SELECT number, seconds, kind, key, value, user, " +
+                       std::string(kBoundedBlob) + " FROM undated WHERE boot = ?1 ORDER BY number");
   if (!rows) return rows.error();
   auto remove = database.prepare("DELETE FROM undated WHERE number = ?1");
   if (!remove) return remove.error();

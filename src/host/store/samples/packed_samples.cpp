@@ -305,6 +305,14 @@ std::optional<PackedLayout> packedLayout(std::span<const std::byte> start, std::
   return length == expected ? std::optional(layout) : std::nullopt;
 }
 
+bool packedRowIsSound(const Statement& row, int first) {
+  const std::int64_t length = row.integer(first + 2);
+  if (length < 0 || length > static_cast<std::int64_t>(kLongestPacked)) return false;
+  const auto layout = packedLayout(row.blob(first + 3), static_cast<std::size_t>(length));
+  if (!layout || row.integer(first) != layout->samples) return false;
+  return layout->weighted() == (row.integer(first + 1) != layout->samples);
+}
+
 bool unpackSamples(std::span<const std::byte> blob, PackedColumns columns, SampleVectors& out) {
   out.clear();
   const auto layout = packedLayout(blob, blob.size());
