@@ -5,6 +5,7 @@
 #include <functional>
 #include <random>
 
+#include "host/store/recording/recording_store.h"
 #include "host/store/store_history.h"
 #include "host/store_fixture.h"
 
@@ -177,6 +178,15 @@ TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
 TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
   ASSERT_TRUE(push(1, "d", sequence(0, 9000), true) && push(1, "e", sequence(0, 300)));
   for (int i = 0; i < 41; ++i) ASSERT_TRUE(set(1, std::to_string(i), i));
+  for (const char* step : {"packed", "arrivals"}) {
+    const auto values = sequence(0.5, 3000);
+    const std::vector<std::uint32_t> offsets(values.size(), 1), weights(values.size(), 2);
+    const auto recorded = makeSqliteRecordingStore(storeFile)->begin();
+    const RecordedChange samples{RecordedChange::Kind::Samples, "w", 0, {values, offsets, weights}};
+    ASSERT_TRUE(recorded && (*recorded)->apply(1, samples) && (*recorded)->commit()) << step;
+    clock->setDay(1);
+    if (step[0] == 'p') store()->TBClientCheckpoint();
+  }
   const std::string whole = get("data/TBDataStore.sqlitedb");
   std::minstd_rand random(11);
   for (int round = 0; round < 120; ++round) {

@@ -6,6 +6,7 @@
 
 #include "host/store/recording/recording_store.h"
 #include "host/store/samples/packed_samples.h"
+#include "host/store/store_importer.h"
 #include "host/store_fixture.h"
 
 namespace tally {
@@ -147,6 +148,71 @@ TEST_F(RecordingStoreTest, ScalarsAndOwnersOfADayAreKeptAsAWholeOrNotAtAll) {
   const auto owners = *recorder->owners(1);
   ASSERT_EQ(owners.size(), 1u);
   EXPECT_TRUE(owners[0].user == 1001 && owners[0].distribution);
+}
+
+TEST_F(RecordingStoreTest, SamplesKeepTheirOrderAndWeightsWhereverTheyLie) {
+  std::vector<double> expected;
+  std::vector<std::uint32_t> expectedWeights;
+  const auto add = [&](std::size_t count, std::uint32_t weight) {
+    const auto values = sequence(static_cast<double>(expected.size()), count);
+    const std::vector<std::uint32_t> offsets(count, 9), weights(weight == 0 ? 0 : count, weight);
+    expected.insert(expected.end(), values.begin(), values.end());
+    expectedWeights.resize(expected.size(), std::max(weight, 1u));
+    return record([&](RecordingTransaction& to) {
+      const RecordedChange all{Kind::Samples, "d", 0, {values, offsets, weights}, 0};
+      return to.apply(kToday, all) && to.apply(kToday - 1, all) &&
+             to.apply(kToday, {Kind::Samples, "c", 0, all.samples, 0});
+    });
+  };
+  const auto check = [&](const char* when) {
+    for (const std::size_t batch : {std::size_t{1}, std::size_t{999}, 3 * kMostPackedSamples}) {
+      const auto rows = distributions("d", kFirst, kLast, batch);
+      ASSERT_EQ(rows.size(), 2u) << when;
+      EXPECT_EQ(rows[1].values, expected) << when << ", " << batch << " at a time";
+      EXPECT_EQ(rows[1].weights, expectedWeights) << when;
+      EXPECT_EQ(rows[1].offsets.back(), 9u);
+    }
+  };
+  expected = sequence(0, 3);
+  ASSERT_TRUE(push(kToday, "d", expected) && push(kToday - 1, "d", expected, true));
+  ASSERT_TRUE(add(5, 0) && add(kMostPackedSamples, 7) && add(1, 0));
+  check("arrived");
+  EXPECT_TRUE(store()->openHistory()->hasWeights());
+  ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
+    for (int turns = 0; turns < 3; ++turns) {  // of the pushed row, then of two that arrived
+      const auto complete = writer.foldRecentUntil({});
+      if (!complete || *complete) return Error{"not a part"};
+    }
+    return Done{};
+  }));
+  check("folded in part");
+  sql("INSERT INTO arrivals SELECT 100, day, key, samples, samples, data FROM arrivals WHERE "
+      "weight > samples LIMIT 1");
+  store()->TBClientCheckpoint();
+  EXPECT_EQ(sql("SELECT group_concat(number) FROM arrivals"), "100") << "a damaged row stays";
+  sql("DELETE FROM arrivals");
+  check("folded");
+  ASSERT_TRUE(add(3, 2));
+  store()->TBClientCheckpoint();
+  check("folded again");
+  EXPECT_EQ(sql("SELECT count(*) FROM packed WHERE key = 'c'"), "2") << "rows are filled";
+  StoreImporter importer(storeFile);
+  for (const std::uint32_t weight : {1u, 4u}) {
+    ASSERT_TRUE(importer.addSample(kToday, "d", 9, weight, weight) &&
+                importer.addSample(1, "new", 9, weight));
+    expected.push_back(weight);
+    expectedWeights.push_back(weight);
+  }
+  ASSERT_TRUE(importer.finish());
+  check("imported");
+  EXPECT_EQ(sql("SELECT count(*) FROM chunks WHERE key = 'new'"), "1");
+  ASSERT_TRUE(record([&](RecordingTransaction& to) {
+                return to.setOwner(kToday - 1, {"d", 1, true});
+              }) &&
+              add(1, 0));
+  ASSERT_TRUE(write([](StoreWriter& writer) { return writer.forgetBefore(kToday); }));
+  EXPECT_EQ(lengths().size(), 2u);
+  EXPECT_THAT(*recorder->owners(kToday - 1), IsEmpty());
 }
 
 TEST_F(RecordingStoreTest, AddsOfSeveralProcessesAreNotLost) {

@@ -49,7 +49,7 @@ class StoreTest : public TemporaryRoot {
     std::vector<std::uint32_t> offsets(values.size());
     std::iota(offsets.begin(), offsets.end(), 0u);
     return write([&](StoreWriter& writer) -> Status {
-      return toChunks ? writer.appendToChunks(day, key, values, offsets)
+      return toChunks ? writer.appendSamples(day, key, {values, offsets, {}})
                       : writer.pushSamples(day, key, values, offsets);
     });
   }

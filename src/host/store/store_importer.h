@@ -21,7 +21,9 @@ class StoreImporter {
 
   // REQUIRES: the key is one that the store can have. After a failure nothing more can be added.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t value);
-  Status addSample(std::int32_t day, std::string_view key, std::uint32_t offset, double value);
+  // The weight is how many samples it stands for, 1 or more.
+  Status addSample(std::int32_t day, std::string_view key, std::uint32_t offset, double value,
+                   std::uint32_t weight = 1);
   // Makes everything that was added visible. Without rows the store is not even created.
   Status finish();
 
@@ -37,7 +39,7 @@ class StoreImporter {
   StoreFile file_;
   std::optional<StoreWriter> writer_;
   // The samples in hand in the order of their arrival, each with its place.
-  std::vector<std::uint32_t> placeOfSample_, offsets_;
+  std::vector<std::uint32_t> placeOfSample_, offsets_, weights_;  // no weights: each counts once
   std::vector<double> values_;
   std::vector<Place> places_;
   std::unordered_map<std::string, std::uint32_t> placeNumbers_;  // by day and key

@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <limits>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -10,6 +11,9 @@
 #include "host/store/sqlite_database.h"
 
 namespace tally {
+
+// Far above what a key can have on a day; a number beyond it was not written by this program.
+constexpr std::int64_t kMostRowsOfKey = std::numeric_limits<std::int32_t>::max();
 
 // The columns of a chunk, without loading one that is longer than any chunk may have.
 constexpr std::string_view kBoundedValues =

@@ -10,6 +10,7 @@
 #include <string_view>
 #include <vector>
 
+#include "host/store/samples/sample_tail.h"
 #include "host/store/store_schema.h"
 #include "platform/counter_state.h"
 #include "platform/flash/wear_history.h"
@@ -33,10 +34,12 @@ class StoreWriter {
   // Records further samples of the key, after all that it has. Both spans have the same length.
   Status pushSamples(std::int32_t day, std::string_view key, std::span<const double> values,
                      std::span<const std::uint32_t> offsets);
-  // The same for many samples, straight into chunks. REQUIRES: foldRecent() in this transaction.
-  Status appendToChunks(std::int32_t day, std::string_view key, std::span<const double> values,
-                        std::span<const std::uint32_t> offsets);
-  // Moves pushed samples to the chunks of their day. Damaged rows stay where they are.
+  // The same for many samples, straight to where a checkpoint moves them: to the chunks, but if
+  // some count for more than one, or the key has such rows, to the packed rows, which come after
+  // these. REQUIRES: foldRecent() in this transaction.
+  Status appendSamples(std::int32_t day, std::string_view key, const SampleColumns& samples);
+  // Moves new samples, pushed ones and those of the recorder, to the chunks and packed rows of
+  // their day. Damaged rows stay where they are.
   Status foldRecent();
   // The same until the time is up, but for one row at least. False when there may be more.
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
@@ -58,16 +61,19 @@ class StoreWriter {
 
  private:
   struct Statements {
-    Statement setScalar, lastRecent, addRecent, lastChunk, putChunk;
+    Statement setScalar, lastRecent, addRecent;
   };
-  class ChunkTail;
-  StoreWriter(Database database, Statements statements)
+  StoreWriter(std::unique_ptr<Database> database, Statements statements)
       : database_(std::move(database)), statements_(std::move(statements)) {}
   Status checkKey(std::string_view key) const;
+  Result<SampleTail*> tail(SampleTail::Table table);
+  Result<bool> isPacked(std::int32_t day, std::string_view key);
 
-  Database database_;
+  std::unique_ptr<Database> database_;  // at a place of its own, which the tails know
   Statements statements_;
   std::optional<Statement> setCounter_;
+  std::optional<SampleTail> chunks_, packed_;
+  std::optional<bool> hasPacked_;
 };
 
 }  // namespace tally
