@@ -18,9 +18,9 @@ void checkRoundTrip(const StoreRow& row) {
   const std::string field = csvField(row.key);
   std::string line;
   if (row.kind == StoreRow::Kind::Scalar) {
-    appendScalarRow(line, field, row.day, row.scalar);
+    appendScalarRow(line, field, row.day, row.scalar, true);
   } else {
-    appendSampleRow(line, field, row.day, row.offset, row.sample);
+    appendSampleRow(line, field, row.day, row.offset, row.sample, row.weight);
   }
   require(line.ends_with('\n'), "a row ends its line");
   line.pop_back();
@@ -30,7 +30,7 @@ void checkRoundTrip(const StoreRow& row) {
   const bool sameSample =
       row.sample == again.sample || (std::isnan(row.sample) && std::isnan(again.sample));
   require(again.kind == row.kind && again.key == row.key && again.day == row.day &&
-              again.scalar == row.scalar && again.offset == row.offset && sameSample,
+              again.scalar == row.scalar && again.offset == row.offset && again.weight == row.weight && sameSample,
           "a row reads back as itself");
 }
 

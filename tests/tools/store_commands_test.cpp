@@ -1,4 +1,5 @@
 // tallyctl store: what import takes and refuses, and that a dump can be imported again.
+#include "tools/store/recorded_words.h"
 #include "tools/tool_fixture.h"
 
 namespace tally::tools {
@@ -41,7 +42,7 @@ TEST_F(StoreCommands, ImportKeepsTheGoodLinesAndNamesTheBadOnes) {
       {"distribution,a,1,0,nan\ndistribution,a,1,0,-inf\ndistribution,a,1,0,1e999\n"
        "distribution,a,1,0,1x\ndistribution,a,1,0,\n",
        0, 2, "3 4 5", "a double"},
-      {"scalar,a,1,1\nscalar,a,1,,1,\nscalar\n", 0, 0, "1 2 3", "fewer than five"},
+      {"scalar,a,1,1\nscalar,a,1,,1,,\nscalar\n", 0, 0, "1 2 3", "fewer than five"},
       {"scalar,,1,,1\nscalar,\xff,1,,1\nscalar," + longKey + ",1,,1\n" +
            std::string("scalar,a\0b,1,,1\n", 16),
        0, 0, "1 2 3 4", "valid UTF-8"},
@@ -104,6 +105,55 @@ TEST_F(StoreCommands, ADumpCanBeImportedAgain) {
                    "lastDay": 20000, "samples": 4}, "/5": "absent"})");
 }
 
+TEST_F(StoreCommands, WeightsAreAColumnOfADumpThatHasAny) {
+  const std::string rows =
+      "kind,key,day,offset,value,weight\n"
+      "scalar,a,20000,,7,\n"
+      "distribution,d,20000,5,0.5,1\n"
+      "distribution,d,20000,4,nan,4294967295\n"
+      "distribution,e,20000,5,1,1\n";
+  ASSERT_EQ(import(rows).status, kSuccess);
+  EXPECT_EQ(dump(), rows);
+  EXPECT_EQ(import("distribution,d,1,5,1,0\ndistribution,d,1,5,1,4294967296\n"
+                   "distribution,d,1,5,1,x\nscalar,a,1,,1,1\n")
+                .json()["rejected"],
+            4);
+  expectValues(run({"store", "dump", "--json"}).json(),
+               R"({"/distributions/0/samples": [[5, 0.5], [4, "nan", 4294967295]]})");
+}
+
+TEST_F(StoreCommands, WordsNameKeysAndTheirValues) {
+  const auto pairs = WordForm::Pairs, groups = WordForm::Groups;
+  const struct {
+    std::vector<std::string> words;
+    WordForm form;
+    std::string input, expected;
+  } cases[] = {
+      {{"a", "1", "b", "2"}, pairs, "", "a 1;b 2;"},
+      {{"a", "1", "b"}, pairs, "", "the key b has no value"},
+      {{"a", "1", "2", "+", "b", "3"}, groups, "", "a 1 2;b 3;"},
+      {{"a", "1", "+"}, groups, "", "a key is missing"},
+      {{"a"}, groups, "", "the key a has no value"},
+      {{"-"}, pairs, "a 1\tb  2\r\n\n - 3", "a 1;b 2;- 3;"},
+      {{"-"}, groups, "a 1\nb 2 + c", "line 2: the key c has no value"},
+      {{"-"}, groups, "", ""},
+      {{"-"}, pairs, std::string((16u << 20) + 1, ' '), "standard input is longer"},
+  };
+  for (const auto& c : cases) {
+    put("words", c.input);
+    const std::unique_ptr<std::FILE, int (*)(std::FILE*)> input(
+        std::fopen(at("words").c_str(), "r"), std::fclose);
+    const auto recorded = readRecordedWords(c.words, c.form, input.get());
+    std::string text = recorded ? "" : recorded.error().message;
+    for (const auto& [key, values] : recorded ? *recorded : std::vector<RecordedWords>()) {
+      text += key;
+      for (const std::string& value : values) text += " " + value;
+      text += ";";
+    }
+    EXPECT_TRUE(text.starts_with(c.expected) && text.empty() == c.expected.empty()) << text;
+  }
+}
+
 TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
   const struct {
     const char* arguments;
@@ -114,6 +164,12 @@ TEST_F(StoreCommands, SetAndPushTakeTheDayInProgressUnlessTold) {
       {"set a 6 --day -7", kSuccess, "scalar,a,-7,,6\n"},
       {"push d nan 1 --day 3 --offset 9", kSuccess,
        "distribution,d,3,9,nan\ndistribution,d,3,9,1\n"},
+      {"set a 1 b 2", kSuccess, "scalar,a,20000,,1\nscalar,b,20000,,2\n"},
+      {"push d 1 + e 2 --offset 9", kSuccess,
+       "distribution,d,20000,9,1\ndistribution,e,20000,9,2\n"},
+      {"set a 1 b x", kBadUsage, ""},
+      {"push d 1 + e x", kBadUsage, ""},
+      {"set a", kBadUsage, ""},
       {"set a 1.5", kBadUsage, ""},
       {"set a 1 --day x", kBadUsage, ""},
       {"push d much", kBadUsage, ""},

@@ -18,6 +18,7 @@
 #include "tools/frame/day_argument.h"
 #include "tools/frame/output.h"
 #include "tools/frame/table.h"
+#include "tools/store/recorded_words.h"
 #include "tools/store/store_csv.h"
 #include "tools/store/store_dump.h"
 #include "tools/store/store_import.h"
@@ -27,7 +28,7 @@ namespace {
 
 // What the arguments of a store command were.
 struct StoreArguments {
-  std::string key, value, file;
+  std::string key, file;
   std::vector<std::string> values;
   std::optional<std::string> day;
   std::optional<std::uint32_t> offset;
@@ -54,52 +55,101 @@ bool readDay(const ToolContext& context, const StoreArguments& arguments,
   return day.has_value();
 }
 
-int setScalar(const ToolContext& context, const StoreArguments& arguments) {
+// The keys and values of the command line or of standard input. Empty after a complaint.
+std::optional<std::vector<RecordedWords>> readWords(const ToolContext& context,
+                                                    const StoreArguments& arguments,
+                                                    WordForm form) {
+  std::vector<std::string> words{arguments.key};
+  words.insert(words.end(), arguments.values.begin(), arguments.values.end());
+  auto recorded = readRecordedWords(words, form, stdin);
+  const auto refuse = [&](std::string_view reason) {
+    complain(context, reason, kBadUsage);
+    return std::nullopt;
+  };
+  if (!recorded) return refuse(recorded.error().message);
+  for (const auto& [key, values] : *recorded) {
+    if (!isStoreKey(key)) return refuse(kStoreKeyRule);
+  }
+  return std::move(*recorded);
+}
+
+// One object for the keys of a command line that names one; else a list.
+void printRecorded(const ToolContext& context, const StoreArguments& arguments, Json entries) {
+  printJson(context, entries.size() == 1 && arguments.key != "-" ? entries[0] : entries);
+}
+
+int setScalars(const ToolContext& context, const StoreArguments& arguments) {
   std::optional<std::int32_t> given;
   if (!readDay(context, arguments, given)) return kBadUsage;
-  const auto value = parseInt64(arguments.value);
-  if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
-  if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
-  const std::int32_t day = given.value_or(context.platform->metricsStore->TBDaysSince1970());
-  const Status set = writeStore(
-      context, [&](StoreWriter& writer) { return writer.setScalar(day, arguments.key, *value); });
-  if (!set) return complain(context, set.error().message, kWrong);
-  if (context.json) {
-    printJson(context, {{"key", arguments.key}, {"day", day}, {"value", *value}});
-  } else {
-    printLine(context, fmt::format("{} = {} on {}", arguments.key, *value, dayName(day)));
+  const auto words = readWords(context, arguments, WordForm::Pairs);
+  if (!words) return kBadUsage;
+  std::vector<std::int64_t> numbers;
+  for (const auto& [key, values] : *words) {
+    const auto value = parseInt64(values[0]);
+    if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
+    numbers.push_back(*value);
   }
+  const std::int32_t day = given.value_or(context.platform->metricsStore->TBDaysSince1970());
+  const Status set = writeStore(context, [&](StoreWriter& writer) -> Status {
+    for (std::size_t i = 0; i < numbers.size(); ++i) {
+      if (auto done = writer.setScalar(day, (*words)[i].key, numbers[i]); !done) return done;
+    }
+    return Done{};
+  });
+  if (!set) return complain(context, set.error().message, kWrong);
+  Json entries = Json::array();
+  for (std::size_t i = 0; i < numbers.size(); ++i) {
+    const std::string& key = (*words)[i].key;
+    if (context.json) {
+      entries.push_back({{"key", key}, {"day", day}, {"value", numbers[i]}});
+    } else {
+      printLine(context, fmt::format("{} = {} on {}", key, numbers[i], dayName(day)));
+    }
+  }
+  if (context.json) printRecorded(context, arguments, std::move(entries));
   return kSuccess;
 }
 
 int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
   std::optional<std::int32_t> given;
   if (!readDay(context, arguments, given)) return kBadUsage;
-  std::vector<double> values;
-  for (const std::string& text : arguments.values) {
-    const auto value = parseDouble(text);
-    if (!value) return complain(context, text + " is not a number", kBadUsage);
-    values.push_back(*value);
+  const auto words = readWords(context, arguments, WordForm::Groups);
+  if (!words) return kBadUsage;
+  std::vector<std::vector<double>> samples;  // of each key
+  for (const auto& [key, values] : *words) {
+    samples.emplace_back();
+    for (const std::string& text : values) {
+      const auto value = parseDouble(text);
+      if (!value) return complain(context, text + " is not a number", kBadUsage);
+      samples.back().push_back(*value);
+    }
   }
-  if (!isStoreKey(arguments.key)) return complain(context, kStoreKeyRule, kBadUsage);
   const double now = context.platform->clock->secondsSince1970();
   const std::int32_t today = dayOfSeconds(now);
   const std::int32_t day = given.value_or(today);
   const std::uint32_t offset = arguments.offset.value_or(
       static_cast<std::uint32_t>(now - static_cast<double>(today) * kSecondsPerDay));
-  const std::vector<std::uint32_t> offsets(values.size(), offset);
-  const Status pushed = writeStore(context, [&](StoreWriter& writer) {
-    return writer.pushSamples(day, arguments.key, values, offsets);
+  const Status pushed = writeStore(context, [&](StoreWriter& writer) -> Status {
+    for (std::size_t i = 0; i < samples.size(); ++i) {
+      const std::vector<std::uint32_t> offsets(samples[i].size(), offset);
+      auto done = writer.pushSamples(day, (*words)[i].key, samples[i], offsets);
+      if (!done) return done;
+    }
+    return Done{};
   });
   if (!pushed) return complain(context, pushed.error().message, kWrong);
-  if (context.json) {
-    printJson(
-        context,
-        {{"key", arguments.key}, {"day", day}, {"offset", offset}, {"samples", values.size()}});
-  } else {
-    printLine(context, fmt::format("{} has {} more {} on {}", arguments.key, values.size(),
-                                   values.size() == 1 ? "sample" : "samples", dayName(day)));
+  Json entries = Json::array();
+  for (std::size_t i = 0; i < samples.size(); ++i) {
+    const std::string& key = (*words)[i].key;
+    const std::size_t count = samples[i].size();
+    if (context.json) {
+      entries.push_back({{"key", key}, {"day", day}, {"offset", offset}, {"samples", count}});
+    } else {
+      printLine(context, fmt::format("{} has {} more {} on {}", key, count,
+                                     count == 1 ? "sample" : "samples", dayName(day)));
+    }
   }
+  if (context.json) printRecorded(context, arguments, std::move(entries));
   return kSuccess;
 }
 
@@ -252,23 +302,27 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   };
   constexpr const char* kDay = "; today by default";
 
-  constexpr const char* kStoreKeyHelp = "Valid UTF-8 of 1 to 512 bytes without a zero byte";
-  Command command = store.add("set", "Set a scalar", setScalar);
+  constexpr const char* kStoreKeyHelp =
+      "Valid UTF-8 of 1 to 512 bytes without a zero byte; - for lines from standard input";
+  Command command = store.add("set", "Set scalars in one transaction", setScalars);
   command.argument(kStoreKeyValue, &arguments.key, kStoreKeyHelp);
-  command.argument({"VALUE", ValueKind::Number}, &arguments.value, "A 64-bit whole number");
+  command.optionalArgument({"VALUE", ValueKind::Number}, &arguments.values,
+                           "A 64-bit whole number; further pairs KEY VALUE may follow");
   addDay(command, kDay);
 
-  command = store.add("push", "Add samples to a distribution", pushSamples);
+  command = store.add("push", "Add samples to distributions in one transaction", pushSamples);
   command.argument(kStoreKeyValue, &arguments.key, kStoreKeyHelp);
-  command.argument({"VALUE", ValueKind::Number}, &arguments.values,
-                   "Numbers, inf or nan; -inf only after --, which ends the options");
+  command.optionalArgument(
+      {"VALUE", ValueKind::Number}, &arguments.values,
+      "Numbers, inf or nan; -inf only after --, which ends the options. Further "
+      "groups KEY VALUE... may follow, each after a +");
   addDay(command, kDay);
   command
       .option("--offset", {"S", ValueKind::Number}, &arguments.offset,
               "Second of the day; now by default")
       .within(0, 86399);
 
-  store.add("import", "Import CSV: kind,key,day,offset,value", import)
+  store.add("import", "Import CSV: kind,key,day,offset,value[,weight]", import)
       .argument(kFileValue, &arguments.file, "A file, or - for standard input");
 
   addDay(store.add("dump", "Print all rows as CSV, in the form that import reads", dump),

@@ -32,15 +32,16 @@ std::string_view StoreCsvParser::readQuoted(std::string_view& rest, std::size_t 
 }
 
 std::string_view StoreCsvParser::split(std::string_view record) {
+  fields_.back() = {};
   for (std::size_t field = 0;; ++field) {
-    if (field == kFields) return "more than five fields";
+    if (field == kFields) return "more than six fields";
     if (record.starts_with('"')) {
       if (const auto fault = readQuoted(record, field); !fault.empty()) return fault;
     } else {
       fields_[field] = record.substr(0, record.find(','));
       record.remove_prefix(fields_[field].size());
     }
-    if (record.empty()) return field + 1 < kFields ? "fewer than five fields" : "";
+    if (record.empty()) return field + 1 < kFieldsAtLeast ? "fewer than five fields" : "";
     record.remove_prefix(1);
   }
 }
@@ -48,9 +49,9 @@ std::string_view StoreCsvParser::split(std::string_view record) {
 std::string_view StoreCsvParser::parse(std::string_view record, StoreRow& row) {
   row = {};
   if (record.starts_with(kByteOrderMark)) record.remove_prefix(kByteOrderMark.size());
-  if (record.empty() || record == kStoreCsvHeader) return "";
+  if (record.empty() || record == kStoreCsvHeader || record == kWeightedCsvHeader) return "";
   if (const auto fault = split(record); !fault.empty()) return fault;
-  const auto& [kind, key, day, offset, value] = fields_;
+  const auto& [kind, key, day, offset, value, weight] = fields_;
   const bool isScalar = kind == "scalar";
   if (!isScalar && kind != "distribution") return "the kind is neither scalar nor distribution";
   if (key != checkedKey_ || key.empty()) {
@@ -63,6 +64,7 @@ std::string_view StoreCsvParser::parse(std::string_view record, StoreRow& row) {
   }
   if (isScalar) {
     if (!offset.empty()) return "a scalar has no offset";
+    if (!weight.empty()) return "a scalar has no weight";
     const auto number = parseInt64(value);
     if (!number) return "the value is not a whole number of 64 bits";
     row.scalar = *number;
@@ -73,6 +75,11 @@ std::string_view StoreCsvParser::parse(std::string_view record, StoreRow& row) {
     }
     const auto number = parseDouble(value);
     if (!number) return "the value is not a number that a double can hold";
+    const auto times = weight.empty() ? std::optional<std::int64_t>(1) : parseInt64(weight);
+    if (!times || *times < 1 || *times > std::numeric_limits<std::uint32_t>::max()) {
+      return "the weight is not a whole number from 1 to 4294967295";
+    }
+    row.weight = static_cast<std::uint32_t>(*times);
     row.offset = static_cast<std::uint32_t>(*seconds);
     row.sample = *number;
   }
@@ -92,23 +99,27 @@ std::string csvField(std::string_view text) {
   return quoted + '"';
 }
 
-void appendScalarRow(std::string& out, std::string_view field, std::int32_t day,
-                     std::int64_t value) {
+void appendScalarRow(std::string& out, std::string_view field, std::int32_t day, std::int64_t value,
+                     bool weighted) {
   out.append("scalar,").append(field) += ',';
   appendInt64(out, day);
   out += ",,";
   appendInt64(out, value);
-  out += '\n';
+  out += weighted ? ",\n" : "\n";
 }
 
 void appendSampleRow(std::string& out, std::string_view field, std::int32_t day,
-                     std::uint32_t offset, double value) {
+                     std::uint32_t offset, double value, std::optional<std::uint32_t> weight) {
   out.append("distribution,").append(field) += ',';
   appendInt64(out, day);
   out += ',';
   appendUInt64(out, offset);
   out += ',';
   appendDouble(out, value);
+  if (weight) {
+    out += ',';
+    appendUInt64(out, *weight);
+  }
   out += '\n';
 }
 

@@ -3,12 +3,15 @@
 
 #include <array>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 
 namespace tally::tools {
 
 constexpr std::string_view kStoreCsvHeader = "kind,key,day,offset,value";
+// Of a store in which samples count for more than one.
+constexpr std::string_view kWeightedCsvHeader = "kind,key,day,offset,value,weight";
 
 struct StoreRow {
   enum class Kind { None, Scalar, Distribution } kind = Kind::None;  // None: nothing to store
@@ -17,6 +20,7 @@ struct StoreRow {
   std::int64_t scalar = 0;
   std::uint32_t offset = 0;  // of a sample, seconds into the day
   double sample = 0;
+  std::uint32_t weight = 1;  // how many samples it stands for, 1 or more
 };
 
 class StoreCsvParser {
@@ -27,7 +31,7 @@ class StoreCsvParser {
   std::string_view parse(std::string_view record, StoreRow& row);
 
  private:
-  static constexpr std::size_t kFields = 5;
+  static constexpr std::size_t kFields = 6, kFieldsAtLeast = 5;  // the weight may be absent
   std::string_view split(std::string_view record);
   std::string_view readQuoted(std::string_view& rest, std::size_t field);
 
@@ -38,10 +42,10 @@ class StoreCsvParser {
 
 // The text as a field, in quotes where it must be.
 std::string csvField(std::string_view text);
-// Append a row; the field is csvField() of the key.
-void appendScalarRow(std::string& out, std::string_view field, std::int32_t day,
-                     std::int64_t value);
+// Append a row; the field is csvField() of the key. A weighted row has the column of weights.
+void appendScalarRow(std::string& out, std::string_view field, std::int32_t day, std::int64_t value,
+                     bool weighted);
 void appendSampleRow(std::string& out, std::string_view field, std::int32_t day,
-                     std::uint32_t offset, double value);
+                     std::uint32_t offset, double value, std::optional<std::uint32_t> weight);
 
 }  // namespace tally::tools

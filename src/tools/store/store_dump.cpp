@@ -41,7 +41,10 @@ void eachSample(DistributionValues& values, const Handler& handler) {
   double batch[kBatch];
   std::uint32_t offsets[kBatch];
   while (const std::size_t count = values.nextValues(batch, offsets, kBatch)) {
-    for (std::size_t i = 0; i < count; ++i) handler(offsets[i], batch[i]);
+    const auto weights = values.weights();
+    for (std::size_t i = 0; i < count; ++i) {
+      handler(offsets[i], batch[i], weights.empty() ? 1 : weights[i]);
+    }
   }
 }
 
@@ -57,11 +60,12 @@ void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bo
   const auto fieldOf = [forPerson](std::string_view key) {
     return csvField(forPerson ? printable(key) : std::string(key));
   };
-  output.text().append(kStoreCsvHeader) += '\n';
+  const bool weighted = history.hasWeights();
+  output.text().append(weighted ? kWeightedCsvHeader : kStoreCsvHeader) += '\n';
   history.enumerateScalars(
       range.keyPrefix, range.minimumDay, range.maximumDay,
       [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
-        appendScalarRow(output.text(), fieldOf(key), day, value);
+        appendScalarRow(output.text(), fieldOf(key), day, value, weighted);
         stop = output.failed();
       });
   history.enumerateDistributions(
@@ -69,8 +73,9 @@ void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bo
       [&](std::string_view key, std::int32_t day, DistributionValues& values, bool& stop) {
         const std::string field = fieldOf(key);
         stop = output.failed();
-        eachSample(values, [&](std::uint32_t offset, double value) {
-          appendSampleRow(output.text(), field, day, offset, value);
+        eachSample(values, [&](std::uint32_t offset, double value, std::uint32_t weight) {
+          appendSampleRow(output.text(), field, day, offset, value,
+                          weighted ? std::optional(weight) : std::nullopt);
         });
       });
 }
@@ -104,7 +109,7 @@ void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
         separator = ",\n  ";
         output.text() += ", \"samples\": [";
         const char* comma = "";
-        eachSample(values, [&](std::uint32_t offset, double value) {
+        eachSample(values, [&](std::uint32_t offset, double value, std::uint32_t weight) {
           std::string& text = output.text();
           text.append(comma) += '[';
           comma = ", ";
@@ -113,7 +118,12 @@ void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
           const char* quote = std::isfinite(value) ? "" : "\"";
           text += quote;
           appendDouble(text, value);
-          text.append(quote) += ']';
+          text += quote;
+          if (weight != 1) {
+            text += ", ";
+            appendUInt64(text, weight);
+          }
+          text += ']';
         });
         output.text() += "]}";
       });

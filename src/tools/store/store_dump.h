@@ -23,7 +23,8 @@ struct DumpRange {
 // that what is printed cannot be imported where there are any.
 void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson);
 // {"scalars": [{"key", "day", "value"}], "distributions": [{"key", "day", "samples": [[offset,
-// value]]}]}; a value that JSON cannot carry is the string "inf", "-inf" or "nan".
+// value]]}]}; a sample that counts for more than one has its weight as a third number. A value that
+// JSON cannot carry is the string "inf", "-inf" or "nan".
 void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out);
 
 }  // namespace tally::tools

@@ -60,7 +60,7 @@ Status store(StoreImporter& importer, const StoreRow& row, ImportResult& result)
       return importer.addScalar(row.day, row.key, row.scalar);
     case StoreRow::Kind::Distribution:
       ++result.samples;
-      return importer.addSample(row.day, row.key, row.offset, row.sample);
+      return importer.addSample(row.day, row.key, row.offset, row.sample, row.weight);
     default:
       return Done{};
   }
