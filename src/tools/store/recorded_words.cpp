@@ -1,5 +1,6 @@
 #include "tools/store/recorded_words.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <string_view>

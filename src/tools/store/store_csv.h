@@ -44,8 +44,9 @@ class StoreCsvParser {
 std::string csvField(std::string_view text);
 // Append a row; the field is csvField() of the key. A weighted row has the column of weights.
 void appendScalarRow(std::string& out, std::string_view field, std::int32_t day, std::int64_t value,
-                     bool weighted);
+                     bool weighted = false);
 void appendSampleRow(std::string& out, std::string_view field, std::int32_t day,
-                     std::uint32_t offset, double value, std::optional<std::uint32_t> weight);
+                     std::uint32_t offset, double value,
+                     std::optional<std::uint32_t> weight = std::nullopt);
 
 }  // namespace tally::tools

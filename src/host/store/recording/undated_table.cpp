@@ -9,18 +9,19 @@
 namespace tally {
 namespace {
 
-constexpr std::int64_t kDaysKept = 30;
+constexpr std::int64_t kDaysWaiting = 30;
 constexpr std::int64_t kMostBytes = 8 << 20;
 constexpr std::int64_t kBytesOfRow = 128;  // beside its samples and its key
 
-using Kind = RecordedChange::Kind;
+using ChangeKind = RecordedChange::Kind;
 // As the column says it; never renumbered.
 constexpr struct {
-  Kind kind;
+  ChangeKind kind;
   std::int64_t number;
-} kKinds[] = {{Kind::Add, 0}, {Kind::Set, 1}, {Kind::Samples, 2}, {Kind::Move, 3}};
+} kKinds[] = {
+    {ChangeKind::Add, 0}, {ChangeKind::Set, 1}, {ChangeKind::Samples, 2}, {ChangeKind::Move, 3}};
 
-std::int64_t numberOf(Kind kind) {
+std::int64_t numberOf(ChangeKind kind) {
   for (const auto& entry : kKinds) {
     if (entry.kind == kind) return entry.number;
   }
@@ -46,7 +47,7 @@ std::optional<UndatedChange> parseChange(const Statement& row, int first) {
   change.secondsSinceBoot = row.integer(first);
   change.value = row.integer(first + 3);
   change.user = row.integer(first + 4);
-  if (change.kind != Kind::Samples) return change;
+  if (change.kind != ChangeKind::Samples) return change;
   SampleVectors samples;
   if (!unpackSamples(row.blob(first + 5), PackedColumns::All, samples)) return std::nullopt;
   change.values = std::move(samples.values);
@@ -86,7 +87,7 @@ Status addUndatedChange(Database& database, std::string_view boot, std::int64_t 
       .bind(4, change.key)
       .bind(5, change.value)
       .bind(7, change.user);
-  if (change.kind != Kind::Samples) return add->run() ? Status(Done{}) : database.error();
+  if (change.kind != ChangeKind::Samples) return add->run() ? Status(Done{}) : database.error();
   for (std::size_t first = 0; first < change.samples.values.size(); first += kMostPackedSamples) {
     const auto blob = packSamples(slice(change.samples, first, kMostPackedSamples));
     if (!add->bind(6, std::span(blob)).run()) return database.error();
@@ -142,7 +143,7 @@ Result<std::uint64_t> forgetUndatedChanges(Database& database, std::optional<std
     auto counted =
         run("UPDATE undated SET first_day = ?1 WHERE first_day IS NULL OR first_day > ?1", *today);
     if (!counted) return counted.error();
-    auto removed = run("DELETE FROM undated WHERE first_day <= ?1", *today - kDaysKept);
+    auto removed = run("DELETE FROM undated WHERE first_day <= ?1", *today - kDaysWaiting);
     if (!removed) return removed.error();
     forgotten += static_cast<std::uint64_t>(database.changes());
   }
