@@ -58,8 +58,8 @@ class RecorderMoment {
 };
 
 std::optional<RecorderMoment> askForMoment(const ToolContext& context) {
-  constexpr std::chrono::seconds kPatience{5};
-  const auto answer = askRecorder(DeviceRoot(context.root), "status", kPatience);
+  constexpr std::chrono::seconds kLongestWait{5};
+  const auto answer = askRecorder(DeviceRoot(context.root), "status", kLongestWait);
   if (!answer) {
     const int error = answer.error().systemError;
     complain(context,
