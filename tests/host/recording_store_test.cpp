@@ -182,6 +182,7 @@ TEST_F(RecordingStoreTest, SamplesKeepTheirOrderAndWeightsWhereverTheyLie) {
   store()->TBClientCheckpoint();
   EXPECT_EQ(sql("SELECT group_concat(number) FROM arrivals"), "100") << "a damaged row stays";
   sql("DELETE FROM arrivals");
+  sql("INSERT INTO packed VALUES (20514, 'd', 50, 1, 1, x'01')");
   check("folded");
   ASSERT_TRUE(add(3, 2));
   store()->TBClientCheckpoint();

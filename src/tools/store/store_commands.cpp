@@ -90,12 +90,13 @@ int setScalars(const ToolContext& context, const StoreArguments& arguments) {
     numbers.push_back(*value);
   }
   const std::int32_t day = given.value_or(context.platform->metricsStore->TBDaysSince1970());
-  const Status set = writeStore(context, [&](StoreWriter& writer) -> Status {
+  const auto setAll = [&](StoreWriter& writer) -> Status {
     for (std::size_t i = 0; i < numbers.size(); ++i) {
       if (auto done = writer.setScalar(day, (*words)[i].key, numbers[i]); !done) return done;
     }
     return Done{};
-  });
+  };
+  const Status set = words->empty() ? Status(Done{}) : writeStore(context, setAll);
   if (!set) return complain(context, set.error().message, kWrong);
   Json entries = Json::array();
   for (std::size_t i = 0; i < numbers.size(); ++i) {
@@ -129,14 +130,15 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
   const std::int32_t day = given.value_or(today);
   const std::uint32_t offset = arguments.offset.value_or(
       static_cast<std::uint32_t>(now - static_cast<double>(today) * kSecondsPerDay));
-  const Status pushed = writeStore(context, [&](StoreWriter& writer) -> Status {
+  const auto pushAll = [&](StoreWriter& writer) -> Status {
     for (std::size_t i = 0; i < samples.size(); ++i) {
       const std::vector<std::uint32_t> offsets(samples[i].size(), offset);
       auto done = writer.pushSamples(day, (*words)[i].key, samples[i], offsets);
       if (!done) return done;
     }
     return Done{};
-  });
+  };
+  const Status pushed = words->empty() ? Status(Done{}) : writeStore(context, pushAll);
   if (!pushed) return complain(context, pushed.error().message, kWrong);
   Json entries = Json::array();
   for (std::size_t i = 0; i < samples.size(); ++i) {
