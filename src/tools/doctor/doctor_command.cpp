@@ -7,6 +7,7 @@
 #include "tools/doctor/health_drivers.h"
 #include "tools/doctor/health_files.h"
 #include "tools/doctor/health_kernel.h"
+#include "tools/doctor/health_recorder.h"
 #include "tools/doctor/health_services.h"
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"
@@ -55,6 +56,7 @@ Json jsonOf(const HealthChecks& checks) {
 int examine(const ToolContext& context) {
   HealthChecks checks;
   examineFiles(context, checks);
+  examineRecorder(context, checks);
   examineServices(context, checks);
   examineDrivers(context, checks);
   examineKernelSources(context, checks);

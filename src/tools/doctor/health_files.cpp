@@ -13,6 +13,7 @@
 #include "host/store/store_schema.h"
 #include "host/system/device_information.h"
 #include "kv/plist_codec.h"
+#include "tools/doctor/error_collector.h"
 #include "tools/frame/output.h"
 #include "tools/frame/spelling.h"
 #include "tools/report/daily_log.h"
@@ -20,17 +21,6 @@
 
 namespace tally::tools {
 namespace {
-
-// Keeps the errors that a check provokes, so that they appear among its findings.
-class ErrorCollector final : public SystemLog {
- public:
-  ErrorCollector() : SystemLog(Repeats::All) {}
-  std::vector<std::string> errors;
-  bool enabled(LogLevel level) const override { return level == LogLevel::Error; }
-  void write(LogLevel level, std::string_view message) override {
-    if (enabled(level)) errors.emplace_back(message);
-  }
-};
 
 void examineRoot(const DeviceRoot& root, HealthChecks& checks) {
   const auto directory = root.open("/");
