@@ -117,9 +117,8 @@ class Documents(unittest.TestCase):
         shown = re.findall(r"^\| `(\w+)` \| (\w+)[^|]*\| ([^|]+?) \|", text.split("Device queries:")[0], re.M)
         self.assertEqual(read, shown)
 
-    @unittest.skipUnless(shutil.which("man"), "man is missing")
-    def test_the_whitelist_for_makers_admits_what_a_linux_device_sweeps(self):
-        """Every daily key of the table, and none that the sweep cannot store."""
+    def test_the_whitelist_for_makers_admits_what_a_linux_device_sweeps_and_what_recorders_lack(self):
+        """Every daily key of the tables, and none that the sweep or the recorder cannot store."""
         rows = [row.split("|") for row in (TOP / "docs/linux.md").read_text().splitlines() if row.startswith("| `")]
         kinds = re.search(r"kind of a wakeup source: (.*?)\. ", (TOP / "docs/linux.md").read_text())[1]
         swept = {f"vellum.hwreport.{key}".replace("#", str(number)).replace("%", kind)
@@ -128,6 +127,9 @@ class Documents(unittest.TestCase):
         whitelist = plistlib.loads((TOP / "packaging/Whitelist_Nimbus.plist").read_bytes())
         listed = [key for group in whitelist.values() for key in group["ScalarKeys"]]
         self.assertEqual({key for key in listed if key.startswith("vellum.hwreport.")}, swept)
+        refused = re.findall(r'"(vellum\.tallyd\.[^"]+)"', (TOP / "src/recorder/refusal.h").read_text())
+        self.assertGreater(len(refused), 20)
+        self.assertEqual({key for key in listed if key.startswith("vellum.tallyd.")}, set(refused))
         self.assertEqual(len(listed), len(set(listed)))
         self.assertTrue(all(set(group) == {"ScalarKeys"} for group in whitelist.values()))
 
@@ -145,6 +147,7 @@ class Documents(unittest.TestCase):
         documented = (TOP / "docs/commands.md").read_text().split("## tallyctl\n\n")[1]
         self.assertTrue(documented.startswith(expected), f"docs/commands.md needs this table:\n{expected}")
 
+    @unittest.skipUnless(shutil.which("man"), "man is missing")
     def test_manual_pages_are_sound(self):
         pages = [path for path in (TOP / "packaging/man").iterdir() if path.suffix != ".in"]
         pages += [path for path in (BIN.parent / "packaging/man").glob("*.[1-8]")]
