@@ -4,7 +4,7 @@
 set(TALLYRUN_USER_TOOLS "systemd | systemd-standalone-sysusers | systemd-sysusers, \
 systemd | systemd-standalone-tmpfiles | systemd-tmpfiles")
 set(TALLYRUN_PACKAGES
-  "tallyrun|tallyrun|admin|@USER@|once-a-day analytics job and its operator's tool"
+  "tallyrun|tallyrun|admin|@USER@|once-a-day analytics job, recorder of metrics and operator's tool"
   "tallykv|libtallykv0|libs||property values of the telemetry libraries"
   "tallykv-dev|libtallykv-dev|libdevel|libtallykv0 (= @VERSION@)|property values of the telemetry libraries, development files"
   "hwreport|libhwreport0|libs|libtallykv0 (= @VERSION@)|statistics channels of drivers"

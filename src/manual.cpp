@@ -1,6 +1,7 @@
 // Writes a manual page from a template: the lines @OPTIONS@ and @COMMANDS@ become what the commands
-// of tallyctl declare, @ENTRIES@ the entries of the device description, and @WHITELIST_OPTIONS@ the
-// options of the whitelist. Runs when the project is built, and is not installed.
+// of tallyctl declare, @ENTRIES@ the entries of the device description, @WHITELIST_OPTIONS@ the
+// options of the whitelist, @RECORDER_SETTINGS@ the settings of the recorder, and @REFUSALS@ what
+// it counts. Runs when the project is built, and is not installed.
 #include <cstdio>
 #include <fstream>
 #include <iostream>
@@ -8,6 +9,8 @@
 
 #include "config/whitelist_options.h"
 #include "host/described/described_entries.h"
+#include "platform/tables/recorder_settings.h"
+#include "recorder/refusal.h"
 #include "tools/frame/command_help.h"
 #include "tools/frame/command_line.h"
 #include "tools/frame/output.h"
@@ -84,6 +87,36 @@ void writeCommand(std::ostream& out, const CommandHelp& help, bool isTop) {
   out << ".RE\n";
 }
 
+// A row of a table: its name, what kind of value it has, and its meaning.
+void writeEntry(std::ostream& out, std::string_view name, const std::string& kind,
+                std::string meaning) {
+  std::erase(meaning, '`');
+  out << ".TP\n\\fB" << roff(std::string(name)) << "\\fR" << (kind.empty() ? "" : " (" + kind + ")")
+      << '\n'
+      << roff(sentence(std::move(meaning))) << '\n';
+}
+
+void writeRecorderSettings(std::ostream& out) {
+  for (const tally::RecorderNumberRow& row : tally::kRecorderNumbers) {
+    writeEntry(out, row.name,
+               "integer, " + std::to_string(row.least) + " to " + std::to_string(row.most) + "; " +
+                   std::to_string(row.fallback) + " if unset",
+               std::string(row.meaning));
+  }
+  for (const tally::RecorderTextRow& row : tally::kRecorderTexts) {
+    writeEntry(out, row.name, std::string(row.form), std::string(row.meaning));
+  }
+}
+
+void writeRefusals(std::ostream& out) {
+  for (const tally::RefusalRow& row : tally::kRefusals) {
+    writeEntry(out, row.key, "", std::string(row.meaning));
+  }
+  for (const tally::RefusalRow& row : tally::kRecorderCounts) {
+    writeEntry(out, row.key, "", std::string(row.meaning));
+  }
+}
+
 }  // namespace
 
 int main(int count, char** arguments) {
@@ -105,21 +138,20 @@ int main(int count, char** arguments) {
       }
     } else if (text == "@ENTRIES@") {
       for (const tally::DescribedEntry& entry : tally::kDescribedEntries) {
-        std::string answers(entry.answers);
-        std::erase(answers, '`');
-        out << ".TP\n\\fB" << roff(std::string(entry.name)) << "\\fR ("
-            << tally::tools::typeName(entry.type) << ")\n"
-            << roff(sentence(answers)) << '\n';
+        writeEntry(out, entry.name, std::string(tally::tools::typeName(entry.type)),
+                   std::string(entry.answers));
       }
     } else if (text == "@WHITELIST_OPTIONS@") {
       for (const tally::WhitelistOption& option : tally::whitelistOptions()) {
         const bool isNumber = option.value == tally::OptionValue::WholeNumber;
         std::string meaning = std::string(isNumber ? "A whole number: " : "An array of numbers: ");
         meaning += option.meaning;
-        std::erase(meaning, '`');
-        out << ".TP\n\\fB" << roff(std::string(option.name)) << "\\fR\n"
-            << roff(sentence(meaning)) << '\n';
+        writeEntry(out, option.name, "", std::move(meaning));
       }
+    } else if (text == "@RECORDER_SETTINGS@") {
+      writeRecorderSettings(out);
+    } else if (text == "@REFUSALS@") {
+      writeRefusals(out);
     } else {
       out << text << '\n';
     }

@@ -11,7 +11,9 @@ from device import BIN, Device, LAST_DAY, PROGRAM_DOMAIN as NAME, TODAY, checked
 
 BUILD = BIN.parent
 DATA = {"var", "Library"}  # what a device recorded stays
-TIMER_LINK = "etc/systemd/system/timers.target.wants/tallyrun-day.timer"
+WANTED = "etc/systemd/system"
+TIMER_LINK = f"{WANTED}/timers.target.wants/tallyrun-day.timer"
+SOCKET_LINKS = {f"{WANTED}/sockets.target.wants/{name}.socket" for name in ("tallyd", "tallyd-control")}
 LIBRARIES = {"libtallykv0": "libtallykv.so.0", "libhwreport0": "libhwreport.so.0",
              "libtallystorage0": "libtallystorage.so.0", "libtallyclient0": "libtallyclient.so.0"}
 # Files that packages of the first release had at other paths.
@@ -50,15 +52,19 @@ class Package(unittest.TestCase):
         before = self.files(root)
         self.dpkg(root, "-i", self.package)
         # The programs' manual pages are lintian's.
-        wanted = ["Library/Preferences", TIMER_LINK, *(f"usr/{path}" for path in (
+        wanted = ["Library/Preferences", TIMER_LINK, *SOCKET_LINKS, *(f"usr/{path}" for path in (
             "bin/tallyctl", "lib/systemd/system/tallyrun.service", "lib/systemd/system/tallyrun-day.timer",
             "lib/systemd/system/tallyrun-counters.service",
+            "bin/tallyd", "lib/systemd/system/tallyd.service", "lib/systemd/system/tallyd-udp.socket",
             "libexec/tallyrun-nvme-health", "lib/systemd/system/tallyrun-nvme-health.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
             "share/tallyrun/Whitelist_Nimbus.plist", "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
             "share/doc/tallyrun/docs/security.md", "share/doc/tallyrun/SECURITY.md"))]
         self.assertLessEqual(set(wanted), self.files(root))
+        # UDP senders are anonymous: it is the administrator's choice.
+        enabled = {path for path in self.files(root) if path.startswith(f"{WANTED}/sockets.target.wants/")}
+        self.assertEqual(enabled, SOCKET_LINKS)
         self.assertEqual(os.readlink(root / TIMER_LINK), "/usr/lib/systemd/system/tallyrun-day.timer")
         user = re.search(r"^mobile:x:(\d+):", (root / "etc/passwd").read_text(), re.M)
         self.assertEqual((root / "var/mobile").stat().st_uid, int(user[1]))
@@ -136,8 +142,8 @@ class Package(unittest.TestCase):
             exposure = checked("systemd-analyze", "security", "--offline=true", "--threshold=30", unit)
             self.assertRegex(exposure, "Overall exposure level")
         result = subprocess.run(["systemd-analyze", "verify", "--man=no",
-                                 *map(str, units.glob("tallyrun*"))], capture_output=True, check=False)
-        complaints = [line for line in result.stderr.decode().splitlines() if "tallyrun" in line]
+                                 *map(str, units.glob("tally*"))], capture_output=True, check=False)
+        complaints = [line for line in result.stderr.decode().splitlines() if "tally" in line]
         self.assertEqual((result.returncode, complaints), (0, []), result.stderr)
 
     @unittest.skipUnless(shutil.which("lintian"), "lintian is missing")
