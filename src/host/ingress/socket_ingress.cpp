@@ -333,8 +333,8 @@ Status SocketIngress::setDeadline(std::optional<std::int64_t> delay) {
   if (delay) next = now_ + std::max<std::int64_t>(*delay, 0);
   if (!next && !armed_) return Done{};
   if (next && armed_ && std::abs(*next - *armed_) < kMillisecond) return Done{};
-  // Never reached; it is read when somebody sets the clock.
-  constexpr std::int64_t kNever = std::numeric_limits<time_t>::max();
+  // The end of the year 9999. It is read when somebody sets the clock.
+  constexpr std::int64_t kNever = 253402300799;
   if (auto set = setTimer(clockStep_.get(), TFD_TIMER_ABSTIME | TFD_TIMER_CANCEL_ON_SET,
                           next ? kNever : 0, 0);
       !set) {
