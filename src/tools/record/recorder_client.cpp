@@ -15,7 +15,7 @@ namespace tally::tools {
 namespace {
 
 using std::chrono::steady_clock;
-constexpr std::chrono::seconds kPatience{5};
+constexpr std::chrono::seconds kQueuePatience{5};
 constexpr std::chrono::milliseconds kLongestPause{20};
 
 constexpr std::size_t kBufferBytes = 8000;  // fewer than the library's buffer has for lines
@@ -66,7 +66,7 @@ Status RecorderClient::push(const std::string& key, std::span<const double> valu
 }
 
 Status RecorderClient::deliver() {
-  const auto end = steady_clock::now() + kPatience;
+  const auto end = steady_clock::now() + kQueuePatience;
   std::chrono::milliseconds pause{1};
   int fault = tallyclient_flush(client_.get());
   while (fault == EAGAIN && steady_clock::now() < end) {
@@ -76,7 +76,7 @@ Status RecorderClient::deliver() {
   }
   if (fault == EAGAIN) {
     return Error{fmt::format("not recorded: the queue of {} was full for {} seconds", path_,
-                             kPatience.count()),
+                             kQueuePatience.count()),
                  fault};
   }
   if (fault == ENOENT || fault == ECONNREFUSED) {
