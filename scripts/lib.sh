@@ -17,7 +17,12 @@ if [ -z "${CCACHE_DIR:-}" ] && ! [ -w "${HOME:-/nonexistent}" ]; then
 fi
 
 # What tests use if it is installed: without it they are skipped, and say so.
-optional_test_packages=(rustc)
+optional_test_packages=(
+  rustc gccgo
+  netcat-openbsd socat python3-statsd python3-aiodogstatsd libnet-statsd-perl ruby-statsd npm
+)
+# The same from npm, below build/npm-clients.
+optional_npm_packages=(unix-dgram@2.0.7 hot-shots@17.1.1 node-statsd@0.1.1)
 
 say() { printf '\n== %s\n' "$*"; }
 fail() {
