@@ -1,6 +1,7 @@
 // The whitelist: as a file of any bytes, or as a property list of any shape; then keys looked up.
 #include <string>
 
+#include "config/metric_table.h"
 #include "config/whitelist.h"
 #include "fakes/fake_platform.h"
 #include "fuzz_values.h"
@@ -45,6 +46,17 @@ void lookUp(const Whitelist& config, const KvDictionary& root, std::string_view 
           "the longest prefix matches");
 }
 
+// The same bytes as a table of metrics.
+void readMetrics(std::string_view bytes) {
+  MetricTable table;
+  table.parse(bytes, "Metrics", [](const std::string&) {});
+  table.finish();
+  require(table.below("").metrics == table.keyCount() + table.prefixCount(), "all begin with \"\"");
+  const Metric* const metric = table.find("vellum.a");
+  require(metric == nullptr || std::string_view("vellum.a").starts_with(metric->key->view()),
+          "what is found is the key or a prefix");
+}
+
 }  // namespace
 
 FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
@@ -53,6 +65,7 @@ FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
   const auto scope = fake.install();
   WhitelistFile file;
   if (fuzz::isDocument(input.rest())) {
+    readMetrics(input.rest());
     file = parseWhitelistFile(input.rest());
   } else {
     file.read = true;

@@ -1,8 +1,10 @@
-// KeyTable: whitelisted keys or key prefixes of one kind, with their options.
+// KeyTable: entries by whole key or by longest prefix.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "base/hash.h"
@@ -10,27 +12,68 @@
 
 namespace tally {
 
-struct WhitelistEntry {
-  KvRef<KvString> key;  // the exact key, or the prefix
-  KvRef<KvDictionary> options;
-  KvRef<KvString> group;  // the group that it was taken from
-};
-
+// An entry has a string value `key`: the whole key, or the prefix.
+template <class Entry>
 class KeyTable {
  public:
   // Reserves capacity for this many further entries.
-  void reserve(std::size_t further);
-  // Adds an entry; it replaces one of the same key from an earlier group.
-  void set(WhitelistEntry entry);
+  void reserve(std::size_t further) {
+    // Called for every section: at least doubles, so that a file of many small groups does not copy
+    // all entries each time.
+    const std::size_t wanted = entries_.size() + further;
+    if (wanted > entries_.capacity()) entries_.reserve(std::max(wanted, entries_.capacity() * 2));
+    positions_.reserve(wanted);
+  }
+  // Adds an entry; it replaces one of the same key that was added earlier.
+  void set(Entry entry) {
+    const std::string_view key = entry.key->view();
+    const std::uint32_t hash = hashBytes(key);
+    if (const auto present = position(key, hash); present != HashIndex::kNone) {
+      entries_[present] = std::move(entry);
+      return;
+    }
+    positions_.add(hash, static_cast<std::uint32_t>(entries_.size()));
+    entries_.push_back(std::move(entry));
+  }
   // Must be called before longestPrefix(), and after the last set().
-  void buildPrefixIndex();
+  void buildPrefixIndex() {
+    sorted_.clear();
+    for (std::uint32_t i = 0; i < entries_.size(); ++i) sorted_.push_back({i, kNone});
+    std::sort(sorted_.begin(), sorted_.end(),
+              [this](const auto& a, const auto& b) { return prefixOf(a) < prefixOf(b); });
+    for (std::uint32_t i = 1; i < sorted_.size(); ++i) {
+      std::uint32_t candidate = i - 1;
+      while (candidate != kNone &&
+             !prefixOf(sorted_[i]).starts_with(prefixOf(sorted_[candidate]))) {
+        candidate = sorted_[candidate].parent;
+      }
+      sorted_[i].parent = candidate;
+    }
+  }
 
   // Null when there is none.
-  const WhitelistEntry* exact(std::string_view key) const;
+  const Entry* exact(std::string_view key) const {
+    if (entries_.empty()) return nullptr;
+    const auto found = position(key, hashBytes(key));
+    return found != HashIndex::kNone ? &entries_[found] : nullptr;
+  }
   // The longest entry that is a prefix of the key; null when there is none. Takes logarithmic time,
   // and a step for each further entry nested inside it.
-  const WhitelistEntry* longestPrefix(std::string_view key) const;
-  const std::vector<WhitelistEntry>& entries() const { return entries_; }
+  const Entry* longestPrefix(std::string_view key) const {
+    // Every entry that sorts between a prefix of the key and the key itself begins with that
+    // prefix, so the last entry not after the key is the longest match, or one of its parents is.
+    const auto after = std::upper_bound(
+        sorted_.begin(), sorted_.end(), key,
+        [this](std::string_view wanted, const auto& item) { return wanted < prefixOf(item); });
+    auto position =
+        after == sorted_.begin() ? kNone : static_cast<std::uint32_t>(after - sorted_.begin() - 1);
+    while (position != kNone) {
+      if (key.starts_with(prefixOf(sorted_[position]))) return &entries_[sorted_[position].entry];
+      position = sorted_[position].parent;
+    }
+    return nullptr;
+  }
+  const std::vector<Entry>& entries() const { return entries_; }
 
  private:
   static constexpr std::uint32_t kNone = UINT32_MAX;
@@ -41,7 +84,10 @@ class KeyTable {
   std::uint32_t position(std::string_view key, std::uint32_t hash) const {
     return positions_.find(hash, [&](auto i) { return entries_[i].key->view() == key; });
   }
-  std::vector<WhitelistEntry> entries_;
+  std::string_view prefixOf(const SortedPrefix& item) const {
+    return entries_[item.entry].key->view();
+  }
+  std::vector<Entry> entries_;
   HashIndex positions_;
   std::vector<SortedPrefix> sorted_;
 };

@@ -53,7 +53,7 @@ class Whitelist::Loader final : public WhitelistVisitor {
  private:
   Platform& platform_;
   SystemLog& log_;
-  KeyTable* const tables_[kWhitelistSections];  // in the order of WhitelistSection
+  Entries* const tables_[kWhitelistSections];  // in the order of WhitelistSection
 };
 
 Whitelist::Whitelist(Platform& platform)
@@ -85,8 +85,8 @@ std::unique_ptr<Whitelist> Whitelist::fromFile(Platform& platform, const Whiteli
   return whitelist;
 }
 
-WhitelistMatch Whitelist::match(std::string_view key, const KeyTable& keys,
-                                const KeyTable& prefixes) const {
+WhitelistMatch Whitelist::match(std::string_view key, const Entries& keys,
+                                const Entries& prefixes) const {
   if (const WhitelistEntry* entry = keys.exact(key)) {
     return {WhitelistMatchKind::Exact, entry, entry->options.get()};
   }

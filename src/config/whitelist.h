@@ -44,13 +44,14 @@ class Whitelist {
  private:
   explicit Whitelist(Platform& platform);
   class Loader;
-  WhitelistMatch match(std::string_view key, const KeyTable& keys, const KeyTable& prefixes) const;
+  using Entries = KeyTable<WhitelistEntry>;
+  WhitelistMatch match(std::string_view key, const Entries& keys, const Entries& prefixes) const;
   const ScalarOptions* logged(const WhitelistMatch& match, std::string_view key) const;
 
   SystemLog& log_;
   const bool isInternalDevice_;
   std::string fileDigest_;
-  KeyTable scalarKeys_, scalarPrefixes_, distributionKeys_, distributionPrefixes_;
+  Entries scalarKeys_, scalarPrefixes_, distributionKeys_, distributionPrefixes_;
   KvRef<KvDictionary> noOptions_ = KvDictionary::create();
 };
 

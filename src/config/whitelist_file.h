@@ -6,7 +6,6 @@
 #include <string>
 #include <string_view>
 
-#include "config/key_table.h"
 #include "kv/value.h"
 #include "platform/platform.h"
 
@@ -26,6 +25,12 @@ struct WhitelistFile {
 };
 WhitelistFile loadWhitelistFile(Platform& platform);
 WhitelistFile parseWhitelistFile(std::string_view bytes);
+
+struct WhitelistEntry {
+  KvRef<KvString> key;  // the exact key, or the prefix
+  KvRef<KvDictionary> options;
+  KvRef<KvString> group;  // the group that it was taken from
+};
 
 enum class WhitelistSection {
   ScalarKeys,
