@@ -8,6 +8,7 @@
 
 #include "base/byte_reader.h"
 #include "hwreport/hwreport.h"
+#include "platform/tables/swept_metrics.h"
 #include "storage/auxiliary_metrics.h"
 #include "storage/nand_info.h"
 #include "storage/storage_log.h"
@@ -49,10 +50,8 @@ std::int64_t mebibytes(const KvDictionary* usage, std::string_view entry) {
 void sweepDiskUsage(DeviceInformation& device, StoreBatch& batch) {
   const auto answer = device.DeviceQuery("DiskUsage");
   const auto* usage = kvCast<KvDictionary>(answer.get());
-  batch.setScalar("vellum.dockyard.DiskUsageUserTotalBlocks",
-                  mebibytes(usage, kDOQDiskUsageTotalDiskCapacity));
-  batch.setScalar("vellum.dockyard.DiskUsageUserBlocksFree",
-                  mebibytes(usage, kDOQDiskUsageTotalDataAvailable));
+  batch.setScalar(kDiskCapacity.key, mebibytes(usage, kDOQDiskUsageTotalDiskCapacity));
+  batch.setScalar(kDiskFree.key, mebibytes(usage, kDOQDiskUsageTotalDataAvailable));
 }
 
 void sweepStorage(SystemLog& log, StoreBatch& batch) {

@@ -62,9 +62,10 @@ std::string sourceText(const MeasuredMetric& metric) {
 }
 
 TEST(DocumentTables, MeasuredMetrics) {
-  std::string table = "| key | measured from | unit |\n|---|---|---|\n";
+  std::string table = "| key | measured from | unit | meaning |\n|---|---|---|---|\n";
   for (const MeasuredMetric& metric : kMeasuredMetrics) {
-    table += fmt::format("| `{}` | {} | {} |\n", metric.key, sourceText(metric), metric.unit);
+    table += fmt::format("| `{}` | {} | {} | {} |\n", metric.key, sourceText(metric), metric.unit,
+                         metric.meaning);
   }
   expectInDocument("device-root.md", table);
 }
