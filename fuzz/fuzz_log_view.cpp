@@ -61,13 +61,22 @@ FUZZ_TARGET(log_view)(const std::uint8_t* data, std::size_t size) {
   const auto other = tools::DailyLog::of(shorter);
 
   Screen screen;
-  tools::printDailyLog(screen.context, *log, document);
+  // The log may say what its own keys mean.
+  MetricTable table;
+  for (const auto& entry : log->scalars()) {
+    const std::string text(kvText(entry.value.get()));
+    table.add({entry.key, std::nullopt, text, text, ""}, (entry.key->view().size() & 1) != 0);
+  }
+  table.finish();
+  const tools::KnownMetrics metrics(std::move(table));
+  tools::printDailyLog(screen.context, *log, document, metrics);
   for (const auto& entry : log->histograms()) {
     if (const auto* histogram = kvCast<KvDictionary>(entry.value.get())) {
       tools::printHistogram(screen.context, *histogram, 2);
     }
   }
-  tools::jsonOf(*log, document).dump(-1, ' ', false, tools::Json::error_handler_t::replace);
+  tools::jsonOf(*log, document, metrics)
+      .dump(-1, ' ', false, tools::Json::error_handler_t::replace);
   if (other) {
     tools::printLogDiff(screen.context, *log, *other);
     tools::jsonOfLogDiff(*log, *other);

@@ -34,6 +34,12 @@ void Table::add(std::vector<Cell> row) {
   rows_.push_back(std::move(row));
 }
 
+void Table::addNote(std::string text) {
+  Cell note(printable(text), Ink::Faint);
+  note.isNote = true;
+  rows_.push_back({std::move(note)});
+}
+
 bool Table::hasTitles() const {
   return std::ranges::any_of(columns_, [](const Column& column) { return !column.title.empty(); });
 }
@@ -46,7 +52,7 @@ Table::Layout Table::layout(const Terminal& terminal, std::size_t indent) const 
     least.push_back(column.shrinks ? kNarrowestText : SIZE_MAX);
   }
   for (const auto& row : rows_) {
-    for (std::size_t i = 0; i < row.size(); ++i) {
+    for (std::size_t i = 0; i < row.size() && !row[i].isNote; ++i) {
       layout.widths[i] = std::max(layout.widths[i], widthOf(row[i]));
       if (row[i].share) least[i] = kNarrowestBar;
     }
@@ -152,6 +158,15 @@ void Table::renderRunning(std::string& out, const Terminal& terminal, const std:
   out += '\n';
 }
 
+void Table::renderNote(std::string& out, const Terminal& terminal, const Cell& note,
+                       std::size_t indent) {
+  const auto lines =
+      terminal.interactive ? wrapped(note.text, terminal.columns - indent) : std::vector{note.text};
+  for (const std::string& line : lines) {
+    out.append(indent, ' ').append(inked(terminal, note.ink, line)) += '\n';
+  }
+}
+
 std::string Table::render(const Terminal& terminal, std::size_t indent) const {
   const Layout layout = this->layout(terminal, indent);
   std::string out;
@@ -161,7 +176,9 @@ std::string Table::render(const Terminal& terminal, std::size_t indent) const {
     renderRow(out, terminal, titles, layout, indent);
   }
   for (const auto& row : rows_) {
-    if (layout.fits) {
+    if (!row.empty() && row.front().isNote) {
+      renderNote(out, terminal, row.front(), indent + kGap);
+    } else if (layout.fits) {
       renderRow(out, terminal, row, layout, indent);
     } else if (hasTitles()) {
       renderTitled(out, terminal, row, indent);

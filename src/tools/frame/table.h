@@ -27,6 +27,7 @@ struct Cell {
   Ink ink = Ink::Plain;
   std::optional<double> share;  // of a bar
   std::size_t barColumns = 0;
+  bool isNote = false;
 };
 
 class Table {
@@ -34,6 +35,8 @@ class Table {
   explicit Table(std::vector<Column> columns) : columns_(std::move(columns)) {}
   // A row may be shorter than the columns.
   void add(std::vector<Cell> row);
+  // A line of its own below the row that was added last, across all columns.
+  void addNote(std::string text);
   bool empty() const { return rows_.empty(); }
   // The lines, each after so many blanks. On a terminal that is too narrow, columns that shrink are
   // wrapped, and when that is not enough each row becomes a block of lines. A file gets whole
@@ -54,6 +57,8 @@ class Table {
   // sequence.
   void renderTitled(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
                     std::size_t indent) const;
+  static void renderNote(std::string& out, const Terminal& terminal, const Cell& note,
+                         std::size_t indent);
   void renderRunning(std::string& out, const Terminal& terminal, const std::vector<Cell>& row,
                      std::size_t indent) const;
   std::vector<Column> columns_;

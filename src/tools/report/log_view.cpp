@@ -44,29 +44,61 @@ void printHeader(const ToolContext& context, const DailyLog& log, const KvDictio
   table.print(context);
 }
 
-void printScalars(const ToolContext& context, const DailyLog& log) {
+// A column of units for these keys, if any of them has one.
+Table tableWithUnits(std::vector<Column> columns, const KvDictionary& keys,
+                     const KnownMetrics& metrics) {
+  const bool areKnown = std::any_of(keys.begin(), keys.end(), [&](const KvDictionary::Entry& key) {
+    const Metric* const metric = metrics.find(key.key->view());
+    return metric != nullptr && !metric->unit.empty();
+  });
+  if (areKnown) columns.push_back({"unit"});
+  return Table(std::move(columns));
+}
+
+// A row that ends with the metric's unit, and its description below it; that of a prefix only below
+// the first of the rows that it describes.
+void addWithMetric(Table& table, std::vector<Cell> row, const Metric* metric,
+                   const Metric*& former) {
+  if (metric != nullptr && !metric->unit.empty()) row.emplace_back(metric->unit, Ink::Faint);
+  table.add(std::move(row));
+  if (metric != nullptr && metric != former && !metric->description.empty()) {
+    table.addNote(metric->description);
+  }
+  former = metric;
+}
+
+void printScalars(const ToolContext& context, const DailyLog& log, const KnownMetrics& metrics) {
   printHeading(context, "Scalars, " + counted(log.scalars().size(), "key"));
-  Table table({{"key", Align::Left, true}, {"value", Align::Right}});
+  Table table =
+      tableWithUnits({{"key", Align::Left, true}, {"value", Align::Right}}, log.scalars(), metrics);
+  const Metric* former = nullptr;
   for (const auto* entry : entriesByName(log.scalars())) {
-    table.add({std::string(entry->key->view()), numberText(entry->value.get())});
+    const std::string_view key = entry->key->view();
+    addWithMetric(table, {std::string(key), numberText(entry->value.get())}, metrics.find(key),
+                  former);
   }
   if (!table.empty()) table.print(context);
 }
 
-void printDistributions(const ToolContext& context, const DailyLog& log) {
+void printDistributions(const ToolContext& context, const DailyLog& log,
+                        const KnownMetrics& metrics) {
   printHeading(context, "Distributions, " + counted(log.distributions().size(), "key"));
-  Table table({{"key", Align::Left, true},
-               {"count", Align::Right},
-               {"min", Align::Right},
-               {"mean", Align::Right},
-               {"std dev", Align::Right},
-               {"max", Align::Right}});
+  Table table = tableWithUnits({{"key", Align::Left, true},
+                                {"count", Align::Right},
+                                {"min", Align::Right},
+                                {"mean", Align::Right},
+                                {"std dev", Align::Right},
+                                {"max", Align::Right}},
+                               log.distributions(), metrics);
+  const Metric* former = nullptr;
   for (const auto* entry : entriesByName(log.distributions())) {
     const std::string key(entry->key->view());
     if (const auto statistics = statisticsOf(entry->value.get())) {
-      table.add({key, integerText(statistics->count), realText(statistics->minimum),
-                 realText(statistics->mean), realText(statistics->standardDeviation()),
-                 realText(statistics->maximum)});
+      addWithMetric(table,
+                    {key, integerText(statistics->count), realText(statistics->minimum),
+                     realText(statistics->mean), realText(statistics->standardDeviation()),
+                     realText(statistics->maximum)},
+                    metrics.find(key), former);
     } else {
       table.add({key, Cell("damaged", Ink::Bad)});
     }
@@ -139,17 +171,21 @@ void printHistogram(const ToolContext& context, const KvDictionary& histogram, s
   print(context.out, table.render(context.output, indent));
 }
 
-void printDailyLog(const ToolContext& context, const DailyLog& log, const KvDictionary* options) {
+void printDailyLog(const ToolContext& context, const DailyLog& log, const KvDictionary* options,
+                   const KnownMetrics& metrics) {
   const auto day = log.day();
   printLine(context, "Daily log of " + (day ? dayName(*day) : std::string("an unknown day")),
             Ink::Strong);
   printHeader(context, log, options);
-  printScalars(context, log);
-  printDistributions(context, log);
+  printScalars(context, log, metrics);
+  printDistributions(context, log, metrics);
   printHeading(context, "Histograms, " + counted(log.histograms().size(), "key"));
   for (const auto* entry : entriesByName(log.histograms())) {
     const auto* histogram = kvCast<KvDictionary>(entry->value.get());
-    printLine(context, "  " + std::string(entry->key->view()));
+    const Metric* const metric = metrics.find(entry->key->view());
+    std::string title = "  " + std::string(entry->key->view());
+    if (metric != nullptr && !metric->unit.empty()) title += ", in " + metric->unit;
+    printLine(context, title);
     if (histogram != nullptr) {
       printHistogram(context, *histogram, 4);
     } else {
@@ -159,7 +195,7 @@ void printDailyLog(const ToolContext& context, const DailyLog& log, const KvDict
   printApplications(context, log);
 }
 
-Json jsonOf(const DailyLog& log, const KvDictionary* options) {
+Json jsonOf(const DailyLog& log, const KvDictionary* options, const KnownMetrics& metrics) {
   Json deviations = Json::object();
   for (const auto& entry : log.distributions()) {
     if (const auto statistics = statisticsOf(entry.value.get())) {
@@ -170,6 +206,17 @@ Json jsonOf(const DailyLog& log, const KvDictionary* options) {
   Json json = {{"document", jsonOf(&log.document())}, {"standardDeviations", deviations}};
   if (const auto day = log.day()) json["day"] = *day;
   json["options"] = jsonOf(options);
+  Json known = Json::object();
+  for (const KvDictionary* part : {&log.scalars(), &log.distributions()}) {
+    for (const auto& entry : *part) {
+      const Metric* const metric = metrics.find(entry.key->view());
+      const bool isSecond = part != &log.scalars() && log.scalars().contains(entry.key->view());
+      if (metric != nullptr && !isSecond) {
+        addMember(known, std::string(entry.key->view()), jsonOf(*metric));
+      }
+    }
+  }
+  if (!known.empty()) json["metrics"] = std::move(known);
   return json;
 }
 

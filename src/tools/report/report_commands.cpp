@@ -90,11 +90,11 @@ int preview(const ToolContext& context, const ReportArguments& arguments) {
     return kSuccess;
   }
   if (context.json) {
-    Json json = jsonOf(*log, made.options.get());
+    Json json = jsonOf(*log, made.options.get(), knownMetrics(context));
     json["submissionAllowed"] = allowed;
     printJson(context, json);
   } else {
-    printDailyLog(context, *log, made.options.get());
+    printDailyLog(context, *log, made.options.get(), knownMetrics(context));
   }
   return kSuccess;
 }
@@ -202,11 +202,11 @@ int showDailyLog(const ToolContext& context, const std::string& title, std::size
                  const DailyLog& content, const KvDictionary* options) {
   if (context.json) {
     Json json = {{"file", title}, {"bytes", bytes}};
-    json.update(jsonOf(content, options));
+    json.update(jsonOf(content, options, knownMetrics(context)));
     printJson(context, json);
     return kSuccess;
   }
-  printDailyLog(context, content, options);
+  printDailyLog(context, content, options, knownMetrics(context));
   print(context.out, "\n");
   printLine(context, fmt::format("{}, {}", title, byteText(bytes)), Ink::Faint);
   return kSuccess;

@@ -20,6 +20,20 @@ struct ExplainArguments {
   std::string day = "yesterday";
 };
 
+// What is known of the key, and whether the store contradicts it.
+void printMetric(const ToolContext& context, const KeyStory& story) {
+  if (story.metric == nullptr) return;
+  printLine(context, metricText(*story.metric));
+  if (!story.metric->type) return;
+  const bool scalar = isScalarType(*story.metric->type);
+  if (!(scalar ? story.distributionRows.empty() : story.scalarRows.empty())) {
+    printLine(context,
+              fmt::format("the store has it as a {}",
+                          kindName(scalar ? KeyKind::Distribution : KeyKind::Scalar)),
+              Ink::Doubtful);
+  }
+}
+
 void printRows(const ToolContext& context, const KeyStory& story) {
   printHeading(context, "In the store");
   if (story.scalarRows.empty() && story.distributionRows.empty()) {
@@ -38,7 +52,7 @@ void printRows(const ToolContext& context, const KeyStory& story) {
   if (!story.scalarRows.empty()) {
     Table table({{"day"}, {"scalar", Align::Right}});
     for (const ScalarRow& row : story.scalarRows) {
-      table.add({dayCell(row.day), integerText(row.value)});
+      table.add({dayCell(row.day), withUnit(integerText(row.value), story.metric)});
     }
     table.print(context);
   }
@@ -83,7 +97,7 @@ void printRounding(const ToolContext& context, const KeyStory& story) {
   if (!story.trace.scalarBefore) return;
   printHeading(context, "Rounding");
   printLine(context, fmt::format("  {}  {}", story.measured ? "measured now" : "stored",
-                                 integerText(*story.trace.scalarBefore)));
+                                 withUnit(integerText(*story.trace.scalarBefore), story.metric)));
   for (const RoundingStep& step : story.trace.steps) {
     printLine(context, fmt::format("  {} {}: {} becomes {}", step.option, step.setting,
                                    integerText(step.before), integerText(step.after)));
@@ -91,17 +105,18 @@ void printRounding(const ToolContext& context, const KeyStory& story) {
   if (story.trace.steps.empty()) printLine(context, "  no step: the value is reported unchanged");
 }
 
-void printValue(const ToolContext& context, const DailyLog& log, const std::string& key,
+void printValue(const ToolContext& context, const DailyLog& log, const KeyStory& story,
                 KeyKind kind) {
-  const KvObject* value = loggedValue(log, key, kind);
+  const KvObject* value = loggedValue(log, story.key, kind);
   if (value == nullptr) {
     printLine(context, fmt::format("  absent as a {}", kindName(kind)), Ink::Doubtful);
     return;
   }
   if (kind == KeyKind::Scalar) {
     const auto* number = kvCast<KvNumber>(value);
-    printLine(context, "  scalar " +
-                           (number != nullptr ? integerText(number->asInt64()) : valueText(value)));
+    printLine(context, "  scalar " + (number != nullptr
+                                          ? withUnit(integerText(number->asInt64()), story.metric)
+                                          : valueText(value)));
     return;
   }
   if (const auto statistics = statisticsOf(value)) {
@@ -109,11 +124,11 @@ void printValue(const ToolContext& context, const DailyLog& log, const std::stri
                                    counted(static_cast<std::uint64_t>(statistics->count), "sample"),
                                    realText(statistics->minimum), realText(statistics->mean),
                                    realText(statistics->standardDeviation()),
-                                   realText(statistics->maximum)));
+                                   withUnit(realText(statistics->maximum), story.metric)));
   } else {
     printLine(context, "  distribution: damaged", Ink::Bad);
   }
-  if (const auto* histogram = log.histograms().getAs<KvDictionary>(key)) {
+  if (const auto* histogram = log.histograms().getAs<KvDictionary>(story.key)) {
     printHistogram(context, *histogram, 4);
   }
 }
@@ -124,7 +139,7 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
   for (const KeyKind kind : story.kinds()) {
     const std::string reason = story.whyAbsent(kind);
     if (reason.empty() && next) {
-      printValue(context, *next, story.key, kind);
+      printValue(context, *next, story, kind);
     } else {
       printLine(context, fmt::format("  absent as a {}: {}", kindName(kind), reason),
                 Ink::Doubtful);
@@ -149,7 +164,7 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
     if (same && kind == KeyKind::Distribution) {
       printLine(context, "  the same distribution");
     } else {
-      printValue(context, log, story.key, kind);
+      printValue(context, log, story, kind);
     }
   }
   const auto* digest = story.submitted->content.document().getAs<KvString>("TBWhitelistDigest");
@@ -179,6 +194,7 @@ Json storyJson(const KeyStory& story) {
                {"similarKeys", story.similar},
                {"whitelist",
                 {{"scalar", jsonOf(story.scalar)}, {"distribution", jsonOf(story.distribution)}}}};
+  if (story.metric != nullptr) json["metric"] = jsonOf(*story.metric);
   if (story.trace.scalarBefore) {
     Json steps = Json::array();
     for (const RoundingStep& step : story.trace.steps) {
@@ -224,6 +240,7 @@ int explain(const ToolContext& context, const ExplainArguments& arguments) {
               Ink::Bad);
   }
   printLine(context, fmt::format("{} on {}", story.key, dayName(story.day)), Ink::Strong);
+  printMetric(context, story);
   printRows(context, story);
   printVerdicts(context, story);
   printRounding(context, story);

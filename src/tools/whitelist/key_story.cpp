@@ -102,8 +102,9 @@ std::string KeyStory::whyAbsent(KeyKind kind) const {
 }
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day) {
-  KeyStory story(*context.platform);
+  KeyStory story(context);
   story.key = key;
+  story.metric = story.metrics.find(key);
   story.day = day;
   story.measured = isMeasuredByReport(key);
   story.scalar = story.judge.judge(key, KeyKind::Scalar);

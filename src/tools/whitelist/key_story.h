@@ -9,6 +9,7 @@
 
 #include "report/distribution_summary.h"
 #include "report/log_values.h"
+#include "tools/metrics/known_metrics.h"
 #include "tools/report/daily_log.h"
 #include "tools/whitelist/whitelist_verdict.h"
 
@@ -24,8 +25,12 @@ struct DistributionRow {
 };
 
 struct KeyStory {
-  explicit KeyStory(Platform& platform) : judge(platform, loadWhitelistFile(platform)) {}
+  explicit KeyStory(const ToolContext& context)
+      : metrics(knownMetrics(context)),
+        judge(*context.platform, loadWhitelistFile(*context.platform)) {}
+  KnownMetrics metrics;
   std::string key;
+  const Metric* metric = nullptr;  // what is known of it; null: nothing
   std::int32_t day = 0;
   // Every row of the key that the store has, by day.
   std::vector<ScalarRow> scalarRows;
