@@ -1,6 +1,7 @@
 #include "tools/whitelist/whitelist_commands.h"
 
 #include <algorithm>
+#include <iterator>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <utility>
@@ -9,6 +10,8 @@
 #include "kv/plist_codec.h"
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"
+#include "tools/metrics/known_metrics.h"
+#include "tools/whitelist/metric_check.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_verdict.h"
 
@@ -33,6 +36,10 @@ std::string fileName(const WhitelistArguments& arguments) {
   return arguments.file.empty() ? std::string(kWhitelistPath) : arguments.file;
 }
 
+std::string prefixesText(std::size_t count) {
+  return count == 1 ? "1 prefix" : fmt::format("{} prefixes", count);
+}
+
 class EntryCounter final : public WhitelistVisitor {
  public:
   std::size_t groups = 0, entries[kWhitelistSections] = {};
@@ -47,8 +54,16 @@ std::size_t countOf(const std::vector<Finding>& findings, Severity severity) {
   return static_cast<std::size_t>(std::ranges::count(findings, severity, &Finding::severity));
 }
 
+// What a check read and found.
+struct Checked {
+  WhitelistFile file;
+  const MetricTable& metrics;
+  std::vector<Finding> findings;
+};
+
 void printCheckJson(const ToolContext& context, const WhitelistArguments& arguments,
-                    const WhitelistFile& file, const std::vector<Finding>& findings) {
+                    const Checked& checked) {
+  const auto& [file, metrics, findings] = checked;
   Json list = Json::array();
   for (const Finding& finding : findings) {
     Json item = {{"severity", finding.severity == Severity::Fault ? "fault" : "surprise"}};
@@ -62,15 +77,21 @@ void printCheckJson(const ToolContext& context, const WhitelistArguments& argume
     item["message"] = finding.message;
     list.push_back(std::move(item));
   }
-  printJson(context, {{"file", fileName(arguments)},
-                      {"digest", file.digest},
-                      {"faults", countOf(findings, Severity::Fault)},
-                      {"surprises", countOf(findings, Severity::Surprise)},
-                      {"findings", std::move(list)}});
+  Json document = {{"file", fileName(arguments)}, {"digest", file.digest}};
+  if (!metrics.files().empty()) {
+    document["metrics"] = {{"files", metrics.files()},
+                           {"keys", metrics.keyCount()},
+                           {"prefixes", metrics.prefixCount()}};
+  }
+  document["faults"] = countOf(findings, Severity::Fault);
+  document["surprises"] = countOf(findings, Severity::Surprise);
+  document["findings"] = std::move(list);
+  printJson(context, document);
 }
 
 void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
-                const WhitelistFile& file, const std::vector<Finding>& findings) {
+                const Checked& checked) {
+  const auto& [file, metrics, findings] = checked;
   printLine(context, "Whitelist " + fileName(arguments), Ink::Strong);
   if (file.root) {
     EntryCounter counter;
@@ -78,11 +99,14 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
     const auto& n = counter.entries;
     printLine(context, fmt::format("  {}: scalars {} and {}, distributions {} and {}",
                                    counted(counter.groups, "group"), counted(n[0], "key"),
-                                   n[2] == 1 ? "1 prefix" : fmt::format("{} prefixes", n[2]),
-                                   counted(n[1], "key"),
-                                   n[3] == 1 ? "1 prefix" : fmt::format("{} prefixes", n[3])));
+                                   prefixesText(n[2]), counted(n[1], "key"), prefixesText(n[3])));
   }
   if (!file.digest.empty()) printLine(context, "  digest " + file.digest);
+  if (!metrics.files().empty()) {
+    printLine(context,
+              fmt::format("  metrics: {} and {} in {}", counted(metrics.keyCount(), "key"),
+                          prefixesText(metrics.prefixCount()), fmt::join(metrics.files(), ", ")));
+  }
   if (!findings.empty()) print(context.out, "\n");
   Table table({{""}, {"", Align::Left, true}});
   for (const Finding& finding : findings) {
@@ -103,15 +127,22 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
 }
 
 int check(const ToolContext& context, const WhitelistArguments& arguments) {
-  const WhitelistFile file = load(context, arguments);
-  std::vector<Finding> findings;
-  if (file.root) {
-    findings = checkWhitelist(*context.platform, *file.root);
+  std::vector<Finding> ofTables;
+  const KnownMetrics metrics(
+      MetricTable::load(context.root, [&ofTables](const std::string& message) {
+        ofTables.push_back({Severity::Fault, "", "", "", "", message});
+      }));
+  Checked checked{load(context, arguments), metrics.ofDevice(), {}};
+  std::vector<Finding>& findings = checked.findings;
+  if (const auto& root = checked.file.root) {
+    findings = checkWhitelist(*context.platform, *root);
+    std::ranges::move(checkMetrics(context, metrics, *root), std::back_inserter(findings));
   } else {
     findings.push_back({Severity::Fault, "", "", "", "",
-                        "the file cannot be used, so nothing is reported: " + file.fault});
+                        "the file cannot be used, so nothing is reported: " + checked.file.fault});
   }
-  (context.json ? printCheckJson : printCheck)(context, arguments, file, findings);
+  std::ranges::move(ofTables, std::back_inserter(findings));
+  (context.json ? printCheckJson : printCheck)(context, arguments, checked);
   return countOf(findings, Severity::Fault) > 0 ? kWrong : kSuccess;
 }
 
