@@ -140,10 +140,10 @@ std::uint32_t MetricIntake::addKey(std::uint32_t user, const MetricLine& metric,
   return index;
 }
 
-void MetricIntake::noteType(HeldKey& key, MetricType type) {
-  const HeldType now = type == MetricType::Counter ? HeldType::Counter
-                       : type == MetricType::Gauge ? HeldType::Gauge
-                                                   : HeldType::Distribution;
+void MetricIntake::noteType(HeldKey& key, LineType type) {
+  const HeldType now = type == LineType::Counter ? HeldType::Counter
+                       : type == LineType::Gauge ? HeldType::Gauge
+                                                 : HeldType::Distribution;
   if (key.type == now) return;
   // Of a key that an earlier process recorded only this is known: it is not a distribution.
   const bool first = key.type == HeldType::None && (key.isNew || now != HeldType::Distribution);
@@ -164,18 +164,18 @@ void MetricIntake::addValues(HeldKey& key, std::uint32_t user, const MetricLine&
   }
   for (const MetricValue& value : values_) {
     switch (metric.type) {
-      case MetricType::Counter:
+      case LineType::Counter:
         key.scalar.add(value.number / rate);
         break;
-      case MetricType::Gauge:
+      case LineType::Gauge:
         if (value.isSigned) {
           key.scalar.move(value.number);
         } else {
           key.scalar.set(value.number);
         }
         break;
-      case MetricType::Duration:
-      case MetricType::Sample:
+      case LineType::Duration:
+      case LineType::Sample:
         addSample(key, user, value.number, rate);
         break;
     }

@@ -83,7 +83,7 @@ class MetricIntake {
   void addOwned(const KeyOwner& owner);
   void addValues(HeldKey& key, std::uint32_t user, const MetricLine& metric);
   void addSample(HeldKey& key, std::uint32_t user, double value, double rate);
-  void noteType(HeldKey& key, MetricType type);
+  void noteType(HeldKey& key, LineType type);
   void refuseFor(std::uint32_t user, Refusal refusal, std::uint64_t count);
   void growSamples(std::uint32_t user, std::size_t bytes);
   void markHeld();

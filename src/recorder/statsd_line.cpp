@@ -60,22 +60,22 @@ std::optional<double> parseNumber(std::string_view text) {
   return negative ? -number : number;
 }
 
-std::optional<Refusal> typeOf(std::string_view text, MetricType& type) {
+std::optional<Refusal> typeOf(std::string_view text, LineType& type) {
   if (text == "ms") {
-    type = MetricType::Duration;
+    type = LineType::Duration;
     return std::nullopt;
   }
   if (text.size() != 1) return text.empty() ? Refusal::Malformed : Refusal::Type;
   switch (text.front()) {
     case 'c':
-      type = MetricType::Counter;
+      type = LineType::Counter;
       return std::nullopt;
     case 'g':
-      type = MetricType::Gauge;
+      type = LineType::Gauge;
       return std::nullopt;
     case 'h':
     case 'd':
-      type = MetricType::Sample;
+      type = LineType::Sample;
       return std::nullopt;
     case 's':
       return Refusal::Set;
@@ -96,7 +96,7 @@ std::optional<Refusal> readSections(std::string_view text, MetricLine& metric) {
     if (section.front() == '@') {
       const auto rate = parseNumber(section.substr(1));
       if (!rate || !(*rate > 0 && *rate <= 1)) return Refusal::SampleRate;
-      metric.rate = metric.type == MetricType::Gauge ? 1 : *rate;  // a sampled gauge is the gauge
+      metric.rate = metric.type == LineType::Gauge ? 1 : *rate;  // a sampled gauge is the gauge
     } else if (section.front() == '#') {
       metric.tags = section.substr(1);
     } else if (!isKnownUnused(section)) {
@@ -106,14 +106,14 @@ std::optional<Refusal> readSections(std::string_view text, MetricLine& metric) {
   return std::nullopt;
 }
 
-std::optional<Refusal> readValues(std::string_view text, MetricType type,
+std::optional<Refusal> readValues(std::string_view text, LineType type,
                                   std::vector<MetricValue>& values) {
   values.clear();
   while (!text.empty()) {
     const std::string_view value = takeUpTo(text, ':');
     if (value.empty()) continue;
     const auto number = parseNumber(value);
-    if (!number || (type == MetricType::Duration && *number < 0)) return Refusal::Value;
+    if (!number || (type == LineType::Duration && *number < 0)) return Refusal::Value;
     values.push_back({*number, value.front() == '+' || value.front() == '-'});
   }
   if (values.empty()) return Refusal::Value;

@@ -11,7 +11,7 @@
 
 namespace tally {
 
-enum class MetricType : std::uint8_t { Counter, Gauge, Duration, Sample };
+enum class LineType : std::uint8_t { Counter, Gauge, Duration, Sample };
 
 struct MetricValue {
   double number = 0;
@@ -21,7 +21,7 @@ struct MetricValue {
 // Its texts borrow from the line.
 struct MetricLine {
   std::string_view name, tags;
-  MetricType type = MetricType::Counter;
+  LineType type = LineType::Counter;
   double rate = 1;  // in (0, 1]
   std::uint32_t skippedSections = 0;
 };

@@ -329,8 +329,12 @@ Status SocketIngress::takeEverything(IngressHandler& handler) {
 }
 
 Status SocketIngress::setDeadline(std::optional<std::int64_t> delay) {
+  if (delay && *delay <= 0) {
+    wake();
+    return Done{};
+  }
   std::optional<std::int64_t> next;
-  if (delay) next = now_ + std::max<std::int64_t>(*delay, 0);
+  if (delay) next = now_ + *delay;
   if (!next && !armed_) return Done{};
   if (next && armed_ && std::abs(*next - *armed_) < kMillisecond) return Done{};
   // The end of the year 9999. It is read when somebody sets the clock.

@@ -1,5 +1,7 @@
 #include "tools/whitelist/whitelist_commands.h"
 
+#include <fmt/format.h>
+
 #include <algorithm>
 #include <iterator>
 #include <memory>
