@@ -1,7 +1,11 @@
 // tallyd: records metrics for other programs.
+#include <link.h>
 #include <malloc.h>
+#include <sys/mman.h>
+#include <unistd.h>
 
 #include <chrono>
+#include <cstdint>
 #include <cstdio>
 #include <optional>
 #include <string>
@@ -75,6 +79,30 @@ std::function<void()> keepCountersHourly(SystemLog& log) {
   };
 }
 
+// Unmaps the pages that an object's code and constants are in; what is needed again is mapped
+// again.
+int unmapCode(dl_phdr_info* object, std::size_t, void*) {
+  const std::string_view name = object->dlpi_name;
+  if (!name.empty() && name.front() != '/') return 0;  // the kernel's own
+  const auto page = static_cast<std::uintptr_t>(::sysconf(_SC_PAGESIZE));
+  for (int i = 0; i < object->dlpi_phnum; ++i) {
+    const auto& segment = object->dlpi_phdr[i];
+    if (segment.p_type != PT_LOAD || (segment.p_flags & PF_W) != 0) continue;
+    const std::uintptr_t address = object->dlpi_addr + segment.p_vaddr;
+    const std::uintptr_t begin = address / page * page;
+    void* const mapping = reinterpret_cast<void*>(begin);  // NOLINT(performance-no-int-to-ptr)
+    (void)::madvise(mapping, address + segment.p_memsz - begin, MADV_DONTNEED);
+  }
+  return 0;
+}
+
+// What was committed was spread over the heap, and most of the code is for commits alone: while it
+// is mapped, the kernel keeps it in memory longest.
+void returnMemory() {
+  ::malloc_trim(0);
+  ::dl_iterate_phdr(unmapCode, nullptr);
+}
+
 int run(const Arguments& arguments) {
   const DeviceRoot root(deviceRootFromEnvironment());
   const auto log = makeSystemLogOfEnvironment();
@@ -90,10 +118,11 @@ int run(const Arguments& arguments) {
                      .bootId = bootId(),
                      .readSettings = [&] { return readRecorderSettings(root, userNumber, *log); },
                      .clockIsSynchronised = clockIsSynchronised,
-                     .onCommitted = [keepCounters = keepCountersHourly(*log)]() mutable {
-                       ::malloc_trim(0);  // what was committed, spread over the heap
-                       keepCounters();
-                     }});
+                     .onCommitted =
+                         [keepCounters = keepCountersHourly(*log)]() mutable {
+                           returnMemory();
+                           keepCounters();
+                         }});
   const auto served = (*ingress)->run(recorder);
   if (!served) log->message(LogLevel::Error, "{}", served.error().message);
   log->writeOmitted();
