@@ -1,0 +1,105 @@
+// Whether metrics are lost between programs and tallyd: at rates that it is to bear, and whether
+// those that libtallyclient drops are accounted for.
+#include <chrono>
+#include <cstdio>
+#include <string>
+#include <thread>
+
+#include "recorder/daemon.h"
+#include "recorder/load.h"
+#include "recorder/own_network.h"
+#include "tallyclient/tallyclient.h"
+
+namespace {
+
+using namespace tally::bench;
+using namespace std::chrono_literals;
+using std::chrono::steady_clock;
+
+constexpr int kSeconds = 4;
+constexpr int kDefaultQueue = 10, kRaisedQueue = 512;
+
+struct Case {
+  int perDatagram, queue;
+  bool blocks;
+  double metricsPerSecond;
+};
+constexpr Case kCases[] = {
+    {1, kDefaultQueue, true, 250'000},  {20, kDefaultQueue, true, 1'500'000},
+    {1, kRaisedQueue, false, 250'000},  {20, kRaisedQueue, false, 1'500'000},
+    {1, kDefaultQueue, false, 250'000}, {20, kDefaultQueue, false, 1'500'000},
+};
+
+bool useQueue(bool mayChoose, int length) {
+  if (mayChoose) setQueueLength(length);
+  return queueLength() == length;
+}
+
+double secondsSince(steady_clock::time_point begin) {
+  return std::chrono::duration<double>(steady_clock::now() - begin).count();
+}
+
+void measure(const Case& c) {
+  const Daemon daemon;
+  const auto datagrams = makeDatagrams({}, c.perDatagram, 110'000);
+  Sender sender(daemon.socket(), c.blocks);
+  const double rate = c.metricsPerSecond / c.perDatagram;
+  const auto count = static_cast<std::int64_t>(rate) * kSeconds;
+  const auto begin = steady_clock::now();
+  const std::int64_t refused = sender.send(datagrams, count, rate) * c.perDatagram;
+  const double seconds = secondsSince(begin);
+  const std::int64_t sent = count * c.perDatagram, taken = daemon.settledMetrics();
+  std::printf("%-12s %5d %6d %12.0f %12.0f %11lld %9lld%s\n",
+              c.blocks ? "blocking" : "non-blocking", c.perDatagram, c.queue, c.metricsPerSecond,
+              static_cast<double>(sent) / seconds, static_cast<long long>(refused),
+              static_cast<long long>(sent - refused - taken),
+              c.queue == kDefaultQueue && !c.blocks ? "" : "  (to reach: 0 and 0)");
+}
+
+// A program that records without a pause, which no queue bears: what the store has and what the
+// client said that it dropped must be all.
+void measureClient() {
+  const Daemon daemon;
+  tallyclient* const client = tallyclient_open(daemon.socket().c_str());
+  require(client != nullptr, "no client");
+  constexpr const char* kName = "com.example.service.requests";
+  constexpr std::int64_t kSent = 20'000'000;
+  for (std::int64_t i = 0; i < kSent; ++i) tallyclient_add(client, kName, 1);
+  for (int i = 0; i < 100 && tallyclient_flush(client) != 0; ++i) std::this_thread::sleep_for(10ms);
+  // The number of the last ones goes with the next datagram.
+  tallyclient_add(client, kName, 0);
+  tallyclient_flush(client);
+  const auto dropped = static_cast<std::int64_t>(tallyclient_dropped(client));
+  tallyclient_close(client);
+  (void)daemon.settledMetrics();
+  daemon.commit();
+  const std::int64_t stored = daemon.stored(kName);
+  const std::int64_t reported = daemon.stored("vellum.tallyd.client.metrics_dropped");
+  std::printf("libtallyclient, queue of %d, as fast as it goes: %lld recorded\n", queueLength(),
+              static_cast<long long>(kSent));
+  std::printf("  in the store %lld, dropped %lld, vellum.tallyd.client.metrics_dropped %lld\n",
+              static_cast<long long>(stored), static_cast<long long>(dropped),
+              static_cast<long long>(reported));
+  std::printf("  unaccounted for: %lld (to reach: 0)\n",
+              static_cast<long long>(kSent - stored - reported));
+}
+
+}  // namespace
+
+int main() {
+  const bool mayChoose = enterOwnNetwork();
+  std::printf("%-12s %5s %6s %12s %12s %11s %9s\n", "sender", "per", "queue", "metrics/s",
+              "in fact", "not taken", "lost");
+  for (const Case& c : kCases) {
+    if (useQueue(mayChoose, c.queue)) {
+      measure(c);
+    } else {
+      std::printf("%-12s %5d %6d skipped: the queue's length is root's to set\n",
+                  c.blocks ? "blocking" : "non-blocking", c.perDatagram, c.queue);
+    }
+    std::fflush(stdout);
+  }
+  (void)useQueue(mayChoose, kDefaultQueue);
+  measureClient();
+  return 0;
+}

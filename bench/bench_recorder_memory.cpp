@@ -1,0 +1,101 @@
+// The private memory of tallyd: idle, with a million samples, and while it commits them.
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <cstdio>
+#include <string>
+#include <string_view>
+#include <thread>
+
+#include "recorder/daemon.h"
+#include "recorder/load.h"
+#include "recorder/process_figures.h"
+
+namespace {
+
+using namespace tally::bench;
+using namespace std::chrono_literals;
+
+constexpr int kKeys = 10'000;
+constexpr std::int64_t kSamples = 1'000'000;
+
+double mebibytes(long kibibytes) { return static_cast<double>(kibibytes) / 1024; }
+
+void print(const char* label, const PrivateMemory& memory, const char* toReach) {
+  std::printf("%-52s %7.2f %7.2f  %s\n", label, mebibytes(memory.sum()), mebibytes(memory.dirty),
+              toReach);
+}
+
+// The largest of many looks, while a function runs.
+template <class Function>
+PrivateMemory peakDuring(pid_t process, Function function) {
+  std::atomic<bool> ended = false;
+  std::thread worker([&] {
+    function();
+    ended = true;
+  });
+  PrivateMemory peak;
+  while (!ended) {
+    const PrivateMemory now = privateMemoryOf(process);
+    if (now.sum() > peak.sum()) peak = now;
+    std::this_thread::sleep_for(1ms);
+  }
+  worker.join();
+  return peak;
+}
+
+// The recorder returns what a burst took once it has been quiet for a second.
+PrivateMemory idleMemoryOf(const Daemon& daemon) {
+  std::this_thread::sleep_for(2s);
+  return privateMemoryOf(daemon.process());
+}
+
+struct Case {
+  const char* what;
+  Mix::Samples samples;
+  std::string_view settings;
+  const char* toReach;
+};
+// By default the recorder commits at half of its limit.
+constexpr std::string_view kMoreMemory =
+    "<key>MemoryLimit</key><integer>67108864</integer>"
+    "<key>MetricsPerSecond</key><integer>1000000000</integer>";
+constexpr Case kCases[] = {
+    {"whole milliseconds", Mix::Samples::WholeMilliseconds, kNoLimits, "(to reach: 16)"},
+    {"any doubles", Mix::Samples::Doubles, kNoLimits, "(to reach: 24)"},
+    {"any doubles, a limit of 64 MiB", Mix::Samples::Doubles, kMoreMemory, "(to reach: 24)"},
+};
+
+void measure(const Case& c) {
+  const Daemon daemon(c.settings);
+  const auto datagrams = makeDatagrams({0, kKeys, c.samples}, 20, kSamples);
+  std::printf("%d keys, %lld samples: %s\n", kKeys, static_cast<long long>(kSamples), c.what);
+  const auto receiving = peakDuring(daemon.process(), [&] {
+    Sender(daemon.socket()).send(datagrams, std::ssize(datagrams));
+    require(daemon.settledMetrics() == kSamples, "tallyd has not taken all samples");
+  });
+  print("  peak while they come", receiving, c.toReach);
+  const auto held = static_cast<long long>(daemon.figure("samples_held"));
+  print(("  then, with " + std::to_string(held) + " in memory").c_str(), idleMemoryOf(daemon), "");
+  const auto peak = peakDuring(daemon.process(), [&] { daemon.commit(); });
+  print("  peak while these are committed", peak,
+        c.settings == kNoLimits ? "(to reach: 32, the limit)" : "");
+  print("  afterwards", idleMemoryOf(daemon), "");
+}
+
+}  // namespace
+
+int main() {
+  std::printf("%-52s %7s %7s\n", "private memory, MiB", "all", "written");
+  {
+    const Daemon daemon;
+    print("idle, just started", idleMemoryOf(daemon), "(to reach: 2)");
+    const auto datagrams = makeDatagrams({}, 20, 110'000);
+    Sender(daemon.socket()).send(datagrams, std::ssize(datagrams));
+    require(daemon.settledMetrics() == 110'000, "tallyd has not taken all metrics");
+    daemon.commit();
+    print("idle, after a commit of 110,000 metrics", idleMemoryOf(daemon), "(to reach: 2)");
+  }
+  for (const Case& c : kCases) measure(c);
+  return 0;
+}
