@@ -4,6 +4,7 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include <array>
 #include <chrono>
 #include <cstdint>
 #include <cstdio>
@@ -12,6 +13,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/child_process.h"
 #include "base/process.h"
 #include "base/version.h"
 #include "host/ingress/socket_ingress.h"
@@ -74,7 +76,8 @@ std::function<void()> keepCountersHourly(SystemLog& log) {
     const auto now = std::chrono::steady_clock::now();
     if (now - last < kEvery) return;
     last = now;
-    const auto started = startNeighbour("tallyctl", {"channels", "keep"});
+    const auto started =
+        startInBackground(std::array<std::string, 3>{"tallyctl", "channels", "keep"});
     if (!started) log.fault("recorder: counters", "{}", started.error().message);
   };
 }
@@ -105,7 +108,7 @@ void returnMemory() {
 
 int run(const Arguments& arguments) {
   const DeviceRoot root(deviceRootFromEnvironment());
-  const auto log = makeSystemLogOfEnvironment();
+  const auto log = makeSystemLogOfEnvironment("tallyd");
   auto ingress = openIngress(root, {arguments.udpAddresses}, *log);
   if (!ingress) {
     log->message(LogLevel::Error, "{}", ingress.error().message);

@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include <array>
+#include <climits>
 #include <vector>
 
 #include "base/files/file.h"
@@ -50,28 +51,55 @@ class TerminalSignals {
   struct sigaction before_[kTerminalSignals.size()];
 };
 
-}  // namespace
-
-Result<int> runInForeground(std::span<const std::string> words) {
+// With the signals whose handling it begins with as by default; null: none of them is handled
+// otherwise, and none is to be blocked.
+Result<pid_t> start(const std::string& program, std::span<const std::string> words,
+                    const sigset_t* defaults) {
   std::vector<char*> arguments;
   for (const std::string& word : words) arguments.push_back(const_cast<char*>(word.c_str()));
   arguments.push_back(nullptr);
-  const TerminalSignals signals;
-  const sigset_t defaults = signals.childDefaults();
   posix_spawnattr_t attributes;
   ::posix_spawnattr_init(&attributes);
-  ::posix_spawnattr_setsigdefault(&attributes, &defaults);
-  ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
+  sigset_t none;
+  ::sigemptyset(&none);
+  if (defaults != nullptr) {
+    ::posix_spawnattr_setsigdefault(&attributes, defaults);
+    ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
+  } else {
+    ::posix_spawnattr_setsigmask(&attributes, &none);
+    ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK);
+  }
   pid_t child = -1;
   const int fault =
-      ::posix_spawnp(&child, arguments[0], nullptr, &attributes, arguments.data(), environ);
+      ::posix_spawnp(&child, program.c_str(), nullptr, &attributes, arguments.data(), environ);
   ::posix_spawnattr_destroy(&attributes);
   if (fault != 0) return systemError("cannot run", words.front(), fault);
+  return child;
+}
+
+}  // namespace
+
+Result<int> runInForeground(std::span<const std::string> words) {
+  const TerminalSignals signals;
+  const sigset_t defaults = signals.childDefaults();
+  const auto child = start(words.front(), words, &defaults);
+  if (!child) return child.error();
   int status = 0;
-  if (retried([&] { return ::waitpid(child, &status, 0); }) < 0) {
+  if (retried([&] { return ::waitpid(*child, &status, 0); }) < 0) {
     return systemError("cannot wait for", words.front());
   }
   return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status);
+}
+
+Status startInBackground(std::span<const std::string> words) {
+  char self[PATH_MAX];
+  const ssize_t length = ::readlink("/proc/self/exe", self, sizeof self);
+  if (length <= 0) return systemError("cannot read", "/proc/self/exe");
+  std::string path(self, static_cast<std::size_t>(length));
+  path.resize(path.rfind('/') + 1);
+  ::signal(SIGCHLD, SIG_IGN);  // the kernel forgets the child at its end
+  const auto child = start(path + words.front(), words, nullptr);
+  return child ? Status(Done{}) : child.error();
 }
 
 }  // namespace tally

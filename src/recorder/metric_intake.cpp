@@ -312,6 +312,10 @@ void MetricIntake::takeCounts(CommitBatch& batch) {
   }
 }
 
+void MetricIntake::discard() {
+  for (const CommitBatch& batch : take(Take::All)) forget(batch);
+}
+
 void MetricIntake::forget(const CommitBatch& batch) {
   for (const CommitBatch::Change& change : batch.changes) {
     if (!change.samples) continue;

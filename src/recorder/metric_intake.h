@@ -63,6 +63,8 @@ class MetricIntake {
   void putBack(std::vector<CommitBatch> batches);
   // The batch is in the store.
   void forget(const CommitBatch& batch);
+  // Drops everything that waits to be committed.
+  void discard();
   // Thins samples until memory is within its limit, or nothing more can be thinned.
   void thin();
 

@@ -84,8 +84,8 @@ void Recorder::onReload() {
 void Recorder::onControl(ControlRequest request, std::string_view line) {
   if (line == "status") {
     parts_.ingress.answer(request, recorderStatusText(intake_, commits_, now_));
-  } else if (line == "commit") {
-    controls_.push_back({request, Control::State::Received, 0});
+  } else if (line == "commit" || line == "forget") {
+    controls_.push_back({request, Control::State::Received, 0, line == "forget"});
   } else {
     parts_.ingress.answer(request, "failed: not a request\n");
   }
@@ -97,9 +97,10 @@ void Recorder::takeUpControls() {
       // Datagrams that are queued came before the request: they are read in the next round.
       control.state = Control::State::Due;
     } else if (control.state == Control::State::Due) {
+      control.state = Control::State::Waiting;
       // A commit that is under way may have begun before what is asked for had arrived.
-      control = {control.request, Control::State::Waiting, commits_.started + 1};
-      askedToCommit_ = true;
+      control.afterCommit = control.forgets ? commits_.started : commits_.started + 1;
+      (control.forgets ? askedToForget_ : askedToCommit_) = true;
     }
   }
 }
@@ -109,9 +110,8 @@ void Recorder::answerControls() {
     if (control.state != Control::State::Waiting || commits_.ended < control.afterCommit) {
       return false;
     }
-    parts_.ingress.answer(control.request, commits_.failure.empty()
-                                               ? "done\n"
-                                               : "failed: " + commits_.failure + "\n");
+    const bool done = control.forgets || commits_.failure.empty();
+    parts_.ingress.answer(control.request, done ? "done\n" : "failed: " + commits_.failure + "\n");
     return true;
   });
 }
@@ -190,6 +190,8 @@ std::optional<std::int64_t> Recorder::endRound() {
   if (intake_.bytes() > intake_.mostBytes()) intake_.thin();
   takeUpControls();
   if (!committer_.isBusy()) {
+    // Before the next commit, which would write it to the store that is being erased.
+    if (std::exchange(askedToForget_, false)) intake_.discard();
     if (terminating_ && finalCommitBegan_) {
       end();
     } else if (commitIsDue()) {

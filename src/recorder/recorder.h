@@ -51,7 +51,8 @@ class Recorder final : public IngressHandler {
     enum class State { Received, Due, Waiting };
     ControlRequest request;
     State state;
-    std::uint64_t afterCommit;  // answered when so many commits have ended
+    std::uint64_t afterCommit = 0;  // answered when so many commits have ended
+    bool forgets = false;           // else it commits
   };
 
   void beginDay();
@@ -75,7 +76,8 @@ class Recorder final : public IngressHandler {
   double secondsSince1970_ = 0;
   std::vector<Control> controls_;
   std::int64_t retryAt_ = 0;  // after a commit that failed
-  bool dateUndated_ = true, terminating_ = false, askedToCommit_ = false, finalCommitBegan_ = false;
+  bool dateUndated_ = true, terminating_ = false, finalCommitBegan_ = false;
+  bool askedToCommit_ = false, askedToForget_ = false;
   CommitFigures commits_;
 };
 

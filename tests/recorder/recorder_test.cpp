@@ -250,6 +250,18 @@ TEST_F(RecorderTest, AStoreThatCannotBeWrittenLosesNothingButDetail) {
   EXPECT_EQ(refused("memory"), 0u);
 }
 
+TEST_F(RecorderTest, WhatItHoldsIsForgottenOnRequest) {
+  send(kAda, "a:1|c\nt:1|ms");
+  recorder->onControl(7, "forget");
+  send(kAda, "");
+  send(kAda, "a:1|c");  // was queued
+  send(kAda, "b:1|c");
+  EXPECT_EQ(ingress.answers[7], "done\n");
+  commit();
+  EXPECT_THAT(store.state.days[kDay].scalars, ElementsAre(Pair("b", 1)));
+  EXPECT_TRUE(store.state.days[kDay].samples.empty());
+}
+
 TEST_F(RecorderTest, TheStatusIsAPropertyList) {
   send(kAda, "a:1|c\nbad\ntallyclient.dropped:7|c");
   recorder->onControl(1, "status");

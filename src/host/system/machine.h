@@ -5,9 +5,6 @@
 #include <optional>
 #include <string>
 #include <string_view>
-#include <vector>
-
-#include "base/result.h"
 
 namespace tally {
 
@@ -19,9 +16,5 @@ bool clockIsSynchronised();
 std::optional<std::int64_t> userNumber(std::string_view name);
 // The name of a user; its number as text when it has none.
 std::string userName(std::int64_t user);
-
-// Starts a program of the directory that this one is in, without waiting for its end. It gets no
-// descriptors but the standard ones, and all signals.
-Status startNeighbour(std::string_view program, const std::vector<std::string>& arguments);
 
 }  // namespace tally

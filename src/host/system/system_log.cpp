@@ -68,7 +68,7 @@ class LinuxSystemLog final : public SystemLog {
   void write(LogLevel level, std::string_view message) override {
     if (!enabled(level)) return;
     if (!useJournal() || !sendToJournal(level, message)) {
-      writeToStandardError(standardErrorLine(level, message));
+      writeToStandardError(standardErrorLine(level, message, settings_.identifier));
     }
   }
 
@@ -79,10 +79,10 @@ class LinuxSystemLog final : public SystemLog {
     return useJournal_;
   }
 
-  static bool sendToJournal(LogLevel level, std::string_view message) {
+  bool sendToJournal(LogLevel level, std::string_view message) const {
     const std::string text = "MESSAGE=" + readable(message);
-    const std::array fields{field(text), field(levelName(level).priority),
-                            field("SYSLOG_IDENTIFIER=tallyrun"),
+    const std::string identifier = "SYSLOG_IDENTIFIER=" + std::string(settings_.identifier);
+    const std::array fields{field(text), field(levelName(level).priority), field(identifier),
                             field("SUBSYSTEM=vellum.tallyd.tallyrun")};
     return ::sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) == 0;
   }
@@ -126,8 +126,10 @@ std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings) {
   return std::make_shared<LinuxSystemLog>(settings);
 }
 
-std::string standardErrorLine(LogLevel level, std::string_view message) {
-  std::string line = "tallyrun[";
+std::string standardErrorLine(LogLevel level, std::string_view message,
+                              std::string_view identifier) {
+  std::string line(identifier);
+  line += '[';
   line += levelName(level).name;
   line += "]: ";
   line += printable(readable(message));
@@ -135,8 +137,9 @@ std::string standardErrorLine(LogLevel level, std::string_view message) {
   return line;
 }
 
-std::shared_ptr<SystemLog> makeSystemLogOfEnvironment() {
-  const SystemLogEnvironment environment = systemLogEnvironment();
+std::shared_ptr<SystemLog> makeSystemLogOfEnvironment(std::string_view identifier) {
+  SystemLogEnvironment environment = systemLogEnvironment();
+  environment.settings.identifier = identifier;
   auto log = makeLinuxSystemLog(environment.settings);
   if (!environment.fault.empty()) {
     log->fault("environment", "{}; the messages are those of level {}", environment.fault,

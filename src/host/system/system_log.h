@@ -9,9 +9,13 @@
 
 namespace tally {
 
+// Of the daily job, and of the libraries in other programs.
+constexpr std::string_view kLogIdentifier = "tallyrun";
+
 struct SystemLogSettings {
   bool forceStandardError = false;
   LogLevel lowest = LogLevel::Info;
+  std::string_view identifier = kLogIdentifier;  // of the program, in the journal and in lines
 };
 
 // From the values of TALLYRUN_LOG and TALLYRUN_LOG_LEVEL; null is unset. An unknown value is
@@ -32,11 +36,12 @@ bool journalIsThere();
 // Whether there is a journal is found out at the first message.
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings);
 // The one that the environment asks for; it says itself what of that is not understood.
-std::shared_ptr<SystemLog> makeSystemLogOfEnvironment();
+std::shared_ptr<SystemLog> makeSystemLogOfEnvironment(std::string_view identifier = kLogIdentifier);
 
 // A message as one line of standard error, ending in a newline: control characters are written as
 // escapes ("\n", "\x1b"), so that no message can look like two, and bytes that are not UTF-8 as
 // U+FFFD. Messages above 16 KiB are cut short.
-std::string standardErrorLine(LogLevel level, std::string_view message);
+std::string standardErrorLine(LogLevel level, std::string_view message,
+                              std::string_view identifier = kLogIdentifier);
 
 }  // namespace tally

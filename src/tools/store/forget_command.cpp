@@ -1,9 +1,12 @@
 #include "tools/store/forget_command.h"
 
+#include <cerrno>
+#include <chrono>
 #include <iostream>
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "host/ingress/recorder_client.h"
 #include "host/linux_platform.h"
 #include "host/spool/waiting_logs.h"
 #include "host/store/store_schema.h"
@@ -41,6 +44,17 @@ Status eraseStore(const DeviceRoot& root) {
   return directory->sync();
 }
 
+// What the recorder holds in memory would otherwise come into the next store.
+Status eraseRecorded(const DeviceRoot& root) {
+  constexpr std::chrono::seconds kPatience{70};  // it may be committing to a locked store
+  const auto answer = askRecorder(root, "forget", kPatience);
+  if (answer || answer.error().systemError == ENOENT ||
+      answer.error().systemError == ECONNREFUSED) {
+    return Done{};
+  }
+  return Error{"the recorder: " + answer.error().message};
+}
+
 Status eraseHistory(Preferences& preferences) {
   for (const KnownPreference& known : kKnownPreferences) {
     if (known.isHistory) preferences.set(known, nullptr);
@@ -63,10 +77,12 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
   const Platform writing = makeLinuxPlatform(root, {context.platform->log, false});
   const RunTurn turn(*writing.runLock);
   if (!turn) return kWrong;  // the lock has said why
+  const Status recorded = eraseRecorded(root);
   const Status store = eraseStore(root);
   const auto logs = handleWaiting(root, WaitingAction::Erase);
   const Status history = eraseHistory(*writing.preferences);
-  for (const Status& status : {store, logs ? Status(Done{}) : Status(logs.error()), history}) {
+  for (const Status& status :
+       {recorded, store, logs ? Status(Done{}) : Status(logs.error()), history}) {
     if (!status) return complain(context, "not all was erased: " + status.error().message, kWrong);
   }
   if (context.json) {
