@@ -124,10 +124,11 @@ TEST_F(RecordingStoreTest, ScalarsAndOwnersOfADayAreKeptAsAWholeOrNotAtAll) {
            to.apply(1, change(ChangeKind::Add, "b", 1)) &&
            to.apply(2, change(ChangeKind::Set, "c", -kMost)) &&
            to.apply(2, change(ChangeKind::Add, "c", -kMost)) &&
-           to.setOwner(1, {"a", 1000, false}) && to.setOwner(1, {"a", 1001, true});
+           to.apply(2, change(ChangeKind::Move, "a", -9)) && to.setOwner(1, {"a", 1000, false}) &&
+           to.setOwner(1, {"a", 1001, true});
   }));
-  EXPECT_THAT(scalars(),
-              ElementsAre("1 a=5", "1 b=9223372036854775807", "2 c=-9223372036854775808"));
+  EXPECT_THAT(scalars(), ElementsAre("1 a=5", "1 b=9223372036854775807", "2 a=-4",
+                                     "2 c=-9223372036854775808"));
   {
     auto undone = recorder->begin();
     ASSERT_TRUE(undone && (*undone)->apply(3, change(ChangeKind::Add, "a", 1)));
@@ -135,10 +136,10 @@ TEST_F(RecordingStoreTest, ScalarsAndOwnersOfADayAreKeptAsAWholeOrNotAtAll) {
   }
   EXPECT_EQ(*recorder->newestDay(), 2);
   EXPECT_EQ(*recorder->scalar(1, "a"), 5);
-  EXPECT_EQ(*recorder->scalar(2, "a"), std::nullopt);
+  EXPECT_EQ(*recorder->scalar(2, "b"), std::nullopt);
   const auto owners = *recorder->owners(1);
   ASSERT_EQ(owners.size(), 1u);
-  EXPECT_TRUE(owners[0].user == 1001 && owners[0].distribution);
+  EXPECT_TRUE(owners[0].user == 1000 && !owners[0].distribution) << "the first one stays";
 }
 
 TEST_F(RecordingStoreTest, SamplesKeepTheirOrderAndWeightsWhereverTheyLie) {

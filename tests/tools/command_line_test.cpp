@@ -23,7 +23,7 @@ TEST_F(CommandLine, WhatIsRefusedIsNamedWithWhatMayBeMeant) {
     std::vector<std::string> arguments;
     const char* says;
   } cases[] = {
-      {{}, "tallyctl needs a command: store, record, whitelist"},
+      {{}, "tallyctl needs a command: store, record, recorder, whitelist"},
       {{"stroe", "keys"}, "has no command \"stroe\"; did you mean store?"},
       {{"store"}, "tallyctl store needs a command: set, push, import, dump or keys"},
       {{"store", "\x1b[31m"}, "has no command \"\\x1b[31m\", only set, push"},
