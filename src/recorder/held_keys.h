@@ -52,7 +52,7 @@ struct HeldKey {
   float weightLeft = 0;                   // of rates whose weights are not whole
   std::uint32_t user = 0;                 // index of the owner
   HeldType type = HeldType::None;
-  bool dirty = false, isNew = false, durable = false, anyUser = false, twoTypes = false;
+  bool dirty = false, isNew = false, durable = false, twoTypes = false;
 };
 
 class HeldKeys {

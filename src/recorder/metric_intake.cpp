@@ -85,7 +85,7 @@ void MetricIntake::record(std::uint32_t user, const MetricLine& metric) {
   const std::uint32_t index = keyFor(user, metric);
   if (index == HeldKeys::kNone) return;
   HeldKey& key = keys_->at(index);
-  if (key.user != user && !key.anyUser) return refuseFor(user, Refusal::Owner, values_.size());
+  if (key.user != user) return refuseFor(user, Refusal::Owner, values_.size());
   if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
   keys_->markDirty(index);
   addValues(key, user, metric);

@@ -14,6 +14,9 @@ constexpr std::int64_t kRetryAfter = 60 * kSecond;
 // A socket-activated recorder ends after so many intervals without a metric: who records now and
 // then is not to start it each time.
 constexpr std::int64_t kQuietIntervals = 2;
+// Durable keys are committed at once, but whoever sends them without a pause must not wear out the
+// flash: so many commits, and then one a second.
+constexpr double kDurableCommits = 10;
 
 }  // namespace
 
@@ -39,6 +42,9 @@ void Recorder::beginRound(std::int64_t bootNanoseconds, double secondsSince1970)
     }
   }
   now_ = clock_.at(bootNanoseconds, secondsSince1970);
+  const auto seconds = static_cast<double>(bootNanoseconds - durableCommitsAt_) / kSecond;
+  durableCommits_ = std::min(durableCommits_ + seconds, kDurableCommits);
+  durableCommitsAt_ = bootNanoseconds;
   if (intake_.keys() == nullptr || intake_.keys()->day() != now_.day) {
     beginDay();
   } else {
@@ -119,14 +125,21 @@ void Recorder::answerControls() {
 bool Recorder::commitIsDue() const {
   const bool asked = terminating_ || askedToCommit_;
   if (!asked && now_.bootNanoseconds < retryAt_) return false;
-  if (asked || intake_.hasWaiting() || intake_.hasDurable()) return true;
+  if (asked || intake_.hasWaiting()) return true;
+  if (intake_.hasDurable() && now_.bootNanoseconds >= durableCommitAt()) return true;
   const auto since = intake_.heldSince();
   return since && (now_.bootNanoseconds - *since >= interval() ||
                    intake_.sampleBytes() >= intake_.mostBytes() / 2);
 }
 
+std::int64_t Recorder::durableCommitAt() const {
+  if (durableCommits_ >= 1) return 0;
+  return durableCommitsAt_ + static_cast<std::int64_t>((1 - durableCommits_) * kSecond);
+}
+
 bool Recorder::startCommit() {
   const bool durableAlone = intake_.hasDurable() && !askedToCommit_ && !intake_.hasWaiting();
+  if (durableAlone) durableCommits_ -= 1;
   CommitJob job;
   job.batches = intake_.take(terminating_   ? MetricIntake::Take::AllAtEnd
                              : durableAlone ? MetricIntake::Take::Durable
@@ -226,6 +239,7 @@ std::optional<std::int64_t> Recorder::nextRound() const {
                 static_cast<std::int64_t>((untilMidnight + 1) * static_cast<double>(kSecond)));
   }
   if (intake_.hasWaiting()) noLaterThan(now_.bootNanoseconds);
+  if (intake_.hasDurable()) noLaterThan(durableCommitAt());
   if (at && retryAt_ > 0) at = std::max(*at, retryAt_);
   if (parts_.ingress.isActivated() && !parts_.ingress.hasConnections()) {
     noLaterThan(std::max(intake_.lastLineAt(), commits_.startedAt) + kQuietIntervals * interval());

@@ -162,7 +162,18 @@ TEST_F(RecorderTest, CommitsComeWithTheIntervalTheDayAndDurableKeys) {
   settle();
   EXPECT_EQ(store.commits, 1);
   EXPECT_THAT(store.state.days[kDay].scalars, ElementsAre(Pair("alarm.x", 1)));
-  send(kAda, "", 889);
+  for (int i = 0; i < 50; ++i) {
+    send(kAda, "alarm.x:1|c");
+    settle();
+  }
+  EXPECT_EQ(store.commits, 10);
+  EXPECT_EQ(next, 1'000'000'000);
+  send(kAda, "", 1);
+  settle();
+  EXPECT_EQ(store.commits, 11);
+  EXPECT_EQ(store.state.days[kDay].scalars["alarm.x"], 51);
+  store.commits = 1;
+  send(kAda, "", 888);
   EXPECT_EQ(store.commits, 1);
   send(kAda, "", 1);
   settle();
