@@ -1,5 +1,6 @@
 #include "base/child_process.h"
 
+#include <fcntl.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -51,8 +52,8 @@ class TerminalSignals {
   struct sigaction before_[kTerminalSignals.size()];
 };
 
-// With the signals whose handling it begins with as by default; null: none of them is handled
-// otherwise, and none is to be blocked.
+// With the signals whose handling it begins with as by default. Null: in the background, where no
+// signal is blocked and nobody reads what it prints.
 Result<pid_t> start(const std::string& program, std::span<const std::string> words,
                     const sigset_t* defaults) {
   std::vector<char*> arguments;
@@ -60,18 +61,22 @@ Result<pid_t> start(const std::string& program, std::span<const std::string> wor
   arguments.push_back(nullptr);
   posix_spawnattr_t attributes;
   ::posix_spawnattr_init(&attributes);
+  posix_spawn_file_actions_t files;
+  ::posix_spawn_file_actions_init(&files);
   sigset_t none;
   ::sigemptyset(&none);
   if (defaults != nullptr) {
     ::posix_spawnattr_setsigdefault(&attributes, defaults);
     ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGDEF);
   } else {
+    ::posix_spawn_file_actions_addopen(&files, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
     ::posix_spawnattr_setsigmask(&attributes, &none);
     ::posix_spawnattr_setflags(&attributes, POSIX_SPAWN_SETSIGMASK);
   }
   pid_t child = -1;
   const int fault =
-      ::posix_spawnp(&child, program.c_str(), nullptr, &attributes, arguments.data(), environ);
+      ::posix_spawnp(&child, program.c_str(), &files, &attributes, arguments.data(), environ);
+  ::posix_spawn_file_actions_destroy(&files);
   ::posix_spawnattr_destroy(&attributes);
   if (fault != 0) return systemError("cannot run", words.front(), fault);
   return child;
