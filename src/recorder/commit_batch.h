@@ -1,6 +1,7 @@
 // What one commit writes.
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -11,6 +12,7 @@
 
 #include "platform/recording/recording_store.h"
 #include "recorder/held_keys.h"
+#include "recorder/refusal.h"
 
 namespace tally {
 
@@ -23,6 +25,7 @@ struct CommitBatch {
     std::unique_ptr<SampleStream> samples;
     std::uint32_t user = 0;  // index
     std::int64_t userNumber = 0;
+    std::uint32_t index = 0;  // of the key
   };
   std::shared_ptr<HeldKeys> keys;  // whose texts the changes borrow
   std::optional<std::int32_t> day;
@@ -30,6 +33,15 @@ struct CommitBatch {
   std::optional<double> originOnClock;  // the same in seconds since 1970, once that is known
   std::vector<Change> changes;
   std::vector<KeyOwner> owners;  // of keys that are new
+  // What was refused and counted since the batch before.
+  RefusalCounts refused{};
+  RecorderCounts counts{};
+
+  bool empty() const {
+    const auto isZero = [](std::uint64_t count) { return count == 0; };
+    return changes.empty() && std::ranges::all_of(refused, isZero) &&
+           std::ranges::all_of(counts, isZero);
+  }
 };
 
 struct CommitJob {

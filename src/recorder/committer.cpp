@@ -1,5 +1,7 @@
 #include "recorder/committer.h"
 
+#include <algorithm>
+#include <limits>
 #include <utility>
 #include <vector>
 
@@ -11,6 +13,7 @@ namespace {
 // Of samples that are unpacked at a time: a row of the store.
 constexpr std::size_t kSamplesAtATime = 4096;
 constexpr std::size_t kUndatedAtATime = 256;
+constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
 
 // Applies a change whose samples' offsets count from an instant: each sample on its own day, a
 // scalar on that of the instant.
@@ -51,6 +54,12 @@ class BatchWriter {
       auto written = write(change);
       if (!written) return written;
     }
+    for (std::size_t i = 0; i < kRefusalCount; ++i) {
+      if (auto added = add(kRefusals[i].key, batch_.refused[i]); !added) return added;
+    }
+    for (std::size_t i = 0; i < kRecorderCountCount; ++i) {
+      if (auto added = add(kRecorderCounts[i].key, batch_.counts[i]); !added) return added;
+    }
     const auto day = ownersDay();
     for (std::size_t i = 0; day && i < batch_.owners.size(); ++i) {
       if (auto set = transaction_.setOwner(*day, batch_.owners[i]); !set) return set;
@@ -69,6 +78,14 @@ class BatchWriter {
     if (batch_.day) return transaction_.apply(*batch_.day, change);
     if (batch_.originOnClock) return applyFrom(transaction_, *batch_.originOnClock, change);
     return transaction_.addUndated(bootId_, batch_.origin, change);
+  }
+
+  Status add(std::string_view key, std::uint64_t count) {
+    if (count == 0) return Done{};
+    RecordedChange change;
+    change.key = key;
+    change.value = static_cast<std::int64_t>(std::min(count, kMostCounted));
+    return apply(change);
   }
 
   Status write(const CommitBatch::Change& change) {

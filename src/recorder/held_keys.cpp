@@ -26,44 +26,55 @@ void addSaturated(std::int64_t& sum, std::int64_t amount, bool& clamped) {
 
 }  // namespace
 
-void HeldScalar::add(double amount) {
-  dirty_ = true;
-  if (isSet_) {
-    amount_ += amount;
-    return;
-  }
-  const double whole = std::trunc(amount);
-  addSaturated(whole_, saturated(whole, clamped_), clamped_);
+ScalarAmount ScalarAmount::of(double number) {
+  ScalarAmount amount;
+  const double whole = std::trunc(number);
+  amount.whole = saturated(whole, amount.clamped);
   // An infinite amount has no fraction; its whole part was clamped.
-  if (whole != amount && std::isfinite(amount)) fraction_ += amount - whole;
+  if (std::isfinite(number)) amount.fraction = number - whole;
+  return amount;
 }
 
-void HeldScalar::set(double value) {
+void HeldScalar::add(const ScalarAmount& amount) {
+  dirty_ = true;
+  clamped_ = clamped_ || amount.clamped;
+  addSaturated(whole_, amount.whole, clamped_);
+  fraction_ += amount.fraction;
+}
+
+void HeldScalar::set(const ScalarAmount& value) {
   dirty_ = isSet_ = true;
-  value_ = value;
-  amount_ = 0;
+  clamped_ = clamped_ || value.clamped;
+  whole_ = value.whole;
+  fraction_ = value.fraction;
 }
 
-void HeldScalar::move(double amount) {
+void HeldScalar::move(const ScalarAmount& amount) {
   moves_ = true;
   add(amount);
 }
 
 std::optional<HeldScalar::Change> HeldScalar::take(bool atEnd) {
-  if (!dirty_ && !(atEnd && fraction_ != 0)) return std::nullopt;
+  if (!dirty_ && !(atEnd && !isSet_ && fraction_ != 0)) return std::nullopt;
   const bool changed = std::exchange(dirty_, false);
   bool clamped = std::exchange(clamped_, false);
+  std::int64_t value = whole_;
   if (isSet_) {
-    value_ += std::exchange(amount_, 0.0);
-    const std::int64_t value = saturated(std::round(value_), clamped);
+    addSaturated(value, saturated(std::round(fraction_), clamped), clamped);
     return Change{RecordedChange::Kind::Set, value, clamped};
   }
   const double whole = atEnd ? std::round(fraction_) : std::trunc(fraction_);
-  addSaturated(whole_, saturated(whole, clamped), clamped);
+  addSaturated(value, saturated(whole, clamped), clamped);
   fraction_ = atEnd ? 0 : fraction_ - whole;
-  const std::int64_t value = std::exchange(whole_, 0);
+  whole_ = 0;
   if (value == 0 && !changed) return std::nullopt;
   return Change{moves_ ? RecordedChange::Kind::Move : RecordedChange::Kind::Add, value, clamped};
+}
+
+void HeldScalar::putBack(const Change& change) {
+  dirty_ = true;
+  if (isSet_) return;  // what was set is still here, and what was added before it does not matter
+  addSaturated(whole_, change.value, clamped_);
 }
 
 std::uint32_t HeldKeys::findIn(const HashIndex& index, std::string_view text) const {
@@ -89,30 +100,50 @@ std::string_view HeldKeys::keep(std::string_view text) {
   return std::string_view(block).substr(begin);
 }
 
-std::uint32_t HeldKeys::add(std::string_view identity, std::string_view key, std::size_t& bytes) {
-  constexpr std::size_t kIndexBytes = 16;  // of a slot, the index being half empty
-  const auto index = static_cast<std::uint32_t>(keys_.size());
-  HeldKey& held = keys_.emplace_back();
-  held.key = keep(key);
-  bytes += 2 * sizeof(HeldKey) + key.size();  // a growing vector has up to twice its elements
-  if (identity == key) {
-    bytes += sizeof(Identity) + kIndexBytes;
-    identities_.add(hashBytes(key), static_cast<std::uint32_t>(texts_.size()));
-    texts_.push_back({held.key, index});
+std::uint32_t HeldKeys::add(std::string_view identity, std::string_view key) {
+  if (identity != key) {
+    const std::uint32_t index = addKey(key);
+    addIdentity(identity, index);
     return index;
   }
-  bytes += sizeof(Identity) + kIndexBytes;
-  others_.add(hashBytes(key), static_cast<std::uint32_t>(texts_.size()));
-  texts_.push_back({held.key, index});
-  addIdentity(identity, index, bytes);
+  const std::uint32_t index = addHeld(key);
+  identities_.add(hashBytes(key), static_cast<std::uint32_t>(texts_.size()));
+  addText(keys_[index].key, index);
   return index;
 }
 
-void HeldKeys::addIdentity(std::string_view identity, std::uint32_t index, std::size_t& bytes) {
-  constexpr std::size_t kIndexBytes = 16;
-  bytes += sizeof(Identity) + kIndexBytes + identity.size();
+std::uint32_t HeldKeys::addKey(std::string_view key) {
+  const std::uint32_t index = addHeld(key);
+  others_.add(hashBytes(key), static_cast<std::uint32_t>(texts_.size()));
+  addText(keys_[index].key, index);
+  return index;
+}
+
+std::uint32_t HeldKeys::addHeld(std::string_view key) {
+  keys_.emplace_back().key = keep(key);
+  bytes_ += 2 * sizeof(HeldKey);  // a growing vector has up to twice its elements
+  return static_cast<std::uint32_t>(keys_.size() - 1);
+}
+
+void HeldKeys::forgetIdentities() {
+  identities_.clear();
+  others_.clear();
+  texts_.clear();
+  for (std::uint32_t i = 0; i < keys_.size(); ++i) {
+    others_.add(hashBytes(keys_[i].key), i);
+    texts_.push_back({keys_[i].key, i});
+  }
+}
+
+void HeldKeys::addIdentity(std::string_view identity, std::uint32_t index) {
   identities_.add(hashBytes(identity), static_cast<std::uint32_t>(texts_.size()));
-  texts_.push_back({keep(identity), index});
+  addText(keep(identity), index);
+}
+
+void HeldKeys::addText(std::string_view text, std::uint32_t index) {
+  constexpr std::size_t kIndexBytes = 16;  // of a slot, the index being half empty
+  texts_.push_back({text, index});
+  bytes_ += text.size() + 2 * sizeof(Identity) + kIndexBytes;
 }
 
 }  // namespace tally

@@ -17,15 +17,23 @@
 
 namespace tally {
 
-// What was recorded of a scalar: a value, if one was set, and an amount that adds to it or to what
-// the store has.
+// An amount of a scalar: whole numbers are exact to 64 bits.
+struct ScalarAmount {
+  std::int64_t whole = 0;
+  double fraction = 0;  // between -1 and 1
+  bool clamped = false;
+
+  static ScalarAmount of(double number);
+};
+
+// What was recorded of a scalar: a value, if one was set, or an amount that adds to what the store
+// has. Fractions add up.
 class HeldScalar {
  public:
-  // A counter's amount. Fractions add up.
-  void add(double amount);
-  void set(double value);
+  void add(const ScalarAmount& amount);
+  void set(const ScalarAmount& value);
   // A gauge's change.
-  void move(double amount);
+  void move(const ScalarAmount& amount);
 
   struct Change {
     RecordedChange::Kind kind;
@@ -35,11 +43,13 @@ class HeldScalar {
   // What is to be committed; empty if nothing is. With atEnd a remaining fraction is rounded, else
   // it is kept for the next time.
   std::optional<Change> take(bool atEnd);
+  // Takes a change back that could not be committed.
+  void putBack(const Change& change);
 
  private:
-  double value_ = 0;  // as it was set; kept, since later changes build on it
-  double amount_ = 0, fraction_ = 0;
+  // As it was set, and what was added since; without that, what was added since the last commit.
   std::int64_t whole_ = 0;
+  double fraction_ = 0;
   bool isSet_ = false, dirty_ = false, moves_ = false, clamped_ = false;
 };
 
@@ -53,6 +63,7 @@ struct HeldKey {
   std::uint32_t user = 0;                 // index of the owner
   HeldType type = HeldType::None;
   bool dirty = false, isNew = false, durable = false, twoTypes = false;
+  bool revoked = false;  // the owner may not record it any longer
 };
 
 class HeldKeys {
@@ -69,11 +80,16 @@ class HeldKeys {
   // By what identifies the metric, or by its key.
   std::uint32_t find(std::string_view identity) const { return findIn(identities_, identity); }
   std::uint32_t findKey(std::string_view key) const;
-  // Adds a key; returns its index and, in bytes, by how much memory grew. REQUIRES: neither is
-  // there.
-  std::uint32_t add(std::string_view identity, std::string_view key, std::size_t& bytes);
+  // Adds a key; returns its index. REQUIRES: neither is there.
+  std::uint32_t add(std::string_view identity, std::string_view key);
   // Has a further identity lead to the key.
-  void addIdentity(std::string_view identity, std::uint32_t index, std::size_t& bytes);
+  void addIdentity(std::string_view identity, std::uint32_t index);
+  // Adds a key to which no identity leads.
+  std::uint32_t addKey(std::string_view key);
+  // From now on identities are made by other rules.
+  void forgetIdentities();
+  // Of memory, without samples.
+  std::size_t bytes() const { return bytes_; }
 
   void markDirty(std::uint32_t index) {
     if (keys_[index].dirty) return;
@@ -92,6 +108,8 @@ class HeldKeys {
   };
   std::uint32_t findIn(const HashIndex& index, std::string_view text) const;
   std::string_view keep(std::string_view text);
+  void addText(std::string_view kept, std::uint32_t index);
+  std::uint32_t addHeld(std::string_view key);
 
   std::optional<std::int32_t> day_;
   std::int64_t origin_;
@@ -100,6 +118,7 @@ class HeldKeys {
   HashIndex identities_, others_;  // entries of texts_; others_: keys that are not an identity
   std::vector<std::uint32_t> dirty_;
   std::deque<std::string> blocks_;  // of the texts
+  std::size_t bytes_ = 0;
 };
 
 }  // namespace tally

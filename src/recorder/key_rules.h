@@ -19,10 +19,6 @@ class KeyRules {
   explicit KeyRules(RecorderSettings settings) : settings_(std::move(settings)) {}
   const RecorderSettings& settings() const { return settings_; }
 
-  // Whether every name is its key.
-  bool isIdentity() const {
-    return settings_.prefix.empty() && settings_.rename.empty() && settings_.tags.empty();
-  }
   // What identifies the metric among those that clients send: its name with the tags that become
   // part of the key. Borrows from the name or the buffer.
   std::string_view identityOf(std::string_view name, std::string_view tags,

@@ -16,6 +16,12 @@ constexpr double kLeastRate = 1e-6;
 // What the program takes beside what it holds: its code's data, the store's buffers, the stack of
 // the commit.
 constexpr std::size_t kMemoryOfProgram = 5 << 20;
+// Of the keys of a day, the last quarter is for users who have few.
+constexpr std::uint64_t kFewKeys = 100;
+
+ScalarAmount amountOf(const MetricValue& value) {
+  return value.whole ? ScalarAmount{.whole = *value.whole} : ScalarAmount::of(value.number);
+}
 
 }  // namespace
 
@@ -24,15 +30,22 @@ std::size_t MetricIntake::mostBytes() const {
          kMemoryOfProgram;
 }
 
+std::size_t MetricIntake::bytes() const {
+  std::size_t bytes = sampleBytes_ + (keys_ ? keys_->bytes() : 0);
+  for (const CommitBatch& batch : waiting_) {
+    bytes += batch.keys->bytes() + batch.changes.size() * sizeof(CommitBatch::Change);
+  }
+  return bytes;
+}
+
 void MetricIntake::beginDay(const RecordingMoment& moment, std::span<const KeyOwner> owners) {
   if (keys_) {
     CommitBatch batch = takeBatch(Take::AllAtEnd);
-    if (!batch.changes.empty()) waiting_.push_back(std::move(batch));
+    if (!batch.empty()) waiting_.push_back(std::move(batch));
   }
   setNow(moment);
   dateWaiting();
   users_.beginDay();
-  keyBytes_ = 0;  // the former keys go with their last batch
   keys_ = std::make_shared<HeldKeys>(moment.day, moment.bootSeconds);
   for (const KeyOwner& owner : owners) addOwned(owner);
 }
@@ -46,13 +59,24 @@ void MetricIntake::dateWaiting() {
   }
 }
 
+void MetricIntake::setSettings(RecorderSettings settings) {
+  rules_ = KeyRules(std::move(settings));
+  keys_->forgetIdentities();
+  for (std::uint32_t i = 0; i < keys_->size(); ++i) applyRules(keys_->at(i));
+}
+
+void MetricIntake::applyRules(HeldKey& key) {
+  key.durable = rules_.isDurable(key.key);
+  key.revoked = !rules_.mayRecord(users_.at(key.user).sender.user, key.key);
+}
+
 void MetricIntake::addOwned(const KeyOwner& owner) {
   if (keys_->findKey(owner.key) != HeldKeys::kNone) return;
   const std::uint32_t user = users_.indexOf({owner.user}, settings());
-  HeldKey& key = keys_->at(keys_->add(owner.key, owner.key, keyBytes_));
+  HeldKey& key = keys_->at(keys_->addKey(owner.key));
   key.user = user;
   key.type = owner.distribution ? HeldType::Distribution : HeldType::None;
-  key.durable = rules_.isDurable(owner.key);
+  applyRules(key);
   ++users_.at(user).keysToday;
 }
 
@@ -85,6 +109,13 @@ void MetricIntake::record(std::uint32_t user, const MetricLine& metric) {
   const std::uint32_t index = keyFor(user, metric);
   if (index == HeldKeys::kNone) return;
   HeldKey& key = keys_->at(index);
+  if (key.revoked) {
+    if (!rules_.mayRecord(users_.at(user).sender.user, key.key)) {
+      return refuseFor(user, Refusal::Permission, values_.size());
+    }
+    key.user = user;  // whoever had it lost the right to it
+    key.revoked = false;
+  }
   if (key.user != user) return refuseFor(user, Refusal::Owner, values_.size());
   if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
   keys_->markDirty(index);
@@ -102,7 +133,7 @@ std::uint32_t MetricIntake::keyFor(std::uint32_t user, const MetricLine& metric)
   if (const auto loss = clientLossOf(metric.name)) {
     double lost = 0;
     for (const MetricValue& value : values_) lost += std::max(value.number, 0.0) / metric.rate;
-    constexpr double kMostBelieved = 1e15;
+    constexpr double kMostBelieved = 1e9;
     count(*loss, static_cast<std::uint64_t>(std::min(lost, kMostBelieved)));
     return HeldKeys::kNone;
   }
@@ -118,9 +149,9 @@ std::uint32_t MetricIntake::addKey(std::uint32_t user, const MetricLine& metric,
   if (!isRecordableName(identity)) return refused(Refusal::Name);
   const std::string key = rules_.keyOf(metric.name, identity);
   if (!isRecordableName(key)) return refused(Refusal::Name);
-  std::uint32_t index = rules_.isIdentity() ? HeldKeys::kNone : keys_->findKey(key);
+  std::uint32_t index = keys_->findKey(key);
   if (index != HeldKeys::kNone) {
-    keys_->addIdentity(identity, index, keyBytes_);
+    keys_->addIdentity(identity, index);
     return index;
   }
   RecordingUser& recording = users_.at(user);
@@ -129,13 +160,16 @@ std::uint32_t MetricIntake::addKey(std::uint32_t user, const MetricLine& metric,
   };
   if (!rules_.mayRecord(recording.sender.user, key)) return refused(Refusal::Permission);
   if (recording.keysToday >= limit(RecorderNumber::KeysOfUser)) return refused(Refusal::KeysOfUser);
-  if (keys_->size() >= limit(RecorderNumber::KeysOfDay)) return refused(Refusal::KeysOfDay);
-  if (bytes() >= mostBytes()) return refused(Refusal::Memory);
-  index = keys_->add(identity, key, keyBytes_);
+  const std::uint64_t mostKeys = limit(RecorderNumber::KeysOfDay);
+  const bool hasFew = recording.keysToday < kFewKeys;
+  if (keys_->size() >= (hasFew ? mostKeys : mostKeys / 4 * 3)) return refused(Refusal::KeysOfDay);
+  // Keys stay all day, samples only until they are committed, so these need their share.
+  if (keys_->bytes() >= mostBytes() / 2 || bytes() >= mostBytes()) return refused(Refusal::Memory);
+  index = keys_->add(identity, key);
   HeldKey& held = keys_->at(index);
   held.user = user;
   held.isNew = true;
-  held.durable = rules_.isDurable(key);
+  applyRules(held);
   ++recording.keysToday;
   return index;
 }
@@ -165,13 +199,13 @@ void MetricIntake::addValues(HeldKey& key, std::uint32_t user, const MetricLine&
   for (const MetricValue& value : values_) {
     switch (metric.type) {
       case LineType::Counter:
-        key.scalar.add(value.number / rate);
+        key.scalar.add(rate == 1 ? amountOf(value) : ScalarAmount::of(value.number / rate));
         break;
       case LineType::Gauge:
         if (value.isSigned) {
-          key.scalar.move(value.number);
+          key.scalar.move(amountOf(value));
         } else {
-          key.scalar.set(value.number);
+          key.scalar.set(amountOf(value));
         }
         break;
       case LineType::Duration:
@@ -223,7 +257,7 @@ void MetricIntake::markHeld() {
 
 void MetricIntake::count(RecorderCount which, std::uint64_t amount) {
   counts_[static_cast<std::size_t>(which)] += amount;
-  markHeld();
+  if (amount > 0) markHeld();
 }
 
 void MetricIntake::growSamples(std::uint32_t user, std::size_t bytes) {
@@ -246,14 +280,49 @@ std::vector<CommitBatch> MetricIntake::take(Take which) {
                                    std::make_move_iterator(waiting_.end()));
   waiting_.clear();
   CommitBatch batch = takeBatch(which);
-  if (!batch.changes.empty()) batches.push_back(std::move(batch));
+  if (!batch.empty()) batches.push_back(std::move(batch));
   return batches;
 }
 
 void MetricIntake::putBack(std::vector<CommitBatch> batches) {
-  waiting_.insert(waiting_.begin(), std::make_move_iterator(batches.begin()),
-                  std::make_move_iterator(batches.end()));
+  std::deque<CommitBatch> former;
+  for (CommitBatch& batch : batches) {
+    if (batch.keys == keys_) {
+      putBackHeld(batch);
+    } else {
+      former.push_back(std::move(batch));
+    }
+  }
+  waiting_.insert(waiting_.begin(), std::make_move_iterator(former.begin()),
+                  std::make_move_iterator(former.end()));
   dateWaiting();
+}
+
+void MetricIntake::putBackHeld(CommitBatch& batch) {
+  markHeld();
+  for (CommitBatch::Change& change : batch.changes) {
+    HeldKey& key = keys_->at(change.index);
+    keys_->markDirty(change.index);
+    hasDurable_ = hasDurable_ || key.durable;
+    if (!change.samples) {
+      key.scalar.putBack({change.kind, change.value, false});
+      continue;
+    }
+    if (key.samples) {
+      // Both are counted; the one that is added to the other goes.
+      const std::size_t gone = key.samples->bytes() + sizeof(SampleStream);
+      growSamples(change.user, change.samples->append(*key.samples));
+      sampleBytes_ -= gone;
+      users_.at(change.user).bytes -= gone;
+    }
+    key.samples = std::move(change.samples);
+  }
+  for (const KeyOwner& owner : batch.owners) {
+    const std::uint32_t index = keys_->findKey(owner.key);
+    if (index != HeldKeys::kNone) keys_->at(index).isNew = true;
+  }
+  for (std::size_t i = 0; i < kRefusalCount; ++i) refusedTaken_[i] -= batch.refused[i];
+  for (std::size_t i = 0; i < kRecorderCountCount; ++i) countsTaken_[i] -= batch.counts[i];
 }
 
 CommitBatch MetricIntake::takeBatch(Take which) {
@@ -271,7 +340,7 @@ CommitBatch MetricIntake::takeBatch(Take which) {
     if (which == Take::Durable && !key.durable) {
       keys_->markDirty(index);
     } else {
-      takeChange(batch, key, which == Take::AllAtEnd);
+      takeChange(batch, index, which == Take::AllAtEnd);
     }
   }
   hasDurable_ = false;
@@ -282,15 +351,16 @@ CommitBatch MetricIntake::takeBatch(Take which) {
   return batch;
 }
 
-void MetricIntake::takeChange(CommitBatch& batch, HeldKey& key, bool atEnd) {
+void MetricIntake::takeChange(CommitBatch& batch, std::uint32_t index, bool atEnd) {
+  HeldKey& key = keys_->at(index);
   const std::int64_t user = users_.at(key.user).sender.user;
   if (const auto change = key.scalar.take(atEnd)) {
     if (change->clamped) count(RecorderCount::ValuesClamped);
-    batch.changes.push_back({key.key, change->kind, change->value, nullptr, key.user, user});
+    batch.changes.push_back({key.key, change->kind, change->value, nullptr, key.user, user, index});
   }
   if (key.samples) {
     batch.changes.push_back({key.key, RecordedChange::Kind::Samples, 0,
-                             std::exchange(key.samples, nullptr), key.user, user});
+                             std::exchange(key.samples, nullptr), key.user, user, index});
   }
   if (std::exchange(key.isNew, false)) {
     batch.owners.push_back({std::string(key.key), user, key.type == HeldType::Distribution});
@@ -298,22 +368,20 @@ void MetricIntake::takeChange(CommitBatch& batch, HeldKey& key, bool atEnd) {
 }
 
 void MetricIntake::takeCounts(CommitBatch& batch) {
-  const auto take = [&](std::string_view key, std::uint64_t now, std::uint64_t& taken) {
-    const std::uint64_t more = now - std::exchange(taken, now);
-    if (more == 0) return;
-    batch.changes.push_back(
-        {key, RecordedChange::Kind::Add, static_cast<std::int64_t>(more), nullptr, 0, 0});
+  const auto take = [](const auto& now, auto& taken, auto& more) {
+    for (std::size_t i = 0; i < now.size(); ++i) {
+      more[i] = now[i] - std::exchange(taken[i], now[i]);
+    }
   };
-  for (std::size_t i = 0; i < kRefusalCount; ++i) {
-    take(kRefusals[i].key, refused_[i], refusedTaken_[i]);
-  }
-  for (std::size_t i = 0; i < kRecorderCountCount; ++i) {
-    take(kRecorderCounts[i].key, counts_[i], countsTaken_[i]);
-  }
+  take(refused_, refusedTaken_, batch.refused);
+  take(counts_, countsTaken_, batch.counts);
 }
 
 void MetricIntake::discard() {
   for (const CommitBatch& batch : take(Take::All)) forget(batch);
+  // Gauges and owners are remembered by their keys.
+  users_.beginDay();
+  keys_ = std::make_shared<HeldKeys>(keys_->day(), now_.bootSeconds);
 }
 
 void MetricIntake::forget(const CommitBatch& batch) {
@@ -365,8 +433,17 @@ void MetricIntake::thin() {
         most = i;
       }
     }
-    if (most == users_.all().size()) return;
+    if (most == users_.all().size()) return dropOldest();
     if (!thinOldest(static_cast<std::uint32_t>(most))) exhausted[most] = true;
+  }
+}
+
+// A store that fails for days leaves the keys of each.
+void MetricIntake::dropOldest() {
+  while (bytes() > mostBytes() && !waiting_.empty()) {
+    count(RecorderCount::ChangesDropped, waiting_.front().changes.size());
+    forget(waiting_.front());
+    waiting_.pop_front();
   }
 }
 

@@ -30,8 +30,9 @@ class MetricIntake {
   MetricIntake(RecorderSettings settings, SystemLog& log)
       : rules_(std::move(settings)), log_(log) {}
 
-  // Settings that change during a day decide on its new keys.
-  void setSettings(RecorderSettings settings) { rules_ = KeyRules(std::move(settings)); }
+  // From now on; keys whose owners may not record them any longer are free for those who may.
+  // REQUIRES: a day has begun.
+  void setSettings(RecorderSettings settings);
   const RecorderSettings& settings() const { return rules_.settings(); }
 
   // The moment of what is recorded from now on. REQUIRES: beginDay() when its day is another one.
@@ -56,10 +57,11 @@ class MetricIntake {
   std::int64_t lastLineAt() const { return lastLineAt_; }
 
   enum class Take { Durable, All, AllAtEnd };
-  // Moves what waits out: former days and commits that failed, then the day in progress, of which
+  // Moves what waits out: former days, then the day in progress, of which
   // Durable takes those keys alone. At the end nothing is kept for later, fractions neither.
   std::vector<CommitBatch> take(Take which);
-  // Takes batches back whose commit failed.
+  // Takes batches back whose commit failed: what is of the day in progress becomes a part of it
+  // again, so that a store that fails for long takes no more memory than one that does not.
   void putBack(std::vector<CommitBatch> batches);
   // The batch is in the store.
   void forget(const CommitBatch& batch);
@@ -69,8 +71,10 @@ class MetricIntake {
   void thin();
 
   // What keys and samples take, those being committed included, and what they may take.
-  std::size_t bytes() const { return keyBytes_ + sampleBytes_; }
+  std::size_t bytes() const;
   std::size_t mostBytes() const;
+  // Whether so much is held that it had better be committed before it has to be thinned.
+  bool isHalfFull() const { return sampleBytes_ >= (mostBytes() - keys_->bytes()) / 2; }
   std::size_t sampleBytes() const { return sampleBytes_; }
   std::uint64_t samples() const { return samples_; }
   std::uint64_t metrics() const { return metrics_; }
@@ -83,6 +87,7 @@ class MetricIntake {
   std::uint32_t keyFor(std::uint32_t user, const MetricLine& metric);
   std::uint32_t addKey(std::uint32_t user, const MetricLine& metric, std::string_view identity);
   void addOwned(const KeyOwner& owner);
+  void applyRules(HeldKey& key);
   void addValues(HeldKey& key, std::uint32_t user, const MetricLine& metric);
   void addSample(HeldKey& key, std::uint32_t user, double value, double rate);
   void noteType(HeldKey& key, LineType type);
@@ -91,26 +96,28 @@ class MetricIntake {
   void markHeld();
 
   CommitBatch takeBatch(Take which);
-  void takeChange(CommitBatch& batch, HeldKey& key, bool atEnd);
+  void takeChange(CommitBatch& batch, std::uint32_t index, bool atEnd);
   void takeCounts(CommitBatch& batch);
+  void putBackHeld(CommitBatch& batch);
   void dateWaiting();
   // One layer of the user's samples, the oldest that has any; false when nothing is left to thin.
   bool thinOldest(std::uint32_t user);
   std::uint64_t thinned(SampleStream& samples, std::uint32_t user);
+  void dropOldest();
 
   KeyRules rules_;
   SystemLog& log_;
   RecordingUsers users_;
   RecordingMoment now_;
   std::shared_ptr<HeldKeys> keys_;
-  std::deque<CommitBatch> waiting_;  // of former days and of commits that failed, oldest first
+  std::deque<CommitBatch> waiting_;  // of former days, oldest first
   std::vector<MetricValue> values_;  // of the line in hand
   std::string identity_;
 
   std::optional<std::int64_t> heldSince_;
   std::int64_t lastLineAt_ = 0;
   bool hasDurable_ = false;
-  std::size_t keyBytes_ = 0, sampleBytes_ = 0;
+  std::size_t sampleBytes_ = 0;
   std::uint64_t samples_ = 0, metrics_ = 0;
   // Since the start, and what of it has been put into batches.
   RefusalCounts refused_{}, refusedTaken_{};

@@ -128,8 +128,7 @@ bool Recorder::commitIsDue() const {
   if (asked || intake_.hasWaiting()) return true;
   if (intake_.hasDurable() && now_.bootNanoseconds >= durableCommitAt()) return true;
   const auto since = intake_.heldSince();
-  return since && (now_.bootNanoseconds - *since >= interval() ||
-                   intake_.sampleBytes() >= intake_.mostBytes() / 2);
+  return since && (now_.bootNanoseconds - *since >= interval() || intake_.isHalfFull());
 }
 
 std::int64_t Recorder::durableCommitAt() const {
@@ -209,6 +208,8 @@ std::optional<std::int64_t> Recorder::endRound() {
       end();
     } else if (commitIsDue()) {
       finalCommitBegan_ = terminating_;
+      // What arrives from now on is for the next process, if systemd holds the sockets.
+      if (terminating_) parts_.ingress.stopReading();
       if (!startCommit()) {
         // Nothing was left to do for those who asked.
         for (Control& control : controls_) {
@@ -241,7 +242,7 @@ std::optional<std::int64_t> Recorder::nextRound() const {
   if (intake_.hasWaiting()) noLaterThan(now_.bootNanoseconds);
   if (intake_.hasDurable()) noLaterThan(durableCommitAt());
   if (at && retryAt_ > 0) at = std::max(*at, retryAt_);
-  if (parts_.ingress.isActivated() && !parts_.ingress.hasConnections()) {
+  if (parts_.ingress.isActivated() && !parts_.ingress.hasConnections() && !hasUncommitted()) {
     noLaterThan(std::max(intake_.lastLineAt(), commits_.startedAt) + kQuietIntervals * interval());
   }
   if (!at) return std::nullopt;

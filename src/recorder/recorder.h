@@ -44,7 +44,7 @@ class Recorder final : public IngressHandler {
 
   bool isCommitting() const { return committer_.isBusy(); }
   // Whether something was recorded that is not in the store.
-  bool hasUncommitted() const { return intake_.samples() > 0 || intake_.hasWaiting(); }
+  bool hasUncommitted() const { return intake_.heldSince() || intake_.hasWaiting(); }
 
  private:
   struct Control {

@@ -92,7 +92,11 @@ class Merge {
       RecorderSettings::Users allowed;
       const auto* const names = kvCast<KvArray>(users.get());
       // A row that cannot be read must not open what it was to close.
-      if (names == nullptr) malformed(prefix->view(), "does not name users in an array");
+      if (names == nullptr) {
+        log_.message(LogLevel::Error,
+                     "{}: {} does not name users in an array, so nobody may record such keys",
+                     file_, prefix->view());
+      }
       for (std::size_t i = 0; names != nullptr && i < names->size(); ++i) {
         takeUser(prefix->view(), names->get(i), allowed);
       }
@@ -101,7 +105,8 @@ class Merge {
   }
 
   void takeUser(std::string_view prefix, const KvObject* item, RecorderSettings::Users& allowed) {
-    if (const auto* number = kvCast<KvNumber>(item)) {
+    const auto* const number = kvCast<KvNumber>(item);
+    if (number != nullptr && !number->isReal() && number->asInt64() >= 0) {
       allowed.numbers.insert(number->asInt64());
       return;
     }
@@ -111,9 +116,9 @@ class Merge {
       allowed.everybody = true;
     } else if (name == "anonymous") {
       allowed.numbers.insert(Sender::kAnonymous);
-    } else if (const auto number =
+    } else if (const auto parsed =
                    name.empty() || name.front() == '-' ? std::nullopt : parseInt64(name)) {
-      allowed.numbers.insert(*number);
+      allowed.numbers.insert(*parsed);
     } else if (const auto user = users_(name)) {
       allowed.numbers.insert(*user);
     } else {

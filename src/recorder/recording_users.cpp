@@ -1,6 +1,7 @@
 #include "recorder/recording_users.h"
 
 #include <algorithm>
+#include <iterator>
 
 namespace tally {
 namespace {
@@ -12,20 +13,26 @@ double largestAllowance(const RecorderSettings& settings) {
   return static_cast<double>(settings.number(RecorderNumber::MetricsPerSecond)) * kSecondsAveraged;
 }
 
+// Root, and those whom settings name: there are few, and they must not be taken for others.
+bool hasRights(Sender sender, const RecorderSettings& settings) {
+  return std::ranges::any_of(
+      settings.allow, [&](const auto& row) { return row.second.numbers.contains(sender.user); });
+}
+
 }  // namespace
 
 std::uint32_t RecordingUsers::indexOf(Sender sender, const RecorderSettings& settings) {
   if (last_ < users_.size() && users_[last_].sender == sender) return last_;
-  const auto found = std::ranges::find(users_, sender, &RecordingUser::sender);
-  if (found == users_.end() && users_.size() < kMostUsers) {
-    users_.push_back({.sender = sender, .allowance = largestAllowance(settings)});
-    last_ = static_cast<std::uint32_t>(users_.size() - 1);
-  } else if (found != users_.end()) {
-    last_ = static_cast<std::uint32_t>(found - users_.begin());
-  } else {
-    last_ = kMostUsers - 1;
+  auto found = std::ranges::find(users_, sender, &RecordingUser::sender);
+  if (found == users_.end() && users_.size() >= kMostUsers && !hasRights(sender, settings)) {
+    sender = {Sender::kOthers};
+    found = std::ranges::find(users_, sender, &RecordingUser::sender);
   }
-  return last_;
+  if (found == users_.end()) {
+    users_.push_back({.sender = sender, .allowance = largestAllowance(settings)});
+    found = std::prev(users_.end());
+  }
+  return last_ = static_cast<std::uint32_t>(found - users_.begin());
 }
 
 bool RecordingUsers::admit(RecordingUser& user, std::size_t metrics, std::int64_t bootNanoseconds,

@@ -16,13 +16,13 @@ struct RecordingUser {
   std::int64_t allowanceAt = 0;  // nanoseconds since boot
   std::uint64_t metrics = 0;     // recorded since the start
   std::uint64_t keysToday = 0;
-  std::size_t bytes = 0;  // of memory that the user's keys and samples take
+  std::size_t bytes = 0;  // of memory that the user's samples take
   RefusalCounts refused{};
 };
 
 class RecordingUsers {
  public:
-  // Their number is bounded, since anyone may have thousands of users: those above are one.
+  // Their number is bounded, since one may have thousands of users: those above are one together.
   static constexpr std::size_t kMostUsers = 1024;
 
   // An index, valid for the life of the object.

@@ -137,6 +137,20 @@ bool SampleStream::Reader::next(StreamSamples& samples, std::size_t most) {
   return !samples.values.empty();
 }
 
+std::size_t SampleStream::append(const SampleStream& other) {
+  constexpr std::size_t kAtATime = 1024;
+  std::size_t grown = 0;
+  Reader reader(other);
+  StreamSamples samples;
+  while (reader.next(samples, kAtATime)) {
+    for (std::size_t i = 0; i < samples.values.size(); ++i) {
+      grown += add(samples.values[i], samples.offsets[i],
+                   samples.weights.empty() ? 1 : samples.weights[i]);
+    }
+  }
+  return grown;
+}
+
 std::uint64_t SampleStream::thin() {
   if (count_ < 2) return 0;
   constexpr std::size_t kAtATime = 1024;  // even, so that pairs stay together

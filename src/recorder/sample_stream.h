@@ -44,6 +44,8 @@ class SampleStream {
     std::uint32_t offset_ = 0, weight_ = 1;
   };
 
+  // Adds another one's samples after its own; by how many bytes memory grew.
+  std::size_t append(const SampleStream& other);
   // Drops every second sample; the ones that stay count for them. Returns how many went.
   std::uint64_t thin();
 

@@ -8,8 +8,8 @@
 namespace tally {
 namespace {
 
-// So many digits are exact in a double.
-constexpr std::size_t kExactDigits = 15;
+// So many digits fit into 64 bits, whatever they are.
+constexpr std::size_t kSafeDigits = 18;
 
 std::size_t findIn(std::string_view text, char wanted) {
   const void* const found = text.empty() ? nullptr : std::memchr(text.data(), wanted, text.size());
@@ -32,32 +32,50 @@ bool isBelowOne(std::string_view text) {
   return text.substr(0, text.find('.')).find_first_not_of('0') == std::string_view::npos;
 }
 
-// Decimal, with an exponent or without; "1." and ".5" are numbers, "inf" and blanks are not.
-std::optional<double> parseNumber(std::string_view text) {
-  const bool negative = !text.empty() && text.front() == '-';
-  if (negative || (!text.empty() && text.front() == '+')) text.remove_prefix(1);
-  if (text.empty()) return std::nullopt;
-  if (text.size() <= kExactDigits) {
-    std::int64_t whole = 0;
-    std::size_t i = 0;
-    for (; i < text.size() && text[i] >= '0' && text[i] <= '9'; ++i) {
-      whole = whole * 10 + (text[i] - '0');
+// The text as a whole number; empty if it has anything but digits, or too many.
+std::optional<std::int64_t> parseDigits(std::string_view text) {
+  std::int64_t whole = 0;
+  if (text.size() <= kSafeDigits) {
+    for (const char digit : text) {
+      if (digit < '0' || digit > '9') return std::nullopt;
+      whole = whole * 10 + (digit - '0');
     }
-    if (i == text.size())
-      return negative ? -static_cast<double>(whole) : static_cast<double>(whole);
+    return whole;
   }
-  if (text.front() != '.' && (text.front() < '0' || text.front() > '9')) return std::nullopt;
+  const char* const end = text.data() + text.size();
+  const auto [stopped, error] = std::from_chars(text.data(), end, whole);
+  return stopped == end && error == std::errc() ? std::optional(whole) : std::nullopt;
+}
+
+// Decimal, with an exponent or without; "1." and ".5" are numbers, "inf" and blanks are not.
+bool parseNumber(std::string_view text, MetricValue& value) {
+  value.isSigned = !text.empty() && (text.front() == '-' || text.front() == '+');
+  const bool negative = value.isSigned && text.front() == '-';
+  if (value.isSigned) text.remove_prefix(1);
+  if (text.empty() || (text.front() != '.' && (text.front() < '0' || text.front() > '9'))) {
+    return false;
+  }
+  value.whole = parseDigits(text);
+  if (value.whole) {
+    value.number = static_cast<double>(*value.whole);
+    if (negative) {
+      value.number = -value.number;
+      value.whole = -*value.whole;
+    }
+    return true;
+  }
   double number = 0;
   const char* const end = text.data() + text.size();
   const auto [stopped, error] = std::from_chars(text.data(), end, number);
-  if (stopped != end) return std::nullopt;
+  if (stopped != end || error == std::errc::invalid_argument) return false;
   // What is too small for a double is as good as 0; what is too large has no meaning.
   if (error == std::errc::result_out_of_range) {
-    if (!isBelowOne(text)) return std::nullopt;
+    if (!isBelowOne(text)) return false;
     number = 0;
   }
-  if (error == std::errc::invalid_argument || !std::isfinite(number)) return std::nullopt;
-  return negative ? -number : number;
+  if (!std::isfinite(number)) return false;
+  value.number = negative ? -number : number;
+  return true;
 }
 
 std::optional<Refusal> typeOf(std::string_view text, LineType& type) {
@@ -94,9 +112,12 @@ std::optional<Refusal> readSections(std::string_view text, MetricLine& metric) {
     const std::string_view section = takeUpTo(text, '|');
     if (section.empty()) continue;
     if (section.front() == '@') {
-      const auto rate = parseNumber(section.substr(1));
-      if (!rate || !(*rate > 0 && *rate <= 1)) return Refusal::SampleRate;
-      metric.rate = metric.type == LineType::Gauge ? 1 : *rate;  // a sampled gauge is the gauge
+      MetricValue rate;
+      if (!parseNumber(section.substr(1), rate) || !(rate.number > 0 && rate.number <= 1)) {
+        return Refusal::SampleRate;
+      }
+      metric.rate =
+          metric.type == LineType::Gauge ? 1 : rate.number;  // a sampled gauge is the gauge
     } else if (section.front() == '#') {
       metric.tags = section.substr(1);
     } else if (!isKnownUnused(section)) {
@@ -112,9 +133,10 @@ std::optional<Refusal> readValues(std::string_view text, LineType type,
   while (!text.empty()) {
     const std::string_view value = takeUpTo(text, ':');
     if (value.empty()) continue;
-    const auto number = parseNumber(value);
-    if (!number || (type == LineType::Duration && *number < 0)) return Refusal::Value;
-    values.push_back({*number, value.front() == '+' || value.front() == '-'});
+    MetricValue& read = values.emplace_back();
+    if (!parseNumber(value, read) || (type == LineType::Duration && read.number < 0)) {
+      return Refusal::Value;
+    }
   }
   if (values.empty()) return Refusal::Value;
   return std::nullopt;

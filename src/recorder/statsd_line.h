@@ -15,6 +15,7 @@ enum class LineType : std::uint8_t { Counter, Gauge, Duration, Sample };
 
 struct MetricValue {
   double number = 0;
+  std::optional<std::int64_t> whole;  // the number, if it was written without a fraction and fits
   bool isSigned = false;  // written with a sign, which changes a gauge instead of setting it
 };
 

@@ -132,6 +132,7 @@ class FakeIngress final : public Ingress {
   std::map<ControlRequest, std::string> answers;
   tally::Status run(IngressHandler&) override { return Done{}; }
   void stop() override { stopped = true; }
+  void stopReading() override {}
   void wake() override {
     const std::lock_guard guard(mutex_);
     ++wakes_;

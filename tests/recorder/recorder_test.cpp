@@ -27,7 +27,9 @@ TEST_F(RecorderTest, ALineIsRecordedOrRefusedForAReason) {
       {"a:0.4|c\na:0.4|c\na:0.4|c", "a 1", "", ""},
       {"a:1|c|@0.0000000000000000000001", "a 1000000", "", ""},
       {"a:1e300|c\na:1|c", "a 9223372036854775807", "", ""},
-      {"a:9007199254740993|c", "a 9007199254740992", "", ""},
+      {"a:9007199254740993|c\na:0.5|c\na:0.25|c", "a 9007199254740994", "", ""},
+      {"a:-9223372036854775808|c\na:-1|c", "a -9223372036854775808", "", ""},
+      {"a:9223372036854775807|g\na:-1|g", "a 9223372036854775806", "", ""},
       {"a:5|g\na:+2|g\na:-10|g", "a -3", "", ""},
       {"a:-7|g", "a -7", "", ""},
       {"a:0|g\na:-5|g", "a -5", "", ""},
@@ -128,6 +130,42 @@ TEST_F(RecorderTest, SettingsGiveNamesTagsAndRights) {
       UnorderedElementsAre(Pair("dev.a,code=200", 2), Pair("dev.a", 2), Pair("new,zone=", 1),
                            Pair("dev.secret.open", 1), Pair("dev.secret.a", 1),
                            Pair("vellum.tallyd.refused.permission", 1)));
+}
+
+TEST_F(RecorderTest, KeysAndRightsSurviveARestartAndOtherSettings) {
+  settings.prefix = "dev.";
+  send(kBob, "temp:5|c\ndev.temp:1|c");
+  for (const bool restarts : {true, false}) {
+    SCOPED_TRACE(restarts);
+    commit();
+    if (restarts) {
+      recorder.reset();
+    } else {
+      settings.prefix = "";
+      settings.allow["dev.temp"].numbers = {kAda};
+      recorder->onReload();
+    }
+    send(kAda, restarts ? "temp:7|c" : "dev.temp:70|c");
+    send(kBob, restarts ? "dev.temp:1|c" : "dev.temp:700|c\ndev.dev.temp:1|c");
+  }
+  commit();
+  EXPECT_EQ(store.state.days[kDay].scalars["dev.temp"], 75) << "of its owner, then of who may";
+  EXPECT_EQ(store.state.days[kDay].scalars["dev.dev.temp"], 3);
+  EXPECT_EQ(refused("owner"), 2u);
+}
+
+TEST_F(RecorderTest, UsersBeyondThoseThatAreToldApartAreNobodyElse) {
+  for (std::int64_t user = 0; user < 1500; ++user) {
+    send(user + 5000, fmt::format("k{}:1|c", user));
+  }
+  send(kRoot, "vellum.x:1|c\nk1400:1|c");
+  send(9000, "vellum.x:1|c\nk1000:1|c\nk1401:1|c");
+  commit();
+  const auto& scalars = store.state.days[kDay].scalars;
+  EXPECT_EQ(scalars.at("vellum.x"), 1);
+  EXPECT_EQ(scalars.at("k1000"), 1);
+  EXPECT_EQ(scalars.at("k1400"), 1);
+  EXPECT_EQ(scalars.at("k1401"), 2) << "these are one";
 }
 
 TEST_F(RecorderTest, LimitsHoldForEachUserAlone) {
@@ -250,6 +288,14 @@ TEST_F(RecorderTest, AStoreThatCannotBeWrittenLosesNothingButDetail) {
     sent += 2000;
   }
   EXPECT_THAT(log->texts(LogLevel::Error), ElementsAre(HasSubstr("the disk is full")));
+  // The next attempts take no more memory, and the days that end meanwhile have bounds.
+  const std::size_t held = recorder->hasUncommitted();
+  for (int minute = 0; minute < 30; ++minute) {
+    send(kAda, "flood:1|h", 61);
+    settle();
+    ++sent;
+  }
+  EXPECT_EQ(held, 1u);
   EXPECT_EQ(commit(), "failed: the disk is full\n");
   store.failure.clear();
   EXPECT_EQ(commit(), "done\n");
@@ -262,14 +308,14 @@ TEST_F(RecorderTest, AStoreThatCannotBeWrittenLosesNothingButDetail) {
 }
 
 TEST_F(RecorderTest, WhatItHoldsIsForgottenOnRequest) {
-  send(kAda, "a:1|c\nt:1|ms");
+  send(kAda, "a:1|c\nt:1|ms\ng:7|g");
   recorder->onControl(7, "forget");
   send(kAda, "");
   send(kAda, "a:1|c");  // was queued
-  send(kAda, "b:1|c");
+  send(kBob, "b:1|c\ng:+1|g");
   EXPECT_EQ(ingress.answers[7], "done\n");
   commit();
-  EXPECT_THAT(store.state.days[kDay].scalars, ElementsAre(Pair("b", 1)));
+  EXPECT_THAT(store.state.days[kDay].scalars, ElementsAre(Pair("b", 1), Pair("g", 1)));
   EXPECT_TRUE(store.state.days[kDay].samples.empty());
 }
 

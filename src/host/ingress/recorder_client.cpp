@@ -21,7 +21,7 @@ namespace {
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
-constexpr std::size_t kLongestAnswer = 4u << 20;
+constexpr std::size_t kLongestReply = 4u << 20;
 
 bool isAbsent(const Error& error) {
   return error.systemError == ENOENT || error.systemError == ECONNREFUSED;
@@ -95,7 +95,7 @@ class Conversation {
       if (count == 0) return answer;
       if (count < 0 && errno != EAGAIN && errno != EINTR) return failed();
       if (count > 0) answer.append(piece, static_cast<std::size_t>(count));
-      if (answer.size() > kLongestAnswer) return noAnswer(path_, "answers without an end");
+      if (answer.size() > kLongestReply) return noAnswer(path_, "answers without an end");
       // Also while bytes come, slowly.
       if (auto ready = waitFor(POLLIN); !ready) return ready.error();
     }

@@ -1,6 +1,7 @@
 #include "host/ingress/socket_ingress.h"
 
 #include <fmt/core.h>
+#include <poll.h>
 #include <signal.h>
 #include <sys/eventfd.h>
 #include <sys/resource.h>
@@ -130,6 +131,7 @@ class SocketIngress final : public Ingress {
   void answer(ControlRequest request, std::string_view text) override {
     control_.answer(request, text, now_);
   }
+  void stopReading() override { stoppedReading_ = true; }
   bool hasConnections() const override { return streams_.size() > 0 || !control_.empty(); }
   bool isActivated() const override { return !sockets_.names; }
 
@@ -137,7 +139,9 @@ class SocketIngress final : public Ingress {
   static constexpr int kMostEvents = 64;
   using Events = std::array<epoll_event, kMostEvents>;
 
+  Status serve(const Events& events, int count, IngressHandler& handler);
   Result<int> wait(Events& events);
+  Result<int> waitForWake();
   std::optional<std::int64_t> waitingTime() const;
   Status serveDatagrams(const Events& events, int count, IngressHandler& handler);
   Status serveConnections(const Events& events, int count, IngressHandler& handler);
@@ -157,6 +161,7 @@ class SocketIngress final : public Ingress {
   ControlConnections control_;
   Descriptor wake_, deadline_, clockStep_;
   std::atomic<bool> stopped_ = false;
+  bool stoppedReading_ = false;
   std::int64_t now_ = 0;      // when the round began
   std::int64_t resumed_ = 0;  // when connections that wait were last asked for
   std::optional<std::int64_t> armed_;
@@ -195,20 +200,26 @@ Status SocketIngress::run(IngressHandler& handler) {
   for (;;) {
     now_ = bootNanoseconds();
     handler.beginRound(now_, wallSeconds());
-    if (auto served = serveDatagrams(events, count, handler); !served) return served;
-    if (auto served = serveConnections(events, count, handler); !served) return served;
-    serveListeners(events, count, handler);
-    if (auto served = serveSignals(handler); !served) return served;
+    if (!stoppedReading_) {
+      if (auto served = serve(events, count, handler); !served) return served;
+    }
     const auto delay = handler.endRound();
     if (stopped_.exchange(false)) {
       takeCount(wake_.get());
       return Done{};
     }
     if (auto set = setDeadline(delay); !set) return set;
-    const auto arrived = wait(events);
+    const auto arrived = stoppedReading_ ? waitForWake() : wait(events);
     if (!arrived) return arrived.error();
     count = *arrived;
   }
+}
+
+Status SocketIngress::serve(const Events& events, int count, IngressHandler& handler) {
+  if (auto served = serveDatagrams(events, count, handler); !served) return served;
+  if (auto served = serveConnections(events, count, handler); !served) return served;
+  serveListeners(events, count, handler);
+  return serveSignals(handler);
 }
 
 // Nanoseconds until something is to be done although nothing arrives; empty: never.
@@ -236,6 +247,15 @@ Result<int> SocketIngress::wait(Events& events) {
       return count;
     }
   }
+}
+
+Result<int> SocketIngress::waitForWake() {
+  pollfd wake{wake_.get(), POLLIN, 0};
+  if (retried([&] { return ::poll(&wake, 1, -1); }) < 0) {
+    return systemError("cannot wait for", "a commit");
+  }
+  takeCount(wake_.get());
+  return 0;
 }
 
 Status SocketIngress::serveDatagrams(const Events& events, int count, IngressHandler& handler) {

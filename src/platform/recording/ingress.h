@@ -15,6 +15,7 @@ namespace tally {
 // credentials.
 struct Sender {
   static constexpr std::int64_t kAnonymous = -1;
+  static constexpr std::int64_t kOthers = -2;  // more users than are told apart
   std::int64_t user = kAnonymous;
   bool operator==(const Sender&) const = default;
 };
@@ -66,6 +67,8 @@ class Ingress {
   virtual Status run(IngressHandler& handler) = 0;
   // Ends run() after this round; from any thread.
   virtual void stop() = 0;
+  // From the end of this round on, nothing is read any longer: only wake() begins rounds.
+  virtual void stopReading() = 0;
   // Begins a round; from any thread.
   virtual void wake() = 0;
   // From the loop's thread, also within onControl(). A client that has gone, or has its answer, is

@@ -2,6 +2,7 @@
 #include "tools/doctor/health_files.h"
 
 #include <algorithm>
+#include <iterator>
 #include <limits>
 
 #include "base/files/device_root.h"
@@ -16,7 +17,9 @@
 #include "tools/doctor/error_collector.h"
 #include "tools/frame/output.h"
 #include "tools/frame/spelling.h"
+#include "tools/metrics/known_metrics.h"
 #include "tools/report/daily_log.h"
+#include "tools/whitelist/metric_check.h"
 #include "tools/whitelist/whitelist_check.h"
 
 namespace tally::tools {
@@ -91,8 +94,9 @@ void examineDescription(const DeviceRoot& root, HealthChecks& checks) {
   examineEntries(*entries, kDescribedEntries, "", checks);
 }
 
-void examineWhitelist(Platform& platform, HealthChecks& checks) {
+void examineWhitelist(const ToolContext& context, HealthChecks& checks) {
   constexpr const char* kSubject = "whitelist";
+  Platform& platform = *context.platform;
   const WhitelistFile file = loadWhitelistFile(platform);
   if (!file.root) {
     const bool there = platform.files->fileSize(kWhitelistPath).has_value();
@@ -100,7 +104,11 @@ void examineWhitelist(Platform& platform, HealthChecks& checks) {
                       (there ? file.fault : std::string("none")) + "; nothing is reported"});
     return;
   }
-  const auto findings = checkWhitelist(platform, *file.root);
+  std::vector<Finding> findings = checkWhitelist(platform, *file.root);
+  const KnownMetrics metrics(MetricTable::load(context.root, [&](const std::string& message) {
+    findings.push_back({Severity::Fault, "", "", "", "", message});
+  }));
+  std::ranges::move(checkMetrics(context, metrics, *file.root), std::back_inserter(findings));
   const auto faults =
       static_cast<std::size_t>(std::ranges::count(findings, Severity::Fault, &Finding::severity));
   checks.push_back({faults > 0 ? Health::Wrong : Health::Ok, kSubject,
@@ -214,7 +222,7 @@ void examineFiles(const ToolContext& context, HealthChecks& checks) {
   examineRoot(root, checks);
   examineDescription(root, checks);
   examinePreferences(root, checks);
-  examineWhitelist(*context.platform, checks);
+  examineWhitelist(context, checks);
   examineStore(*context.platform, root, checks);
   examineSpool(context, checks);
 }

@@ -23,7 +23,7 @@ namespace tally::tools {
 namespace {
 
 struct RecorderArguments {
-  bool watch = false;
+  bool watch = false, commit = false;
 };
 
 // What the recorder says about itself, from one moment.
@@ -80,6 +80,7 @@ std::optional<RecorderMoment> askForMoment(const ToolContext& context) {
 }
 
 std::string userText(std::int64_t user) {
+  if (user == Sender::kOthers) return "others";
   return user == Sender::kAnonymous ? "anonymous (UDP)" : userName(user);
 }
 
@@ -190,7 +191,20 @@ void show(const ToolContext& context, const RecorderMoment& now,
   printCounts(context, now);
 }
 
+int commitNow(const ToolContext& context) {
+  constexpr std::chrono::seconds kLongestCommit{130};  // two turns at a store that is locked
+  const auto committed = SocketRecorderLink(DeviceRoot(context.root)).commit(kLongestCommit);
+  if (!committed) return complain(context, committed.error().message, kWrong);
+  if (context.json) {
+    printJson(context, {{"committed", *committed}});
+  } else {
+    printLine(context, *committed ? "committed" : "no recorder is running, so nothing is held");
+  }
+  return kSuccess;
+}
+
 int run(const ToolContext& context, const RecorderArguments& arguments) {
+  if (arguments.commit) return commitNow(context);
   std::optional<RecorderMoment> before;
   for (;;) {
     auto now = askForMoment(context);
@@ -209,10 +223,12 @@ int run(const ToolContext& context, const RecorderArguments& arguments) {
 
 void addRecorderCommand(CLI::App& app, ToolContext& context) {
   const auto arguments = std::make_shared<RecorderArguments>();
-  addCommand(app, context, "recorder",
-             "What the recorder (tallyd) holds in memory, and what it refused",
-             [&context, arguments] { return run(context, *arguments); })
-      .flag("--watch", &arguments->watch, "Show it every second until interrupted");
+  const Command command = addCommand(app, context, "recorder",
+                                     "What the recorder (tallyd) holds in memory, and what it "
+                                     "refused",
+                                     [&context, arguments] { return run(context, *arguments); });
+  command.flag("--watch", &arguments->watch, "Show it every second until interrupted");
+  command.flag("--commit", &arguments->commit, "Have it commit what it holds to the store");
 }
 
 }  // namespace tally::tools

@@ -6,6 +6,7 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 
+#include "base/printable.h"
 #include "host/ingress/recorder_client.h"
 #include "host/linux_platform.h"
 #include "host/spool/waiting_logs.h"
@@ -48,10 +49,10 @@ Status eraseStore(const DeviceRoot& root) {
 Status eraseRecorded(const DeviceRoot& root) {
   constexpr std::chrono::seconds kPatience{70};  // it may be committing to a locked store
   const auto answer = askRecorder(root, "forget", kPatience);
-  if (answer || answer.error().systemError == ENOENT ||
-      answer.error().systemError == ECONNREFUSED) {
-    return Done{};
-  }
+  if (answer && *answer == "done\n") return Done{};
+  if (answer) return Error{"the recorder: " + printable(*answer)};
+  const int error = answer.error().systemError;
+  if (error == ENOENT || error == ECONNREFUSED) return Done{};  // it holds nothing
   return Error{"the recorder: " + answer.error().message};
 }
 
