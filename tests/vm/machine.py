@@ -22,6 +22,9 @@ LONGEST_BOOT = 120  # seconds, on a machine that has other things to do
 
 
 class Machine:
+    FILE_SYSTEM = []  # further options of mke2fs
+    SIZE = "64M"
+
     def __init__(self, name, volume, chance):
         """volume: the property lists of the data volume, by path; chance: decides what the disk loses."""
         self.folder, self.chance = MADE / name, chance
@@ -31,7 +34,7 @@ class Machine:
             target = self.folder / "volume" / path
             target.parent.mkdir(parents=True, exist_ok=True)
             target.write_bytes(plistlib.dumps(content))
-        subprocess.run(["mke2fs", "-q", "-t", "ext4", "-d", self.folder / "volume", self.disk, "64M"],
+        subprocess.run(["mke2fs", "-q", "-t", "ext4", *self.FILE_SYSTEM, "-d", self.folder / "volume", self.disk, self.SIZE],
                        check=True, capture_output=True)
 
     def boot(self, day, sign, disk, lives=LONGEST_BOOT, **arguments):

@@ -115,4 +115,5 @@ def main():
     raise SystemExit("\n".join(["Faults:", *faults]) if faults else 0)
 
 
-main()
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,74 @@
+"""What a day of recording writes to the disk, counted by the emulated machine's block layer: for some
+intervals between commits, and beside programs that commit each value. scripts/bench-flash starts it."""
+import pathlib
+import plistlib
+import shutil
+import subprocess
+import sys
+
+sys.path.insert(0, str(pathlib.Path(__file__).resolve().parents[2] / "tests/vm"))
+from machine import Machine
+from run import FIRST_DAY
+
+INTERVALS = (1, 5, 15, 60)  # minutes
+METRICS = 86400 * 110
+SINGLE = 100  # values that the yardstick commits one by one
+MIB = 1 << 20
+SECTOR = 512
+LONGEST_DAY = 1200  # seconds
+WHITELIST = {"Machine": {"ScalarKeys": {}, "DistributionKeys": {}, "ScalarKeyPrefixes": {"com.example.": {}},
+                         "DistributionKeyPrefixes": {"com.example.": {}}}}
+
+
+class FlashMachine(Machine):
+    """With a disk of the common block size, whose file system has nothing left to initialise."""
+    FILE_SYSTEM = ["-b", "4096", "-E", "lazy_itable_init=0,lazy_journal_init=0"]
+    SIZE = "512M"
+
+    def answers(self, minutes):
+        """By name what the machine answers: bytes written until then, or a text."""
+        self.log.write_bytes(b"")
+        command = self.command(FIRST_DAY, "virtio", {"MODE": "flash", "DAY": FIRST_DAY, "MINUTES": minutes})
+        said = subprocess.run(command, stdin=subprocess.DEVNULL, capture_output=True, text=True, errors="replace",
+                              timeout=LONGEST_DAY, check=False).stdout.splitlines()
+        if "measured" not in said:
+            raise SystemExit(f"the machine failed, see {self.folder}/console: {said[-5:]}")
+        return dict(line.split(" ", 1) for line in said if " " in line)
+
+
+def written(answers, begin, end):
+    """Bytes, write requests and flushes between two moments."""
+    first, last = (list(map(int, answers[moment].split())) for moment in (begin, end))
+    return [(b - a) * unit for a, b, unit in zip(first, last, (SECTOR, 1, 1))]
+
+
+def measure(minutes):
+    machine = FlashMachine(f"flash-{minutes}", {
+        "Library/Application Support/Tallybook/Whitelist_Nimbus.plist": WHITELIST,
+        "var/mobile/Library/Preferences/vellum.tallyd.tallyrun.plist": {}}, None)
+    answers = machine.answers(minutes)
+    (machine.folder / "answers").write_text("".join(f"{name} {text}\n" for name, text in answers.items()))
+    if answers["recorded"] != f"{METRICS} of {METRICS}":
+        raise SystemExit(f"not all was recorded: {answers['recorded']}")
+    return answers
+
+
+def main():
+    print("a day of 100 counts a second over 500 keys and 10 samples a second over 50 keys, MiB written")
+    print(f"{'interval':<14}{'recording':>10}{'with the daily run':>20}{'requests':>10}{'flushes':>9}"
+          f"{'of each commit, KiB':>21}")
+    for minutes in INTERVALS:
+        answers = measure(minutes)
+        size, requests, flushes = written(answers, "start", "day")
+        whole = written(answers, "start", "report")[0]
+        goal = "  (to reach: 40)" if minutes == 15 else ""
+        print(f"{minutes:3} min{size / MIB:17.1f}{whole / MIB:20.1f}{requests:10}{flushes:9}"
+              f"{size / 1024 * minutes / 1440:21.1f}{goal}", flush=True)
+    for name, end in (("tallyctl store set", "set"), ("tallyctl store push", "push")):
+        size, _, flushes = written(answers, f"before-{end}", end)
+        print(f"{name}, a commit for each of {SINGLE} values: {size / SINGLE / 1024:.1f} KiB and "
+              f"{flushes / SINGLE:.1f} flushes each; a day would be {size / SINGLE * METRICS / MIB / 1024:,.0f} GiB")
+
+
+if __name__ == "__main__":
+    main()
