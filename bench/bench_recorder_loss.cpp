@@ -44,30 +44,51 @@ struct Outcome {
   std::int64_t lost = 0;
 };
 
-Outcome run(const Case& c, const std::vector<std::string>& datagrams) {
-  const Daemon daemon;
-  Sender sender(daemon.socket(), c.blocks);
+template <class Receiver>
+Outcome run(const Case& c, const std::vector<std::string>& datagrams, const std::string& socket,
+            const Receiver& metricsOf) {
+  Sender sender(socket, c.blocks);
   const double rate = c.metricsPerSecond / c.perDatagram;
   const auto count = static_cast<std::int64_t>(rate) * kSeconds;
   const auto begin = steady_clock::now();
   const std::int64_t refused = sender.send(datagrams, count, rate) * c.perDatagram;
   const double seconds = std::chrono::duration<double>(steady_clock::now() - begin).count();
   const std::int64_t sent = count * c.perDatagram;
-  return {static_cast<double>(sent) / seconds, refused, sent - refused - daemon.settledMetrics()};
+  return {static_cast<double>(sent) / seconds, refused, sent - refused - metricsOf()};
+}
+
+Outcome runDaemon(const Case& c, const std::vector<std::string>& datagrams) {
+  const Daemon daemon;
+  return run(c, datagrams, daemon.socket(), [&] { return daemon.settledMetrics(); });
+}
+
+Outcome runBareReceiver(const Case& c, const std::vector<std::string>& datagrams) {
+  const Daemon folder;  // for its own socket's directory alone
+  const std::string socket = folder.root() + "/bare";
+  const BareReceiver receiver(socket);
+  return run(c, datagrams, socket, [&] { return receiver.settled() * c.perDatagram; });
+}
+
+template <class Run>
+Outcome bestOf(Run runOnce) {
+  std::vector<Outcome> runs;
+  std::int64_t lost = 0;  // in any of them
+  for (int i = 0; i < kRuns; ++i) lost += runs.emplace_back(runOnce()).lost;
+  Outcome best = *std::ranges::min_element(runs, [](const Outcome& a, const Outcome& b) {
+    return std::pair(a.notTaken, -a.rate) < std::pair(b.notTaken, -b.rate);
+  });
+  best.lost = lost;
+  return best;
 }
 
 void measure(const Case& c) {
   const auto datagrams = makeDatagrams({}, c.perDatagram, 110'000);
-  std::vector<Outcome> runs;
-  for (int i = 0; i < kRuns; ++i) runs.push_back(run(c, datagrams));
-  const Outcome best = *std::ranges::min_element(runs, [](const Outcome& a, const Outcome& b) {
-    return std::pair(a.notTaken, -a.rate) < std::pair(b.notTaken, -b.rate);
-  });
-  std::int64_t lost = 0;  // in any of them
-  for (const Outcome& outcome : runs) lost += outcome.lost;
-  std::printf("%-12s %5d %6d %12.0f %12.0f %11lld %9lld%s\n",
+  const Outcome ours = bestOf([&] { return runDaemon(c, datagrams); });
+  const Outcome bare = bestOf([&] { return runBareReceiver(c, datagrams); });
+  std::printf("%-12s %3d %6d %10.0f %10.0f %10lld %6lld %12lld%s\n",
               c.blocks ? "blocking" : "non-blocking", c.perDatagram, c.queue, c.metricsPerSecond,
-              best.rate, static_cast<long long>(best.notTaken), static_cast<long long>(lost),
+              ours.rate, static_cast<long long>(ours.notTaken), static_cast<long long>(ours.lost),
+              static_cast<long long>(bare.notTaken),
               c.queue == kDefaultQueue && !c.blocks ? "" : "  (to reach: 0 and 0)");
 }
 
@@ -103,13 +124,13 @@ void measureClient() {
 
 int main() {
   const bool mayChoose = enterOwnNetwork();
-  std::printf("%-12s %5s %6s %12s %12s %11s %9s\n", "sender", "per", "queue", "metrics/s",
-              "in fact", "not taken", "lost");
+  std::printf("%-12s %3s %6s %10s %10s %10s %6s %12s\n", "sender", "per", "queue", "metrics/s",
+              "in fact", "not taken", "lost", "bare recv's");
   for (const Case& c : kCases) {
     if (useQueue(mayChoose, c.queue)) {
       measure(c);
     } else {
-      std::printf("%-12s %5d %6d skipped: the queue's length is root's to set\n",
+      std::printf("%-12s %3d %6d skipped: the queue's length is root's to set\n",
                   c.blocks ? "blocking" : "non-blocking", c.perDatagram, c.queue);
     }
     std::fflush(stdout);

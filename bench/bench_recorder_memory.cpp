@@ -62,7 +62,7 @@ constexpr std::string_view kMoreMemory =
     "<key>MetricsPerSecond</key><integer>1000000000</integer>";
 constexpr Case kCases[] = {
     {"whole milliseconds", Mix::Samples::WholeMilliseconds, kNoLimits, "(to reach: 16)"},
-    {"any doubles", Mix::Samples::Doubles, kNoLimits, "(to reach: 24)"},
+    {"any doubles", Mix::Samples::Doubles, kNoLimits, "(to reach: 32, the limit)"},
     {"any doubles, a limit of 64 MiB", Mix::Samples::Doubles, kMoreMemory, "(to reach: 24)"},
 };
 
