@@ -21,6 +21,7 @@
 #include "host/store/store_schema.h"
 #include "host/system/environment.h"
 #include "host/system/machine.h"
+#include "host/system/standard_streams.h"
 #include "host/system/system_log.h"
 #include "recorder/recorder.h"
 
@@ -137,6 +138,7 @@ int run(const Arguments& arguments) {
 
 int main(int count, char** texts) {
   tally::surviveFailedWrites();
+  tally::prepareStandardStreams();
   const auto arguments = tally::readArguments(count, texts);
   if (arguments.exitStatus) return *arguments.exitStatus;
   // One heap for both threads, and what is freed goes back: the daemon is there all day.

@@ -5,6 +5,7 @@
 #include <stdbool.h>
 #include <stddef.h>
 #include <sys/socket.h>
+#include <sys/types.h>
 #include <sys/un.h>
 
 #ifdef __cplusplus
@@ -14,6 +15,8 @@ extern "C" {
 struct client_link {
   struct sockaddr_un address;
   int descriptor; /* -1 while not connected */
+  dev_t device;   /* with the inode: which socket the descriptor was made for */
+  ino_t inode;
 };
 
 /* 0, EINVAL or ENAMETOOLONG. Connects if it can, for programs that lock themselves in afterwards.

@@ -48,7 +48,7 @@ struct CommitJob {
   std::vector<CommitBatch> batches;
   // Once the clock is set, undated changes of this boot are dated by this, and old ones forgotten.
   std::optional<double> wallMinusBoot;
-  std::int32_t today = 0;
+  std::int32_t today = 0;  // with a set clock; nothing is dated later
 };
 
 }  // namespace tally

@@ -2,10 +2,15 @@
 
 #include <algorithm>
 #include <limits>
+#include <new>
+#include <set>
+#include <string_view>
+#include <system_error>
 #include <utility>
 #include <vector>
 
 #include "base/time_text.h"
+#include "platform/clock.h"
 
 namespace tally {
 namespace {
@@ -13,11 +18,14 @@ namespace {
 // Of samples that are unpacked at a time: a row of the store.
 constexpr std::size_t kSamplesAtATime = 4096;
 constexpr std::size_t kUndatedAtATime = 256;
+constexpr std::string_view kOwnCounts = "vellum.tallyd.";
 constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
 
 // Applies a change whose samples' offsets count from an instant: each sample on its own day, a
-// scalar on that of the instant.
-Status applyFrom(RecordingTransaction& transaction, double instant, RecordedChange change) {
+// scalar on that of the instant. Samples of later days than `today` are dropped: the clock was
+// wrong.
+Status applyFrom(RecordingTransaction& transaction, double instant, std::int32_t today,
+                 RecordedChange change) {
   const std::int32_t firstDay = dayOfSeconds(instant);
   if (change.kind != RecordedChange::Kind::Samples) return transaction.apply(firstDay, change);
   const double intoDay = instant - static_cast<double>(firstDay) * kSecondsPerDay;
@@ -36,21 +44,60 @@ Status applyFrom(RecordingTransaction& transaction, double instant, RecordedChan
     const std::size_t count = end - i;
     change.samples = {all.values.subspan(i, count), offsets,
                       all.weights.empty() ? all.weights : all.weights.subspan(i, count)};
-    auto applied = transaction.apply(firstDay + static_cast<std::int32_t>(days), change);
-    if (!applied) return applied;
+    if (firstDay + days <= today) {
+      auto applied = transaction.apply(firstDay + static_cast<std::int32_t>(days), change);
+      if (!applied) return applied;
+    }
     i = end;
   }
   return Done{};
 }
 
+// Says whose keys are, and remembers which turned out to be others'.
+class OwnerCheck {
+ public:
+  OwnerCheck(RecordingTransaction& transaction, Committer::Outcome& outcome)
+      : transaction_(transaction), outcome_(outcome) {}
+
+  // Whether the user may record the key on that day; it is then the user's. A key that is not is
+  // counted.
+  Result<bool> claim(std::int32_t day, const KeyOwner& wanted) {
+    const auto owner = transaction_.owner(day, wanted.key);
+    if (!owner) return owner.error();
+    if (!*owner) {
+      if (auto set = transaction_.setOwner(day, wanted); !set) return set.error();
+      return true;
+    }
+    if (**owner == wanted.user) return true;
+    ++outcome_.refused;
+    outcome_.foreign.push_back({wanted.key, **owner, wanted.distribution});
+    return false;
+  }
+
+ private:
+  RecordingTransaction& transaction_;
+  Committer::Outcome& outcome_;
+};
+
 class BatchWriter {
  public:
-  BatchWriter(RecordingTransaction& transaction, const std::string& bootId,
-              const CommitBatch& batch)
-      : transaction_(transaction), bootId_(bootId), batch_(batch) {}
+  BatchWriter(RecordingTransaction& transaction, const std::string& bootId, const CommitJob& job,
+              const CommitBatch& batch, Committer::Outcome& outcome)
+      : transaction_(transaction),
+        bootId_(bootId),
+        today_(job.today),
+        batch_(batch),
+        owners_(transaction, outcome) {}
 
   Status write() {
+    const auto day = batch_.day             ? batch_.day
+                     : batch_.originOnClock ? std::optional(dayOfSeconds(*batch_.originOnClock))
+                                            : std::nullopt;
+    if (day) {
+      if (auto claimed = claim(*day); !claimed) return claimed;
+    }
     for (const CommitBatch::Change& change : batch_.changes) {
+      if (foreign_.contains(change.key)) continue;
       auto written = write(change);
       if (!written) return written;
     }
@@ -60,23 +107,37 @@ class BatchWriter {
     for (std::size_t i = 0; i < kRecorderCountCount; ++i) {
       if (auto added = add(kRecorderCounts[i].key, batch_.counts[i]); !added) return added;
     }
-    const auto day = ownersDay();
-    for (std::size_t i = 0; day && i < batch_.owners.size(); ++i) {
-      if (auto set = transaction_.setOwner(*day, batch_.owners[i]); !set) return set;
-    }
     return Done{};
   }
 
  private:
-  std::optional<std::int32_t> ownersDay() const {
-    if (batch_.day) return batch_.day;
-    if (batch_.originOnClock) return dayOfSeconds(*batch_.originOnClock);
-    return std::nullopt;
+  // Keys that are new to this process may be others' all the same: the owners could not be read, or
+  // the day was not known.
+  Status claim(std::int32_t day) {
+    for (const KeyOwner& owner : batch_.owners) {
+      if (auto claimed = claim(day, owner); !claimed) return claimed;
+    }
+    if (batch_.day) return Done{};
+    for (const CommitBatch::Change& change : batch_.changes) {
+      const bool distribution = change.kind == RecordedChange::Kind::Samples;
+      auto claimed = claim(day, {std::string(change.key), change.userNumber, distribution});
+      if (!claimed) return claimed;
+    }
+    return Done{};
+  }
+  Status claim(std::int32_t day, const KeyOwner& owner) {
+    if (foreign_.contains(owner.key)) return Done{};
+    const auto claimed = owners_.claim(day, owner);
+    if (!claimed) return claimed.error();
+    if (!*claimed) foreign_.insert(owner.key);
+    return Done{};
   }
 
   Status apply(const RecordedChange& change) {
     if (batch_.day) return transaction_.apply(*batch_.day, change);
-    if (batch_.originOnClock) return applyFrom(transaction_, *batch_.originOnClock, change);
+    if (batch_.originOnClock) {
+      return applyFrom(transaction_, *batch_.originOnClock, today_, change);
+    }
     return transaction_.addUndated(bootId_, batch_.origin, change);
   }
 
@@ -105,26 +166,41 @@ class BatchWriter {
 
   RecordingTransaction& transaction_;
   const std::string& bootId_;
+  const std::int32_t today_;
   const CommitBatch& batch_;
+  OwnerCheck owners_;
+  std::set<std::string, std::less<>> foreign_;
   StreamSamples samples_;
 };
 
 Status dateUndated(RecordingTransaction& transaction, const std::string& bootId,
-                   double wallMinusBoot) {
+                   Committer::Outcome& outcome) {
+  OwnerCheck owners(transaction, outcome);
   for (;;) {
     const auto taken = transaction.takeUndated(bootId, kUndatedAtATime);
     if (!taken) return taken.error();
     for (const UndatedChange& undated : *taken) {
+      const double instant =
+          *outcome.job.wallMinusBoot + static_cast<double>(undated.secondsSinceBoot);
+      const std::int32_t day = dayOfSeconds(instant);
+      if (day < kFirstPlausibleDay || day > outcome.job.today) {
+        ++outcome.undatedForgotten;
+        continue;
+      }
       const RecordedChange change{.kind = undated.kind,
                                   .key = undated.key,
                                   .value = undated.value,
                                   .samples = {undated.values, undated.offsets, undated.weights},
                                   .user = undated.user};
-      const double instant = wallMinusBoot + static_cast<double>(undated.secondsSinceBoot);
-      if (auto applied = applyFrom(transaction, instant, change); !applied) return applied;
-      const KeyOwner owner{undated.key, undated.user,
-                           undated.kind == RecordedChange::Kind::Samples};
-      if (auto set = transaction.setOwner(dayOfSeconds(instant), owner); !set) return set;
+      const bool isOwn = undated.key.starts_with(kOwnCounts);  // counted by the recorder itself
+      const auto claimed = isOwn
+                               ? Result<bool>(true)
+                               : owners.claim(day, {undated.key, undated.user,
+                                                    undated.kind == RecordedChange::Kind::Samples});
+      if (!claimed) return claimed.error();
+      if (!*claimed) continue;
+      auto applied = applyFrom(transaction, instant, outcome.job.today, change);
+      if (!applied) return applied;
     }
     if (taken->size() < kUndatedAtATime) return Done{};
   }
@@ -140,40 +216,54 @@ void Committer::start(CommitJob job) {
   outcome_ = {};
   outcome_.job = std::move(job);
   ended_ = false;
-  thread_ = std::thread([this] {
-    {
-      const std::lock_guard guard(storeInUse_);
-      outcome_.status = write(outcome_.job, outcome_.undatedForgotten);
-      store_.releaseMemory();
-    }
+  busy_ = true;
+  try {
+    thread_ = std::thread([this] {
+      {
+        const std::lock_guard guard(storeInUse_);
+        try {
+          outcome_.status = write(outcome_);
+        } catch (const std::bad_alloc&) {
+          outcome_.status = Error{"no memory for a commit"};
+        }
+        store_.releaseMemory();
+      }
+      ended_ = true;
+      onDone_();
+    });
+  } catch (const std::system_error&) {
+    // The user has as many processes as it may.
+    outcome_.status = Error{"no thread for a commit"};
     ended_ = true;
     onDone_();
-  });
+  }
 }
 
 std::optional<Committer::Outcome> Committer::takeOutcome() {
-  if (!thread_.joinable() || !ended_) return std::nullopt;
-  thread_.join();
+  if (!busy_ || !ended_) return std::nullopt;
+  if (thread_.joinable()) thread_.join();
+  busy_ = false;
   return std::move(outcome_);
 }
 
-Status Committer::write(CommitJob& job, std::uint64_t& undatedForgotten) {
+Status Committer::write(Outcome& outcome) {
+  const CommitJob& job = outcome.job;
   auto transaction = store_.begin();
   if (!transaction) return transaction.error();
   if (job.wallMinusBoot) {
-    auto dated = dateUndated(**transaction, bootId_, *job.wallMinusBoot);
-    if (!dated) return dated;
+    if (auto dated = dateUndated(**transaction, bootId_, outcome); !dated) return dated;
   }
   bool hasUndated = false;
   for (const CommitBatch& batch : job.batches) {
-    if (auto written = BatchWriter(**transaction, bootId_, batch).write(); !written) return written;
+    auto written = BatchWriter(**transaction, bootId_, job, batch, outcome).write();
+    if (!written) return written;
     hasUndated = hasUndated || (!batch.day && !batch.originOnClock);
   }
   if (job.wallMinusBoot || hasUndated) {
     const auto forgotten =
         (*transaction)->forgetUndated(job.wallMinusBoot ? std::optional(job.today) : std::nullopt);
     if (!forgotten) return forgotten.error();
-    undatedForgotten = *forgotten;
+    outcome.undatedForgotten += *forgotten;
   }
   return (*transaction)->commit();
 }

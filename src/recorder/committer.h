@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "base/result.h"
 #include "platform/recording/recording_store.h"
@@ -23,6 +24,9 @@ class Committer {
     Status status = Done{};
     CommitJob job;  // as it was given, also when it failed
     std::uint64_t undatedForgotten = 0;
+    // Keys that turned out to be others', with these owners; what was recorded of them is refused.
+    std::vector<KeyOwner> foreign;
+    std::uint64_t refused = 0;
   };
   // onDone is called by the thread when there is an outcome.
   Committer(RecordingStore& store, std::string bootId, std::function<void()> onDone)
@@ -31,7 +35,7 @@ class Committer {
   Committer(const Committer&) = delete;
   Committer& operator=(const Committer&) = delete;
 
-  bool isBusy() const { return thread_.joinable(); }
+  bool isBusy() const { return busy_; }
   // REQUIRES: it is not busy.
   void start(CommitJob job);
   // The outcome of the commit that has ended, once.
@@ -44,13 +48,14 @@ class Committer {
   }
 
  private:
-  Status write(CommitJob& job, std::uint64_t& undatedForgotten);
+  Status write(Outcome& outcome);
 
   RecordingStore& store_;
   const std::string bootId_;
   std::function<void()> onDone_;
   std::mutex storeInUse_;
   std::thread thread_;
+  bool busy_ = false;
   std::atomic<bool> ended_ = false;
   Outcome outcome_;
 };

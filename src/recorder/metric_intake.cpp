@@ -4,6 +4,7 @@
 #include <cmath>
 #include <cstring>
 #include <iterator>
+#include <limits>
 #include <utility>
 
 #include "base/time_text.h"
@@ -13,9 +14,10 @@ namespace {
 
 // Rates below are taken as this: a weight stays a number that a day can have.
 constexpr double kLeastRate = 1e-6;
-// What the program takes beside what it holds: its code's data, the store's buffers, the stack of
-// the commit.
-constexpr std::size_t kMemoryOfProgram = 5 << 20;
+// What the program takes beside what it holds: its code's data, the datagrams that were just read,
+// the store's buffers, the stack of the commit.
+constexpr std::size_t kMemoryOfProgram = 8 << 20;
+constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
 // Of the keys of a day, the last quarter is for users who have few.
 constexpr std::uint64_t kFewKeys = 100;
 
@@ -26,8 +28,8 @@ ScalarAmount amountOf(const MetricValue& value) {
 }  // namespace
 
 std::size_t MetricIntake::mostBytes() const {
-  return static_cast<std::size_t>(settings().number(RecorderNumber::MemoryLimit)) -
-         kMemoryOfProgram;
+  const auto limit = static_cast<std::size_t>(settings().number(RecorderNumber::MemoryLimit));
+  return limit - std::min(kMemoryOfProgram, limit / 2);
 }
 
 std::size_t MetricIntake::bytes() const {
@@ -120,7 +122,7 @@ void MetricIntake::record(std::uint32_t user, const MetricLine& metric) {
   if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
   keys_->markDirty(index);
   addValues(key, user, metric);
-  hasDurable_ = hasDurable_ || key.durable;
+  if (key.durable) markDurable(user);
   markHeld();
   users_.at(user).metrics += values_.size();
   metrics_ += values_.size();
@@ -255,8 +257,23 @@ void MetricIntake::markHeld() {
   if (!heldSince_) heldSince_ = now_.bootNanoseconds;
 }
 
+void MetricIntake::markDurable(std::uint32_t user) {
+  const std::int64_t due = users_.durableDue(users_.at(user), now_.bootNanoseconds);
+  durableDue_ = durableDue_ ? std::min(*durableDue_, due) : due;
+}
+
+void MetricIntake::yieldKeys(std::span<const KeyOwner> owners, std::uint64_t changes) {
+  refused_[static_cast<std::size_t>(Refusal::Owner)] += changes;
+  if (changes > 0) markHeld();
+  for (const KeyOwner& owner : owners) {
+    const std::uint32_t index = keys_->findKey(owner.key);
+    if (index != HeldKeys::kNone) keys_->at(index).user = users_.indexOf({owner.user}, settings());
+  }
+}
+
 void MetricIntake::count(RecorderCount which, std::uint64_t amount) {
-  counts_[static_cast<std::size_t>(which)] += amount;
+  std::uint64_t& count = counts_[static_cast<std::size_t>(which)];
+  count += std::min(amount, kMostCounted - count);
   if (amount > 0) markHeld();
 }
 
@@ -303,7 +320,7 @@ void MetricIntake::putBackHeld(CommitBatch& batch) {
   for (CommitBatch::Change& change : batch.changes) {
     HeldKey& key = keys_->at(change.index);
     keys_->markDirty(change.index);
-    hasDurable_ = hasDurable_ || key.durable;
+    if (key.durable) markDurable(key.user);
     if (!change.samples) {
       key.scalar.putBack({change.kind, change.value, false});
       continue;
@@ -343,7 +360,8 @@ CommitBatch MetricIntake::takeBatch(Take which) {
       takeChange(batch, index, which == Take::AllAtEnd);
     }
   }
-  hasDurable_ = false;
+  durableDue_.reset();
+  users_.endDurable();
   if (which != Take::Durable) {
     takeCounts(batch);
     heldSince_.reset();

@@ -51,8 +51,8 @@ class MetricIntake {
 
   // Since when, in nanoseconds since boot, something waits to be taken; empty if nothing does.
   std::optional<std::int64_t> heldSince() const { return heldSince_; }
-  // Whether a key that is to be committed at once is among that.
-  bool hasDurable() const { return hasDurable_; }
+  // When keys that are durable are to be committed, on the same clock; empty if none has changed.
+  std::optional<std::int64_t> durableDue() const { return durableDue_; }
   bool hasWaiting() const { return !waiting_.empty(); }
   std::int64_t lastLineAt() const { return lastLineAt_; }
 
@@ -63,6 +63,8 @@ class MetricIntake {
   // Takes batches back whose commit failed: what is of the day in progress becomes a part of it
   // again, so that a store that fails for long takes no more memory than one that does not.
   void putBack(std::vector<CommitBatch> batches);
+  // Keys that are others', as the store knows them: so many changes of theirs were refused there.
+  void yieldKeys(std::span<const KeyOwner> owners, std::uint64_t changes);
   // The batch is in the store.
   void forget(const CommitBatch& batch);
   // Drops everything that waits to be committed.
@@ -94,6 +96,7 @@ class MetricIntake {
   void refuseFor(std::uint32_t user, Refusal refusal, std::uint64_t count);
   void growSamples(std::uint32_t user, std::size_t bytes);
   void markHeld();
+  void markDurable(std::uint32_t user);
 
   CommitBatch takeBatch(Take which);
   void takeChange(CommitBatch& batch, std::uint32_t index, bool atEnd);
@@ -116,7 +119,7 @@ class MetricIntake {
 
   std::optional<std::int64_t> heldSince_;
   std::int64_t lastLineAt_ = 0;
-  bool hasDurable_ = false;
+  std::optional<std::int64_t> durableDue_;
   std::size_t sampleBytes_ = 0;
   std::uint64_t samples_ = 0, metrics_ = 0;
   // Since the start, and what of it has been put into batches.

@@ -14,9 +14,6 @@ constexpr std::int64_t kRetryAfter = 60 * kSecond;
 // A socket-activated recorder ends after so many intervals without a metric: who records now and
 // then is not to start it each time.
 constexpr std::int64_t kQuietIntervals = 2;
-// Durable keys are committed at once, but whoever sends them without a pause must not wear out the
-// flash: so many commits, and then one a second.
-constexpr double kDurableCommits = 10;
 
 }  // namespace
 
@@ -42,9 +39,6 @@ void Recorder::beginRound(std::int64_t bootNanoseconds, double secondsSince1970)
     }
   }
   now_ = clock_.at(bootNanoseconds, secondsSince1970);
-  const auto seconds = static_cast<double>(bootNanoseconds - durableCommitsAt_) / kSecond;
-  durableCommits_ = std::min(durableCommits_ + seconds, kDurableCommits);
-  durableCommitsAt_ = bootNanoseconds;
   if (intake_.keys() == nullptr || intake_.keys()->day() != now_.day) {
     beginDay();
   } else {
@@ -83,7 +77,11 @@ void Recorder::onLoss(IngressLoss loss, Sender sender, std::uint64_t count) {
 std::size_t Recorder::streamQuota(Sender sender) { return intake_.allowedBytes(sender); }
 
 void Recorder::onReload() {
-  intake_.setSettings(parts_.readSettings());
+  RecorderSettings settings = parts_.readSettings();
+  if (!settings.complete) {
+    return parts_.log.write(LogLevel::Error, "the settings stay as they were");
+  }
+  intake_.setSettings(std::move(settings));
   parts_.log.write(LogLevel::Default, "settings read again");
 }
 
@@ -123,31 +121,30 @@ void Recorder::answerControls() {
 }
 
 bool Recorder::commitIsDue() const {
-  const bool asked = terminating_ || askedToCommit_;
-  if (!asked && now_.bootNanoseconds < retryAt_) return false;
-  if (asked || intake_.hasWaiting()) return true;
-  if (intake_.hasDurable() && now_.bootNanoseconds >= durableCommitAt()) return true;
-  const auto since = intake_.heldSince();
-  return since && (now_.bootNanoseconds - *since >= interval() || intake_.isHalfFull());
+  if (terminating_ || askedToCommit_) return true;
+  return now_.bootNanoseconds >= retryAt_ && (durableIsDue() || allIsDue());
 }
 
-std::int64_t Recorder::durableCommitAt() const {
-  if (durableCommits_ >= 1) return 0;
-  return durableCommitsAt_ + static_cast<std::int64_t>((1 - durableCommits_) * kSecond);
+bool Recorder::durableIsDue() const {
+  const auto due = intake_.durableDue();
+  return due && now_.bootNanoseconds >= *due;
+}
+
+bool Recorder::allIsDue() const {
+  const auto since = intake_.heldSince();
+  return terminating_ || askedToCommit_ || intake_.hasWaiting() ||
+         (since && (now_.bootNanoseconds - *since >= interval() || intake_.isHalfFull()));
 }
 
 bool Recorder::startCommit() {
-  const bool durableAlone = intake_.hasDurable() && !askedToCommit_ && !intake_.hasWaiting();
-  if (durableAlone) durableCommits_ -= 1;
+  const bool durableAlone = !allIsDue();
   CommitJob job;
   job.batches = intake_.take(terminating_   ? MetricIntake::Take::AllAtEnd
                              : durableAlone ? MetricIntake::Take::Durable
                                             : MetricIntake::Take::All);
   askedToCommit_ = false;
-  if (now_.day && std::exchange(dateUndated_, false)) {
-    job.wallMinusBoot = now_.wallMinusBoot;
-    job.today = *now_.day;
-  }
+  job.today = now_.day.value_or(0);
+  if (now_.day && std::exchange(dateUndated_, false)) job.wallMinusBoot = now_.wallMinusBoot;
   if (job.batches.empty() && !job.wallMinusBoot) return false;
   ++commits_.started;
   committer_.start(std::move(job));
@@ -160,6 +157,7 @@ bool Recorder::endCommit() {
   ++commits_.ended;
   if (outcome->status) {
     for (const CommitBatch& batch : outcome->job.batches) intake_.forget(batch);
+    intake_.yieldKeys(outcome->foreign, outcome->refused);
     if (outcome->undatedForgotten > 0) {
       intake_.count(RecorderCount::UndatedDropped, outcome->undatedForgotten);
     }
@@ -240,7 +238,7 @@ std::optional<std::int64_t> Recorder::nextRound() const {
                 static_cast<std::int64_t>((untilMidnight + 1) * static_cast<double>(kSecond)));
   }
   if (intake_.hasWaiting()) noLaterThan(now_.bootNanoseconds);
-  if (intake_.hasDurable()) noLaterThan(durableCommitAt());
+  if (const auto due = intake_.durableDue()) noLaterThan(*due);
   if (at && retryAt_ > 0) at = std::max(*at, retryAt_);
   if (parts_.ingress.isActivated() && !parts_.ingress.hasConnections() && !hasUncommitted()) {
     noLaterThan(std::max(intake_.lastLineAt(), commits_.startedAt) + kQuietIntervals * interval());

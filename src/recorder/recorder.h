@@ -58,8 +58,8 @@ class Recorder final : public IngressHandler {
   void beginDay();
   std::int64_t interval() const;  // nanoseconds
   bool commitIsDue() const;
-  // When the next commit of durable keys alone may begin.
-  std::int64_t durableCommitAt() const;
+  bool durableIsDue() const;
+  bool allIsDue() const;
   // False when there was nothing to commit.
   bool startCommit();
   // Whether a commit has ended, and well.
@@ -80,8 +80,6 @@ class Recorder final : public IngressHandler {
   std::int64_t retryAt_ = 0;  // after a commit that failed
   bool dateUndated_ = true, terminating_ = false, finalCommitBegan_ = false;
   bool askedToCommit_ = false, askedToForget_ = false;
-  double durableCommits_ = 0;  // that may begin at once
-  std::int64_t durableCommitsAt_ = 0;
   CommitFigures commits_;
 };
 

@@ -133,23 +133,21 @@ class Merge {
   SystemLog& log_;
 };
 
-void mergeFile(RecorderSettings& settings, const DeviceDirectory& directory,
+// False, after a line, if it is there and cannot be read.
+bool mergeFile(RecorderSettings& settings, const DeviceDirectory& directory,
                const std::string& name, const UserLookup& users, SystemLog& log) {
   const std::string file = directory.text() + "/" + name;
   const auto text = directory.readFile(name, kLargestFile);
-  if (!text) {
-    if (text.error().systemError != ENOENT) {
-      log.message(LogLevel::Error, "{}", text.error().message);
-    }
-    return;
-  }
-  const auto value = decodePlist(*text);
-  if (!value) return log.message(LogLevel::Error, "{}: {}", file, value.error().message);
-  const auto* const dictionary = kvCast<KvDictionary>(value->get());
+  if (!text && text.error().systemError == ENOENT) return true;
+  const auto value = text ? decodePlist(*text) : Result<KvRef<KvObject>>(text.error());
+  const auto* const dictionary = value ? kvCast<KvDictionary>(value->get()) : nullptr;
   if (dictionary == nullptr) {
-    return log.message(LogLevel::Error, "{}: not a dictionary, and is ignored", file);
+    log.message(LogLevel::Error, "{}: {}", file,
+                value ? std::string("not a dictionary") : value.error().message);
+    return false;
   }
   settings.merge(*dictionary, file, users, log);
+  return true;
 }
 
 }  // namespace
@@ -171,17 +169,23 @@ RecorderSettings readRecorderSettings(const DeviceRoot& root, const UserLookup& 
   RecorderSettings settings;
   const std::string domain(kRecorderDomain);
   for (const std::string_view path : kDirectories) {
-    mergeFile(settings, DeviceDirectory(root, std::string(path)), domain + ".plist", users, log);
+    const auto take = [&](const DeviceDirectory& directory, const std::string& name) {
+      const bool taken = mergeFile(settings, directory, name, users, log);
+      settings.complete = settings.complete && taken;
+    };
+    take(DeviceDirectory(root, std::string(path)), domain + ".plist");
     const DeviceDirectory dropIns(root, std::string(path) + "/" + domain + ".d");
     const auto names = dropIns.list();
     if (!names) {
       log.message(LogLevel::Error, "{}", names.error().message);
+      settings.complete = false;
       continue;
     }
     for (const std::string& name : *names) {
-      if (name.ends_with(".plist")) mergeFile(settings, dropIns, name, users, log);
+      if (name.ends_with(".plist")) take(dropIns, name);
     }
   }
+  if (!settings.complete) settings.allow[""] = {.numbers = {0}};
   return settings;
 }
 

@@ -37,6 +37,7 @@ struct RecorderSettings {
   std::map<std::string, std::string, std::less<>> rename;
   std::vector<std::string> tags, durable;
   std::map<std::string, Users, std::less<>> allow;  // by prefix of the key
+  bool complete = true;  // false: a file could not be read, and with it perhaps what closes keys
 
   // Takes over what the dictionary sets; lists grow, everything else is replaced. What is malformed
   // is left out and named, with the file, in the log.
@@ -45,7 +46,8 @@ struct RecorderSettings {
 };
 
 // tallyd.plist and then, by name, the drop-ins tallyd.d/*.plist of the system's preferences, and
-// after them those of the store's owner.
+// after them those of the store's owner. While one of them cannot be read, only root may record
+// keys that none of the others gives to somebody.
 RecorderSettings readRecorderSettings(const DeviceRoot& root, const UserLookup& users,
                                       SystemLog& log);
 

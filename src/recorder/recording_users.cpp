@@ -8,6 +8,10 @@ namespace {
 
 // Traffic comes in bursts: what counts is the rate over this time.
 constexpr double kSecondsAveraged = 600;
+// Durable keys are committed at once, but whoever sends them without a pause must not wear out the
+// flash: each user has so many commits, and then one a second.
+constexpr double kDurableCommits = 10;
+constexpr double kNanoseconds = 1e9;
 
 double largestAllowance(const RecorderSettings& settings) {
   return static_cast<double>(settings.number(RecorderNumber::MetricsPerSecond)) * kSecondsAveraged;
@@ -38,7 +42,6 @@ std::uint32_t RecordingUsers::indexOf(Sender sender, const RecorderSettings& set
 bool RecordingUsers::admit(RecordingUser& user, std::size_t metrics, std::int64_t bootNanoseconds,
                            const RecorderSettings& settings) {
   if (user.allowanceAt != bootNanoseconds) {
-    constexpr double kNanoseconds = 1e9;
     const double rate = static_cast<double>(settings.number(RecorderNumber::MetricsPerSecond));
     if (user.allowanceAt != 0) {
       const double seconds = static_cast<double>(bootNanoseconds - user.allowanceAt) / kNanoseconds;
@@ -51,6 +54,21 @@ bool RecordingUsers::admit(RecordingUser& user, std::size_t metrics, std::int64_
   if (user.allowance < wanted) return false;
   user.allowance -= wanted;
   return true;
+}
+
+std::int64_t RecordingUsers::durableDue(RecordingUser& user, std::int64_t bootNanoseconds) {
+  if (user.durableWaits) return user.durableAt;
+  const auto seconds = static_cast<double>(bootNanoseconds - user.durableAt) / kNanoseconds;
+  const double commits = std::min(user.durableCommits + std::max(seconds, 0.0), kDurableCommits);
+  const double wait = std::max(1 - commits, 0.0);
+  user.durableWaits = true;
+  user.durableCommits = commits + wait - 1;
+  user.durableAt = bootNanoseconds + static_cast<std::int64_t>(wait * kNanoseconds);
+  return user.durableAt;
+}
+
+void RecordingUsers::endDurable() {
+  for (RecordingUser& user : users_) user.durableWaits = false;
 }
 
 void RecordingUsers::beginDay() {

@@ -18,6 +18,9 @@ struct RecordingUser {
   std::uint64_t keysToday = 0;
   std::size_t bytes = 0;  // of memory that the user's samples take
   RefusalCounts refused{};
+  double durableCommits = 0;   // that the user's durable keys may begin at once
+  std::int64_t durableAt = 0;  // as of when, nanoseconds since boot
+  bool durableWaits = false;
 };
 
 class RecordingUsers {
@@ -33,6 +36,10 @@ class RecordingUsers {
   // Whether the user may send so many metrics now, which then count.
   bool admit(RecordingUser& user, std::size_t metrics, std::int64_t bootNanoseconds,
              const RecorderSettings& settings);
+  // When a durable key that the user records now is to be committed.
+  std::int64_t durableDue(RecordingUser& user, std::int64_t bootNanoseconds);
+  // Those keys are being committed.
+  void endDurable();
   void beginDay();
 
  private:

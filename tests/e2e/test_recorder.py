@@ -49,10 +49,11 @@ class Recorder(DeviceTest):
         self.path = str(self.root / "run/tallyd/statsd.sock")
         eventually(lambda: self.ask("status"))
 
-    def stop(self, status=0):
+    def stop(self, status=0, asked=False):
         if self.process is None:
             return ""
-        self.process.terminate()
+        if not asked:
+            self.process.terminate()
         errors = self.process.communicate(timeout=100)[1].decode()
         self.assertEqual(self.process.returncode, status, errors)
         self.process = None
@@ -91,6 +92,7 @@ class Recorder(DeviceTest):
         self.start(day=TODAY - 1)
         self.send("shop.orders:1|c|@0.1", "shop.orders:5|c", "shop.open:0|g", "shop.open:-4|g", "x:y|s",
                   "shop.time:5:50:50|ms|@0.5")
+        eventually(lambda: self.status()["metrics"] == 7)
         # Nothing was committed yet; the next day's run asks for it.
         self.set_clock(TODAY, 300)
         self.device.run("-f")
@@ -112,7 +114,7 @@ class Recorder(DeviceTest):
         eventually(lambda: self.status()["metrics"] == 4)
         self.commit()
         self.assertEqual(self.scalars(), {"a": 3})
-        self.assertEqual(self.rows(f"SELECT day, key, samples FROM arrivals"), [(TODAY, "t", 1)])
+        self.assertEqual(self.rows("SELECT day, key, samples FROM arrivals"), [(TODAY, "t", 1)])
         # Across midnight and back, as a correction of some seconds may go.
         self.set_clock(TODAY + 1, 5)
         self.send("a:10|c")
@@ -220,6 +222,37 @@ class Recorder(DeviceTest):
                   "    except PermissionError: print('refused')\n")
         output = subprocess.check_output([sys.executable, "-c", script, self.root, self.root / STORE], text=True)
         self.assertEqual(output.split(), ["refused"] * 3)
+
+    def test_what_comes_while_it_ends_is_for_the_next_one(self):
+        """As on an upgrade: systemd keeps the sockets, here the test does."""
+        folder = self.root / "run/tallyd"
+        folder.mkdir(parents=True)
+        self.device.tool("store", "set", "made", "1")
+        day = int(time.time()) // 86400
+        self.path = str(folder / "statsd.sock")
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as passed:
+            passed.bind(self.path)
+
+            def start():
+                self.process = subprocess.Popen(
+                    ["sh", "-c", f'exec 3<&{passed.fileno()}; LISTEN_PID=$$ LISTEN_FDS=1 exec "$0"', BIN / "tallyd"],
+                    pass_fds=[passed.fileno()], env=self.device.environment(), stderr=subprocess.PIPE)
+
+            start()
+            self.send("a:1|c")
+            time.sleep(0.5)  # it has no control socket to ask
+            with contextlib.closing(sqlite3.connect(self.root / STORE, isolation_level=None)) as other:
+                other.execute("BEGIN IMMEDIATE")
+                self.process.terminate()
+                time.sleep(0.5)
+                self.send("a:10|c")
+                other.execute("COMMIT")
+            self.stop(asked=True)
+            self.assertEqual(self.scalars(day)["a"], 1)
+            start()
+            time.sleep(0.5)
+            self.stop()
+            self.assertEqual(self.scalars(day)["a"], 11)
 
     def test_a_thousand_connections(self):
         self.start()

@@ -36,6 +36,7 @@ class FakeRecordingStore final : public RecordingStore {
   State state;
   int commits = 0;
   std::string failure;  // of every commit, unless empty
+  bool ownersFail = false;
 
   Result<std::unique_ptr<RecordingTransaction>> begin() override {
     if (!failure.empty()) return Error{failure};
@@ -43,6 +44,7 @@ class FakeRecordingStore final : public RecordingStore {
   }
   Result<std::vector<KeyOwner>> owners(std::int32_t day) override {
     std::vector<KeyOwner> found;
+    if (ownersFail) return Error{"cannot be read"};
     for (const auto& [key, user] : state.days[day].owners) found.push_back({key, user, false});
     return found;
   }
@@ -77,6 +79,11 @@ class FakeRecordingStore final : public RecordingStore {
           break;
       }
       return Done{};
+    }
+    Result<std::optional<std::int64_t>> owner(std::int32_t day, std::string_view key) override {
+      const auto& owners = state_.days[day].owners;
+      const auto found = owners.find(std::string(key));
+      return found != owners.end() ? std::optional(found->second) : std::nullopt;
     }
     tally::Status setOwner(std::int32_t day, const KeyOwner& owner) override {
       state_.days[day].owners.emplace(owner.key, owner.user);

@@ -114,6 +114,38 @@ TEST_F(RecorderTest, AKeyBelongsToItsFirstUserForTheDay) {
   EXPECT_EQ(store.state.days[kDay + 1].scalars["a"], 5);
 }
 
+// Another user comes while the owners are not known: before the clock is set, or since they could
+// not be read.
+TEST_F(RecorderTest, AKeyOfAnotherIsFoundOutAtTheCommit) {
+  for (const std::string_view reason : {"held", "committed", "unread"}) {
+    SCOPED_TRACE(reason);
+    store.state = {};
+    store.ownersFail = false;
+    const double right = wall;
+    recorder.reset();
+    send(kAda, "mine:100|g\nlat:5|h");
+    commit();
+    recorder.reset();
+    store.ownersFail = reason == "unread";
+    if (!store.ownersFail) wall = 100;
+    send(kBob, "mine:666|g\nlat:9|h\nhis:1|c", 1);
+    if (reason == "committed") commit();
+    wall = right + 5;
+    boot += 5'000'000'000;
+    send(kBob, "mine:667|g\nhis:1|c");
+    commit();
+    send(kBob, "mine:668|g");
+    send(kAda, "lat:6|h");
+    commit();
+    const StoredDay& day = store.state.days[kDay];
+    EXPECT_EQ(day.scalars.at("mine"), 100);
+    EXPECT_EQ(day.scalars.at("his"), 2);
+    EXPECT_EQ(day.weights.at("lat"), 2u);
+    EXPECT_EQ(day.owners.at("mine"), kAda);
+    EXPECT_GE(refused("owner"), 3u);
+  }
+}
+
 TEST_F(RecorderTest, SettingsGiveNamesTagsAndRights) {
   settings.prefix = "dev.";
   settings.rename["old"] = "new";
@@ -144,6 +176,9 @@ TEST_F(RecorderTest, KeysAndRightsSurviveARestartAndOtherSettings) {
       settings.prefix = "";
       settings.allow["dev.temp"].numbers = {kAda};
       recorder->onReload();
+      settings.allow.clear();
+      settings.complete = false;
+      recorder->onReload();  // a broken file changes nothing
     }
     send(kAda, restarts ? "temp:7|c" : "dev.temp:70|c");
     send(kBob, restarts ? "dev.temp:1|c" : "dev.temp:700|c\ndev.dev.temp:1|c");
@@ -206,10 +241,14 @@ TEST_F(RecorderTest, CommitsComeWithTheIntervalTheDayAndDurableKeys) {
   }
   EXPECT_EQ(store.commits, 10);
   EXPECT_EQ(next, 1'000'000'000);
+  send(kBob, "alarm.y:1|c");
+  settle();
+  EXPECT_EQ(store.state.days[kDay].scalars["alarm.y"], 1) << "one who floods delays nobody else";
+  send(kAda, "alarm.x:1|c");
   send(kAda, "", 1);
   settle();
-  EXPECT_EQ(store.commits, 11);
-  EXPECT_EQ(store.state.days[kDay].scalars["alarm.x"], 51);
+  EXPECT_EQ(store.commits, 12);
+  EXPECT_EQ(store.state.days[kDay].scalars["alarm.x"], 52);
   store.commits = 1;
   send(kAda, "", 888);
   EXPECT_EQ(store.commits, 1);

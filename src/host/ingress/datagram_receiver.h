@@ -49,7 +49,7 @@ class DatagramReceiver {
   void releaseMemory();
 
  private:
-  static constexpr std::size_t kSlots = 256;
+  static constexpr std::size_t kSlots = 64;
   struct Socket {
     int descriptor;
     bool hasCredentials;

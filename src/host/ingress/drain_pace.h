@@ -16,7 +16,7 @@ class DrainPace {
   // After a call at this time (in nanoseconds) that read so many and left the queue empty: for how
   // long nothing is to be read. 0: to be read as soon as something comes.
   std::int64_t pauseAfter(std::size_t count, std::int64_t now) {
-    constexpr std::int64_t kLongest = 250'000;
+    constexpr std::int64_t kLongest = 1'000'000;
     constexpr std::int64_t kBatch = 64;  // an eighth of the queue: the rate may rise
     constexpr std::int64_t kWorthIt = 8;
     const std::int64_t interval = std::clamp<std::int64_t>(now - last_, 1, 1'000'000'000);

@@ -53,7 +53,8 @@ Status setTimer(int timer, int flags, std::int64_t seconds, std::int64_t nanosec
   itimerspec value{};
   value.it_value.tv_sec = static_cast<time_t>(seconds);
   value.it_value.tv_nsec = static_cast<long>(nanoseconds);
-  if (::timerfd_settime(timer, flags, &value, nullptr) == 0) return Done{};
+  // Cancelled: it is set, and the clock was since the last look at it, which its reader sees too.
+  if (::timerfd_settime(timer, flags, &value, nullptr) == 0 || errno == ECANCELED) return Done{};
   return systemError("cannot set", "a timer");
 }
 
@@ -161,7 +162,7 @@ class SocketIngress final : public Ingress {
   ControlConnections control_;
   Descriptor wake_, deadline_, clockStep_;
   std::atomic<bool> stopped_ = false;
-  bool stoppedReading_ = false;
+  bool stoppedReading_ = false, signalled_ = false;
   std::int64_t now_ = 0;      // when the round began
   std::int64_t resumed_ = 0;  // when connections that wait were last asked for
   std::optional<std::int64_t> armed_;
@@ -219,7 +220,7 @@ Status SocketIngress::serve(const Events& events, int count, IngressHandler& han
   if (auto served = serveDatagrams(events, count, handler); !served) return served;
   if (auto served = serveConnections(events, count, handler); !served) return served;
   serveListeners(events, count, handler);
-  return serveSignals(handler);
+  return std::exchange(signalled_, false) ? serveSignals(handler) : Status(Done{});
 }
 
 // Nanoseconds until something is to be done although nothing arrives; empty: never.
@@ -276,6 +277,7 @@ Status SocketIngress::serveConnections(const Events& events, int count, IngressH
     const PollTag tag = PollTag::of(event);
     if (tag.kind == Kind::Stream) bytes += streams_.read(tag.index, handler);
     if (tag.kind == Kind::Control) control_.serve(tag.index, event.events, handler);
+    if (tag.kind == Kind::Signal) signalled_ = true;
     if (tag.kind == Kind::Wake) takeCount(wake_.get());
     if (tag.kind == Kind::ClockStep) takeCount(clockStep_.get());
     if (tag.kind == Kind::Deadline) {

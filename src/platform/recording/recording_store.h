@@ -58,6 +58,8 @@ class RecordingTransaction {
   // day without the scalar begins with that of the day before. Samples: after those that the key
   // has.
   virtual Status apply(std::int32_t day, const RecordedChange& change) = 0;
+  // The user who owns the key on that day; empty if nobody does.
+  virtual Result<std::optional<std::int64_t>> owner(std::int32_t day, std::string_view key) = 0;
   // Ignored when the key has an owner on that day.
   virtual Status setOwner(std::int32_t day, const KeyOwner& owner) = 0;
 

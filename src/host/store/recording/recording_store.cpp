@@ -21,7 +21,7 @@ struct Connection {
 
   Database database;
   std::optional<FileIdentity> identity;
-  std::optional<Statement> getScalar, setScalar, addArrival, setOwner;
+  std::optional<Statement> getScalar, setScalar, addArrival, getOwner, setOwner;
 
   // Prepares the statement at its first use.
   Result<Statement*> prepared(std::optional<Statement>& statement, std::string_view text) {
@@ -37,11 +37,17 @@ struct Connection {
   Result<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key) {
     const auto get = prepared(getScalar, "SELECT value FROM scalars WHERE day = ?1 AND key = ?2");
     if (!get) return get.error();
-    const Step step = (*get)->bind(1, std::int64_t{day}).bind(2, key).step();
+    return integerOf(**get, day, key);
+  }
+
+  // What a query of a day and a key answers.
+  Result<std::optional<std::int64_t>> integerOf(Statement& get, std::int32_t day,
+                                                std::string_view key) {
+    const Step step = get.bind(1, std::int64_t{day}).bind(2, key).step();
     std::optional<std::int64_t> value;
-    if (step == Step::Row && (*get)->type(0) == ColumnType::Integer) value = (*get)->integer(0);
+    if (step == Step::Row && get.type(0) == ColumnType::Integer) value = get.integer(0);
     Status failed = step == Step::Failed ? Status(database.error()) : Status(Done{});
-    (*get)->reset();
+    get.reset();
     if (!failed) return failed.error();
     return value;
   }
@@ -80,6 +86,14 @@ class SqliteTransaction final : public RecordingTransaction {
                                            "INSERT OR REPLACE INTO scalars VALUES (?1, ?2, ?3)");
     if (!set) return set.error();
     return done((*set)->bind(1, std::int64_t{day}).bind(2, change.key).bind(3, value).run());
+  }
+
+  Result<std::optional<std::int64_t>> owner(std::int32_t day, std::string_view key) override {
+    if (auto made = make(kOwnersTable, hasOwners_); !made) return made.error();
+    const auto get = connection_->prepared(connection_->getOwner,
+                                           "SELECT user FROM owners WHERE day = ?1 AND key = ?2");
+    if (!get) return get.error();
+    return connection_->integerOf(**get, day, key);
   }
 
   Status setOwner(std::int32_t day, const KeyOwner& owner) override {

@@ -11,6 +11,8 @@ namespace {
 
 constexpr std::int64_t kDaysWaiting = 30;
 constexpr std::int64_t kMostBytes = 8 << 20;
+constexpr std::int64_t kLongestBoot =
+    std::int64_t{100} * 366 * 86400;       // seconds: nothing runs so long
 constexpr std::int64_t kBytesOfRow = 128;  // beside its samples and its key
 
 using ChangeKind = RecordedChange::Kind;
@@ -45,6 +47,7 @@ std::optional<UndatedChange> parseChange(const Statement& row, int first) {
   if (!known) return std::nullopt;
   change.key = key;
   change.secondsSinceBoot = row.integer(first);
+  if (change.secondsSinceBoot < 0 || change.secondsSinceBoot > kLongestBoot) return std::nullopt;
   change.value = row.integer(first + 3);
   change.user = row.integer(first + 4);
   if (change.kind != ChangeKind::Samples) return change;
