@@ -232,6 +232,7 @@ class Recorder(DeviceTest):
         self.path = str(folder / "statsd.sock")
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as passed:
             passed.bind(self.path)
+            passed.setsockopt(socket.SOL_SOCKET, socket.SO_PASSCRED, 1)
 
             def start():
                 self.process = subprocess.Popen(
