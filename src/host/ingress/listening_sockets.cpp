@@ -51,7 +51,10 @@ Status setFlag(int socket, int name) {
 // What is asked of the kernel for each datagram.
 Status prepare(const ListeningSocket& socket) {
   if (socket.kind != RecorderSocket::Kind::Datagrams) return Done{};
-  return setFlag(socket.descriptor.get(), socket.hasCredentials ? SO_PASSCRED : SO_RXQ_OVFL);
+  if (socket.hasCredentials) return setFlag(socket.descriptor.get(), SO_PASSCRED);
+  auto counts = setFlag(socket.descriptor.get(), SO_RXQ_OVFL);
+  // Not every kernel says what it dropped; metrics come all the same.
+  return counts || counts.error().systemError != ENOPROTOOPT ? counts : Status(Done{});
 }
 
 struct SocketFacts {
