@@ -217,25 +217,23 @@ void Committer::start(CommitJob job) {
   outcome_.job = std::move(job);
   ended_ = false;
   busy_ = true;
-  try {
-    thread_ = std::thread([this] {
-      {
-        const std::lock_guard guard(storeInUse_);
-        try {
-          outcome_.status = write(outcome_);
-        } catch (const std::bad_alloc&) {
-          outcome_.status = Error{"no memory for a commit"};
-        }
-        store_.releaseMemory();
+  const auto work = [this] {
+    {
+      const std::lock_guard guard(storeInUse_);
+      try {
+        outcome_.status = write(outcome_);
+      } catch (const std::bad_alloc&) {
+        outcome_.status = Error{"no memory for a commit"};
       }
-      ended_ = true;
-      onDone_();
-    });
-  } catch (const std::system_error&) {
-    // The user has as many processes as it may.
-    outcome_.status = Error{"no thread for a commit"};
+      store_.releaseMemory();
+    }
     ended_ = true;
     onDone_();
+  };
+  try {
+    thread_ = std::thread(work);
+  } catch (const std::system_error&) {
+    work();  // the user has as many processes as it may: the sockets wait meanwhile
   }
 }
 
