@@ -4,6 +4,7 @@
 #include <nlohmann/json.hpp>
 
 #include "base/time_text.h"
+#include "host/ingress/recorder_client.h"
 #include "platform/platform.h"
 #include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
@@ -43,6 +44,13 @@ void printRows(const ToolContext& context, const KeyStory& story) {
     if (!story.similar.empty()) {
       const std::vector<std::string_view> near(story.similar.begin(), story.similar.end());
       printLine(context, "  did you mean " + alternatives(near) + "?", Ink::Doubtful);
+    }
+    const auto served = isRecorderServed(DeviceRoot(context.root));
+    if (!story.measured && served && *served) {
+      printLine(context,
+                "  what was recorded since the last commit is not in the store yet: tallyctl "
+                "recorder --commit",
+                Ink::Faint);
     }
     return;
   }
