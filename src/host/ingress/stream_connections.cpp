@@ -10,8 +10,9 @@
 namespace tally {
 namespace {
 
-// Of lines that are not complete: those of one user, and all.
-constexpr std::size_t kMostPartialOfUser = 1u << 20, kMostPartial = 4u << 20;
+// Of lines that are not complete: those of one user, and all, of which the last quarter is for
+// users who have no more than a few kilobytes.
+constexpr std::size_t kMostPartialOfUser = 1u << 20, kMostPartial = 4u << 20, kFewBytes = 16u << 10;
 
 }  // namespace
 
@@ -128,8 +129,9 @@ void StreamConnections::keep(Connection& connection, std::string_view text,
   User& user = users_[connection.user];
   // Of what its own user takes up, so that one user cannot have the lines of others dropped.
   const std::size_t growth = size > held ? std::max(size, held * 2) - held : 0;
+  const bool hasFew = user.partialBytes + growth <= kFewBytes;
   if (size > kLongestLine || user.partialBytes + growth > kMostPartialOfUser ||
-      partialBytes_ + growth > kMostPartial) {
+      partialBytes_ + growth > (hasFew ? kMostPartial : kMostPartial / 4 * 3)) {
     dropPartial(connection);
     connection.skipsLine = true;
     return handler.onLoss(IngressLoss::LongLine, {connection.user}, 1);

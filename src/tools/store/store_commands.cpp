@@ -73,6 +73,11 @@ std::optional<std::vector<RecordedWords>> readWords(const ToolContext& context,
   return std::move(*recorded);
 }
 
+// Of several keys, which one is meant.
+std::string subjectOf(const std::vector<RecordedWords>& words, const std::string& key) {
+  return words.size() > 1 ? key + ": " : std::string();
+}
+
 // One object for the keys of a command line that names one; else a list.
 void printRecorded(const ToolContext& context, const StoreArguments& arguments, Json entries) {
   printJson(context, entries.size() == 1 && arguments.key != "-" ? entries[0] : entries);
@@ -86,7 +91,11 @@ int setScalars(const ToolContext& context, const StoreArguments& arguments) {
   std::vector<std::int64_t> numbers;
   for (const auto& [key, values] : *words) {
     const auto value = parseInt64(values[0]);
-    if (!value) return complain(context, "the value is not a whole number of 64 bits", kBadUsage);
+    if (!value) {
+      return complain(context,
+                      subjectOf(*words, key) + "the value is not a whole number of 64 bits",
+                      kBadUsage);
+    }
     numbers.push_back(*value);
   }
   const std::int32_t day = given.value_or(context.platform->metricsStore->TBDaysSince1970());
@@ -121,7 +130,9 @@ int pushSamples(const ToolContext& context, const StoreArguments& arguments) {
     samples.emplace_back();
     for (const std::string& text : values) {
       const auto value = parseDouble(text);
-      if (!value) return complain(context, text + " is not a number", kBadUsage);
+      if (!value) {
+        return complain(context, subjectOf(*words, key) + text + " is not a number", kBadUsage);
+      }
       samples.back().push_back(*value);
     }
   }
