@@ -1,7 +1,6 @@
 #include "recorder/committer.h"
 
 #include <algorithm>
-#include <limits>
 #include <new>
 #include <set>
 #include <string_view>
@@ -19,7 +18,6 @@ namespace {
 constexpr std::size_t kSamplesAtATime = 4096;
 constexpr std::size_t kUndatedAtATime = 256;
 constexpr std::string_view kOwnCounts = "vellum.tallyd.";
-constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
 
 // Applies a change whose samples' offsets count from an instant: each sample on its own day, a
 // scalar on that of the instant. Samples of later days than `today` are dropped: the clock was

@@ -4,7 +4,6 @@
 #include <cmath>
 #include <cstring>
 #include <iterator>
-#include <limits>
 #include <utility>
 
 #include "base/time_text.h"
@@ -17,7 +16,6 @@ constexpr double kLeastRate = 1e-6;
 // What the program takes beside what it holds: its code's data, the datagrams that were just read,
 // the store's buffers, the stack of the commit.
 constexpr std::size_t kMemoryOfProgram = 8 << 20;
-constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
 // Of the keys of a day, the last quarter is for users who have few.
 constexpr std::uint64_t kFewKeys = 100;
 

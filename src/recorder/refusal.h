@@ -4,6 +4,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <string_view>
 
 namespace tally {
@@ -98,6 +99,9 @@ inline constexpr RefusalRow kRecorderCounts[] = {
      "bytes that clients say they had to drop"},
 };
 inline constexpr std::size_t kRecorderCountCount = std::size(kRecorderCounts);
+// No count goes beyond what a scalar can hold.
+constexpr std::uint64_t kMostCounted = std::numeric_limits<std::int64_t>::max();
+
 using RecorderCounts = std::array<std::uint64_t, kRecorderCountCount>;
 static_assert(kRecorderCountCount == std::size_t(RecorderCount::ClientBytesDropped) + 1);
 
