@@ -150,6 +150,9 @@ TEST_F(IngressTest, AThousandConnections) {
 }
 
 TEST_F(IngressTest, ConnectionsWaitWhileTheProcessHasNoDescriptors) {
+#ifdef __SANITIZE_ADDRESS__
+  GTEST_SKIP() << "the sanitizer's own checks need descriptors";
+#endif
   ASSERT_EQ(open(), "");
   const Descriptor sockets[] = {connectTo(kStreamSocket), connectTo(kStreamSocket)};
   for (const Descriptor& socket : sockets) ASSERT_TRUE(sendTo(socket, "a\n"));
