@@ -139,10 +139,23 @@ Result<std::string> askRecorder(const DeviceRoot& root, std::string_view line,
 }
 
 Result<bool> isRecorderServed(const DeviceRoot& root) {
+  const auto unserved = unservedRecorderSockets(root);
+  if (!unserved) return unserved.error();
+  return std::ranges::find(*unserved, kDatagramSocket.name) == unserved->end();
+}
+
+Result<std::vector<std::string>> unservedRecorderSockets(const DeviceRoot& root) {
+  std::vector<std::string> unserved;
   const auto directory = openSocketDirectory(root, recorderUsers(root));
-  auto served = directory ? isServed(*directory, kDatagramSocket) : directory.error();
-  if (!served && isAbsent(served.error())) return false;
-  return served;
+  for (const RecorderSocket& socket : {kDatagramSocket, kStreamSocket, kControlSocket}) {
+    const auto served = directory ? isServed(*directory, socket) : directory.error();
+    // One that only others may ask is there.
+    if (!served && !isAbsent(served.error()) && served.error().systemError != EACCES) {
+      return served.error();
+    }
+    if (served ? !*served : isAbsent(served.error())) unserved.emplace_back(socket.name);
+  }
+  return unserved;
 }
 
 Result<bool> SocketRecorderLink::commit(milliseconds patience) {

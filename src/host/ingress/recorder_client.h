@@ -5,6 +5,7 @@
 #include <string>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "base/files/device_root.h"
 #include "base/result.h"
@@ -22,6 +23,9 @@ Result<std::string> askRecorder(const DeviceRoot& root, std::string_view line,
 // Whether somebody takes what is sent to the socket of datagrams: the recorder, or systemd, which
 // starts it then. False if there is no such socket. An error if it cannot be trusted or examined.
 Result<bool> isRecorderServed(const DeviceRoot& root);
+
+// The names of its UNIX sockets that nobody serves; an error as above.
+Result<std::vector<std::string>> unservedRecorderSockets(const DeviceRoot& root);
 
 // Has the recorder commit.
 class SocketRecorderLink final : public RecorderLink {

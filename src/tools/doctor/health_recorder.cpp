@@ -91,16 +91,21 @@ void ask(const DeviceRoot& root, HealthChecks& checks) {
 
 void examineRecorder(const ToolContext& context, HealthChecks& checks) {
   const DeviceRoot root(context.root);
-  const auto served = isRecorderServed(root);
-  if (!served) {
-    checks.push_back({Health::Wrong, kSubject, served.error().message});
-  } else if (!*served) {
+  const auto unserved = unservedRecorderSockets(root);
+  constexpr std::size_t kSockets = 3;
+  const bool served = unserved && unserved->size() < kSockets;
+  if (!unserved) {
+    checks.push_back({Health::Wrong, kSubject, unserved.error().message});
+  } else if (!served) {
     checks.push_back(
         {Health::Missing, kSubject, "none runs; other programs cannot send metrics to tallyd"});
   } else {
     ask(root, checks);
+    for (const std::string& name : *unserved) {
+      checks.push_back({Health::Missing, kSubject, "nobody serves run/tallyd/" + name});
+    }
   }
-  examineSettings(root, served && *served, checks);
+  examineSettings(root, served, checks);
 }
 
 }  // namespace tally::tools
