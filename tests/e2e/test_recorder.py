@@ -230,28 +230,31 @@ class Recorder(DeviceTest):
         self.device.tool("store", "set", "made", "1")
         day = int(time.time()) // 86400
         self.path = str(folder / "statsd.sock")
-        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as passed:
-            passed.bind(self.path)
-            passed.setsockopt(socket.SOL_SOCKET, socket.SO_PASSCRED, 1)
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as metrics, socket.socket(socket.AF_UNIX) as control:
+            metrics.bind(self.path)
+            metrics.setsockopt(socket.SOL_SOCKET, socket.SO_PASSCRED, 1)
+            control.bind(str(folder / "control.sock"))
+            control.listen()
 
-            def start():
+            def start(metrics_read):
+                passed = [metrics.fileno(), control.fileno()]
                 self.process = subprocess.Popen(
-                    ["sh", "-c", f'exec 3<&{passed.fileno()}; LISTEN_PID=$$ LISTEN_FDS=1 exec "$0"', BIN / "tallyd"],
-                    pass_fds=[passed.fileno()], env=self.device.environment(), stderr=subprocess.PIPE)
+                    ["sh", "-c", f'exec 3<&{passed[0]} 4<&{passed[1]}; LISTEN_FDNAMES=metrics:control LISTEN_PID=$$ '
+                     'LISTEN_FDS=2 exec "$0"', BIN / "tallyd"],
+                    pass_fds=passed, env=self.device.environment(), stderr=subprocess.PIPE)
+                eventually(lambda: self.status()["metrics"] == metrics_read)
 
-            start()
             self.send("a:1|c")
-            time.sleep(0.5)  # it has no control socket to ask
+            start(1)
             with contextlib.closing(sqlite3.connect(self.root / STORE, isolation_level=None)) as other:
                 other.execute("BEGIN IMMEDIATE")
                 self.process.terminate()
-                time.sleep(0.5)
+                eventually(lambda: len(os.listdir(f"/proc/{self.process.pid}/task")) == 2)
                 self.send("a:10|c")
                 other.execute("COMMIT")
             self.stop(asked=True)
             self.assertEqual(self.scalars(day)["a"], 1)
-            start()
-            time.sleep(0.5)
+            start(1)
             self.stop()
             self.assertEqual(self.scalars(day)["a"], 11)
 
