@@ -30,7 +30,8 @@ void checkRoundTrip(const StoreRow& row) {
   const bool sameSample =
       row.sample == again.sample || (std::isnan(row.sample) && std::isnan(again.sample));
   require(again.kind == row.kind && again.key == row.key && again.day == row.day &&
-              again.scalar == row.scalar && again.offset == row.offset && again.weight == row.weight && sameSample,
+              again.scalar == row.scalar && again.offset == row.offset &&
+              again.weight == row.weight && sameSample,
           "a row reads back as itself");
 }
 

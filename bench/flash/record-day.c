@@ -1,5 +1,6 @@
-/* record-day DAY MINUTES: in the emulated machine, sends tallyd what a device records on that day since
-   1970, in steps of the clock, which it sets, and has it commit at every interval of so many minutes. */
+/* record-day DAY MINUTES: in the emulated machine, sends tallyd what a device records on that day
+   since 1970, in steps of the clock, which it sets, and has it commit at every interval of so many
+   minutes. */
 #include <errno.h>
 #include <linux/sockios.h>
 #include <math.h>
@@ -13,7 +14,14 @@
 #include <time.h>
 #include <unistd.h>
 
-enum { DAY = 86400, COUNTERS = 500, COUNTS = 100, DISTRIBUTIONS = 50, SAMPLES = 10, PER_DATAGRAM = 20 };
+enum {
+  DAY = 86400,
+  COUNTERS = 500,
+  COUNTS = 100,
+  DISTRIBUTIONS = 50,
+  SAMPLES = 10,
+  PER_DATAGRAM = 20
+};
 enum { STEP = 2 }; /* seconds; those of a step share their time of arrival */
 
 static void give_up(const char* what) {
@@ -35,7 +43,8 @@ static long long ask(const char* request, const char* begin, const char* before)
   const int control = connected(SOCK_STREAM, "/run/tallyd/control.sock");
   size_t size = 0;
   if (write(control, request, strlen(request)) < 0) give_up(request);
-  for (ssize_t got; (got = read(control, answer + size, sizeof answer - 1 - size)) > 0;) size += (size_t)got;
+  for (ssize_t got; (got = read(control, answer + size, sizeof answer - 1 - size)) > 0;)
+    size += (size_t)got;
   close(control);
   answer[size] = '\0';
   if (strncmp(answer, begin, strlen(begin)) != 0) give_up(answer);
@@ -60,8 +69,8 @@ struct Datagram {
 };
 
 static void add_line(struct Datagram* datagram, const char* format, int key, int value) {
-  datagram->used +=
-      (size_t)snprintf(datagram->text + datagram->used, sizeof datagram->text - datagram->used, format, key, value);
+  datagram->used += (size_t)snprintf(datagram->text + datagram->used,
+                                     sizeof datagram->text - datagram->used, format, key, value);
 }
 
 static int receiver;
@@ -84,7 +93,8 @@ static void sample(int datagrams) {
   for (; datagrams > 0; --datagrams) {
     struct Datagram made = {.used = 0};
     for (int i = 0; i < PER_DATAGRAM; ++i)
-      add_line(&made, "com.example.service.latency.%02d:%d|ms\n", (int)(lrand48() % DISTRIBUTIONS), milliseconds());
+      add_line(&made, "com.example.service.latency.%02d:%d|ms\n", (int)(lrand48() % DISTRIBUTIONS),
+               milliseconds());
     send_datagram(&made);
   }
 }

@@ -18,7 +18,7 @@
 namespace tally::tools {
 namespace {
 
-constexpr const char* kSubject = "recorder";
+constexpr const char* kRecorderSubject = "recorder";
 
 std::uint64_t numberIn(const KvDictionary& dictionary, std::string_view key) {
   const auto* const number = dictionary.getAs<KvNumber>(key);
@@ -56,7 +56,7 @@ std::string refusalText(const KvDictionary& status) {
 void examineStatus(const KvDictionary& status, HealthChecks& checks) {
   const auto* const failure = status.getAs<KvString>("failure");
   checks.push_back(
-      {failure == nullptr ? Health::Ok : Health::Wrong, kSubject,
+      {failure == nullptr ? Health::Ok : Health::Wrong, kRecorderSubject,
        fmt::format(
            "{} of {} held in memory, {} since it started{}",
            byteText(numberIn(status, "bytes_held")), byteText(numberIn(status, "bytes_limit")),
@@ -65,7 +65,8 @@ void examineStatus(const KvDictionary& status, HealthChecks& checks) {
                               : fmt::format("; its last commit failed: {}", failure->view()))});
   // The programs that sent it are at fault, or a limit is low; the recorder works.
   const std::string refused = refusalText(status);
-  if (!refused.empty()) checks.push_back({Health::Missing, kSubject, "refused: " + refused});
+  if (!refused.empty())
+    checks.push_back({Health::Missing, kRecorderSubject, "refused: " + refused});
 }
 
 void ask(const DeviceRoot& root, HealthChecks& checks) {
@@ -76,13 +77,13 @@ void ask(const DeviceRoot& root, HealthChecks& checks) {
     const auto* const status = value ? kvCast<KvDictionary>(value->get()) : nullptr;
     if (status != nullptr) return examineStatus(*status, checks);
     constexpr std::size_t kMostShown = 200;
-    checks.push_back({Health::Wrong, kSubject,
+    checks.push_back({Health::Wrong, kRecorderSubject,
                       "it does not say how it is: " +
                           fitted(printable(answer->substr(0, kMostShown)), kMostShown, "...")});
     return;
   }
   const bool mayNot = answer.error().systemError == EACCES;
-  checks.push_back({mayNot ? Health::Ok : Health::Wrong, kSubject,
+  checks.push_back({mayNot ? Health::Ok : Health::Wrong, kRecorderSubject,
                     mayNot ? "its sockets are served; only root and its own user may ask it more"
                            : answer.error().message});
 }
@@ -95,14 +96,14 @@ void examineRecorder(const ToolContext& context, HealthChecks& checks) {
   constexpr std::size_t kSockets = 3;
   const bool served = unserved && unserved->size() < kSockets;
   if (!unserved) {
-    checks.push_back({Health::Wrong, kSubject, unserved.error().message});
+    checks.push_back({Health::Wrong, kRecorderSubject, unserved.error().message});
   } else if (!served) {
-    checks.push_back(
-        {Health::Missing, kSubject, "none runs; other programs cannot send metrics to tallyd"});
+    checks.push_back({Health::Missing, kRecorderSubject,
+                      "none runs; other programs cannot send metrics to tallyd"});
   } else {
     ask(root, checks);
     for (const std::string& name : *unserved) {
-      checks.push_back({Health::Missing, kSubject, "nobody serves run/tallyd/" + name});
+      checks.push_back({Health::Missing, kRecorderSubject, "nobody serves run/tallyd/" + name});
     }
   }
   examineSettings(root, served, checks);
