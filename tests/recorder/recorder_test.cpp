@@ -346,6 +346,14 @@ TEST_F(RecorderTest, AStoreThatCannotBeWrittenLosesNothingButDetail) {
   EXPECT_EQ(refused("memory"), 0u);
 }
 
+TEST_F(RecorderTest, FractionsAddUpOverCommits) {
+  for (int i = 0; i < 5; ++i) {
+    send(kAda, "a:0.5|c");
+    commit();
+  }
+  EXPECT_EQ(store.state.days[kDay].scalars["a"], 2);
+}
+
 TEST_F(RecorderTest, WhatItHoldsIsForgottenOnRequest) {
   send(kAda, "a:1|c\nt:1|ms\ng:7|g");
   recorder->onControl(7, "forget");
