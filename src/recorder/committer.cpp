@@ -68,7 +68,7 @@ class OwnerCheck {
     }
     if (**owner == wanted.user) return true;
     ++outcome_.refused;
-    outcome_.foreign.push_back({wanted.key, **owner, wanted.distribution});
+    outcome_.foreign.push_back({day, {wanted.key, **owner, wanted.distribution}});
     return false;
   }
 

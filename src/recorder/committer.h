@@ -24,8 +24,12 @@ class Committer {
     Status status = Done{};
     CommitJob job;  // as it was given, also when it failed
     std::uint64_t undatedForgotten = 0;
-    // Keys that turned out to be others', with these owners; what was recorded of them is refused.
-    std::vector<KeyOwner> foreign;
+    // Keys that turned out to be others' on a day; what was recorded of them is refused.
+    struct Foreign {
+      std::int32_t day;
+      KeyOwner owner;
+    };
+    std::vector<Foreign> foreign;
     std::uint64_t refused = 0;
   };
   // onDone is called by the thread when there is an outcome.

@@ -157,7 +157,12 @@ bool Recorder::endCommit() {
   ++commits_.ended;
   if (outcome->status) {
     for (const CommitBatch& batch : outcome->job.batches) intake_.forget(batch);
-    intake_.yieldKeys(outcome->foreign, outcome->refused);
+    std::vector<KeyOwner> foreign;
+    for (auto& [day, owner] : outcome->foreign) {
+      // The keys of a day that has ended are free again.
+      if (intake_.keys()->day() == day) foreign.push_back(std::move(owner));
+    }
+    intake_.yieldKeys(foreign, outcome->refused);
     if (outcome->undatedForgotten > 0) {
       intake_.count(RecorderCount::UndatedDropped, outcome->undatedForgotten);
     }
@@ -202,7 +207,8 @@ std::optional<std::int64_t> Recorder::endRound() {
   if (!committer_.isBusy()) {
     // Before the next commit, which would write it to the store that is being erased.
     if (std::exchange(askedToForget_, false)) intake_.discard();
-    if (terminating_ && finalCommitBegan_) {
+    // A commit may leave counts of its own, which one more takes along.
+    if (terminating_ && finalCommitBegan_ && (!commits_.failure.empty() || !hasUncommitted())) {
       end();
     } else if (commitIsDue()) {
       finalCommitBegan_ = terminating_;

@@ -146,6 +146,23 @@ TEST_F(RecorderTest, AKeyOfAnotherIsFoundOutAtTheCommit) {
   }
 }
 
+TEST_F(RecorderTest, AKeyThatWasAnothersYesterdayIsFreeToday) {
+  send(kAda, "mine:100|g");
+  commit();
+  recorder.reset();
+  store.ownersFail = true;
+  send(kBob, "mine:1|g");
+  send(kBob, "mine:2|g", 86400);
+  settle();  // yesterday's is found out
+  send(kBob, "mine:3|g");
+  recorder->onTerminate();
+  settle();
+  EXPECT_EQ(store.state.days[kDay].scalars["mine"], 100);
+  EXPECT_EQ(store.state.days[kDay + 1].scalars["mine"], 3);
+  EXPECT_EQ(refused("owner") + refused("owner", kDay + 1), 1u) << "what the last commit counted";
+  EXPECT_FALSE(recorder->hasUncommitted());
+}
+
 TEST_F(RecorderTest, SettingsGiveNamesTagsAndRights) {
   settings.prefix = "dev.";
   settings.rename["old"] = "new";

@@ -80,7 +80,7 @@ class Database {
   Status limitMemory(std::size_t bytes);
   // Frees the pages that are kept for later.
   void releaseMemory();
-  // Whether the file is no longer the one that its directory has under this name.
+  // Whether its directory has another file under this name by now, or none.
   bool wasReplaced() const;
   // A failure, in words that name the file; without a reason, the last call's.
   Error error() const;

@@ -13,7 +13,7 @@ struct UnitScale {
   double size;  // in seconds or bytes
 };
 
-// Null for what is no unit of time or data. Knows the usual names: "ms", "milliseconds".
+// Null unless it is a unit of time or data. Knows the usual names: "ms", "milliseconds".
 const UnitScale* unitScale(std::string_view unit);
 
 // Samples that were seen; NaN and infinite ones are not among them.
