@@ -18,6 +18,10 @@ namespace {
 constexpr std::string_view kBodySuffix = ".log";
 constexpr std::string_view kInfoSuffix = ".info.plist";
 constexpr std::size_t kLargestInfo = 1u << 20;
+// Keys of the information that tell a fleet's logs apart.
+constexpr std::string_view kDevicePseudonym = "DevicePseudonym";
+constexpr std::string_view kSequenceNumber = "SequenceNumber";
+constexpr std::string_view kSystemVersion = "SystemVersion";
 // Space for the number, the longer suffix and a temporary file's mark in a file's name.
 constexpr std::size_t kLongestLogName = 180;
 
@@ -143,6 +147,24 @@ Status SpoolSubmission::writeBody(const Directory& folder, const std::string& st
   return body->commit();
 }
 
+void readLogInformation(std::string_view bytes, SpooledLog& log) {
+  const auto root = decodePlist(bytes);
+  const auto* const info = root ? kvCast<KvDictionary>(root->get()) : nullptr;
+  if (info == nullptr) return;
+  log.typeCode = info->getString("TypeCode").value_or("");
+  log.name = info->getString("Name").value_or("");
+  log.options = KvRef<KvDictionary>::share(info->getAs<KvDictionary>("Options"));
+  if (const auto* date = info->getAs<KvDate>("CreationTime")) {
+    log.creationTime = date->secondsSince1970();
+  }
+  log.device = info->getString(kDevicePseudonym).value_or("");
+  log.systemVersion = info->getString(kSystemVersion).value_or("");
+  const auto* const number = info->getAs<KvNumber>(kSequenceNumber);
+  if (number != nullptr && number->asInt64() > 0) {
+    log.deviceSequence = static_cast<std::uint64_t>(number->asInt64());
+  }
+}
+
 Result<std::vector<SpooledLog>> SpoolReader::list() const {
   const auto folder = folder_.open();
   if (!folder && folder.error().systemError == ENOENT) return std::vector<SpooledLog>();
@@ -161,16 +183,8 @@ Result<std::vector<SpooledLog>> SpoolReader::list() const {
     const auto identity = folder->identity(*body);
     entry.bytes = identity ? identity->size : 0;
     const auto stem = body->substr(0, body->size() - kBodySuffix.size());
-    const auto document = folder->readFile(stem + std::string(kInfoSuffix), kLargestInfo);
-    const auto root = document ? decodePlist(*document) : Result<KvRef<KvObject>>(document.error());
-    const auto* info = root ? kvCast<KvDictionary>(root->get()) : nullptr;
-    if (info == nullptr) continue;
-    entry.typeCode = info->getString("TypeCode").value_or("");
-    entry.name = info->getString("Name").value_or("");
-    entry.options = KvRef<KvDictionary>::share(info->getAs<KvDictionary>("Options"));
-    if (const auto* date = info->getAs<KvDate>("CreationTime")) {
-      entry.creationTime = date->secondsSince1970();
-    }
+    const auto information = folder->readFile(stem + std::string(kInfoSuffix), kLargestInfo);
+    if (information) readLogInformation(*information, entry);
   }
   return spooled;
 }

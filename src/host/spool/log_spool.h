@@ -62,7 +62,14 @@ struct SpooledLog {
   std::string typeCode, name;
   KvRef<KvDictionary> options;  // null when it was submitted without
   std::optional<double> creationTime;
+  // The device's pseudonym, the log's number among those of its name on this device, and the
+  // version of the system that submitted it.
+  std::string device, systemVersion;
+  std::optional<std::uint64_t> deviceSequence;
 };
+
+// What a log's information says, in the fields that it is for; malformed information says nothing.
+void readLogInformation(std::string_view bytes, SpooledLog& log);
 
 class SpoolReader {
  public:
