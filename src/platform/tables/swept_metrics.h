@@ -14,7 +14,7 @@ inline constexpr SweptMetric kDiskCapacity{"vellum.dockyard.DiskUsageUserTotalBl
     kDiskFree{"vellum.dockyard.DiskUsageUserBlocksFree", "MiB",
               "space that is free on the user's volume; -1: not known"};
 
-// Of all figures of the storage, which have no table of units.
+// Of figures of the storage that are not known.
 inline constexpr SweptMetric kStorageFigures{"vellum.NANDInfo.", "", "figure of the flash storage"};
 
 }  // namespace tally

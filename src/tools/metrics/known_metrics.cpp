@@ -12,6 +12,7 @@
 #include "platform/tables/measured_metrics.h"
 #include "platform/tables/swept_metrics.h"
 #include "recorder/refusal.h"
+#include "storage/nand_info/figure_texts.h"
 
 namespace tally::tools {
 namespace {
@@ -84,6 +85,9 @@ KnownMetrics::KnownMetrics(MetricTable ofDevice) : device_(std::move(ofDevice)) 
   }
   addOwn(system_, kStorageFigures.key, std::nullopt, kStorageFigures.unit, kStorageFigures.meaning,
          /*isPrefix=*/true);
+  eachFigureText([this](const FigureText& figure) {
+    addOwn(system_, figure.key, MetricType::Gauge, figure.unit, figure.meaning);
+  });
   addChannels(system_);
   for (const RefusalRow& row : kRefusals) {
     addOwn(system_, row.key, MetricType::Counter, "refusals", row.meaning);
