@@ -60,18 +60,16 @@ class KeyTable {
   // The longest entry that is a prefix of the key; null when there is none. Takes logarithmic time,
   // and a step for each further entry nested inside it.
   const Entry* longestPrefix(std::string_view key) const {
-    // Every entry that sorts between a prefix of the key and the key itself begins with that
-    // prefix, so the last entry not after the key is the longest match, or one of its parents is.
-    const auto after = std::upper_bound(
-        sorted_.begin(), sorted_.end(), key,
-        [this](std::string_view wanted, const auto& item) { return wanted < prefixOf(item); });
-    auto position =
-        after == sorted_.begin() ? kNone : static_cast<std::uint32_t>(after - sorted_.begin() - 1);
-    while (position != kNone) {
-      if (key.starts_with(prefixOf(sorted_[position]))) return &entries_[sorted_[position].entry];
-      position = sorted_[position].parent;
+    const std::uint32_t found = longest(key);
+    return found != kNone ? &entries_[sorted_[found].entry] : nullptr;
+  }
+  // Calls visit(entry) for every entry that is a prefix of the key, the longest first.
+  template <class Visit>
+  void forEachPrefix(std::string_view key, const Visit& visit) const {
+    // What begins the longest of them begins the key, and each other one begins it.
+    for (std::uint32_t i = longest(key); i != kNone; i = sorted_[i].parent) {
+      visit(entries_[sorted_[i].entry]);
     }
-    return nullptr;
   }
   const std::vector<Entry>& entries() const { return entries_; }
 
@@ -83,6 +81,20 @@ class KeyTable {
   };
   std::uint32_t position(std::string_view key, std::uint32_t hash) const {
     return positions_.find(hash, [&](auto i) { return entries_[i].key->view() == key; });
+  }
+  // The longest prefix of the key, into sorted_; kNone when there is none.
+  std::uint32_t longest(std::string_view key) const {
+    // Every entry that sorts between a prefix of the key and the key itself begins with that
+    // prefix, so the last entry not after the key is the longest match, or one of its parents is.
+    const auto after = std::upper_bound(
+        sorted_.begin(), sorted_.end(), key,
+        [this](std::string_view wanted, const auto& item) { return wanted < prefixOf(item); });
+    auto position =
+        after == sorted_.begin() ? kNone : static_cast<std::uint32_t>(after - sorted_.begin() - 1);
+    while (position != kNone && !key.starts_with(prefixOf(sorted_[position]))) {
+      position = sorted_[position].parent;
+    }
+    return position;
   }
   std::string_view prefixOf(const SortedPrefix& item) const {
     return entries_[item.entry].key->view();

@@ -42,13 +42,15 @@ class SqliteDistributionValues final : public DistributionValues {
 
 class SqliteHistory final : public HistoryStore {
  public:
-  SqliteHistory(Database database, StoreFaultHandler onFault)
-      : database_(std::move(database)), onFault_(std::move(onFault)) {}
+  SqliteHistory(Database database, StoreFaultHandler onFault, DamagedRowHandler onDamaged)
+      : database_(std::move(database)),
+        onFault_(std::move(onFault)),
+        onDamaged_(std::move(onDamaged)) {}
 
   void enumerateScalars(std::string_view keyPrefix, std::int32_t minimumDay,
                         std::int32_t maximumDay, const ScalarHandler& handler) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
-    StoreFaults faults(database_, onFault_);
+    StoreFaults faults(database_, onFault_, &onDamaged_);
     auto rows = database_.prepare("SELECT day, key, value FROM scalars" +
                                   std::string(StoreRange::kCondition) + " ORDER BY day, key");
     if (!rows) return faults.fail(rows.error());
@@ -73,7 +75,7 @@ class SqliteHistory final : public HistoryStore {
                               std::int32_t maximumDay,
                               const DistributionHandler& handler) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
-    StoreFaults faults(database_, onFault_);
+    StoreFaults faults(database_, onFault_, &onDamaged_);
     const Sources sources = openSampleSources(database_, faults, range);
     bool stop = false;
     while (!stop) {
@@ -111,6 +113,7 @@ class SqliteHistory final : public HistoryStore {
  private:
   Database database_;
   StoreFaultHandler onFault_;
+  DamagedRowHandler onDamaged_;
 };
 
 class EmptyHistory final : public HistoryStore {
@@ -123,11 +126,13 @@ class EmptyHistory final : public HistoryStore {
 
 }  // namespace
 
-std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault) {
+std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault,
+                                                DamagedRowHandler onDamaged) {
   auto store = openStoreForReading(file);
   if (!store) onFault(store.error().message);
   if (!store || !*store) return std::make_unique<EmptyHistory>();
-  return std::make_unique<SqliteHistory>(std::move(**store), std::move(onFault));
+  return std::make_unique<SqliteHistory>(std::move(**store), std::move(onFault),
+                                         std::move(onDamaged));
 }
 
 void listStoreKeys(const StoreFile& file, const std::function<void(const StoreKey&)>& handler,

@@ -13,10 +13,14 @@ namespace tally {
 // Told, in words that name the store, why rows are missing from what was read.
 using StoreFaultHandler = std::function<void(const std::string& message)>;
 
+// Told of each damaged row that is left out. A key that is damaged itself may be any bytes.
+using DamagedRowHandler = std::function<void(std::string_view key, std::int64_t day)>;
+
 // The rows that the store has at this moment; none, without a fault, when there is no
 // store. Samples are read chunk by chunk, so memory does not grow with their number. A damaged row
 // is left out. Each enumeration reports at most one fault. Never null.
-std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault);
+std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault,
+                                                DamagedRowHandler onDamaged = {});
 
 struct StoreKey {
   enum class Kind { Scalar, Distribution } kind = Kind::Scalar;

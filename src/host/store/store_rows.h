@@ -79,8 +79,11 @@ struct StoreRange {
 // Counts what one enumeration leaves out, and reports it as one line.
 class StoreFaults {
  public:
-  StoreFaults(const Database& database, const std::function<void(const std::string&)>& report)
-      : database_(database), report_(report) {}
+  using OnDamaged = std::function<void(std::string_view key, std::int64_t day)>;
+  // Each damaged row is told to onDamaged, unless that is null.
+  StoreFaults(const Database& database, const std::function<void(const std::string&)>& report,
+              const OnDamaged* onDamaged = nullptr)
+      : database_(database), report_(report), onDamaged_(onDamaged) {}
   ~StoreFaults() {
     if (failed_) {
       report_(reason_);
@@ -95,6 +98,7 @@ class StoreFaults {
   StoreFaults& operator=(const StoreFaults&) = delete;
 
   void addDamaged(std::string_view key, std::int64_t day) {
+    if (onDamaged_ != nullptr && *onDamaged_) (*onDamaged_)(key, day);
     if (damaged_++ == 0)
       reason_ = "the key \"" + std::string(key) + "\" on day " + std::to_string(day);
   }
@@ -106,6 +110,7 @@ class StoreFaults {
  private:
   const Database& database_;
   const std::function<void(const std::string&)>& report_;
+  const OnDamaged* onDamaged_;
   std::size_t damaged_ = 0;
   bool failed_ = false;
   std::string reason_;

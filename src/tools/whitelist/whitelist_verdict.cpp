@@ -6,41 +6,21 @@
 namespace tally::tools {
 namespace {
 
-class CandidateFinder final : public WhitelistVisitor {
- public:
-  CandidateFinder(Platform& platform, std::string_view key) : platform_(platform), key_(key) {}
-  std::vector<KeyCandidate> found;
-
-  bool beginGroup(std::string_view name) override {
-    state_ = groupState(platform_, name);
-    return true;
-  }
-  void entry(WhitelistSection section, WhitelistEntry entry) override {
-    const std::string_view text = entry.key->view();
-    if (isPrefixSection(section) ? key_.starts_with(text) : key_ == text) {
-      found.push_back({section, std::move(entry), state_});
-    }
-  }
-  void malformed(const WhitelistPlace&) override {}
-
- private:
-  Platform& platform_;
-  std::string_view key_;
-  GroupState state_ = GroupState::InForce;
-};
-
 std::string entryText(WhitelistSection section, const WhitelistEntry& entry) {
   if (!isPrefixSection(section)) return fmt::format("the group {}", entry.group->view());
   return fmt::format("the prefix {} of the group {}", entry.key->view(), entry.group->view());
 }
 
-std::string whyRefused(const std::vector<KeyCandidate>& candidates, KeyKind kind) {
-  for (const KeyCandidate& candidate : candidates) {
-    if (isScalarSection(candidate.section) != (kind == KeyKind::Scalar)) continue;
-    return fmt::format("named only by {}, which {}", entryText(candidate.section, candidate.entry),
-                       whyNotInForce(candidate.state));
+// The entry of the kind that comes nearest to admitting the key: one whose switch cannot be read
+// may be in force. Null when there is none.
+const KeyCandidate* nearestOf(const std::vector<const KeyCandidate*>& candidates, bool scalar) {
+  const KeyCandidate* nearest = nullptr;
+  for (const KeyCandidate* candidate : candidates) {
+    if (isScalarSection(candidate->section) != scalar) continue;
+    if (candidate->state == GroupState::SwitchUnreadable) return candidate;
+    if (nearest == nullptr) nearest = candidate;
   }
-  return "it is not listed";
+  return nearest;
 }
 
 bool isDecisive(const KeyCandidate& candidate, const WhitelistMatch& match) {
@@ -70,19 +50,38 @@ std::string optionsText(const KvDictionary& options) {
 }
 
 WhitelistJudge::WhitelistJudge(Platform& platform, WhitelistFile file)
-    : platform_(platform), file_(std::move(file)), config_(Whitelist::fromFile(platform, file_)) {}
+    : file_(std::move(file)), config_(Whitelist::fromFile(platform, file_)) {
+  if (config_) index_ = std::make_unique<WhitelistIndex>(platform, *file_.root);
+}
+
+WhitelistMatch WhitelistJudge::match(std::string_view key, KeyKind kind) const {
+  if (!config_) return {};
+  return kind == KeyKind::Scalar ? config_->matchScalarKey(key)
+                                 : config_->matchDistributionKey(key);
+}
+
+AbsenceReason WhitelistJudge::whyRefused(std::string_view key, KeyKind kind) const {
+  if (!index_) return {Absence::Unreadable, "the whitelist cannot be loaded: " + file_.fault};
+  const bool scalar = kind == KeyKind::Scalar;
+  const auto candidates = index_->find(key);
+  if (const KeyCandidate* const same = nearestOf(candidates, scalar)) {
+    return {same->state == GroupState::SwitchUnreadable ? Absence::Unreadable : Absence::GroupOff,
+            fmt::format("named only by {}, which {}", entryText(same->section, same->entry),
+                        whyNotInForce(same->state))};
+  }
+  if (const KeyCandidate* const other = nearestOf(candidates, !scalar)) {
+    return {Absence::OtherSection,
+            fmt::format("listed only as a {}, by {}",
+                        kindName(scalar ? KeyKind::Distribution : KeyKind::Scalar),
+                        entryText(other->section, other->entry))};
+  }
+  return {Absence::NotListed, "it is not listed"};
+}
 
 KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
   KeyVerdict verdict;
   verdict.kind = kind;
-  if (!config_) {
-    verdict.reason = "the whitelist cannot be loaded: " + file_.fault;
-    return verdict;
-  }
-  verdict.match =
-      kind == KeyKind::Scalar ? config_->matchScalarKey(key) : config_->matchDistributionKey(key);
-  CandidateFinder finder(platform_, key);
-  visitWhitelist(*file_.root, finder);
+  verdict.match = match(key, kind);
   switch (verdict.match.kind) {
     case WhitelistMatchKind::Exact:
       verdict.reason = fmt::format("the group {} lists it", verdict.match.entry->group->view());
@@ -95,15 +94,17 @@ KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
     case WhitelistMatchKind::InternalDevice:
       verdict.reason = "it is not listed, but this is an internal device";
       break;
-    case WhitelistMatchKind::None:
-      verdict.reason = whyRefused(finder.found, kind);
+    case WhitelistMatchKind::None: {
+      AbsenceReason why = whyRefused(key, kind);
+      verdict.reason = std::move(why.detail);
+      verdict.absence = why.absence;
       break;
-  }
-  for (KeyCandidate& candidate : finder.found) {
-    const bool sameKind = isScalarSection(candidate.section) == (kind == KeyKind::Scalar);
-    if (sameKind && !isDecisive(candidate, verdict.match)) {
-      verdict.others.push_back(std::move(candidate));
     }
+  }
+  if (!index_) return verdict;
+  for (const KeyCandidate* candidate : index_->find(key)) {
+    const bool sameKind = isScalarSection(candidate->section) == (kind == KeyKind::Scalar);
+    if (sameKind && !isDecisive(*candidate, verdict.match)) verdict.others.push_back(*candidate);
   }
   return verdict;
 }
@@ -115,6 +116,7 @@ Json jsonOf(const KeyVerdict& verdict) {
     json["match"] = verdict.match.kind == WhitelistMatchKind::Exact ? "exact" : "prefix";
     json["entry"] = entry->key->view();
   }
+  if (verdict.absence) json["absence"] = rowOf(*verdict.absence).name;
   if (verdict.admitted()) json["options"] = jsonOf(verdict.match.options);
   Json others = Json::array();
   for (const KeyCandidate& other : verdict.others) {
