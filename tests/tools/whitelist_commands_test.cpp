@@ -189,7 +189,8 @@ TEST_F(ExplainCommand, ComparesWithWhatWasSubmitted) {
                             "it was made with another whitelist"});
   expectValues(run({"explain", "a", "--day", "20000", "--json"}).json(),
                R"({"/submittedLog/scalar": 1200, "/nextLog": null, "/scalarRows/1/value": 1236,
-                   "/whyAbsent/scalar": "the whitelist refuses it"})");
+                   "/whyAbsent/scalar": "the whitelist refuses it: it is not listed",
+                   "/absence/scalar": "absent"})");
 }
 
 }  // namespace

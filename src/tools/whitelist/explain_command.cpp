@@ -145,11 +145,12 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
   printHeading(context, fmt::format("In a log of {}, made now", dayText(story.day)));
   const auto next = DailyLog::of(story.next);
   for (const KeyKind kind : story.kinds()) {
-    const std::string reason = story.whyAbsent(kind);
-    if (reason.empty() && next) {
+    const auto why = story.whyAbsent(kind);
+    if (!why && next) {
       printValue(context, *next, story, kind);
     } else {
-      printLine(context, fmt::format("  absent as a {}: {}", kindName(kind), reason),
+      printLine(context,
+                fmt::format("  absent as a {}: {}", kindName(kind), why ? why->detail : ""),
                 Ink::Doubtful);
     }
   }
@@ -159,7 +160,12 @@ void printLogs(const ToolContext& context, const KeyStory& story) {
   }
   if (!story.submitted) {
     printHeading(context, "In the submitted log");
-    printLine(context, "  no log of that day was submitted", Ink::Doubtful);
+    const bool forbidden =
+        story.unsent && story.unsent->absence == Absence::SubmissionForbidden;  // said already
+    printLine(context,
+              "  no log of that day was submitted" +
+                  (story.unsent && !forbidden ? ": " + story.unsent->detail : ""),
+              Ink::Doubtful);
     return;
   }
   printHeading(context, "In the submitted log " + story.submitted->log.fileName);
@@ -221,8 +227,11 @@ Json storyJson(const KeyStory& story) {
   const auto next = DailyLog::of(story.next);
   json["nextLog"] = next ? logged(*next) : Json(nullptr);
   for (const KeyKind kind : story.kinds()) {
-    const std::string reason = story.whyAbsent(kind);
-    if (!reason.empty()) json["whyAbsent"][std::string(kindName(kind))] = reason;
+    const std::string name(kindName(kind));
+    if (const auto why = story.whyAbsent(kind)) json["whyAbsent"][name] = why->detail;
+    if (const auto why = story.whyNotSubmitted(kind)) {
+      json["absence"][name] = rowOf(why->absence).name;
+    }
   }
   json["submittedLog"] = nullptr;
   if (story.submitted) {
@@ -237,7 +246,7 @@ int explain(const ToolContext& context, const ExplainArguments& arguments) {
   if (!day) return kBadUsage;
   const KeyStory story = tellStory(context, arguments.key, *day);
   bool present = false;
-  for (const KeyKind kind : story.kinds()) present = present || story.whyAbsent(kind).empty();
+  for (const KeyKind kind : story.kinds()) present = present || !story.whyAbsent(kind);
   if (context.json) {
     printJson(context, storyJson(story));
     return present ? kSuccess : kWrong;

@@ -12,6 +12,8 @@
 #include "report/device_metrics.h"
 #include "tools/frame/spelling.h"
 #include "tools/report/preview.h"
+#include "tools/whitelist/day_account.h"
+#include "tools/whitelist/refused_keys.h"
 
 namespace tally::tools {
 namespace {
@@ -19,19 +21,29 @@ namespace {
 constexpr std::int32_t kBeforeAllDays = std::numeric_limits<std::int32_t>::min();
 constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
 
-void readRows(Platform& platform, KeyStory& story) {
-  const auto history = platform.metricsStore->openHistory();
+void readRows(const ToolContext& context, KeyStory& story) {
+  ValueState* reading = &story.scalarValue;
+  const auto history = openSqliteHistory(
+      metricsStoreFile(context.root),
+      [&](const std::string& message) {
+        context.platform->log->fault("metrics store", "{}", message);
+        reading->storeFails = !reading->damaged;
+      },
+      [&](std::string_view key, std::int64_t day) {
+        if (key == story.key && day == story.day) reading->damaged = true;
+      });
   history->enumerateScalars(story.key, kBeforeAllDays, kLastDay,
                             [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
                               if (key == story.key) story.scalarRows.push_back({day, value});
                             });
+  reading = &story.distributionValue;
   const auto noOptions = ScalarOptions::create();
   history->enumerateDistributions(
       story.key, kBeforeAllDays, kLastDay,
       [&](std::string_view key, std::int32_t day, DistributionValues& values, bool&) {
         if (key != story.key) return;
         story.distributionRows.push_back(
-            {day, summariseDistribution(*platform.log, values, key, *noOptions).summary});
+            {day, summariseDistribution(*context.platform->log, values, key, *noOptions).summary});
       });
 }
 
@@ -73,6 +85,23 @@ bool hasDay(const Rows& rows, std::int32_t day) {
   return std::ranges::any_of(rows, [day](const auto& row) { return row.day == day; });
 }
 
+// After everything else is known.
+void completeValues(const ToolContext& context, KeyStory& story) {
+  story.scalarValue.stored = hasDay(story.scalarRows, story.day);
+  story.scalarValue.elsewhen = !story.scalarRows.empty();
+  story.scalarValue.measured = story.measured;
+  story.scalarValue.logMade = static_cast<bool>(story.next);
+  story.scalarValue.measurable = story.trace.scalarBefore.has_value();
+  story.distributionValue.stored = hasDay(story.distributionRows, story.day);
+  story.distributionValue.elsewhen = !story.distributionRows.empty();
+  if (story.scalarValue.stored && story.distributionValue.stored) return;
+  for (const RefusedKey& refused : refusedKeys(DeviceRoot(context.root), story.day)) {
+    if (refused.key != story.key) continue;
+    if (refused.kind != KeyKind::Distribution) story.scalarValue.refusal = refused.meaning;
+    if (refused.kind != KeyKind::Scalar) story.distributionValue.refusal = refused.meaning;
+  }
+}
+
 }  // namespace
 
 std::vector<KeyKind> KeyStory::kinds() const {
@@ -84,21 +113,22 @@ std::vector<KeyKind> KeyStory::kinds() const {
   return kinds;
 }
 
-std::string KeyStory::whyAbsent(KeyKind kind) const {
+std::optional<AbsenceReason> KeyStory::whyAbsent(KeyKind kind) const {
   const bool isScalar = kind == KeyKind::Scalar;
   const KeyVerdict& verdict = isScalar ? scalar : distribution;
-  const bool stored = isScalar ? hasDay(scalarRows, day) : hasDay(distributionRows, day);
-  const bool mine = isScalar && measured;
-  if (!stored && !mine) return "the store has no such row on that day";
-  if (!verdict.admitted()) return "the whitelist refuses it";
-  if (!next) {
-    return "the day has no whitelisted value in the store, so no log is made and nothing is "
-           "measured";
+  const ValueState& value = isScalar ? scalarValue : distributionValue;
+  if (auto why = whyNoValue(value)) return why;
+  if (verdict.absence) {
+    return AbsenceReason{*verdict.absence, "the whitelist refuses it: " + verdict.reason};
   }
-  if (mine && !trace.scalarBefore) {
-    return "it cannot be measured: a count that it needs cannot be read, or is 0";
-  }
-  return "";
+  return whyNotMeasured(value);
+}
+
+std::optional<AbsenceReason> KeyStory::whyNotSubmitted(KeyKind kind) const {
+  const auto now = whyAbsent(kind);
+  if (!submitted) return now ? now : unsent;
+  if (loggedValue(submitted->content, key, kind) != nullptr) return std::nullopt;
+  return whyAbsentFrom(submitted->content, now, judge.file().digest);
 }
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day) {
@@ -109,7 +139,7 @@ KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_
   story.measured = isMeasuredByReport(key);
   story.scalar = story.judge.judge(key, KeyKind::Scalar);
   story.distribution = story.judge.judge(key, KeyKind::Distribution);
-  readRows(*context.platform, story);
+  readRows(context, story);
   if (!story.measured && story.scalarRows.empty() && story.distributionRows.empty()) {
     story.similar = similarKeys(context, story);
   }
@@ -117,6 +147,8 @@ KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_
   story.next = previewLog(*context.platform, day, &story.trace).document;
   story.submitted = SubmittedLogs(context).newest(day);
   story.submissionAllowed = context.platform->crashReporting->isDiagnosticSubmissionEnabled();
+  story.unsent = whyUnsent(context, day, story.submitted.has_value());
+  completeValues(context, story);
   return story;
 }
 

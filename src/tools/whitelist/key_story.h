@@ -11,6 +11,7 @@
 #include "report/log_values.h"
 #include "tools/metrics/known_metrics.h"
 #include "tools/report/daily_log.h"
+#include "tools/whitelist/absence.h"
 #include "tools/whitelist/whitelist_verdict.h"
 
 namespace tally::tools {
@@ -46,12 +47,17 @@ struct KeyStory {
   KeyTrace trace;                                 // of the key on its way into that log
   std::optional<SubmittedLogs::Found> submitted;  // the newest log of the day
   bool submissionAllowed = true;
+  // What is known of the values of the day, and why none was submitted.
+  ValueState scalarValue, distributionValue;
+  std::optional<AbsenceReason> unsent;
 
   // The kinds that the key is of: those that it has rows of or is measured as, both when there are
   // none.
   std::vector<KeyKind> kinds() const;
-  // Why a log of the day does not contain the key as that kind; empty if it does.
-  std::string whyAbsent(KeyKind kind) const;
+  // Why a log of the day that is made now does not contain the key as that kind; empty if it does.
+  std::optional<AbsenceReason> whyAbsent(KeyKind kind) const;
+  // Why the day's submitted log does not; empty if it does, or did as far as can be told.
+  std::optional<AbsenceReason> whyNotSubmitted(KeyKind kind) const;
 };
 
 KeyStory tellStory(const ToolContext& context, std::string_view key, std::int32_t day);
