@@ -20,6 +20,10 @@ std::int64_t roundToMultiple(std::int64_t value, std::uint32_t interval) {
   return sum - sum % std::int64_t{interval};
 }
 
+RoundingGrid gridOfMultiples(std::int64_t, std::uint32_t interval) {
+  return {std::max(interval, 1U), std::numeric_limits<std::int64_t>::max()};
+}
+
 std::optional<SettingRemark> remarkOnInterval(std::uint32_t interval) {
   if (interval == 0) {
     return SettingRemark{true, true, "a step of 0 rounds nothing; values are reported unchanged"};
@@ -40,6 +44,24 @@ std::int64_t roundToFigures(std::int64_t value, std::uint32_t figures) {
   return saturatedInt64(power * std::round(static_cast<double>(value) / power));
 }
 
+// Each power of ten ends a grid, and begins the next beyond it.
+RoundingGrid gridOfFigures(std::int64_t value, std::uint32_t figures) {
+  constexpr std::uint64_t kEnd = std::numeric_limits<std::int64_t>::max();
+  constexpr std::uint32_t kMostDigits = 19;
+  if (figures >= kMostDigits) return {1, std::numeric_limits<std::int64_t>::max()};
+  const std::uint64_t size =
+      value < 0 ? 0 - static_cast<std::uint64_t>(value) : static_cast<std::uint64_t>(value);
+  std::uint64_t step = 1, former = 0, power = 1;
+  for (std::uint32_t i = 0; i < figures; ++i) power *= 10;
+  while (power < size) {
+    former = power;
+    power *= 10;
+    step *= 10;
+  }
+  if (value < 0 && former > 0) return {step, -static_cast<std::int64_t>(former) - 1};
+  return {step, static_cast<std::int64_t>(std::min(power, kEnd))};
+}
+
 std::optional<SettingRemark> remarkOnFigures(std::uint32_t figures) {
   if (figures == 0) {
     return SettingRemark{false, false,
@@ -52,9 +74,11 @@ std::optional<SettingRemark> remarkOnFigures(std::uint32_t figures) {
 }
 
 constexpr WhitelistOption kOptions[] = {
-    {"bucket_interval", OptionValue::WholeNumber, ScalarRounding{roundToMultiple, remarkOnInterval},
+    {"bucket_interval", OptionValue::WholeNumber,
+     ScalarRounding{roundToMultiple, gridOfMultiples, remarkOnInterval},
      "a scalar is rounded to a multiple of this number, before `sig_fig` applies"},
-    {"sig_fig", OptionValue::WholeNumber, ScalarRounding{roundToFigures, remarkOnFigures},
+    {"sig_fig", OptionValue::WholeNumber,
+     ScalarRounding{roundToFigures, gridOfFigures, remarkOnFigures},
      "a scalar is rounded to this many significant figures"},
     {kOptionIntervals, OptionValue::Numbers, OptionEffect::onDistributions(),
      "a distribution gets a histogram with these upper bounds"},

@@ -29,9 +29,16 @@ struct SettingRemark {
   std::string_view text;
 };
 
+// Near a value: results are multiples of the step, for values up to and including the last.
+struct RoundingGrid {
+  std::uint64_t step;
+  std::int64_t last;
+};
+
 // A step of the rounding of scalars. The remark is empty for an ordinary setting.
 struct ScalarRounding {
   std::int64_t (*round)(std::int64_t value, std::uint32_t setting);
+  RoundingGrid (*grid)(std::int64_t value, std::uint32_t setting);
   std::optional<SettingRemark> (*remark)(std::uint32_t setting);
 };
 

@@ -6,6 +6,7 @@
 #include <iterator>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <optional>
 #include <utility>
 
 #include "base/files/file.h"
@@ -13,6 +14,7 @@
 #include "tools/frame/command.h"
 #include "tools/frame/table.h"
 #include "tools/metrics/known_metrics.h"
+#include "tools/privacy/exposure.h"
 #include "tools/whitelist/metric_check.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_verdict.h"
@@ -23,6 +25,7 @@ namespace {
 struct WhitelistArguments {
   std::string file;
   std::vector<std::string> keys;
+  bool privacy = false;
 };
 
 WhitelistFile load(const ToolContext& context, const WhitelistArguments& arguments) {
@@ -61,11 +64,12 @@ struct Checked {
   WhitelistFile file;
   const MetricTable& metrics;
   std::vector<Finding> findings;
+  std::optional<PrivacyReport> privacy;
 };
 
 void printCheckJson(const ToolContext& context, const WhitelistArguments& arguments,
                     const Checked& checked) {
-  const auto& [file, metrics, findings] = checked;
+  const auto& [file, metrics, findings, privacy] = checked;
   Json list = Json::array();
   for (const Finding& finding : findings) {
     Json item = {{"severity", finding.severity == Severity::Fault ? "fault" : "surprise"}};
@@ -88,12 +92,13 @@ void printCheckJson(const ToolContext& context, const WhitelistArguments& argume
   document["faults"] = countOf(findings, Severity::Fault);
   document["surprises"] = countOf(findings, Severity::Surprise);
   document["findings"] = std::move(list);
+  if (privacy) document["privacy"] = jsonOf(*privacy);
   printJson(context, document);
 }
 
 void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
                 const Checked& checked) {
-  const auto& [file, metrics, findings] = checked;
+  const auto& [file, metrics, findings, privacy] = checked;
   printLine(context, "Whitelist " + fileName(arguments), Ink::Strong);
   if (file.root) {
     EntryCounter counter;
@@ -126,6 +131,7 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
   printLine(context,
             fmt::format("{}, {}", counted(faults, "fault"), counted(surprises, "surprise")),
             faults > 0 ? Ink::Bad : Ink::Good);
+  if (privacy) printPrivacy(context, *privacy);
 }
 
 int check(const ToolContext& context, const WhitelistArguments& arguments) {
@@ -134,7 +140,7 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
       MetricTable::load(context.root, [&ofTables](const std::string& message) {
         ofTables.push_back({Severity::Fault, "", "", "", "", message});
       }));
-  Checked checked{load(context, arguments), metrics.ofDevice(), {}};
+  Checked checked{load(context, arguments), metrics.ofDevice(), {}, {}};
   std::vector<Finding>& findings = checked.findings;
   if (const auto& root = checked.file.root) {
     findings = checkWhitelist(*context.platform, *root);
@@ -144,6 +150,10 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
                         "the file cannot be used, so nothing is reported: " + checked.file.fault});
   }
   std::ranges::move(ofTables, std::back_inserter(findings));
+  if (arguments.privacy && checked.file.root) {
+    const WhitelistJudge judge(*context.platform, checked.file);
+    checked.privacy = measurePrivacy(context, judge, metrics);
+  }
   (context.json ? printCheckJson : printCheck)(context, arguments, checked);
   return countOf(findings, Severity::Fault) > 0 ? kWrong : kSuccess;
 }
@@ -195,8 +205,11 @@ void addWhitelistCommands(CLI::App& app, ToolContext& context) {
   WhitelistArguments& arguments = whitelist.arguments();
   constexpr const char* kFile = "A whitelist file instead of the device's";
 
-  whitelist.add("check", "Find faults (exit status 1) and surprises in the whitelist", check)
-      .optionalArgument(kFileValue, &arguments.file, kFile);
+  const Command checking =
+      whitelist.add("check", "Find faults (exit status 1) and surprises in the whitelist", check);
+  checking.optionalArgument(kFileValue, &arguments.file, kFile);
+  checking.flag("--privacy", &arguments.privacy,
+                "Measure how much each entry can reveal, by what the store has");
 
   Command command =
       whitelist.add("test", "Say whether keys would be reported, and by which entry", test);
