@@ -10,7 +10,6 @@
 #include <vector>
 
 #include "config/whitelist_file.h"
-#include "tools/metrics/known_metrics.h"
 #include "tools/whitelist/whitelist_verdict.h"
 
 namespace tally::tools {
@@ -117,14 +116,5 @@ struct PrivacyReport {
   // Null when the key is not reported as that kind, or has no values in the store.
   const KeyExposure* find(std::string_view key, KeyKind kind) const;
 };
-
-// Reads the whole store once. Memory grows with the keys, not with days or samples. Faults of the
-// store are logged, and what can be read counts.
-PrivacyReport measurePrivacy(const ToolContext& context, const WhitelistJudge& judge,
-                             const KnownMetrics& metrics);
-
-// The report as whitelist check and the page show it to programs.
-Json jsonOf(const PrivacyReport& report);
-void printPrivacy(const ToolContext& context, const PrivacyReport& report);
 
 }  // namespace tally::tools

@@ -1,3 +1,5 @@
+#include "tools/privacy/measure_privacy.h"
+
 #include <fmt/format.h>
 #include <algorithm>
 #include <cmath>
@@ -8,7 +10,6 @@
 
 #include "platform/tables/measured_metrics.h"
 #include "report/distribution_summary.h"
-#include "tools/privacy/exposure.h"
 #include "tools/privacy/exposure_bits.h"
 #include "tools/privacy/key_identifiers.h"
 #include "tools/privacy/key_states.h"
@@ -393,25 +394,6 @@ PrivacyReport Measurer::finish() {
 }
 
 }  // namespace
-
-std::string distinctText(const DistinctCount& distinct) {
-  return fmt::format("{}{}", distinct.more ? "more than " : "", distinct.count);
-}
-
-std::string rangeText(const SeenRange& range, KeyKind kind) {
-  if (!range.any) return "-";
-  const bool scalar = kind == KeyKind::Scalar;
-  const std::string low = scalar ? integerText(range.lowest) : realText(range.minimum);
-  const std::string high = scalar ? integerText(range.highest) : realText(range.maximum);
-  return low == high ? low : low + " to " + high;
-}
-
-const KeyExposure* PrivacyReport::find(std::string_view key, KeyKind kind) const {
-  const auto found = std::ranges::lower_bound(
-      keys, std::pair(key, kind), {},
-      [](const KeyExposure& one) { return std::pair(std::string_view(one.key), one.kind); });
-  return found != keys.end() && found->key == key && found->kind == kind ? &*found : nullptr;
-}
 
 PrivacyReport measurePrivacy(const ToolContext& context, const WhitelistJudge& judge,
                              const KnownMetrics& metrics) {

@@ -1,3 +1,5 @@
+#include "tools/privacy/privacy_view.h"
+
 #include <fmt/format.h>
 #include <algorithm>
 #include <cmath>
@@ -5,7 +7,6 @@
 
 #include "base/time_text.h"
 #include "tools/frame/table.h"
-#include "tools/privacy/exposure.h"
 
 namespace tally::tools {
 namespace {
