@@ -94,8 +94,10 @@ void MetricIntake::recordLines(Sender sender, std::string_view lines) {
     lines.remove_prefix(std::min(end + 1, lines.size()));
     if (line.ends_with('\r')) line.remove_suffix(1);
     if (line.empty()) continue;
+    metric.name = {};
     if (const auto refused = parseMetricLine(line, metric, values_)) {
-      refuseFor(user, *refused, 1);
+      values_.resize(1);  // the line counts once
+      refuseLine(user, *refused, metric, metric.name);
     } else {
       record(user, metric);
     }
@@ -104,19 +106,20 @@ void MetricIntake::recordLines(Sender sender, std::string_view lines) {
 
 void MetricIntake::record(std::uint32_t user, const MetricLine& metric) {
   if (!users_.admit(users_.at(user), values_.size(), now_.bootNanoseconds, settings())) {
-    return refuseFor(user, Refusal::MetricsPerSecond, values_.size());
+    return refuseLine(user, Refusal::MetricsPerSecond, metric,
+                      rules_.identityOf(metric.name, metric.tags, identity_));
   }
   const std::uint32_t index = keyFor(user, metric);
   if (index == HeldKeys::kNone) return;
   HeldKey& key = keys_->at(index);
   if (key.revoked) {
     if (!rules_.mayRecord(users_.at(user).sender.user, key.key)) {
-      return refuseFor(user, Refusal::Permission, values_.size());
+      return refuseKey(user, Refusal::Permission, key, values_.size());
     }
     key.user = user;  // whoever had it lost the right to it
     key.revoked = false;
   }
-  if (key.user != user) return refuseFor(user, Refusal::Owner, values_.size());
+  if (key.user != user) return refuseKey(user, Refusal::Owner, key, values_.size());
   if (metric.skippedSections > 0) count(RecorderCount::SectionsSkipped, metric.skippedSections);
   keys_->markDirty(index);
   addValues(key, user, metric);
@@ -143,7 +146,7 @@ std::uint32_t MetricIntake::keyFor(std::uint32_t user, const MetricLine& metric)
 std::uint32_t MetricIntake::addKey(std::uint32_t user, const MetricLine& metric,
                                    std::string_view identity) {
   const auto refused = [&](Refusal refusal) {
-    refuseFor(user, refusal, values_.size());
+    refuseLine(user, refusal, metric, identity);
     return HeldKeys::kNone;
   };
   if (!isRecordableName(identity)) return refused(Refusal::Name);
@@ -227,7 +230,7 @@ void MetricIntake::addSample(HeldKey& key, std::uint32_t user, double value, dou
   if (bytes() > mostBytes()) {
     thin();
     // Everything may be in the commit that is under way.
-    if (bytes() > mostBytes()) return refuseFor(user, Refusal::Memory, 1);
+    if (bytes() > mostBytes()) return refuseKey(user, Refusal::Memory, key, 1);
   }
   if (!key.samples) {
     key.samples = std::make_unique<SampleStream>();
@@ -251,6 +254,30 @@ void MetricIntake::refuseFor(std::uint32_t user, Refusal refusal, std::uint64_t 
   markHeld();
 }
 
+void MetricIntake::refuseLine(std::uint32_t user, Refusal refusal, const MetricLine& metric,
+                              std::string_view identity) {
+  refuseFor(user, refusal, values_.size());
+  const bool typed =
+      refusal != Refusal::Malformed && refusal != Refusal::Type && refusal != Refusal::Set;
+  const bool scalar = metric.type == LineType::Counter || metric.type == LineType::Gauge;
+  refusedNames_.note({identity, metric.name.size(), refusal,
+                      !typed   ? RefusedNames::Kind::Unknown
+                      : scalar ? RefusedNames::Kind::Scalar
+                               : RefusedNames::Kind::Distribution,
+                      now_.day, values_.size()});
+}
+
+void MetricIntake::refuseKey(std::uint32_t user, Refusal refusal, const HeldKey& key,
+                             std::uint64_t count) {
+  refuseFor(user, refusal, count);
+  refusedNames_.note({key.key, 0, refusal, RefusedNames::Kind::Unknown, now_.day, count});
+}
+
+std::string MetricIntake::keyOf(const RefusedNames::Row& row) const {
+  if (row.nameLength == 0) return std::string(row.text);
+  return rules_.keyOf(row.text.substr(0, row.nameLength), row.text);
+}
+
 void MetricIntake::markHeld() {
   if (!heldSince_) heldSince_ = now_.bootNanoseconds;
 }
@@ -264,6 +291,7 @@ void MetricIntake::yieldKeys(std::span<const KeyOwner> owners, std::uint64_t cha
   refused_[static_cast<std::size_t>(Refusal::Owner)] += changes;
   if (changes > 0) markHeld();
   for (const KeyOwner& owner : owners) {
+    refusedNames_.note({owner.key, 0, Refusal::Owner, RefusedNames::Kind::Unknown, now_.day, 1});
     const std::uint32_t index = keys_->findKey(owner.key);
     if (index != HeldKeys::kNone) keys_->at(index).user = users_.indexOf({owner.user}, settings());
   }

@@ -20,6 +20,7 @@
 #include "recorder/key_rules.h"
 #include "recorder/recording_clock.h"
 #include "recorder/recording_users.h"
+#include "recorder/refused_names.h"
 #include "recorder/statsd_line.h"
 
 namespace tally {
@@ -82,6 +83,9 @@ class MetricIntake {
   std::uint64_t metrics() const { return metrics_; }
   const RecordingUsers& users() const { return users_; }
   const RefusalCounts& refused() const { return refused_; }
+  const RefusedNames& refusedNames() const { return refusedNames_; }
+  // The key of one of them.
+  std::string keyOf(const RefusedNames::Row& row) const;
   const RecorderCounts& counts() const { return counts_; }
 
  private:
@@ -94,6 +98,10 @@ class MetricIntake {
   void addSample(HeldKey& key, std::uint32_t user, double value, double rate);
   void noteType(HeldKey& key, LineType type);
   void refuseFor(std::uint32_t user, Refusal refusal, std::uint64_t count);
+  // The same of the line in hand, whose metric is remembered.
+  void refuseLine(std::uint32_t user, Refusal refusal, const MetricLine& metric,
+                  std::string_view identity);
+  void refuseKey(std::uint32_t user, Refusal refusal, const HeldKey& key, std::uint64_t count);
   void growSamples(std::uint32_t user, std::size_t bytes);
   void markHeld();
   void markDurable(std::uint32_t user);
@@ -124,6 +132,7 @@ class MetricIntake {
   std::uint64_t samples_ = 0, metrics_ = 0;
   // Since the start, and what of it has been put into batches.
   RefusalCounts refused_{}, refusedTaken_{};
+  RefusedNames refusedNames_;
   RecorderCounts counts_{}, countsTaken_{};
 };
 

@@ -37,6 +37,23 @@ KvRef<KvArray> usersOf(const RecordingUsers& users) {
   return rows;
 }
 
+KvRef<KvArray> refusedKeysOf(const MetricIntake& intake) {
+  auto rows = KvArray::create();
+  for (const RefusedNames::Row& refused : intake.refusedNames().all()) {
+    auto row = KvDictionary::create();
+    row->set("key", KvString::create(intake.keyOf(refused)));
+    row->set("reason", KvString::create(kRefusals[static_cast<std::size_t>(refused.refusal)].name));
+    if (refused.kind != RefusedNames::Kind::Unknown) {
+      row->set("kind", KvString::create(
+                           refused.kind == RefusedNames::Kind::Scalar ? "scalar" : "distribution"));
+    }
+    if (refused.day) row->set("day", KvNumber::int32(*refused.day));
+    row->set("count", number(refused.count));
+    rows->append(std::move(row));
+  }
+  return rows;
+}
+
 }  // namespace
 
 std::string recorderStatusText(const MetricIntake& intake, const CommitFigures& commits,
@@ -59,6 +76,7 @@ std::string recorderStatusText(const MetricIntake& intake, const CommitFigures& 
   if (commits.lastSuccess) status->set("last_commit", KvNumber::float64(*commits.lastSuccess));
   status->set("refused", countsOf(kRefusals, intake.refused()));
   status->set("counts", countsOf(kRecorderCounts, intake.counts()));
+  status->set("refused_keys", refusedKeysOf(intake));
   status->set("users", usersOf(intake.users()));
   const auto text = encodeXmlPlist(*status);
   return text ? *text : "failed: " + text.error().message + "\n";

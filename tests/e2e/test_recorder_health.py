@@ -43,6 +43,10 @@ class RecorderHealth(DeviceTest):
         self.send(b"a:1|c\nb:2|g", b"a:1|s", b"_e{1,1}:a|b")
         self.expect("^ok: .* MiB held in memory, 2 metrics", r"^missing: refused: 1 \(a set .*, 1 \(an event",
                     "^ok: commits every 60 seconds, within 32.0 MiB")
+        self.send(b"never:1|s")
+        found = json.loads(self.device.tool("--json", "explain", "never", "--day", "today", status=1))
+        self.assertEqual(found["absence"]["scalar"], "refused_by_recorder")
+        self.assertIn("a set (type s)", found["whyAbsent"]["scalar"])
 
         # The store is another file's link, which is never followed.
         (self.device.root / STORE).parent.mkdir(parents=True, exist_ok=True)

@@ -396,6 +396,35 @@ TEST_F(RecorderTest, TheStatusIsAPropertyList) {
   EXPECT_THAT(ingress.answers[2], HasSubstr("failed"));
 }
 
+TEST_F(RecorderTest, TheStatusNamesTheKeysThatWereRefusedLast) {
+  settings.prefix = "p.";
+  settings.tags = {"t"};
+  send(kAda, "a:1|c\nset:1|s\nset:2|s\nwrong:x|g|#t:u\n\x01:1|q\nlate:1:2|ms|@7\nbare:1");
+  send(kBob, "a:2:3|c");
+  const auto named = [&] {
+    recorder->onControl(1, "status");
+    const auto value = decodePlist(ingress.answers[1]);
+    const auto* const rows = kvCast<KvDictionary>(value->get())->getAs<KvArray>("refused_keys");
+    std::vector<std::string> texts;
+    for (std::size_t i = 0; i < rows->size(); ++i) {
+      const auto* const row = rows->getAs<KvDictionary>(i);
+      EXPECT_EQ(row->getInt64("day"), kDay);
+      texts.push_back(fmt::format(
+          "{} {} {} {}", row->getString("key").value_or(""), row->getString("reason").value_or(""),
+          row->getString("kind").value_or("-"), row->getInt64("count").value_or(0)));
+    }
+    return texts;
+  };
+  EXPECT_THAT(named(), ElementsAre("p.a owner - 2", "p.bare malformed - 1",
+                                   "p.late sample_rate distribution 1", "p.wrong value scalar 1",
+                                   "p.set set - 2"));
+  // However many there are, the newest ones are kept.
+  for (int i = 0; i < 1000; ++i) send(kAda, fmt::format("n{}:1|s", i));
+  const auto many = named();
+  EXPECT_EQ(many.size(), RefusedNames::kMost);
+  EXPECT_EQ(many.front(), "p.n999 set - 1");
+}
+
 TEST_F(RecorderTest, OneThatIsNotUsedEndsIfItIsStartedAgain) {
   ingress.activated = true;
   send(kAda, "a:1|c");

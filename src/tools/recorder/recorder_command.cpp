@@ -179,6 +179,22 @@ void printCounts(const ToolContext& context, const RecorderMoment& now) {
   table.print(context);
 }
 
+void printRefusedKeys(const ToolContext& context, const RecorderMoment& now) {
+  constexpr std::size_t kMostShown = 10;
+  Table table({{"", Align::Right}, {""}, {"", Align::Left, /*shrinks=*/true}});
+  const auto* const rows = now.fields().getAs<KvArray>("refused_keys");
+  for (std::size_t i = 0; rows != nullptr && i < std::min(rows->size(), kMostShown); ++i) {
+    const auto* const row = rows->getAs<KvDictionary>(i);
+    if (row == nullptr) continue;
+    table.add({integerText(RecorderMoment::numberIn(*row, "count")),
+               std::string(row->getString("reason").value_or("")),
+               std::string(row->getString("key").value_or(""))});
+  }
+  if (table.empty()) return;
+  printHeading(context, "Keys that were refused last");
+  table.print(context);
+}
+
 void show(const ToolContext& context, const RecorderMoment& now,
           const std::optional<RecorderMoment>& before) {
   if (context.json) {
@@ -189,6 +205,7 @@ void show(const ToolContext& context, const RecorderMoment& now,
   printSummary(context, now, before);
   printUsers(context, now, before);
   printCounts(context, now);
+  printRefusedKeys(context, now);
 }
 
 int commitNow(const ToolContext& context) {
