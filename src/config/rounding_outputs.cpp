@@ -63,11 +63,14 @@ double outputsBetween(std::int64_t lowest, std::int64_t highest, const ScalarOpt
     }
     values = std::move(rounded);
   }
-  // Stretches have at most their ends in common.
+  // Stretches have at most their ends in common; or their middle, where no figure is kept and
+  // values of every size become 0.
   double inside = 0;
   std::vector<std::int64_t> ends;
   for (const Stretch& stretch : values) {
-    inside += stretch.count - (stretch.first == stretch.last ? 1 : 2);
+    const bool hasMiddle = stretch.count == 3;
+    if (hasMiddle) ends.push_back(plus(stretch.first, stretch.spacing));
+    inside += stretch.count - (stretch.first == stretch.last ? 1 : 2) - (hasMiddle ? 1 : 0);
     ends.push_back(stretch.first);
     ends.push_back(stretch.last);
   }

@@ -4,6 +4,9 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <set>
+
+#include "config/rounding_outputs.h"
 #include "fakes/fake_platform.h"
 
 namespace tally {
@@ -220,6 +223,33 @@ TEST(WhitelistOptions, RoundingOfScalars) {
     EXPECT_EQ(roundScalar(c.value, *options), c.expected) << c.value << kvText(options.get());
     EXPECT_EQ(haveEffect(*options), c.haveEffect) << kvText(options.get());
   }
+}
+
+// By counting, where that is possible.
+TEST(WhitelistOptions, OutputsAreCountedWithoutMakingThem) {
+  const std::pair<std::int64_t, std::int64_t> ranges[] = {
+      {0, 0}, {-7, 5}, {95, 1105}, {-2345, -90}, {-1200, 1999}, {9990, 11011}, {98765, 101011}};
+  for (const std::int64_t interval : {-1, 0, 1, 2, 7, 10, 64, 999, 1000, 5000}) {
+    for (const std::int64_t figures : {-1, 0, 1, 2, 3, 4, 19}) {
+      auto options = KvDictionary::create();
+      if (interval >= 0) options->set("bucket_interval", KvNumber::int64(interval));
+      if (figures >= 0) options->set("sig_fig", KvNumber::int64(figures));
+      for (const auto& [lowest, highest] : ranges) {
+        std::set<std::int64_t> outputs;
+        for (auto value = lowest; value <= highest; ++value) {
+          outputs.insert(roundScalar(value, *options));
+        }
+        EXPECT_EQ(outputsBetween(lowest, highest, *options), static_cast<double>(outputs.size()))
+            << lowest << " to " << highest << kvText(options.get());
+      }
+    }
+  }
+  const auto none = KvDictionary::create();
+  EXPECT_EQ(outputsBetween(INT64_MIN, INT64_MAX, *none), 18446744073709551616.0);
+  auto figures = KvDictionary::create();
+  figures->set("sig_fig", KvNumber::int64(2));
+  // 0, and for each sign 1 to 99, then 10 to 99 of 16 powers of ten, then 10 to 92.
+  EXPECT_EQ(outputsBetween(INT64_MIN, INT64_MAX, *figures), 1 + 2 * (99 + 90 * 16 + 83));
 }
 
 }  // namespace

@@ -362,8 +362,10 @@ void Measurer::addNotes(std::uint32_t number, std::span<const KeyExposure* const
 void Measurer::sortEntries() {
   std::vector<std::uint32_t> order(report_.entries.size());
   for (std::uint32_t i = 0; i < order.size(); ++i) order[i] = i;
-  std::ranges::stable_sort(order, std::greater<>(),
-                           [this](std::uint32_t i) { return report_.entries[i].bits; });
+  std::ranges::stable_sort(order, std::greater<>(), [this](std::uint32_t i) {
+    const EntryExposure& entry = report_.entries[i];
+    return std::pair(entry.range.any, entry.bits);
+  });
   std::vector<std::uint32_t> places(order.size());
   std::vector<EntryExposure> sorted;
   sorted.reserve(order.size());

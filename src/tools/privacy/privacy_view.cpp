@@ -88,7 +88,9 @@ void printNotes(const ToolContext& context, const EntryExposure& entry) {
   if (entry.notes.empty() && entry.proposals.empty()) return;
   printLine(context, "  " + entryText(entry), Ink::Strong);
   for (const PrivacyNote& note : entry.notes) {
-    printLine(context, fmt::format("    {}: {}", rowOf(note.concern).meaning, note.detail));
+    const bool isEntry = note.detail == entry.entry;  // said in the line above
+    printLine(context, fmt::format("    {}{}", rowOf(note.concern).meaning,
+                                   isEntry ? "" : ": " + note.detail));
   }
   for (const PrivacyProposal& proposal : entry.proposals) {
     printLine(context, fmt::format("    {} bits with {}", bitsText(proposal.bits), proposal.text),

@@ -82,6 +82,13 @@ double bitsWith(std::span<const double> bounds, bool hasHistogram,
   return bits;
 }
 
+// As a person would write it into the whitelist.
+KvRef<KvNumber> numberOf(double number) {
+  constexpr double kExact = 9007199254740992.0;  // 2 to the 53rd
+  const bool whole = std::trunc(number) == number && std::fabs(number) < kExact;
+  return whole ? KvNumber::int64(static_cast<std::int64_t>(number)) : KvNumber::float64(number);
+}
+
 }  // namespace
 
 std::vector<PrivacyProposal> proposalsForScalars(const EntryExposure& entry,
@@ -123,7 +130,7 @@ std::vector<PrivacyProposal> proposalsForHistogram(const EntryExposure& entry,
     PrivacyProposal proposal;
     proposal.options = without(*entry.options, false);
     auto array = KvArray::create();
-    for (const double bound : bounds) array->append(KvNumber::float64(bound));
+    for (const double bound : bounds) array->append(numberOf(bound));
     proposal.options->set(kOptionIntervals, std::move(array));
     for (std::size_t i = 1; i < bounds.size(); ++i) {
       proposal.absoluteError =
