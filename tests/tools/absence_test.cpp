@@ -148,6 +148,10 @@ TEST_F(AbsenceTest, AWholeDayIsAccountedForAsEachKeyIs) {
     ++compared;
   }
   EXPECT_EQ(compared, 10U);
+  const auto absent = run({"whitelist", "absent", "--day", "20000", "--json"}).json();
+  EXPECT_EQ(absent["keys"].size(), 11U);  // two that are measured; one is of another day
+  expectParts(run({"whitelist", "absent", "--day", "20000", "--all"}).out,
+              {"12  keys in all\n", "late", "named only by the prefix off. of the group Off"});
   ASSERT_NE(account.find("d", KeyKind::Distribution), nullptr);
   EXPECT_EQ(account.find("d", KeyKind::Distribution)->section(),
             WhitelistSection::DistributionKeys);

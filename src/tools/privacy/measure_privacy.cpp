@@ -335,16 +335,13 @@ void Measurer::addNotes(std::uint32_t number, std::span<const KeyExposure* const
   constexpr double kSame = 1e-9;  // of two logarithms
   Examples exact;
   for (const KeyExposure* key : keys) {
-    if (!key->range.any) continue;
-    if (entry.kind() == KeyKind::Distribution) {
-      exact.add(key->key);
-      continue;
-    }
     const auto width =
         static_cast<double>(key->range.highest) - static_cast<double>(key->range.lowest);
-    if (!haveEffect(*entry.options) || (width > 0 && key->bits > std::log2(width + 1) - kSame)) {
-      exact.add(key->key);
-    }
+    const bool isExact = entry.kind() == KeyKind::Distribution
+                             ? key->range.any
+                             : !haveEffect(*entry.options) ||
+                                   (width > 0 && key->bits > std::log2(width + 1) - kSame);
+    if (isExact) exact.add(key->key);
   }
   if (exact.count() > 0) {
     entry.notes.push_back({entry.kind() == KeyKind::Scalar ? PrivacyConcern::ExactNumber

@@ -12,10 +12,12 @@
 #include "base/files/file.h"
 #include "kv/plist_codec.h"
 #include "tools/frame/command.h"
+#include "tools/frame/day_argument.h"
 #include "tools/frame/table.h"
 #include "tools/metrics/known_metrics.h"
 #include "tools/privacy/measure_privacy.h"
 #include "tools/privacy/privacy_view.h"
+#include "tools/whitelist/absent_command.h"
 #include "tools/whitelist/metric_check.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_verdict.h"
@@ -27,6 +29,7 @@ struct WhitelistArguments {
   std::string file;
   std::vector<std::string> keys;
   bool privacy = false;
+  AbsentArguments absent;
 };
 
 WhitelistFile load(const ToolContext& context, const WhitelistArguments& arguments) {
@@ -216,6 +219,13 @@ void addWhitelistCommands(CLI::App& app, ToolContext& context) {
       whitelist.add("test", "Say whether keys would be reported, and by which entry", test);
   command.argument(kStoreKeyValue, &arguments.keys, "Keys of the metrics store");
   command.option("--file", kFileValue, &arguments.file, kFile);
+
+  Command absent = whitelist.add("absent", "List the keys of a day that no log has, and why",
+                                 [](const ToolContext& tool, const WhitelistArguments& given) {
+                                   return listAbsent(tool, given.absent);
+                                 });
+  absent.option("--day", kDayValue, &arguments.absent.day, kDayForms);
+  absent.flag("--all", &arguments.absent.wholeStore, "Also keys that have values on other days");
 }
 
 }  // namespace tally::tools
