@@ -11,7 +11,10 @@
 namespace tally::tools {
 namespace {
 
-std::string bitsText(double bits) { return fmt::format("{:.1f}", bits); }
+std::string bitsText(double bits) {
+  constexpr double kMany = 1000;
+  return bits < kMany ? fmt::format("{:.1f}", bits) : integerText(std::llround(bits));
+}
 
 // Two decimals are more than the ranges are worth.
 double jsonBits(double bits) { return std::round(bits * 100) / 100; }

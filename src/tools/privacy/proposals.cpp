@@ -133,8 +133,9 @@ std::vector<PrivacyProposal> proposalsForHistogram(const EntryExposure& entry,
     for (const double bound : bounds) array->append(numberOf(bound));
     proposal.options->set(kOptionIntervals, std::move(array));
     for (std::size_t i = 1; i < bounds.size(); ++i) {
-      proposal.absoluteError =
-          std::max(proposal.absoluteError.value_or(0), bounds[i] - bounds[i - 1]);
+      const double width = bounds[i] - bounds[i - 1];
+      if (!std::isfinite(width)) continue;  // as if there were no boundary
+      proposal.absoluteError = std::max(proposal.absoluteError.value_or(0), width);
     }
     proposal.bits = bitsWith(bounds, true, keys);
     constexpr std::size_t kShown = 8;
