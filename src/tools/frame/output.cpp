@@ -208,6 +208,10 @@ std::string printableJson(std::string text) {
   return out.append(text, copied);
 }
 
+std::string jsonText(std::string_view text) {
+  return printableJson(Json(text).dump(-1, ' ', false, Json::error_handler_t::replace));
+}
+
 int complain(const ToolContext& context, std::string_view message, ExitStatus status) {
   if (context.json && context.complaints != nullptr) {
     context.complaints->emplace_back(message);

@@ -54,6 +54,8 @@ void printJson(const ToolContext& context, const Json& document);
 // JSON that is safe to show on a terminal: control characters beyond those that JSON escapes
 // anyway, and characters that reorder a line, are escaped.
 std::string printableJson(std::string text);
+// A text as a JSON string, in quotes, likewise safe to show.
+std::string jsonText(std::string_view text);
 
 // Reports why the command fails, as a line on standard error or with --json as a part of the error
 // object that runTool() prints. Returns the status.

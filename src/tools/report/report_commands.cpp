@@ -10,6 +10,7 @@
 #include "kv/plist_codec.h"
 #include "platform/platform.h"
 #include "report/document.h"
+#include "tools/export/export_command.h"
 #include "tools/frame/command.h"
 #include "tools/frame/day_argument.h"
 #include "tools/frame/standard_input.h"
@@ -259,8 +260,8 @@ int show(const ToolContext& context, const ReportArguments& arguments) {
 }  // namespace
 
 void addReportCommands(CLI::App& app, ToolContext& context) {
-  CommandGroup<ReportArguments> report(
-      addFamily(app, "report", "Show the next log and earlier ones"), context);
+  CLI::App& family = addFamily(app, "report", "Show the next log and earlier ones");
+  CommandGroup<ReportArguments> report(family, context);
   ReportArguments& arguments = report.arguments();
 
   Command command = report.add(
@@ -276,6 +277,8 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
       .optionalArgument(
           {"LOG", ValueKind::Log}, &arguments.name,
           "Its number or name, a file, or - for standard input; the last daily log by default");
+
+  addExportCommand(family, context);
 }
 
 }  // namespace tally::tools

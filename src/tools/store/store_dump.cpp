@@ -1,39 +1,16 @@
 #include "tools/store/store_dump.h"
 
 #include <cmath>
-#include <nlohmann/json.hpp>
 #include <string_view>
 
 #include "base/number_text.h"
 #include "base/printable.h"
+#include "tools/frame/buffered_output.h"
 #include "tools/frame/output.h"
 #include "tools/store/store_csv.h"
 
 namespace tally::tools {
 namespace {
-
-// Text on its way to a file, written in large pieces.
-class Output {
- public:
-  explicit Output(std::FILE* file) : file_(file) {}
-  std::string& text() {
-    constexpr std::size_t kPiece = 64u << 10;
-    if (text_.size() >= kPiece) flush();
-    return text_;
-  }
-  ~Output() { flush(); }
-  Output(const Output&) = delete;
-  Output& operator=(const Output&) = delete;
-  bool failed() const { return std::ferror(file_) != 0; }
-
- private:
-  void flush() {
-    print(file_, text_);
-    text_.clear();
-  }
-  std::FILE* file_;
-  std::string text_;
-};
 
 template <class Handler>
 void eachSample(DistributionValues& values, const Handler& handler) {
@@ -48,15 +25,10 @@ void eachSample(DistributionValues& values, const Handler& handler) {
   }
 }
 
-std::string jsonText(std::string_view text) {
-  return printableJson(
-      nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace));
-}
-
 }  // namespace
 
 void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bool forPerson) {
-  Output output(out);
+  BufferedOutput output(out);
   const auto fieldOf = [forPerson](std::string_view key) {
     return csvField(forPerson ? printable(key) : std::string(key));
   };
@@ -81,7 +53,7 @@ void dumpAsCsv(HistoryStore& history, const DumpRange& range, std::FILE* out, bo
 }
 
 void dumpAsJson(HistoryStore& history, const DumpRange& range, std::FILE* out) {
-  Output output(out);
+  BufferedOutput output(out);
   const auto beginRow = [&](const char* separator, std::string_view key, std::int32_t day) {
     std::string& text = output.text();
     text.append(separator).append("{\"key\": ").append(jsonText(key)).append(", \"day\": ");
