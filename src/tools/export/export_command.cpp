@@ -5,6 +5,7 @@
 #include "tools/export/csv_rows.h"
 #include "tools/export/json_rows.h"
 #include "tools/export/log_sources.h"
+#include "tools/export/metric_rows.h"
 #include "tools/frame/buffered_output.h"
 #include "tools/frame/output.h"
 
@@ -16,6 +17,7 @@ struct ExportArguments {
   std::string device, systemVersion, configuration;
   std::optional<std::uint32_t> sequence;
   std::vector<std::string> files;
+  bool timestamps = false;
 };
 
 std::unique_ptr<RowFormat> makeFormat(const ToolContext& context, const ExportArguments& arguments,
@@ -23,10 +25,17 @@ std::unique_ptr<RowFormat> makeFormat(const ToolContext& context, const ExportAr
   if (arguments.format == "csv") {
     return std::make_unique<CsvRows>(output, context.output.interactive);
   }
+  if (arguments.format == "openmetrics") {
+    return std::make_unique<MetricRows>(output, knownMetrics(context), arguments.timestamps,
+                                        context.output.interactive);
+  }
   return std::make_unique<JsonRows>(output);
 }
 
 int exportLogs(const ToolContext& context, const ExportArguments& arguments) {
+  if (arguments.timestamps && arguments.format != "openmetrics") {
+    return complain(context, "--timestamps is of --format openmetrics", kBadUsage);
+  }
   BufferedOutput output(context.out);
   const auto format = makeFormat(context, arguments, output);
   LogSources sources(
@@ -48,8 +57,10 @@ void addExportCommand(CLI::App& report, ToolContext& context) {
   Command command = group.add(
       "export", "Turn submitted logs into rows for databases and other programs", exportLogs);
   command.option("--format", {"FORMAT", ValueKind::Text}, &arguments.format, "Form of the rows")
-      .oneOf({"ndjson", "csv"})
+      .oneOf({"ndjson", "csv", "openmetrics"})
       .showsDefault();
+  command.flag("--timestamps", &arguments.timestamps,
+               "OpenMetrics of all logs with the times of their days, not of the last log without");
   command.option("--device", kTextValue, &arguments.device,
                  "Pseudonym of the device, of logs that do not say it");
   command.option("--sequence", {"NUMBER", ValueKind::Number}, &arguments.sequence,
