@@ -1,7 +1,9 @@
 #include "base/number_text.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <limits>
 #include <type_traits>
 
 namespace tally {
@@ -25,6 +27,12 @@ void appendReal(std::string& out, T value) {
   constexpr T kPlainFrom = T(1e-4);
   constexpr T kPlainBelow = std::is_same_v<T, float> ? T(1e7) : T(1e16);
   const T size = std::fabs(value);
+  // Whole numbers are frequent, and their digits several times faster as an integer's.
+  constexpr T kExactBelow = T(std::uint64_t{1} << std::numeric_limits<T>::digits);
+  if (size < std::min(kExactBelow, kPlainBelow) && size == std::trunc(size) && size != 0) {
+    append(out, static_cast<std::int64_t>(value));
+    return;
+  }
   const bool plain = size == 0 || (size >= kPlainFrom && size < kPlainBelow);
   append(out, value, plain ? std::chars_format::fixed : std::chars_format::scientific);
 }

@@ -6,7 +6,6 @@
 
 #include <algorithm>
 #include <bit>
-#include <cstring>
 #include <span>
 #include <string>
 #include <vector>
@@ -27,6 +26,10 @@ constexpr std::string_view kBigEndianMark = "\xFE\xFF", kLittleEndianMark = "\xF
 
 bool isBlank(char character) {
   return character == ' ' || character == '\n' || character == '\t' || character == '\r';
+}
+
+bool endsName(char character) {
+  return character == '<' || character == '>' || character == '/' || isBlank(character);
 }
 
 struct Tag {
@@ -154,9 +157,7 @@ class Reader {
     ++position_;
     tag.closing = take("/");
     const std::size_t start = position_;
-    while (!atEnd() && !isBlank(text_[position_]) && !std::strchr("<>/", text_[position_])) {
-      ++position_;
-    }
+    while (!atEnd() && !endsName(text_[position_])) ++position_;
     tag.name = text_.substr(start, position_ - start);
     for (; !atEnd(); ++position_) {
       const char character = text_[position_];

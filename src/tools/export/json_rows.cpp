@@ -1,5 +1,7 @@
 #include "tools/export/json_rows.h"
 
+#include <cmath>
+
 #include "base/number_text.h"
 #include "base/time_text.h"
 #include "tools/frame/output.h"
@@ -111,14 +113,22 @@ void JsonRows::addDistribution(std::string_view key, const ExportedDistribution&
 }
 
 void JsonRows::appendHistogram(std::string& text, const std::vector<ExportedBucket>& histogram) {
+  uppers_.clear();
+  std::size_t former = 0;  // where the upper bound of the former bucket begins
   text += R"(,"lower":)";
   appendArray(text, histogram, [&](const ExportedBucket& bucket, std::size_t i) {
-    appendNumberOrNull(text, numbers_.lower(bucket.bounds, i));
+    // A bucket mostly begins where the former one ends, whose bound is text already.
+    const bool isNext = i != 0 && bucket.bounds.lower == histogram[i - 1].bounds.upper;
+    if (isNext && std::isfinite(bucket.bounds.lower)) {
+      text.append(uppers_, former);
+    } else {
+      appendNumberOrNull(text, numbers_.lower(bucket.bounds, i));
+    }
+    if (i != 0) uppers_ += ',';
+    former = uppers_.size();
+    appendNumberOrNull(uppers_, numbers_.upper(bucket.bounds, i));
   });
-  text += R"(,"upper":)";
-  appendArray(text, histogram, [&](const ExportedBucket& bucket, std::size_t i) {
-    appendNumberOrNull(text, numbers_.upper(bucket.bounds, i));
-  });
+  text.append(R"(,"upper":[)").append(uppers_) += ']';
   text += R"(,"counts":)";
   appendArray(text, histogram,
               [&](const ExportedBucket& bucket, std::size_t) { appendInt64(text, bucket.count); });

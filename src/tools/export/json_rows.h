@@ -22,6 +22,7 @@ class JsonRows final : public RowFormat {
 
   BufferedOutput& output_;
   std::string front_;      // of every row of the log, up to its key
+  std::string uppers_;     // of the histogram that is being written
   FiniteNumbers numbers_;  // of the row that is being written
 };
 
