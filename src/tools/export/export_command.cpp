@@ -1,7 +1,9 @@
 #include "tools/export/export_command.h"
 
+#include <limits>
 #include <memory>
 
+#include "base/utf8.h"
 #include "tools/export/csv_rows.h"
 #include "tools/export/json_rows.h"
 #include "tools/export/log_sources.h"
@@ -38,10 +40,10 @@ int exportLogs(const ToolContext& context, const ExportArguments& arguments) {
   }
   BufferedOutput output(context.out);
   const auto format = makeFormat(context, arguments, output);
-  LogSources sources(
-      context,
-      {arguments.device, arguments.sequence, arguments.systemVersion, arguments.configuration},
-      *format);
+  LogSources sources(context,
+                     {repairUtf8(arguments.device), arguments.sequence,
+                      repairUtf8(arguments.systemVersion), repairUtf8(arguments.configuration)},
+                     *format);
   if (arguments.files.empty()) sources.addSpool();
   for (const std::string& file : arguments.files) sources.addFile(file);
   const auto finished = format->finish();
@@ -63,8 +65,10 @@ void addExportCommand(CLI::App& report, ToolContext& context) {
                "OpenMetrics of all logs with the times of their days, not of the last log without");
   command.option("--device", kTextValue, &arguments.device,
                  "Pseudonym of the device, of logs that do not say it");
-  command.option("--sequence", {"NUMBER", ValueKind::Number}, &arguments.sequence,
-                 "Sequence number, of the first log that does not say it");
+  command
+      .option("--sequence", {"NUMBER", ValueKind::Number}, &arguments.sequence,
+              "Sequence number, of the first log that does not say it")
+      .within(1, std::numeric_limits<int>::max());
   command.option("--system-version", kTextValue, &arguments.systemVersion,
                  "Version of the system, of logs that do not say it");
   command.option("--configuration", kTextValue, &arguments.configuration,

@@ -110,7 +110,10 @@ std::string MetricRows::labelsOf(std::string_view key, bool withUnit) const {
 }
 
 void MetricRows::beginLog(const LogHead& head) {
-  if (!withTimes_) lines_.clear();
+  if (!withTimes_) {
+    lines_.clear();
+    disorderedHistograms_ = 0;
+  }
   time_.reset();
   isLeftOut_ = withTimes_ && !head.day;
   if (isLeftOut_) {
