@@ -1,5 +1,7 @@
 #include "tools/channels/keep_command.h"
 
+#include <nlohmann/json.hpp>
+
 #include "hwreport/hwreport.h"
 #include "tools/frame/output.h"
 
@@ -25,7 +27,11 @@ int keep(const ToolContext& context) {
   platform.metricsStore->beginBatch();
   const std::size_t kept = readCounters() ? platform.dailyCounters->accumulate() : 0;
   platform.metricsStore->endBatch();
-  printLine(context, counted(kept, "counter") + " kept");
+  if (context.json) {
+    printJson(context, {{"kept", kept}});
+  } else {
+    printLine(context, counted(kept, "counter") + " kept");
+  }
   return kSuccess;
 }
 
