@@ -11,7 +11,7 @@
 
 #include "base/time_text.h"
 #include "kv/value.h"
-#include "platform/counter_state.h"
+#include "platform/counters/counter_state.h"
 #include "platform/flash/wear_history.h"
 
 namespace tally {

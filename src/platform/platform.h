@@ -13,7 +13,7 @@
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
 #include "platform/crash_support_library.h"
-#include "platform/daily_counters.h"
+#include "platform/counters/daily_counters.h"
 #include "platform/device_information.h"
 #include "platform/device_registry.h"
 #include "platform/event_loop.h"

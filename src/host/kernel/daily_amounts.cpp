@@ -3,56 +3,6 @@
 #include <algorithm>
 
 namespace tally {
-namespace {
-
-// 2^width - 1.
-std::uint64_t largestOf(std::uint8_t width) {
-  return width >= 64 ? UINT64_MAX : (std::uint64_t{1} << width) - 1;
-}
-
-std::int64_t saturated(std::uint64_t value) {
-  return value > std::uint64_t{INT64_MAX} ? INT64_MAX : static_cast<std::int64_t>(value);
-}
-
-std::uint64_t sumOf(std::uint64_t a, std::uint64_t b) {
-  return a > UINT64_MAX - b ? UINT64_MAX : a + b;
-}
-
-// What the next rise of a counter begins at. One that wavers rises above its highest value only.
-std::uint64_t nextLast(const CounterState& kept, const CounterReading& reading) {
-  constexpr std::uint64_t kWavering = 3000;  // an idle time falls by less, unless a processor went
-  const bool wavers = reading.isUnsteady && kept.epoch == reading.epoch &&
-                      reading.value < kept.last && kept.last - reading.value < kWavering;
-  return wavers ? kept.last : reading.value;
-}
-
-}  // namespace
-
-std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading) {
-  if (kept.epoch != reading.epoch) return reading.value;
-  if (reading.value >= kept.last) return reading.value - kept.last;
-  if (reading.isUnsteady) return 0;
-  const std::uint64_t largest = largestOf(reading.width);
-  const bool wrapped = reading.width != 0 && kept.last <= largest && kept.last > largest / 4 * 3;
-  return wrapped ? largest - kept.last + 1 + reading.value : reading.value;
-}
-
-CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today,
-                       std::int32_t lastSweep) {
-  CounterState next = kept;
-  next.sum = sumOf(kept.sum, riseOf(kept, reading));
-  if (today > kept.day) {
-    next.amount.reset();
-    if (kept.day >= lastSweep) next.amount = saturated(next.sum);
-    next.sum = 0;
-  } else if (today < kept.day) {
-    next.amount.reset();  // the clock was set back: of which days the sum is will not be known
-  }
-  next.day = today;
-  next.last = nextLast(kept, reading);
-  next.epoch = reading.epoch;
-  return next;
-}
 
 std::string eventKey(std::string_view key) { return std::string(key).append("/event"); }
 
@@ -95,17 +45,14 @@ std::size_t DailyAmounts::accumulate() {
   for (const auto& [key, last] : read_) {
     const CounterState* const state = kept(key);
     if (state == nullptr) continue;
-    CounterState next = *state;
-    next.sum = sumOf(state->sum, riseOf(*state, last.reading()));
-    next.last = nextLast(*state, last.reading());
-    next.epoch = last.epoch;
+    const CounterState next = accumulated(*state, last.reading());
     store_->setCounterState(next);
     ++count;
     // What waits for the sweep as an event.
     if (const CounterState* const event = kept(eventKey(key))) {
       CounterState waiting = next;
       waiting.key = event->key;
-      waiting.sum = sumOf(event->sum, riseOf(*event, last.reading()));
+      waiting.sum = saturatedSum(event->sum, riseOf(*event, last.reading()));
       waiting.day = event->day;
       waiting.amount.reset();
       store_->setCounterState(waiting);

@@ -9,29 +9,12 @@
 #include <string_view>
 
 #include "platform/clock.h"
-#include "platform/counter_state.h"
-#include "platform/daily_counters.h"
+#include "platform/counters/counter_rise.h"
+#include "platform/counters/counter_state.h"
+#include "platform/counters/daily_counters.h"
 #include "platform/metrics_store.h"
 
 namespace tally {
-
-// A counter as it was just read.
-struct CounterReading {
-  std::uint64_t value = 0;
-  // As long as it is the same, the counter goes on: the boot, or the device that it belongs to.
-  std::string_view epoch;
-  std::uint8_t width = 64;
-  bool isUnsteady = false;  // a fall does not mean that it started again
-};
-
-// How much a counter rose since its state was kept. Where it started again, what it counts since
-// then is all that is known.
-std::uint64_t riseOf(const CounterState& kept, const CounterReading& reading);
-
-// The state after a reading on a day: the day's amount is fixed by its first reading. lastSweep is
-// the day of the sweep before; a counter that was missing from it has no amount of that day.
-CounterState nextState(const CounterState& kept, const CounterReading& reading, std::int32_t today,
-                       std::int32_t lastSweep);
 
 // Under which what a counter rose by is kept until a sweep forwards it as an event.
 std::string eventKey(std::string_view key);

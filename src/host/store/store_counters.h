@@ -4,7 +4,7 @@
 #include <vector>
 
 #include "host/store/store_schema.h"
-#include "platform/counter_state.h"
+#include "platform/counters/counter_state.h"
 
 namespace tally {
 

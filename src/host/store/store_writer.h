@@ -12,7 +12,7 @@
 
 #include "host/store/samples/sample_tail.h"
 #include "host/store/store_schema.h"
-#include "platform/counter_state.h"
+#include "platform/counters/counter_state.h"
 #include "platform/flash/wear_history.h"
 
 namespace tally {
