@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <span>
 #include <string_view>
 #include <vector>
@@ -51,6 +52,9 @@ class HistoryStore {
                                       const DistributionHandler& handler) = 0;
   // Whether any sample counts for more than one.
   virtual bool hasWeights() { return false; }
+  // Rows that the enumerations until now left out, being damaged; empty if one could not be read to
+  // its end.
+  virtual std::optional<std::uint64_t> damagedRows() { return 0; }
 };
 
 // The instant at which a day begins (UTC).

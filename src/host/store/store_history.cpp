@@ -45,12 +45,12 @@ class SqliteHistory final : public HistoryStore {
   SqliteHistory(Database database, StoreFaultHandler onFault, DamagedRowHandler onDamaged)
       : database_(std::move(database)),
         onFault_(std::move(onFault)),
-        onDamaged_(std::move(onDamaged)) {}
+        losses_{0, true, std::move(onDamaged)} {}
 
   void enumerateScalars(std::string_view keyPrefix, std::int32_t minimumDay,
                         std::int32_t maximumDay, const ScalarHandler& handler) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
-    StoreFaults faults(database_, onFault_, &onDamaged_);
+    StoreFaults faults(database_, onFault_, &losses_);
     auto rows = database_.prepare("SELECT day, key, value FROM scalars" +
                                   std::string(StoreRange::kCondition) + " ORDER BY day, key");
     if (!rows) return faults.fail(rows.error());
@@ -75,7 +75,7 @@ class SqliteHistory final : public HistoryStore {
                               std::int32_t maximumDay,
                               const DistributionHandler& handler) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
-    StoreFaults faults(database_, onFault_, &onDamaged_);
+    StoreFaults faults(database_, onFault_, &losses_);
     const Sources sources = openSampleSources(database_, faults, range);
     bool stop = false;
     while (!stop) {
@@ -99,6 +99,10 @@ class SqliteHistory final : public HistoryStore {
     }
   }
 
+  std::optional<std::uint64_t> damagedRows() override {
+    return losses_.isComplete ? std::optional(losses_.damagedRows) : std::nullopt;
+  }
+
   bool hasWeights() override {
     for (const std::string_view table : {kPackedTable, kArrivalsTable}) {
       const auto exists = hasTable(database_, table);
@@ -113,7 +117,7 @@ class SqliteHistory final : public HistoryStore {
  private:
   Database database_;
   StoreFaultHandler onFault_;
-  DamagedRowHandler onDamaged_;
+  StoreLosses losses_;
 };
 
 class EmptyHistory final : public HistoryStore {

@@ -76,15 +76,26 @@ struct StoreRange {
   std::int32_t minimum, maximum;
 };
 
+// What a reader of the store did not get to see.
+struct StoreLosses {
+  std::uint64_t damagedRows = 0;
+  bool isComplete = true;  // else nobody knows how many more
+  // Is told of each damaged row, unless it is empty.
+  std::function<void(std::string_view key, std::int64_t day)> onDamaged;
+};
+
 // Counts what one enumeration leaves out, and reports it as one line.
 class StoreFaults {
  public:
-  using OnDamaged = std::function<void(std::string_view key, std::int64_t day)>;
-  // Each damaged row is told to onDamaged, unless that is null.
+  // The losses, which may be null, are added to.
   StoreFaults(const Database& database, const std::function<void(const std::string&)>& report,
-              const OnDamaged* onDamaged = nullptr)
-      : database_(database), report_(report), onDamaged_(onDamaged) {}
+              StoreLosses* losses = nullptr)
+      : database_(database), report_(report), losses_(losses) {}
   ~StoreFaults() {
+    if (losses_ != nullptr) {
+      losses_->damagedRows += damaged_;
+      losses_->isComplete = losses_->isComplete && !failed_;
+    }
     if (failed_) {
       report_(reason_);
     } else if (damaged_ > 0) {
@@ -98,7 +109,7 @@ class StoreFaults {
   StoreFaults& operator=(const StoreFaults&) = delete;
 
   void addDamaged(std::string_view key, std::int64_t day) {
-    if (onDamaged_ != nullptr && *onDamaged_) (*onDamaged_)(key, day);
+    if (losses_ != nullptr && losses_->onDamaged) losses_->onDamaged(key, day);
     if (damaged_++ == 0)
       reason_ = "the key \"" + std::string(key) + "\" on day " + std::to_string(day);
   }
@@ -110,7 +121,7 @@ class StoreFaults {
  private:
   const Database& database_;
   const std::function<void(const std::string&)>& report_;
-  const OnDamaged* onDamaged_;
+  StoreLosses* const losses_;
   std::size_t damaged_ = 0;
   bool failed_ = false;
   std::string reason_;
