@@ -20,7 +20,7 @@
 #include "host/store/recording/recording_store.h"
 #include "host/store/store_schema.h"
 #include "host/system/environment.h"
-#include "host/system/machine.h"
+#include "host/system/machine/machine.h"
 #include "host/system/standard_streams.h"
 #include "host/system/system_log.h"
 #include "recorder/recorder.h"

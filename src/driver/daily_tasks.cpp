@@ -4,6 +4,7 @@
 #include <chrono>
 
 #include "config/whitelist_file.h"
+#include "driver/own_figures.h"
 #include "platform/tables/known_preferences.h"
 #include "report/daily_report.h"
 
@@ -67,11 +68,13 @@ void DailyTasks::runDaily(std::int32_t day, const KvArray* appInfo) {
   commitRecorded(platform_);
   platform_.metricsStore->TBClientCheckpoint();
   CrashReporting& crashReporting = *platform_.crashReporting;
-  if (crashReporting.isDiagnosticSubmissionEnabled()) writeDailyLog(platform_, day, appInfo);
+  OwnMetrics own;
+  if (crashReporting.isDiagnosticSubmissionEnabled()) own = writeDailyLog(platform_, day, appInfo);
   tasks_.runTelemetrySweep(platform_);
   crashReporting.FDDumpAllOldStructuredDataLogs();
   tasks_.updateTaskingState(platform_);
   crashReporting.rollFixlineLogs();
+  recordOwnFigures(platform_, own);  // last, so that it knows what all of this cost
 }
 
 }  // namespace tally

@@ -23,6 +23,7 @@
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"
 #include "host/system/log_header_facts.h"
+#include "host/system/machine/linux_self.h"
 #include "host/system/run_lock.h"
 #include "host/system/system_log.h"
 
@@ -83,6 +84,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
       description);
   services.kernelValues = std::make_shared<LinuxKernelValues>(description, tree);
   services.recorder = std::make_shared<SocketRecorderLink>(root);
+  services.self = std::make_shared<LinuxSelf>();
   services.stackshot = std::make_shared<DescribedStackshot>(described, description);
   services.purgeableSpace = std::make_shared<DescribedPurgeableSpace>(description);
   services.logHeaderFacts =

@@ -11,9 +11,9 @@
 #include "platform/analytics_events.h"
 #include "platform/applications.h"
 #include "platform/clock.h"
+#include "platform/counters/daily_counters.h"
 #include "platform/crash_reporting.h"
 #include "platform/crash_support_library.h"
-#include "platform/counters/daily_counters.h"
 #include "platform/device_information.h"
 #include "platform/device_registry.h"
 #include "platform/event_loop.h"
@@ -30,6 +30,7 @@
 #include "platform/purgeable_space.h"
 #include "platform/recording/recorder_link.h"
 #include "platform/run_lock.h"
+#include "platform/self.h"
 #include "platform/stackshot.h"
 #include "platform/system_configuration.h"
 #include "platform/system_log.h"
@@ -67,6 +68,7 @@ struct Platform {
   std::shared_ptr<DailyCounters> dailyCounters = std::make_shared<DailyCounters>();
   std::shared_ptr<FlashDisks> flashDisks = std::make_shared<FlashDisks>();
   std::shared_ptr<RecorderLink> recorder = std::make_shared<RecorderLink>();
+  std::shared_ptr<Self> self = std::make_shared<Self>();
   std::shared_ptr<Stackshot> stackshot;
   std::shared_ptr<PurgeableSpace> purgeableSpace;
   std::shared_ptr<LogHeaderFacts> logHeaderFacts;

@@ -49,6 +49,12 @@ struct CommitJob {
   // Once the clock is set, undated changes of this boot are dated by this, and old ones forgotten.
   std::optional<double> wallMinusBoot;
   std::int32_t today = 0;  // with a set clock; nothing is dated later
+  // The time that the recorder ran and that was not committed yet, in nanoseconds since boot.
+  struct Running {
+    std::int64_t from = 0, until = 0;
+    double wallMinusBoot = 0;
+  };
+  std::optional<Running> ran;  // with a set clock
 };
 
 }  // namespace tally

@@ -204,6 +204,29 @@ Status dateUndated(RecordingTransaction& transaction, const std::string& bootId,
   }
 }
 
+// To each day what fell on it; also nothing, which says that the recorder was there.
+Status addRunning(RecordingTransaction& transaction, const CommitJob::Running& ran) {
+  const auto second = [&](std::int64_t bootNanoseconds) {
+    return static_cast<std::int64_t>(ran.wallMinusBoot +
+                                     static_cast<double>(bootNanoseconds) / 1e9);
+  };
+  constexpr std::int64_t kDay = kSecondsPerDay;
+  const std::int64_t end = second(ran.until);
+  std::int64_t from = std::min(second(ran.from), end);
+  do {
+    const std::int64_t day = from / kDay;
+    const std::int64_t until = std::min(end, (day + 1) * kDay);
+    RecordedChange change;
+    change.key = rowOf(OwnMetric::RecorderRan).key;
+    change.value = until - from;
+    if (auto added = transaction.apply(static_cast<std::int32_t>(day), change); !added) {
+      return added;
+    }
+    from = until;
+  } while (from < end);
+  return Done{};
+}
+
 }  // namespace
 
 Committer::~Committer() {
@@ -260,6 +283,14 @@ Status Committer::write(Outcome& outcome) {
         (*transaction)->forgetUndated(job.wallMinusBoot ? std::optional(job.today) : std::nullopt);
     if (!forgotten) return forgotten.error();
     outcome.undatedForgotten += *forgotten;
+  }
+  if (job.ran) {
+    const auto wanted = (*transaction)->isWanted(OwnMetric::RecorderRan, job.today);
+    if (!wanted) return wanted.error();
+    outcome.countsRunning = *wanted;
+    if (*wanted) {
+      if (auto added = addRunning(**transaction, *job.ran); !added) return added;
+    }
   }
   return (*transaction)->commit();
 }

@@ -24,6 +24,7 @@ class Committer {
     Status status = Done{};
     CommitJob job;  // as it was given, also when it failed
     std::uint64_t undatedForgotten = 0;
+    bool countsRunning = false;  // the time that the recorder ran is wanted, and was committed
     // Keys that turned out to be others' on a day; what was recorded of them is refused.
     struct Foreign {
       std::int32_t day;

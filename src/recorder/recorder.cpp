@@ -30,7 +30,7 @@ std::int64_t Recorder::interval() const {
 void Recorder::beginRound(std::int64_t bootNanoseconds, double secondsSince1970) {
   secondsSince1970_ = secondsSince1970;
   if (intake_.keys() == nullptr) {
-    commits_.startedAt = bootNanoseconds;
+    commits_.startedAt = ranCountedUntil_ = bootNanoseconds;
     const auto newest = parts_.store.newestDay();
     if (newest) {
       clock_.setNewestDay(*newest);
@@ -145,7 +145,8 @@ bool Recorder::startCommit() {
   askedToCommit_ = false;
   job.today = now_.day.value_or(0);
   if (now_.day && std::exchange(dateUndated_, false)) job.wallMinusBoot = now_.wallMinusBoot;
-  if (job.batches.empty() && !job.wallMinusBoot) return false;
+  if (job.batches.empty() && !job.wallMinusBoot && !(countsRunning_ && now_.day)) return false;
+  if (now_.day) job.ran = {ranCountedUntil_, now_.bootNanoseconds, now_.wallMinusBoot};
   ++commits_.started;
   committer_.start(std::move(job));
   return true;
@@ -156,6 +157,10 @@ bool Recorder::endCommit() {
   if (!outcome) return false;
   ++commits_.ended;
   if (outcome->status) {
+    if (const auto& ran = outcome->job.ran) {
+      ranCountedUntil_ = ran->until;
+      countsRunning_ = outcome->countsRunning;
+    }
     for (const CommitBatch& batch : outcome->job.batches) intake_.forget(batch);
     std::vector<KeyOwner> foreign;
     for (auto& [day, owner] : outcome->foreign) {
@@ -183,6 +188,15 @@ bool Recorder::endCommit() {
   dateUndated_ = dateUndated_ || outcome->job.wallMinusBoot.has_value();
   intake_.putBack(std::move(outcome->job.batches));
   return false;
+}
+
+bool Recorder::commitRunning() {
+  // Once since the last line: a store that cannot be written must not keep it running.
+  if (!countsRunning_ ||
+      std::exchange(runningCommittedAt_, intake_.lastLineAt()) == intake_.lastLineAt()) {
+    return false;
+  }
+  return startCommit();
 }
 
 bool Recorder::mayEnd() const {
@@ -225,7 +239,7 @@ std::optional<std::int64_t> Recorder::endRound() {
   }
   answerControls();
   if (committed) parts_.onCommitted();
-  if (mayEnd()) parts_.ingress.stop();
+  if (mayEnd() && !commitRunning()) parts_.ingress.stop();
   return nextRound();
 }
 

@@ -62,6 +62,8 @@ class Recorder final : public IngressHandler {
   bool allIsDue() const;
   // False when there was nothing to commit.
   bool startCommit();
+  // One last commit before the recorder ends, of the time that it ran; false when there was none.
+  bool commitRunning();
   // Whether a commit has ended, and well.
   bool endCommit();
   void takeUpControls();
@@ -79,6 +81,9 @@ class Recorder final : public IngressHandler {
   std::vector<Control> controls_;
   std::int64_t retryAt_ = 0;  // after a commit that failed
   bool dateUndated_ = true, terminating_ = false, finalCommitBegan_ = false;
+  // Until when, since boot, the time that it ran is in the store or was not wanted.
+  std::int64_t ranCountedUntil_ = 0, runningCommittedAt_ = -1;
+  bool countsRunning_ = false;
   bool askedToCommit_ = false, askedToForget_ = false;
   CommitFigures commits_;
 };

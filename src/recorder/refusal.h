@@ -1,11 +1,14 @@
 // Why the recorder did not record something, as it counts, shows and reports it.
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
 #include <limits>
 #include <string_view>
+
+#include "platform/tables/own_metrics.h"
 
 namespace tally {
 
@@ -60,6 +63,9 @@ inline constexpr RefusalRow kRefusals[] = {
      "datagrams whose sender the kernel does not name"},
     {"connections", "vellum.tallyd.refused.connections", "more connections than are served"},
 };
+static_assert(std::ranges::all_of(kRefusals, [](const RefusalRow& row) {
+  return row.key.starts_with(kRefusalKeys);
+}));
 inline constexpr std::size_t kRefusalCount = std::size(kRefusals);
 static_assert(kRefusalCount == std::size_t(Refusal::Connections) + 1);
 

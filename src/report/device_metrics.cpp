@@ -8,6 +8,7 @@
 #include "config/saturate.h"
 #include "platform/tables/known_preferences.h"
 #include "platform/tables/measured_metrics.h"
+#include "platform/tables/own_metrics.h"
 
 namespace tally {
 namespace {
@@ -176,6 +177,8 @@ void recordDeviceMetrics(Platform& platform, LogValues& values) {
 }
 
 bool isMeasuredByReport(std::string_view key) {
+  const auto own = std::ranges::find(kOwnMetrics, key, &OwnMetricRow::key);
+  if (own != std::end(kOwnMetrics)) return own->source == OwnSource::Report;
   return std::ranges::find(kMeasuredMetrics, key, &MeasuredMetric::key) !=
          std::end(kMeasuredMetrics);
 }

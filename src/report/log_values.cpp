@@ -12,6 +12,14 @@ const ScalarOptions* LogValues::distributionOptions(std::string_view key) const 
   return whitelist_ ? whitelist_->distributionOptions(key) : nullptr;
 }
 
+OwnMetrics LogValues::admittedOwn() const {
+  OwnMetrics admitted;
+  for (std::size_t i = 0; i < kOwnMetricCount; ++i) {
+    if (scalarOptions(kOwnMetrics[i].key) != nullptr) admitted.add(static_cast<OwnMetric>(i));
+  }
+  return admitted;
+}
+
 void LogValues::addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options) {
   std::vector<RoundingStep>* steps = nullptr;
   if (trace_ != nullptr && trace_->key == key) {

@@ -12,6 +12,7 @@
 #include "config/whitelist_options.h"
 #include "kv/value.h"
 #include "platform/metrics_store.h"
+#include "platform/tables/own_metrics.h"
 
 namespace tally {
 
@@ -33,6 +34,8 @@ class LogValues {
   // Null: the key must not be reported.
   const ScalarOptions* scalarOptions(std::string_view key) const;
   const ScalarOptions* distributionOptions(std::string_view key) const;
+  // The job's own figures that may be reported.
+  OwnMetrics admittedOwn() const;
 
   // Records the value as its options round it.
   void addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options);

@@ -133,6 +133,10 @@ class Documents(unittest.TestCase):
         self.assertGreater(len(refused), 20)
         self.assertEqual({key for key in listed if key.startswith("vellum.tallyd.")}, set(refused))
         self.assertEqual(len(listed), len(set(listed)))
+        own = re.findall(r'\{"(vellum\.[^"]+)", OwnSource', (TOP / "src/platform/tables/own_metrics.h").read_text())
+        example = plistlib.loads((TOP / "examples/own-figures/Whitelist_Nimbus.plist").read_bytes())
+        self.assertEqual(list(example["OwnFigures"]["ScalarKeys"]), own)
+        self.assertFalse(set(own) & set(listed))
         self.assertTrue(all(set(group) == {"ScalarKeys"} for group in whitelist.values()))
 
     def test_every_command_of_the_tool_is_documented(self):

@@ -86,6 +86,8 @@ struct FakeMetricsStore final : MetricsStore {
   std::shared_ptr<Clock> clock;
   FakeRows rows;
   std::map<std::string, std::vector<WearRow>, std::less<>> wears;
+  std::map<std::string, CounterState, std::less<>> counters;
+  int countersRead = 0;
   int batchDepth = 0, historiesOpened = 0;
 
   std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock->secondsSince1970()); }
@@ -94,6 +96,13 @@ struct FakeMetricsStore final : MetricsStore {
     calls->push_back("scalar " + std::string(key) + "=" + std::to_string(value));
     rows.scalars[{TBDaysSince1970(), std::string(key)}] = value;
   }
+  std::vector<CounterState> counterStates() override {
+    ++countersRead;
+    std::vector<CounterState> states;
+    for (const auto& [key, state] : counters) states.push_back(state);
+    return states;
+  }
+  void setCounterState(const CounterState& state) override { counters[state.key] = state; }
   void beginBatch() override { ++batchDepth; }
   void endBatch() override { --batchDepth; }
   std::unique_ptr<HistoryStore> openHistory() override {

@@ -37,6 +37,7 @@ class FakeRecordingStore final : public RecordingStore {
   int commits = 0;
   std::string failure;  // of every commit, unless empty
   bool ownersFail = false;
+  bool wantsRunning = false;  // the time that the recorder ran
 
   Result<std::unique_ptr<RecordingTransaction>> begin() override {
     if (!failure.empty()) return Error{failure};
@@ -89,6 +90,7 @@ class FakeRecordingStore final : public RecordingStore {
       state_.days[day].owners.emplace(owner.key, owner.user);
       return Done{};
     }
+    Result<bool> isWanted(OwnMetric, std::int32_t) override { return store_.wantsRunning; }
     tally::Status addUndated(std::string_view boot, std::int64_t seconds,
                              const RecordedChange& change) override {
       const auto copied = [](auto span) { return std::vector(span.begin(), span.end()); };

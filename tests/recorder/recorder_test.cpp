@@ -436,5 +436,39 @@ TEST_F(RecorderTest, OneThatIsNotUsedEndsIfItIsStartedAgain) {
   EXPECT_TRUE(ingress.stopped);
 }
 
+TEST_F(RecorderTest, TheTimeThatItRanIsCountedOnItsDaysIfItIsWanted) {
+  const auto ran = [&](std::int32_t day) {
+    const auto& scalars = store.state.days[day].scalars;
+    const auto found = scalars.find("vellum.tallyd.time.running");
+    return found != scalars.end() ? found->second : -1;
+  };
+  ingress.activated = true;
+  wall = kDay * 86400.0 + 86400 - 2000;
+  send(kAda, "a:1|c");
+  send(kAda, "", 900);
+  settle();
+  EXPECT_EQ(ran(kDay), -1) << "not wanted";
+  store.wantsRunning = true;
+  send(kAda, "a:1|c", 100);
+  EXPECT_EQ(commit(), "done\n");
+  EXPECT_EQ(ran(kDay), 100);
+  send(kAda, "a:1|c", 950);
+  EXPECT_EQ(commit(), "done\n");
+  EXPECT_EQ(ran(kDay), 1050);
+  store.failure = "full";
+  send(kAda, "b:1|c", 20);
+  EXPECT_NE(commit(), "done\n");
+  store.failure.clear();
+  send(kAda, "", 80);  // past midnight, since when it waits to try again
+  settle();
+  EXPECT_EQ(ran(kDay), 1100);
+  EXPECT_EQ(ran(kDay + 1), 50);
+  // Nobody records any more: it ends, and not before what it ran is committed.
+  send(kAda, "", 1800);
+  settle();
+  EXPECT_TRUE(ingress.stopped);
+  EXPECT_EQ(ran(kDay + 1), 1850);
+}
+
 }  // namespace
 }  // namespace tally

@@ -10,6 +10,7 @@
 #include "document_table.h"
 #include "platform/tables/known_preferences.h"
 #include "platform/tables/measured_metrics.h"
+#include "platform/tables/own_metrics.h"
 
 namespace tally {
 namespace {
@@ -68,6 +69,16 @@ TEST(DocumentTables, MeasuredMetrics) {
                          metric.meaning);
   }
   expectInDocument("device-root.md", table);
+}
+
+TEST(DocumentTables, OwnMetrics) {
+  constexpr const char* kOf[] = {"run to run", "the day", "the day", "the run"};
+  std::string table = "| key | of | unit | meaning |\n|---|---|---|---|\n";
+  for (const OwnMetricRow& row : kOwnMetrics) {
+    table += fmt::format("| `{}` | {} | {} | {} |\n", row.key, kOf[std::size_t(row.source)],
+                         row.unit.empty() ? "-" : row.unit, row.meaning);
+  }
+  expectInDocument("own-figures.md", table);
 }
 
 TEST(DocumentTables, WhitelistOptions) {

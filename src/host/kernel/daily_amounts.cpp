@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "platform/tables/own_metrics.h"
+
 namespace tally {
 
 std::string eventKey(std::string_view key) { return std::string(key).append("/event"); }
@@ -12,6 +14,7 @@ void DailyAmounts::beginSample() {
   read_.clear();
   lastSweep_ = 0;
   for (CounterState& state : store_->counterStates()) {
+    if (isOwnMetric(state.key)) continue;  // of the job itself: it has days of its own
     lastSweep_ = std::max(lastSweep_, state.day);
     std::string key = state.key;
     kept_.emplace(std::move(key), std::move(state));

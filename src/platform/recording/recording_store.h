@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "base/result.h"
+#include "platform/tables/own_metrics.h"
 
 namespace tally {
 
@@ -62,6 +63,9 @@ class RecordingTransaction {
   virtual Result<std::optional<std::int64_t>> owner(std::int32_t day, std::string_view key) = 0;
   // Ignored when the key has an owner on that day.
   virtual Status setOwner(std::int32_t day, const KeyOwner& owner) = 0;
+
+  // Whether the last daily run wanted a figure of the recorder's own.
+  virtual Result<bool> isWanted(OwnMetric, std::int32_t /*today*/) { return false; }
 
   // Keeps a change under a boot (its id) and the seconds since that boot, from which its samples'
   // offsets count.

@@ -2,6 +2,7 @@
 
 #include <nlohmann/json.hpp>
 
+#include "driver/own_figures.h"
 #include "hwreport/hwreport.h"
 #include "tools/frame/output.h"
 
@@ -26,6 +27,7 @@ int keep(const ToolContext& context) {
   if (!turn) return kWrong;  // the lock has said why
   platform.metricsStore->beginBatch();
   const std::size_t kept = readCounters() ? platform.dailyCounters->accumulate() : 0;
+  keepOwnFigures(platform);
   platform.metricsStore->endBatch();
   if (context.json) {
     printJson(context, {{"kept", kept}});

@@ -8,7 +8,7 @@
 #include "base/files/device_root.h"
 #include "base/printable.h"
 #include "host/ingress/recorder_client.h"
-#include "host/system/machine.h"
+#include "host/system/machine/machine.h"
 #include "kv/plist_codec.h"
 #include "recorder/recorder_settings.h"
 #include "recorder/refusal.h"

@@ -67,7 +67,7 @@ class CountedCrashReporting final : public CrashReporting {
 }  // namespace
 
 // Whoever adds a service decides here whether it has effects that a dry run must keep back.
-static_assert(sizeof(Platform) == 27 * sizeof(std::shared_ptr<void>));
+static_assert(sizeof(Platform) == 28 * sizeof(std::shared_ptr<void>));
 
 Platform DryRun::variantOf(const Platform& platform) {
   Platform variant = platform;

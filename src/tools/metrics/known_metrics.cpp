@@ -10,6 +10,7 @@
 #include "host/kernel/channel_table.h"
 #include "hwreport/hwreport.h"
 #include "platform/tables/measured_metrics.h"
+#include "platform/tables/own_metrics.h"
 #include "platform/tables/swept_metrics.h"
 #include "recorder/refusal.h"
 #include "storage/nand_info/figure_texts.h"
@@ -94,6 +95,9 @@ KnownMetrics::KnownMetrics(MetricTable ofDevice) : device_(std::move(ofDevice)) 
   }
   for (const RefusalRow& row : kRecorderCounts) {
     addOwn(system_, row.key, MetricType::Counter, "", row.meaning);
+  }
+  for (const OwnMetricRow& row : kOwnMetrics) {
+    addOwn(system_, row.key, MetricType::Gauge, row.unit, row.meaning);
   }
   system_.finish();
 }

@@ -11,7 +11,7 @@
 
 #include "base/time_text.h"
 #include "host/ingress/recorder_client.h"
-#include "host/system/machine.h"
+#include "host/system/machine/machine.h"
 #include "kv/plist_codec.h"
 #include "platform/recording/ingress.h"
 #include "recorder/refusal.h"

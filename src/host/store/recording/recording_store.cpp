@@ -110,6 +110,18 @@ class SqliteTransaction final : public RecordingTransaction {
                     .run());
   }
 
+  Result<bool> isWanted(OwnMetric metric, std::int32_t today) override {
+    const auto exists = hasTable(database_, kCountersTable);
+    if (!exists) return exists.error();
+    if (!*exists) return false;
+    auto get = database_.prepare("SELECT day FROM counters WHERE key = ?1");
+    if (!get) return get.error();
+    const Step step = get->bind(1, rowOf(metric).key).step();
+    if (step == Step::Failed) return database_.error();
+    return step == Step::Row && get->type(0) == ColumnType::Integer &&
+           isStillWanted(get->integer(0), today);
+  }
+
   Status addUndated(std::string_view boot, std::int64_t secondsSinceBoot,
                     const RecordedChange& change) override {
     if (!isStoreKey(change.key) || !isStoreKey(boot)) return database_.error(kStoreKeyRule);

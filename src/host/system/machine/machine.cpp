@@ -1,4 +1,4 @@
-#include "host/system/machine.h"
+#include "host/system/machine/machine.h"
 
 #include <pwd.h>
 #include <sys/timex.h>
@@ -19,10 +19,11 @@ std::string bootId() {
   return *text;
 }
 
-bool clockIsSynchronised() {
+std::optional<bool> kernelSynchronisation() {
   timex state{};
   const int status = ::adjtimex(&state);
-  return status >= 0 && status != TIME_ERROR && (state.status & STA_UNSYNC) == 0;
+  if (status < 0) return std::nullopt;
+  return status != TIME_ERROR && (state.status & STA_UNSYNC) == 0;
 }
 
 std::optional<std::int64_t> userNumber(std::string_view name) {
