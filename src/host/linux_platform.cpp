@@ -62,19 +62,20 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.clock = clock;
   services.eventLoop = eventLoop;
   services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
-  services.notifications = std::make_shared<BusNotifications>(bus, log);
+  services.notifications = std::make_shared<BusNotifications>(bus, log, root.prefix().empty());
   services.files = std::make_shared<RootedFiles>(root);
   services.runLock = std::make_shared<FileRunLock>(metricsStoreFile(root).directory, log);
   services.preferences = preferences;
   services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
   services.metricsStore = makeSqliteMetricsStore(metricsStoreFile(root), log, clock);
-  services.logSubmission =
-      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences, consent);
   services.crashReporting =
       std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, consent);
   services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);
   services.deviceInformation = std::make_shared<LinuxDeviceInformation>(root, description);
+  services.logSubmission =
+      std::make_shared<SpoolSubmission>(spoolFolder(root), log, clock, preferences, consent,
+                                        services.deviceInformation, services.notifications);
   services.appRegistry = std::make_shared<DesktopAppRegistry>(
       applicationFolders(root, userDataFolder(root)), description);
   services.locale = std::make_shared<LinuxLocale>(

@@ -13,6 +13,7 @@ YESTERDAY = TODAY - 1
 NOTIFIED = "notified of logging status, waiting for activate app info"
 NEVER = "never received requested AAI, so moving along without it"
 LOGGING = (f"{NAME}", "logging")
+SUBMITTED = (f"{NAME}", "submitted")
 ELEMENTS = ["aa{sv}", "1", "5", "bundle_id", "s", "org.example.mail", "version", "s", "7.1", "adam_id", "x",
             "5000000000", "arch", "x", "-2", "uuid", "ay", "16", *map(str, range(0, 256, 17))]
 MAIL = {"bundle": "org.example.mail", "version": "7.1", "adamID": 5000000000, "arch": -2,
@@ -42,7 +43,7 @@ def expected_conversation(test, device):
     test.assertEqual(found.count("Day unchanged since last run"), 1)
     monitor.terminate()
     monitor.wait()
-    test.assertEqual([signal[-2:] for signal in device.signals()], [LOGGING, LOGGING])
+    test.assertEqual([signal[-2:] for signal in device.signals()], [LOGGING, SUBMITTED, LOGGING])
 
 def list_that_never_comes(test, device):
     began = time.monotonic()

@@ -146,6 +146,9 @@ struct FakeNotifications final : Notifications {
   void postSystemNotification(std::string_view name) override {
     calls->push_back("post " + std::string(name));
   }
+  void offerSystemNotification(std::string_view name) override {
+    calls->push_back("offer " + std::string(name));
+  }
 };
 
 // Writes are recorded as "system DOMAIN KEY=VALUE" or "... removed", with " unsynced" at the end.

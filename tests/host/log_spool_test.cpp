@@ -3,6 +3,8 @@
 
 #include <sys/mount.h>
 
+#include <set>
+
 #include "host/temporary_root.h"
 
 namespace tally {
@@ -10,12 +12,14 @@ namespace {
 
 class SpoolTest : public TemporaryRoot {
  protected:
-  SpoolTest() { preferences->calls = std::make_shared<fakes::CallLog>(); }
+  SpoolTest() { notifications->calls = preferences->calls = std::make_shared<fakes::CallLog>(); }
   std::shared_ptr<SubmissionConsent> consent() {
     const auto description = std::make_shared<DeviceDescription>(folder("device"), log);
     return std::make_shared<SubmissionConsent>(root, log, preferences, description);
   }
-  SpoolSubmission spool() { return {folder("spool"), log, clock, preferences, consent()}; }
+  SpoolSubmission spool() {
+    return {folder("spool"), log, clock, preferences, consent(), information, notifications};
+  }
   bool submit(std::string_view body, std::string_view name = "log-test",
               const KvDictionary* options = nullptr, const KvObject* reserved = nullptr) {
     return spool().SMAWriteLogForSubmission("193", name, options, reserved,
@@ -34,6 +38,10 @@ class SpoolTest : public TemporaryRoot {
   }
 
   std::shared_ptr<fakes::FakePreferences> preferences = std::make_shared<fakes::FakePreferences>();
+  std::shared_ptr<fakes::FakeNotifications> notifications =
+      std::make_shared<fakes::FakeNotifications>();
+  std::shared_ptr<fakes::FakeDeviceInformation> information =
+      std::make_shared<fakes::FakeDeviceInformation>();
 };
 
 TEST_F(SpoolTest, KeepsBodyAndInformation) {
@@ -69,14 +77,14 @@ TEST_F(SpoolTest, TheOldestGoWhenABoundIsReached) {
   EXPECT_EQ(names("spool").size(), 6u) << "information of a removed log";
 
   bound("SpoolMaximumLogs", 0);  // no bound: the default
-  bound("SpoolMaximumBytes", 3500);
+  bound("SpoolMaximumBytes", 3700);
   ASSERT_TRUE(submit(std::string(2500, 'f')));
   const auto logs = list();
   EXPECT_EQ(body(logs.back()), std::string(2500, 'f'));
-  EXPECT_EQ(logs.size(), 2u) << "a third log and its information of about 370 bytes are too much";
+  EXPECT_EQ(logs.size(), 2u) << "a third log and its information of about 570 bytes are too much";
   std::uint64_t bytes = 0;
   for (const std::string& name : names("spool")) bytes += *fileSize(at("spool/" + name));
-  EXPECT_LE(bytes, 3500u);
+  EXPECT_LE(bytes, 3700u);
 
   std::filesystem::create_directories(at("spool/0000000000-in-the-way.log"));
   bound("SpoolMaximumLogs", 1);
@@ -138,10 +146,40 @@ TEST_F(SpoolTest, AVolumeIsNotFilledToItsEnd) {
   EXPECT_EQ(names("spool").size(), 2u);
 }
 
+TEST_F(SpoolTest, ANumberIsGivenOnceAndMadeKnown) {
+  ASSERT_TRUE(submit("a", "one"));
+  const std::string path =
+      std::string(kIdentityFolder).substr(1) + "/" + std::string(kIdentityFile);
+  const std::string former = get(path);
+  ASSERT_TRUE(submit("b", "one"));
+  put(path, former);  // as if that run had been killed before it noted the number
+  ASSERT_TRUE(submit("c", "two"));
+  std::filesystem::remove_all(at("spool"));
+  std::filesystem::create_directory(at("spool"));
+  ASSERT_TRUE(submit("d", "one"));
+  std::filesystem::remove(at(path));
+  std::filesystem::create_directory(at(path));  // can be neither read nor replaced
+  ASSERT_TRUE(submit("e", "one"));
+  const auto logs = list();
+  ASSERT_EQ(logs.size(), 2u);
+  EXPECT_TRUE(isDevicePseudonym(logs[0].device)) << logs[0].device;
+  EXPECT_EQ(logs[0].deviceSequence, 3u);
+  EXPECT_EQ(logs[0].systemVersion, information->osVersion);
+  EXPECT_EQ(logs[1].device, "");
+  EXPECT_FALSE(logs[1].deviceSequence);
+  EXPECT_EQ(errors().size(), 1u);
+  EXPECT_EQ(*notifications->calls, fakes::CallLog(5, "offer vellum.tallyd.tallyrun.submitted"));
+}
+
 TEST_F(SpoolTest, SubmittersDoNotClash) {
   runTogether(4, 10, [this](int process, int) { return submit(std::to_string(process)); });
   std::map<std::string, int> counts;
-  for (const auto& entry : list()) ++counts[body(entry)];
+  std::set<std::uint64_t> numbers;
+  for (const auto& entry : list()) {
+    ++counts[body(entry)];
+    numbers.insert(entry.deviceSequence.value_or(0));
+  }
+  EXPECT_TRUE(numbers.size() == 40 && *numbers.begin() == 1 && *numbers.rbegin() == 40);
   EXPECT_EQ(counts, (std::map<std::string, int>{{"0", 10}, {"1", 10}, {"2", 10}, {"3", 10}}));
 }
 

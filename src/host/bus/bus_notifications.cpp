@@ -29,4 +29,8 @@ void BusNotifications::postSystemNotification(std::string_view name) {
   }
 }
 
+void BusNotifications::offerSystemNotification(std::string_view name) {
+  if (isOfMachine_ || connection_->existing() != nullptr) (void)emit(*connection_, name);
+}
+
 }  // namespace tally

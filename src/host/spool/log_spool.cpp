@@ -15,9 +15,6 @@
 namespace tally {
 namespace {
 
-constexpr std::string_view kBodySuffix = ".log";
-constexpr std::string_view kInfoSuffix = ".info.plist";
-constexpr std::size_t kLargestInfo = 1u << 20;
 // Keys of the information that tell a fleet's logs apart.
 constexpr std::string_view kDevicePseudonym = "DevicePseudonym";
 constexpr std::string_view kSequenceNumber = "SequenceNumber";
@@ -50,13 +47,15 @@ class SpoolFile final : public LogFile {
   Status status_ = Done{};
 };
 
-Result<std::string> makeInfo(std::string_view typeCode, std::string_view name,
-                             const KvDictionary* options, double now) {
-  const auto info = KvDictionary::create({{"TypeCode", KvString::create(typeCode)},
-                                          {"Name", KvString::create(name)},
-                                          {"CreationTime", KvDate::create(now)}});
-  if (options != nullptr) info->set("Options", options->copy());
-  return encodeXmlPlist(*info);
+KvRef<KvDictionary> makeInformation(std::string_view typeCode, std::string_view name,
+                                    const KvDictionary* options, double now,
+                                    std::string systemVersion) {
+  auto information = KvDictionary::create({{"TypeCode", KvString::create(typeCode)},
+                                           {"Name", KvString::create(name)},
+                                           {"CreationTime", KvDate::create(now)},
+                                           {kSystemVersion, KvString::create(systemVersion)}});
+  if (options != nullptr) information->set("Options", options->copy());
+  return information;
 }
 
 // Removes what runs that were killed have left: temporary files, and information whose body never
@@ -66,8 +65,9 @@ void sweepLeftOvers(const Directory& folder) {
   if (!names) return;
   for (const std::string& name : *names) {
     bool stale = isTemporaryName(name);
-    if (sequenceOf(name) && name.ends_with(kInfoSuffix)) {
-      const auto body = name.substr(0, name.size() - kInfoSuffix.size()) + std::string(kBodySuffix);
+    if (sequenceOf(name) && name.ends_with(kInformationSuffix)) {
+      const auto body =
+          name.substr(0, name.size() - kInformationSuffix.size()) + std::string(kBodySuffix);
       stale = stale || !std::binary_search(names->begin(), names->end(), body);
     }
     if (stale) (void)folder.remove(name);
@@ -100,6 +100,8 @@ bool SpoolSubmission::SMAWriteLogForSubmission(std::string_view typeCode, std::s
   if (!submitted) {
     log_->fault(faultKind("log submission", submitted.error()), "log submission of {}: {}", name,
                 submitted.error().message);
+  } else {
+    notifications_->offerSystemNotification(kSubmittedNotification);
   }
   return static_cast<bool>(submitted);
 }
@@ -115,21 +117,48 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
   if (!logs) return logs.error();
   const auto sequence = nextSequence(*logs);
   if (!sequence) return sequence.error();
-  const auto info = makeInfo(typeCode, name, options, clock_->secondsSince1970());
-  if (!info) return info.error();
+  const auto information = makeInformation(typeCode, name, options, clock_->secondsSince1970(),
+                                           information_->SMAOSVersion());
+  // A log is worth more than its number.
+  auto identity = identityFile_.load(*folder, *log_);
+  if (identity) {
+    information->set(kDevicePseudonym, KvString::create(identity->device));
+    information->set(kSequenceNumber,
+                     KvNumber::int64(static_cast<std::int64_t>(identity->next(name))));
+  } else {
+    log_->fault("log number", "log submission of {}: no device pseudonym: {}", name,
+                identity.error().message);
+  }
 
   const FolderBounds bounds = folderBounds(*preferences_);
   const std::string stem = fmt::format("{}{}", sequencePrefix(*sequence), name);
-  if (auto written = writeBody(*folder, stem, *info, writer, bounds.maximumBytes); !written) {
-    (void)folder->remove(stem + std::string(kBodySuffix));
-    (void)folder->remove(stem + std::string(kInfoSuffix));
+  if (auto written = commit(*folder, *information, stem, writer, bounds.maximumBytes); !written) {
     return written;
   }
-  // The log is safe; that older ones cannot be removed is not its failure.
+  // The log is safe. Should its number not be noted now, it is found beside the log the next time.
+  if (identity) {
+    identity->last.insert_or_assign(std::string(name), identity->next(name));
+    if (const auto noted = identityFile_.write(*identity); !noted) {
+      log_->fault("log number", "log submission: {}", noted.error().message);
+    }
+  }
   if (const auto evicted = evictOldest(*folder, bounds, *sequence); !evicted) {
     log_->fault("log submission: older logs stay", "log submission: {}", evicted.error().message);
   }
   return Done{};
+}
+
+Status SpoolSubmission::commit(const Directory& folder, const KvDictionary& information,
+                               const std::string& stem, const Writer& writer,
+                               std::uint64_t maximumBytes) {
+  const auto text = encodeXmlPlist(information);
+  if (!text) return text.error();
+  auto written = writeBody(folder, stem, *text, writer, maximumBytes);
+  if (!written) {
+    (void)folder.remove(stem + std::string(kBodySuffix));
+    (void)folder.remove(stem + std::string(kInformationSuffix));
+  }
+  return written;
 }
 
 // The information gets its name before the body does, so that no body is ever without.
@@ -142,7 +171,7 @@ Status SpoolSubmission::writeBody(const Directory& folder, const std::string& st
   writer(file);
   if (!file.status()) return file.status();
   if (auto reserve = checkReserve(folder, info.size()); !reserve) return reserve;
-  const std::string infoName = stem + std::string(kInfoSuffix);
+  const std::string infoName = stem + std::string(kInformationSuffix);
   if (auto written = writeFileAtomically(folder, infoName, info); !written) return written;
   return body->commit();
 }
@@ -165,28 +194,43 @@ void readLogInformation(std::string_view bytes, SpooledLog& log) {
   }
 }
 
-Result<std::vector<SpooledLog>> SpoolReader::list() const {
-  const auto folder = folder_.open();
-  if (!folder && folder.error().systemError == ENOENT) return std::vector<SpooledLog>();
-  if (!folder) return folder.error();
-  const auto logs = listSequenced(*folder);
+Result<std::vector<SpooledLog>> listSpooled(const Directory& folder, ListedLogs which) {
+  const auto logs = listSequenced(folder);
   if (!logs) return logs.error();
   std::vector<SpooledLog> spooled;
   for (const SequencedLog& log : *logs) {
-    const auto body = std::find_if(log.names.begin(), log.names.end(), [](const std::string& name) {
-      return name.ends_with(kBodySuffix);
-    });
+    std::string_view held;
+    const auto isBody = [&](const std::string& name) {
+      return name.ends_with(std::string(kBodySuffix).append(held));
+    };
+    auto body = std::ranges::find_if(log.names, isBody);
+    if (body == log.names.end() && which == ListedLogs::HeldToo) {
+      held = kHeldSuffix;
+      body = std::ranges::find_if(log.names, isBody);
+    }
     if (body == log.names.end()) continue;
     SpooledLog& entry = spooled.emplace_back();
     entry.sequence = log.sequence;
     entry.fileName = *body;
-    const auto identity = folder->identity(*body);
+    const auto identity = folder.identity(*body);
     entry.bytes = identity ? identity->size : 0;
-    const auto stem = body->substr(0, body->size() - kBodySuffix.size());
-    const auto information = folder->readFile(stem + std::string(kInfoSuffix), kLargestInfo);
-    if (information) readLogInformation(*information, entry);
+    const auto stem = body->substr(0, body->size() - kBodySuffix.size() - held.size());
+    const auto information =
+        folder.readFile(stem + std::string(kInformationSuffix).append(held), kLargestInformation);
+    if (information) {
+      readLogInformation(*information, entry);
+    } else {
+      entry.fault = information.error();
+    }
   }
   return spooled;
+}
+
+Result<std::vector<SpooledLog>> SpoolReader::list() const {
+  const auto folder = folder_.open();
+  if (!folder && folder.error().systemError == ENOENT) return std::vector<SpooledLog>();
+  if (!folder) return folder.error();
+  return listSpooled(*folder);
 }
 
 Result<std::string> SpoolReader::readBody(const SpooledLog& log, std::size_t limit) const {

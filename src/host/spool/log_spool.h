@@ -11,8 +11,11 @@
 #include "base/files/device_root.h"
 #include "host/spool/sequence_folder.h"
 #include "host/spool/submission_consent.h"
+#include "host/spool/submission_identity.h"
 #include "platform/clock.h"
+#include "platform/device_information.h"
 #include "platform/log_submission.h"
+#include "platform/notifications.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 
@@ -22,6 +25,9 @@ namespace tally {
 // "SpoolMaximumBytes" where they are above 0, else the defaults.
 FolderBounds folderBounds(Preferences& preferences);
 
+// Posted when a log is in the spool.
+constexpr std::string_view kSubmittedNotification = "vellum.tallyd.tallyrun.submitted";
+
 // Submits logs into a spool folder. A log is in the spool once its body has its final name, which
 // is the last step; a killed run leaves only files that are ignored, which the next submission
 // removes. Submissions of several processes are serialised. If the user forbids submission, a log
@@ -30,12 +36,17 @@ class SpoolSubmission final : public LogSubmission {
  public:
   SpoolSubmission(DeviceDirectory folder, std::shared_ptr<SystemLog> log,
                   std::shared_ptr<Clock> clock, std::shared_ptr<Preferences> preferences,
-                  std::shared_ptr<SubmissionConsent> consent)
+                  std::shared_ptr<SubmissionConsent> consent,
+                  std::shared_ptr<DeviceInformation> information,
+                  std::shared_ptr<Notifications> notifications)
       : folder_(std::move(folder)),
+        identityFile_(folder_.root()),
         log_(std::move(log)),
         clock_(std::move(clock)),
         preferences_(std::move(preferences)),
-        consent_(std::move(consent)) {}
+        consent_(std::move(consent)),
+        information_(std::move(information)),
+        notifications_(std::move(notifications)) {}
   bool SMAWriteLogForSubmission(std::string_view typeCode, std::string_view name,
                                 const KvDictionary* options, const KvObject* reserved,
                                 const Writer& writer) override;
@@ -43,14 +54,19 @@ class SpoolSubmission final : public LogSubmission {
  private:
   Status submit(std::string_view typeCode, std::string_view name, const KvDictionary* options,
                 const Writer& writer);
+  Status commit(const Directory& folder, const KvDictionary& information, const std::string& stem,
+                const Writer& writer, std::uint64_t maximumBytes);
   static Status writeBody(const Directory& folder, const std::string& stem, const std::string& info,
                           const Writer& writer, std::uint64_t maximumBytes);
 
   DeviceDirectory folder_;
+  IdentityFile identityFile_;
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<Clock> clock_;
   std::shared_ptr<Preferences> preferences_;
   std::shared_ptr<SubmissionConsent> consent_;
+  std::shared_ptr<DeviceInformation> information_;
+  std::shared_ptr<Notifications> notifications_;
   bool submitting_ = false;
 };
 
@@ -66,10 +82,22 @@ struct SpooledLog {
   // version of the system that submitted it.
   std::string device, systemVersion;
   std::optional<std::uint64_t> deviceSequence;
+  std::optional<Error> fault;  // why its information cannot be read
 };
 
 // What a log's information says, in the fields that it is for; malformed information says nothing.
 void readLogInformation(std::string_view bytes, SpooledLog& log);
+
+// Names of a log's files: these after the same stem.
+constexpr std::string_view kBodySuffix = ".log";
+constexpr std::string_view kInformationSuffix = ".info.plist";
+constexpr std::size_t kLargestInformation = 1u << 20;
+
+// The logs of a folder, oldest first. Those that are held back are listed only if they are asked
+// for.
+enum class ListedLogs { Waiting, HeldToo };
+Result<std::vector<SpooledLog>> listSpooled(const Directory& folder,
+                                            ListedLogs which = ListedLogs::Waiting);
 
 class SpoolReader {
  public:

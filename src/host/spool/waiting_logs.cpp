@@ -6,11 +6,10 @@
 #include "base/files/file_lock.h"
 #include "base/files/temporary_file.h"
 #include "host/spool/sequence_folder.h"
+#include "host/spool/submission_identity.h"
 
 namespace tally {
 namespace {
-
-constexpr std::string_view kHeldSuffix = ".held";
 
 bool isWaiting(std::string_view name) { return sequenceOf(name) || isTemporaryName(name); }
 
@@ -54,6 +53,20 @@ Status handleFolder(const Directory& directory, std::string_view lockName, Waiti
   return status;
 }
 
+// A log that is being submitted writes its number first.
+Status eraseIdentity(const DeviceRoot& root) {
+  const IdentityFile file(root);
+  if (const auto identity = file.read(); !identity && identity.error().systemError == ENOENT) {
+    return Done{};
+  }
+  const auto spool = kSubmittedLogs.on(root).open();
+  if (!spool && spool.error().systemError != ENOENT) return spool.error();
+  std::optional<Result<FileLock>> lock;
+  if (spool) lock = FileLock::acquire(*spool, kSubmittedLogs.lock);
+  if (lock && !*lock) return lock->error();
+  return file.erase();
+}
+
 }  // namespace
 
 WaitingFiles countWaiting(const DeviceRoot& root) {
@@ -81,6 +94,9 @@ Result<std::uint64_t> handleWaiting(const DeviceRoot& root, WaitingAction action
     const Status handled = directory ? handleFolder(*directory, folder.lock, action, count)
                                      : Status(directory.error());
     if (!handled) status = handled;
+  }
+  if (action == WaitingAction::Erase) {
+    if (const Status erased = eraseIdentity(root); !erased) status = erased;
   }
   if (!status) return status.error();
   return count;
