@@ -109,7 +109,7 @@ int __real_ftruncate(int, off_t);
 int __real_flock(int, int);
 int __real_fstat(int, struct stat*);
 int __real_fstatat(int, const char*, struct stat*, int);
-int __real_renameat(int, const char*, int, const char*);
+int __real_renameat2(int, const char*, int, const char*, unsigned);
 int __real_unlinkat(int, const char*, int);
 int __real_mkdirat(int, const char*, mode_t);
 DIR* __real_fdopendir(int);
@@ -208,11 +208,15 @@ int __wrap_fstatat(int directory, const char* name, struct stat* status, int fla
   return __real_fstatat(directory, name, status, flags);
 }
 
-int __wrap_renameat(int from, const char* name, int to, const char* newName) {
+int __wrap_renameat2(int from, const char* name, int to, const char* newName, unsigned flags) {
   const std::string path = pathAt(to, newName);
   if (fails("rename to", path, kNoSpace | kInputOutput | kDenied | kLastCall)) return -1;
   const NameChange change(NameChange::Kind::Rename, pathAt(from, name), path);
-  return change.done(__real_renameat(from, name, to, newName));
+  return change.done(__real_renameat2(from, name, to, newName, flags));
+}
+
+int __wrap_renameat(int from, const char* name, int to, const char* newName) {
+  return __wrap_renameat2(from, name, to, newName, 0);
 }
 
 int __wrap_unlinkat(int directory, const char* name, int flags) {

@@ -11,6 +11,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 #include "base/files/file.h"
@@ -291,6 +292,16 @@ Status Directory::rename(std::string_view from, std::string_view to) const {
     return Done{};
   }
   return systemError("cannot rename", pathOf(from));
+}
+
+Status Directory::renameToNew(std::string_view from, std::string_view to) const {
+  if (::renameat2(descriptor(), std::string(from).c_str(), descriptor(), std::string(to).c_str(),
+                  RENAME_NOREPLACE) == 0) {
+    return Done{};
+  }
+  if (errno != EINVAL && errno != ENOSYS) return systemError("cannot make", pathOf(to));
+  if (identity(to)) return systemError("cannot make", pathOf(to), EEXIST);
+  return rename(from, to);
 }
 
 Status Directory::sync() const {

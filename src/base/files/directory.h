@@ -77,6 +77,9 @@ class Directory {
   // Removes a directory with everything in it; no link is followed.
   Status removeTree(std::string_view name) const;
   Status rename(std::string_view from, std::string_view to) const;
+  // The same, but never replaces a file (EEXIST). A file system that cannot promise that is asked
+  // before, so another writer may still come between.
+  Status renameToNew(std::string_view from, std::string_view to) const;
   // Makes creations, renames and removals in this directory survive a power cut.
   Status sync() const;
   // The same for everything on its volume.
