@@ -11,6 +11,8 @@ namespace tally {
 
 std::string programName() { return ::program_invocation_short_name; }
 
+bool isRoot() { return ::geteuid() == 0; }
+
 int processID() { return ::getpid(); }
 
 void surviveFailedWrites() {

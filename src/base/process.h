@@ -11,6 +11,8 @@ namespace tally {
 // The program's name without its folder.
 std::string programName();
 int processID();
+// Whether it runs with root's rights to files.
+bool isRoot();
 // From now on, writing to a closed pipe or beyond the process's file-size limit makes the call fail
 // instead of ending the process. For programs only.
 void surviveFailedWrites();

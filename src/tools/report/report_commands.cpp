@@ -16,6 +16,7 @@
 #include "tools/frame/standard_input.h"
 #include "tools/frame/table.h"
 #include "tools/report/daily_log.h"
+#include "tools/report/handover_commands.h"
 #include "tools/report/log_diff.h"
 #include "tools/report/log_view.h"
 #include "tools/report/preview.h"
@@ -279,6 +280,7 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
           "Its number or name, a file, or - for standard input; the last daily log by default");
 
   addExportCommand(family, context);
+  addHandoverCommands(family, context);
 }
 
 }  // namespace tally::tools
