@@ -56,15 +56,19 @@ class Package(unittest.TestCase):
             "bin/tallyctl", "lib/systemd/system/tallyrun.service", "lib/systemd/system/tallyrun-day.timer",
             "lib/systemd/system/tallyrun-counters.service",
             "bin/tallyd", "lib/systemd/system/tallyd.service", "lib/systemd/system/tallyd-udp.socket",
+            *(f"lib/systemd/system/tallyrun-{unit}" for unit in (
+                "submitted.path", "submitted.service", "upload.path", "upload.service", "upload.timer")),
             "libexec/tallyrun-nvme-health", "lib/systemd/system/tallyrun-nvme-health.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
             "share/tallyrun/Whitelist_Nimbus.plist", "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",
             "share/doc/tallyrun/docs/security.md", "share/doc/tallyrun/SECURITY.md"))]
         self.assertLessEqual(set(wanted), self.files(root))
-        # UDP senders are anonymous: it is the administrator's choice.
+        # UDP senders are anonymous, and a hand-over empties the spool: both are the administrator's choice.
         enabled = {path for path in self.files(root) if path.startswith(f"{WANTED}/sockets.target.wants/")}
         self.assertEqual(enabled, SOCKET_LINKS)
+        self.assertFalse((root / WANTED / "paths.target.wants").exists())
+        self.assertEqual((root / "var/spool/tallyrun").stat().st_mode & 0o7777, 0o2770)
         self.assertEqual(os.readlink(root / TIMER_LINK), "/usr/lib/systemd/system/tallyrun-day.timer")
         user = re.search(r"^mobile:x:(\d+):", (root / "etc/passwd").read_text(), re.M)
         self.assertEqual((root / "var/mobile").stat().st_uid, int(user[1]))
