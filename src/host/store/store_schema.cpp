@@ -172,6 +172,13 @@ Status makeTables(Database& database) {
 
 }  // namespace
 
+std::vector<std::string_view> storeTables() {
+  std::vector<std::string_view> names;
+  for (const TableDefinition& table : kTables) names.push_back(table.name);
+  for (const TableDefinition& table : kOptionalTables) names.push_back(table.name);
+  return names;
+}
+
 Result<bool> hasTable(Database& database, std::string_view name) {
   auto query = database.prepare("SELECT 1 FROM sqlite_schema WHERE type = 'table' AND name = ?");
   if (!query) return query.error();

@@ -4,6 +4,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "base/files/device_root.h"
 #include "host/store/sqlite_database.h"
@@ -33,6 +34,8 @@ constexpr std::string_view kCountersTable = "counters", kWearTable = "wear";
 // key, and changes that wait for a day.
 constexpr std::string_view kArrivalsTable = "arrivals", kPackedTable = "packed",
                            kOwnersTable = "owners", kUndatedTable = "undated";
+// Every table that a store may have, but for SQLite's own.
+std::vector<std::string_view> storeTables();
 Result<bool> hasTable(Database& database, std::string_view name);
 // Makes one of them if it is missing. REQUIRES: a transaction of a writer.
 Status makeOptionalTable(Database& database, std::string_view name);
