@@ -169,6 +169,7 @@ class Hooks(HandingOver):
                 make()
                 status, said = self.run_hooks()
                 self.assertEqual((status, self.said(), self.waiting()), (1, "", 2), said)
+                self.assertRegex(self.device.tool("doctor", status=1), "hooks +.*(no hook is run|symbolic)")
 
     def test_a_hook_that_hangs_is_killed_with_its_children(self):
         self.hook("hang", f"sleep 600 & echo $! >> {self.notes}/children; sleep 600")

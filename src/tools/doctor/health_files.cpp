@@ -10,6 +10,7 @@
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"
 #include "host/spool/log_spool.h"
+#include "host/spool/submitted_hooks.h"
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
 #include "host/system/device_information.h"
@@ -215,6 +216,16 @@ void examineSpool(const ToolContext& context, HealthChecks& checks) {
   }
 }
 
+// Only a device that has them has a line.
+void examineHooks(const DeviceRoot& root, HealthChecks& checks) {
+  constexpr const char* kSubject = "hooks";
+  if (!root.identity(kHooksFolder)) return;
+  const auto hooks = openHooks(root);
+  checks.push_back(hooks ? HealthCheck{Health::Ok, kSubject,
+                                       counted(hooks->size(), "hook") + " for submitted logs"}
+                         : HealthCheck{Health::Wrong, kSubject, hooks.error().message});
+}
+
 }  // namespace
 
 void examineFiles(const ToolContext& context, HealthChecks& checks) {
@@ -225,6 +236,7 @@ void examineFiles(const ToolContext& context, HealthChecks& checks) {
   examineWhitelist(context, checks);
   examineStore(*context.platform, root, checks);
   examineSpool(context, checks);
+  examineHooks(root, checks);
 }
 
 }  // namespace tally::tools
