@@ -17,6 +17,8 @@ namespace {
 
 constexpr std::string_view kJournalFile = ".handover.plist";
 constexpr std::size_t kLargestJournal = 1u << 16;
+// Of a log that may have been held back meanwhile.
+constexpr std::string_view kSuffixes[] = {"", kHeldSuffix};
 
 std::string informationOf(std::string_view stem) {
   return std::string(stem).append(kInformationSuffix);
@@ -51,7 +53,9 @@ bool contains(const std::vector<std::string>& names, const std::string& name) {
 
 Status removeLog(const Directory& spool, const std::string& stem) {
   for (const std::string& name : {bodyOf(stem), informationOf(stem)}) {
-    if (auto removed = spool.remove(name); !removed) return removed;
+    for (const std::string_view suffix : kSuffixes) {
+      if (auto removed = spool.remove(name + std::string(suffix)); !removed) return removed;
+    }
   }
   return spool.sync();
 }
@@ -77,15 +81,21 @@ struct LogHandover::Journal {
   std::string temporaryBody() const { return mark + ".tmp~log"; }
   std::string temporaryInformation() const { return mark + ".tmp~info"; }
 
-  // Whether the log is still in the spool: a later one may have its name.
+  // Whether the log is still in the spool, perhaps held back: a later one may have its name.
   Result<bool> isIn(const Directory& spool) const {
     const auto names = spool.list();
     if (!names) return names.error();
-    if (stem.empty() || !contains(*names, bodyOf(stem))) return false;
-    const auto found = spool.identity(bodyOf(stem));
-    if (!found) return Error{spool.pathOf(bodyOf(stem)) + " cannot be examined"};
-    return static_cast<std::int64_t>(found->inode) == inode &&
-           found->modifiedNanoseconds == modified;
+    for (const std::string_view suffix : kSuffixes) {
+      const std::string name = bodyOf(stem).append(suffix);
+      if (stem.empty() || !contains(*names, name)) continue;
+      const auto found = spool.identity(name);
+      if (!found) return Error{spool.pathOf(name) + " cannot be examined"};
+      if (static_cast<std::int64_t>(found->inode) == inode &&
+          found->modifiedNanoseconds == modified) {
+        return true;
+      }
+    }
+    return false;
   }
 
   Status write(const Directory& spool) const {
