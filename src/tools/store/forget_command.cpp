@@ -23,11 +23,12 @@ struct ForgetArguments {
 };
 
 bool isConfirmed(const ToolContext& context, const WaitingFiles& waiting) {
-  print(context.out,
-        fmt::format("This erases the metrics store, {} ({}) that have not been uploaded, and what "
-                    "is remembered\nof processed days, on the device {}. It cannot be undone. Type "
-                    "\"yes\" to go on: ",
-                    counted(waiting.files, "file"), byteText(waiting.bytes), context.root));
+  print(
+      context.out,
+      fmt::format("This erases the metrics store, {} ({}) that have not been uploaded, the "
+                  "pseudonym of\nsubmitted logs, and what is remembered of processed days, on the "
+                  "device {}. It cannot be undone. Type \"yes\" to go on: ",
+                  counted(waiting.files, "file"), byteText(waiting.bytes), context.root));
   std::fflush(context.out);
   std::string answer;
   return std::getline(std::cin, answer) && answer == "yes";
