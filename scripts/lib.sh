@@ -18,8 +18,7 @@ fi
 
 # What tests use if it is installed: without it they are skipped, and say so.
 optional_test_packages=(
-  rustc gccgo
-  python3-jsonschema
+  rustc gccgo curl
   netcat-openbsd socat python3-statsd python3-aiodogstatsd libnet-statsd-perl ruby-statsd npm
 )
 # The same from npm, below build/npm-clients.

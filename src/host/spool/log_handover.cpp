@@ -23,7 +23,7 @@ constexpr std::string_view kSuffixes[] = {"", kHeldSuffix};
 std::string informationOf(std::string_view stem) {
   return std::string(stem).append(kInformationSuffix);
 }
-std::string_view stemOf(const SpooledLog& log) {
+std::string_view stemOfLog(const SpooledLog& log) {
   return std::string_view(log.fileName).substr(0, log.fileName.size() - kBodySuffix.size());
 }
 std::string bodyOf(std::string_view stem) { return std::string(stem).append(kBodySuffix); }
@@ -267,7 +267,7 @@ Status LogHandover::moveAll(const Directory& spool, const std::vector<SpooledLog
       return Error{target.directory.path() + " is full"};
     }
     const Copy copy{spool.readFile(log.fileName, log.bytes),
-                    spool.readFile(informationOf(stemOf(log)), kLargestInformation)};
+                    spool.readFile(informationOf(stemOfLog(log)), kLargestInformation)};
     const bool isAlone = !copy.information && copy.information.error().systemError == ENOENT;
     if (!copy.body || (!copy.information && !isAlone)) {
       taken.faults.push_back((copy.body ? copy.information : copy.body).error().message);
@@ -300,7 +300,7 @@ Status LogHandover::moveOne(const Directory& spool, const SpooledLog& log, const
   }
   if (auto synced = to.sync(); !synced) return synced;
 
-  journal.stem = stemOf(log);
+  journal.stem = stemOfLog(log);
   journal.newStem = sequencePrefix(target.nextNumber++) +
                     journal.stem.substr(sequencePrefix(log.sequence).size());
   journal.inode = static_cast<std::int64_t>(identity->inode);

@@ -17,7 +17,7 @@ namespace tally {
 namespace {
 
 constexpr std::size_t kPseudonymBytes = 16;
-constexpr std::size_t kLargestFile = 1u << 20;
+constexpr std::size_t kLargestIdentity = 1u << 20;
 constexpr std::string_view kPseudonym = "DevicePseudonym";
 constexpr std::string_view kLastNumbers = "LastSequenceNumbers";
 constexpr std::uint64_t kLargestNumber = std::numeric_limits<std::int64_t>::max() - 1;
@@ -84,7 +84,7 @@ std::uint64_t SubmissionIdentity::next(std::string_view name) const {
 }
 
 Result<SubmissionIdentity> IdentityFile::read() const {
-  const auto bytes = folder_.readFile(kIdentityFile, kLargestFile);
+  const auto bytes = folder_.readFile(kIdentityFile, kLargestIdentity);
   if (!bytes) return bytes.error();
   auto identity = parseIdentity(*bytes);
   if (!identity) return Error{folder_.text() + "/" + std::string(kIdentityFile) + " is damaged"};
@@ -142,13 +142,19 @@ Status IdentityFile::erase() const {
   return folder->sync();
 }
 
+std::vector<std::string> IdentityFile::leftOvers() const {
+  auto names = folder_.list();
+  if (!names) return {};
+  std::erase_if(*names, [](const std::string& name) {
+    return !isTemporaryName(name) || !name.starts_with(kIdentityFile);
+  });
+  return *std::move(names);
+}
+
 void IdentityFile::sweep() const {
   const auto folder = folder_.open();
-  const auto names = folder ? folder->list() : Result<std::vector<std::string>>(folder.error());
-  if (!names) return;
-  for (const std::string& name : *names) {
-    if (isTemporaryName(name) && name.starts_with(kIdentityFile)) (void)folder->remove(name);
-  }
+  if (!folder) return;
+  for (const std::string& name : leftOvers()) (void)folder->remove(name);
 }
 
 }  // namespace tally

@@ -5,6 +5,7 @@
 #include <map>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "base/files/device_root.h"
 #include "platform/system_log.h"
@@ -29,7 +30,7 @@ Result<std::string> randomHex();
 // Whether a text has the form of a pseudonym.
 bool isDevicePseudonym(std::string_view text);
 
-// The file that keeps it. All calls but read() REQUIRE the lock of the spool.
+// The file that keeps it. All calls but read() and hasLeftOvers() REQUIRE the lock of the spool.
 //
 // A log's number is written here after the log's commit. If a run dies between the two, the number
 // is found beside the log: load() looks there, and must be called before a log is removed.
@@ -47,10 +48,12 @@ class IdentityFile {
   Result<SubmissionIdentity> reset() const;
   // The next log begins with a new one.
   Status erase() const;
+  // What killed or failing runs left beside it.
+  bool hasLeftOvers() const { return !leftOvers().empty(); }
+  void sweep() const;
 
  private:
-  // Removes what killed runs left.
-  void sweep() const;
+  std::vector<std::string> leftOvers() const;
   DeviceDirectory folder_;
 };
 

@@ -53,18 +53,23 @@ Status handleFolder(const Directory& directory, std::string_view lockName, Waiti
   return status;
 }
 
-// A log that is being submitted writes its number first.
-Status eraseIdentity(const DeviceRoot& root) {
+// Every run comes here, also one that submits nothing, so what a failing one left is removed here.
+Status tidyIdentity(const DeviceRoot& root, WaitingAction action) {
   const IdentityFile file(root);
-  if (const auto identity = file.read(); !identity && identity.error().systemError == ENOENT) {
-    return Done{};
+  bool erases = false;
+  if (action == WaitingAction::Erase) {
+    const auto identity = file.read();
+    erases = identity || identity.error().systemError != ENOENT;
   }
+  if (!erases && !file.hasLeftOvers()) return Done{};
+  // A log that is being submitted writes its number first.
   const auto spool = kSubmittedLogs.on(root).open();
   if (!spool && spool.error().systemError != ENOENT) return spool.error();
   std::optional<Result<FileLock>> lock;
   if (spool) lock = FileLock::acquire(*spool, kSubmittedLogs.lock);
   if (lock && !*lock) return lock->error();
-  return file.erase();
+  file.sweep();
+  return erases ? file.erase() : Done{};
 }
 
 }  // namespace
@@ -95,9 +100,7 @@ Result<std::uint64_t> handleWaiting(const DeviceRoot& root, WaitingAction action
                                      : Status(directory.error());
     if (!handled) status = handled;
   }
-  if (action == WaitingAction::Erase) {
-    if (const Status erased = eraseIdentity(root); !erased) status = erased;
-  }
+  if (const Status tidied = tidyIdentity(root, action); !tidied) status = tidied;
   if (!status) return status.error();
   return count;
 }
