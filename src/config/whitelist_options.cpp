@@ -32,10 +32,20 @@ std::optional<SettingRemark> remarkOnInterval(std::uint32_t interval) {
   return std::nullopt;
 }
 
+// Digits before the point; one less for powers of ten. REQUIRES: value is not 0.
+int digitsOf(std::int64_t value) {
+  return static_cast<int>(std::ceil(std::log10(std::fabs(static_cast<double>(value)))));
+}
+
+// The step changes with the number of digits: 50 becomes 100 without a figure, and 10 stays 10.
+int pieceOfFigures(std::int64_t value) {
+  if (value == 0) return 0;
+  return value > 0 ? 1 + digitsOf(value) : -1 - digitsOf(value);
+}
+
 std::int64_t roundToFigures(std::int64_t value, std::uint32_t figures) {
   if (value == 0) return 0;
-  const double digits = std::ceil(std::log10(std::fabs(static_cast<double>(value))));
-  const std::int64_t shift = static_cast<std::int64_t>(digits) - std::int64_t{figures};
+  const std::int64_t shift = digitsOf(value) - std::int64_t{figures};
   if (shift < 1) return value;
   // At most 19: these are the powers of ten that a signed 64-bit integer can reach, all exact.
   static constexpr double kPowers[] = {1e0,  1e1,  1e2,  1e3,  1e4,  1e5,  1e6,  1e7,  1e8,  1e9,
@@ -75,10 +85,10 @@ std::optional<SettingRemark> remarkOnFigures(std::uint32_t figures) {
 
 constexpr WhitelistOption kOptions[] = {
     {"bucket_interval", OptionValue::WholeNumber,
-     ScalarRounding{roundToMultiple, gridOfMultiples, remarkOnInterval},
+     ScalarRounding{roundToMultiple, gridOfMultiples, remarkOnInterval, nullptr},
      "a scalar is rounded to a multiple of this number, before `sig_fig` applies"},
     {"sig_fig", OptionValue::WholeNumber,
-     ScalarRounding{roundToFigures, gridOfFigures, remarkOnFigures},
+     ScalarRounding{roundToFigures, gridOfFigures, remarkOnFigures, pieceOfFigures},
      "a scalar is rounded to this many significant figures"},
     {kOptionIntervals, OptionValue::Numbers, OptionEffect::onDistributions(),
      "a distribution gets a histogram with these upper bounds"},

@@ -35,11 +35,14 @@ struct RoundingGrid {
   std::int64_t last;
 };
 
-// A step of the rounding of scalars. The remark is empty for an ordinary setting.
+// A step of the rounding of scalars. The remark is empty for an ordinary setting. The step is
+// monotonic over the values of one piece, whose number never falls while the values rise; without a
+// function for it, over all values.
 struct ScalarRounding {
   std::int64_t (*round)(std::int64_t value, std::uint32_t setting);
   RoundingGrid (*grid)(std::int64_t value, std::uint32_t setting);
   std::optional<SettingRemark> (*remark)(std::uint32_t setting);
+  int (*piece)(std::int64_t value);
 };
 
 // What an option does. Has no default, so that a row without an effect does not compile.
