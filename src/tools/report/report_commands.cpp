@@ -15,6 +15,7 @@
 #include "tools/frame/day_argument.h"
 #include "tools/frame/standard_input.h"
 #include "tools/frame/table.h"
+#include "tools/page/page_command.h"
 #include "tools/report/daily_log.h"
 #include "tools/report/handover_commands.h"
 #include "tools/report/log_diff.h"
@@ -281,6 +282,7 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
 
   addExportCommand(family, context);
   addHandoverCommands(family, context);
+  addPageCommand(family, context);
 }
 
 }  // namespace tally::tools
