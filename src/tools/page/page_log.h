@@ -2,16 +2,16 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "config/whitelist.h"
 #include "host/spool/log_spool.h"
 #include "tools/metrics/known_metrics.h"
+#include "tools/privacy/exposure.h"
 #include "tools/report/daily_log.h"
+#include "tools/whitelist/whitelist_verdict.h"
 
 namespace tally::tools {
 
@@ -20,8 +20,8 @@ struct PageSources {
   explicit PageSources(const ToolContext& tool);
   const ToolContext& context;
   KnownMetrics metrics;
-  WhitelistFile file;
-  std::unique_ptr<Whitelist> whitelist;  // null when the file cannot be used
+  WhitelistJudge judge;
+  PrivacyReport privacy;
   bool submissionAllowed = true;
 };
 

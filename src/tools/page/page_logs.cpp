@@ -35,9 +35,9 @@ bool hasValues(MetricsStore& store, std::int32_t day) {
 }
 
 std::string whyNoLog(const PageSources& sources, std::int32_t day) {
-  if (!sources.whitelist) {
-    return "No log would be submitted: the whitelist cannot be used (" + sources.file.fault +
-           "), and without one nothing leaves.";
+  if (sources.judge.index() == nullptr) {
+    return "No log would be submitted: the whitelist cannot be used (" +
+           sources.judge.file().fault + "), and without one nothing leaves.";
   }
   if (!hasValues(*sources.context.platform->metricsStore, day)) {
     return "No log would be submitted: the store has no value of that day.";

@@ -31,12 +31,30 @@ function admissionDetails(block, entry, cell) {
   cell.append(text, switchWords([line, note]));
 }
 
-// [bits, range seen in words, notes] of what a key can reveal; null where nothing was measured.
-function revealDetails(reveal, cell) {
+// What was measured of a key over the days of the store; null where nothing was.
+function revealOf(block, number) {
+  if (number === undefined || number < 0) return null;
+  const [bits, days, range, values, reports, exposure] = block.reveals[number];
+  const [notes, proposals] = block.exposures[exposure];
+  return { bits, days, range, values, reports, notes, proposals, isWarned: notes.some(([warns]) => warns) };
+}
+
+function revealDetails(row, cell) {
+  const { reveal } = row;
   if (!reveal) return;
-  cell.append(make("h4", {}, "What it can reveal"));
-  if (reveal.text) cell.append(paragraph(reveal.text));
-  for (const note of reveal.notes) cell.append(paragraph(note, { class: "warning" }));
+  const kind = row.isScalar ? "values" : "samples";
+  cell.append(make("h4", {}, "What it can reveal"),
+    paragraph(`At most ${reveal.bits.toFixed(1)} bits a day, over the range that was seen: ` +
+      `${withUnit(reveal.range, row.unit)}, on ${counted(reveal.days, "day")}. Different ${kind} recorded: ` +
+      `${reveal.values}; different reports: ${reveal.reports}.`));
+  if (reveal.notes.length > 0) {
+    cell.append(make("ul", { class: "remarks" }, ...reveal.notes.map(([warns, text]) =>
+      make("li", { class: warns ? "warning" : null }, text))));
+  }
+  if (reveal.proposals.length > 0) {
+    cell.append(paragraph("Whoever writes the whitelist could make its entry reveal less:"),
+      make("ul", { class: "remarks" }, ...reveal.proposals.map((text) => make("li", {}, text))));
+  }
 }
 
 function scalarDetails(block, row, cell) {

@@ -18,7 +18,7 @@ function blockOf(number) {
 
 // Adds what the views and the search look at.
 function prepare(block) {
-  const none = { key: [], value: [], metric: [], entry: [], former: [] };
+  const none = { key: [], value: [], metric: [], entry: [], former: [], reveal: [] };
   block.scalars = block.scalars || { ...none, range: [] };
   block.distributions = block.distributions || { ...none, histogram: [] };
   block.absent = block.absent || { key: [], kind: [], reason: [], metric: [] };
@@ -38,7 +38,7 @@ function leavingRow(block, id) {
   const row = {
     isScalar, unit, description, key: part.key[i], value: part.value[i], entry: part.entry[i],
     former: block.before ? part.former[i] : true,
-    reveal: part.reveal ? block.reveals[part.reveal[i]] : null,
+    reveal: revealOf(block, part.reveal[i]),
   };
   if (isScalar) row.range = rangeOf(block, row.value, part.range[i]);
   else row.histogram = part.histogram[i];
@@ -71,14 +71,13 @@ function changeCell(block, row) {
 
 function revealCell(row) {
   if (!row.reveal) return cell("Reveals", "\u2013", "number faint");
-  const { bits, notes } = row.reveal;
-  const text = bits === null ? "\u2013" : `${bits.toFixed(1)} bits`;
-  return cell("Reveals", notes.length === 0 ? text : make("span", { class: "badge warned", title: notes.join("\n") },
-    bits === null ? "warning" : text), "number");
+  const text = `${row.reveal.bits.toFixed(1)} bits`;
+  if (!row.reveal.isWarned) return cell("Reveals", text, "number");
+  return cell("Reveals", make("span", { class: "badge warned" }, text, make("span", { class: "unseen" }, ", with a warning")), "number");
 }
 
 function leavingTable(block) {
-  const revealing = Boolean(block.reveals && block.reveals.length);
+  const revealing = block.reveals.length > 0;
   const columns = [{ title: "Key" }, { title: "Reported", class: "number" }, { title: "True value", class: "number" },
     { title: "Change", class: "number" }];
   if (revealing) columns.push({ title: "Reveals", class: "number" });
@@ -99,7 +98,7 @@ function leavingTable(block) {
     const parts = [make("div", {}), make("div", {})];
     (row.isScalar ? scalarDetails : distributionDetails)(block, row, parts[0]);
     admissionDetails(block, row.entry, parts[1]);
-    revealDetails(row.reveal, parts[1]);
+    revealDetails(row, parts[1]);
     element.append(make("div", { class: "unfolded" }, ...parts));
   });
   table.prefix = "leaves";
@@ -244,11 +243,11 @@ const FILTERS = {
   added: ["what is new", (row) => row.former === null],
   rounded: ["what is rounded", (row) => row.range && row.range.low !== row.range.high],
   exact: ["what is exact", (row) => !row.isScalar || (row.range && row.range.low === row.range.high)],
-  warned: ["warnings", (row) => row.reveal && row.reveal.notes.length > 0],
+  warned: ["warnings", (row) => row.reveal && row.reveal.isWarned],
 };
 const ORDERS = {
   name: ["by name", null],
-  reveals: ["most revealing first", (row) => (row.reveal && row.reveal.bits !== null ? -row.reveal.bits : 0)],
+  reveals: ["most revealing first", (row) => (row.reveal ? -row.reveal.bits : 0)],
   change: ["largest change first", (row) => (row.former === true ? 1 : row.former === null ? 0
     : row.isScalar ? -Math.abs(Number(row.value) - Number(row.former)) : 0)],
 };
@@ -345,6 +344,11 @@ function figures(block) {
   if (block.before) {
     list.push(["Changed or new", changed.toLocaleString("en-US"), `since ${shortDate(block.before)}`],
       ["No longer reported", block.removed.length.toLocaleString("en-US"), ""]);
+  }
+  if (block.bits) {
+    const [bits, first, last] = block.bits;
+    list.push(["Reveals at most", withUnit(bits.toLocaleString("en-US", { maximumFractionDigits: 0 }), "bits a day"),
+      `by what was recorded ${first === last ? `on ${shortDate(first)}` : `from ${shortDate(first)} to ${shortDate(last)}`}`]);
   }
   return list;
 }
