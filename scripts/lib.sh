@@ -20,9 +20,10 @@ fi
 optional_test_packages=(
   rustc gccgo curl
   netcat-openbsd socat python3-statsd python3-aiodogstatsd libnet-statsd-perl ruby-statsd npm
+  chromium chromium-driver
 )
 # The same from npm, below build/npm-clients.
-optional_npm_packages=(unix-dgram@2.0.7 hot-shots@17.1.1 node-statsd@0.1.1)
+optional_npm_packages=(unix-dgram@2.0.7 hot-shots@17.1.1 node-statsd@0.1.1 axe-core@4.14.1)
 
 say() { printf '\n== %s\n' "$*"; }
 fail() {

@@ -13,7 +13,7 @@ FLAGS = ["--headless", "--no-sandbox", "--disable-gpu", "--disable-quic", "--no-
          "--disable-background-networking", "--disable-component-update", "--disable-sync"]
 PROGRAMS = [shutil.which("chromedriver"), shutil.which("chromium")]
 IS_INSTALLED = all(PROGRAMS)
-ENTER, TAB, RIGHT, END = "\ue007", "\ue004", "\ue014", "\ue010"
+ENTER, TAB, RIGHT = "\ue007", "\ue004", "\ue014"
 
 
 class Browser:
@@ -64,7 +64,8 @@ class Browser:
         """Opens a file in a window of that inner size."""
         self.devtools("Emulation.setDeviceMetricsOverride", width=width, height=height, deviceScaleFactor=1,
                       mobile=mobile)
-        self.devtools("Emulation.setEmulatedMedia", features=[{"name": "prefers-color-scheme", "value": scheme}])
+        self.devtools("Emulation.setEmulatedMedia", features=[
+            {"name": "prefers-color-scheme", "value": scheme}, {"name": "prefers-reduced-motion", "value": "reduce"}])
         self.command("url", url=f"file://{path}")
 
     def run(self, script, *arguments):

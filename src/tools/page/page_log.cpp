@@ -74,6 +74,7 @@ class BlockBuilder {
   Json build() {
     Json block = {{"notes", log_.notes}, {"facts", pageFacts(sources_, log_)}};
     if (log_.content) {
+      block["sameWhitelist"] = sameWhitelist_;
       if (!sameWhitelist_) block["notes"].push_back(whitelistNote());
       block["applications"] = pageApplications(*log_.content);
       block["before"] =

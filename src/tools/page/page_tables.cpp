@@ -86,7 +86,9 @@ int PageTables::exposureOf(std::uint32_t entry) {
 
 int PageTables::reasonOf(const AbsenceReason& reason) {
   return reasons_.numberOf({reason.absence, reason.detail}, [&] {
-    return Json({rowOf(reason.absence).name, reason.detail});
+    // The page shows the row's meaning, to which this detail adds nothing.
+    const bool isPlain = reason.detail == "it is not listed";
+    return Json({rowOf(reason.absence).name, isPlain ? "" : reason.detail});
   });
 }
 

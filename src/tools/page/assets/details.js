@@ -4,8 +4,11 @@ function paragraph(text, attributes) {
   return make("p", attributes || {}, text);
 }
 
+// A line breaks between its words alone, not at the hyphens of an option.
 function command(text) {
-  return make("code", { class: "command" }, text);
+  const line = make("code", { class: "command" });
+  text.split(" ").forEach((word, i) => line.append(i > 0 ? " " : "", make("span", {}, word)));
+  return line;
 }
 
 // How a group, or all submission, is switched off; the switch is [command, note].
@@ -17,7 +20,8 @@ function switchWords([line, note]) {
 function admissionDetails(block, entry, cell) {
   cell.append(make("h4", {}, "Why it leaves, and how to stop it"));
   if (entry < 0) {
-    cell.append(paragraph("Which entry of the whitelist admitted it is not known."));
+    cell.append(paragraph(block.sameWhitelist ? "By the whitelist as it is in force now, it would not leave any more."
+      : "Which entry of the whitelist admitted it is not known."));
     return;
   }
   const [group, prefix, , options] = block.entries[entry];

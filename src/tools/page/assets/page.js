@@ -62,6 +62,14 @@ function cell(label, text, kind) {
   return make("td", { role: "cell", "data-label": label, class: kind }, text);
 }
 
+function statisticsCell(label, statistics, unit) {
+  if (!statistics) return cell(label, "damaged", "number warning");
+  const [count, minimum, maximum, mean] = statistics;
+  return cell(label, make("span", {}, make("span", { class: "strong" }, counted(count, "sample")), make("span", { class: "description" },
+    make("span", { class: "whole" }, `${realText(minimum)} to ${withUnit(realText(maximum), unit)},`), " ",
+    make("span", { class: "whole" }, `mean ${realText(mean)}`))), "number");
+}
+
 function changeCell(block, row) {
   if (!block.before) return cell("Change", "\u2013", "number faint");
   if (row.former === true) return cell("Change", "same", "number faint");
@@ -78,7 +86,7 @@ function revealCell(row) {
 
 function leavingTable(block) {
   const revealing = block.reveals.length > 0;
-  const columns = [{ title: "Key" }, { title: "Reported", class: "number" }, { title: "True value", class: "number" },
+  const columns = [{ title: "Key" }, { title: "Reported", class: "number reported" }, { title: "True value", class: "number" },
     { title: "Change", class: "number" }];
   if (revealing) columns.push({ title: "Reveals", class: "number" });
   const table = new LongTable("What leaves: each key with the value that is reported", columns, (id, element) => {
@@ -88,7 +96,7 @@ function leavingTable(block) {
       element.append(cell("Reported", withUnit(integerText(row.value), row.unit), "number strong"),
         cell("True value", rangeText(row.range), "number"));
     } else {
-      element.append(cell("Reported", statisticsText(row.value, row.unit), "number"),
+      element.append(statisticsCell("Reported", row.value, row.unit),
         cell("True value", "not rounded", "number faint"));
     }
     element.append(changeCell(block, row));
@@ -108,7 +116,7 @@ function leavingTable(block) {
 function absentTable(block) {
   const { absent } = block;
   const table = new LongTable("What was recorded and does not leave, with the reason",
-    [{ title: "Key" }, { title: "Kind" }, { title: "Why it stays" }], (id, element) => {
+    [{ title: "Key" }, { title: "Kind", class: "narrow" }, { title: "Why it stays" }], (id, element) => {
       const [, , description] = block.metrics[absent.metric[id]] || ["", "", ""];
       const [name, detail] = block.reasons[absent.reason[id]];
       const { meaning } = index.absences.find((absence) => absence.name === name) || { meaning: name };
@@ -162,11 +170,11 @@ function stopPanel(block) {
     }
   }
   const panel = make("div", { class: "stop" });
-  panel.append(make("section", { class: "card" }, make("h3", {}, "Everything"),
+  panel.append(make("section", { class: "card" }, make("h4", {}, "Everything"),
     make("p", {}, index.submissionAllowed ? "Submission is allowed." : "Submission is not allowed: nothing leaves."),
     index.submissionAllowed ? switchWords(index.submissionSwitch) : null));
   block.groups.forEach(([name, line, note], group) => {
-    panel.append(make("section", { class: "card" }, make("h3", {}, "Group ", make("span", { class: "key" }, name)),
+    panel.append(make("section", { class: "card" }, make("h4", {}, "Group ", make("span", { class: "key" }, name)),
       make("p", {}, `Admits ${counted(counts.get(group) || 0, "key")} of this log.`), switchWords([line, note])));
   });
   const others = counts.get(-1) || 0;
@@ -188,7 +196,7 @@ function buildView(block) {
       "data-view": name }, title, " ", count);
     const empty = make("p", { class: "faint empty", hidden: true });
     view.panels[name] = make("section", { role: "tabpanel", id: `panel-${name}`, "aria-labelledby": `tab-${name}`, tabindex: "0" },
-      make("h3", { class: "printed" }, title), empty, contents[name]);
+      make("h3", { class: "unseen printed" }, title), empty, contents[name]);
     tabs.push(view.tabs[name]);
   }
   byId("tabs").replaceChildren(...tabs);
@@ -347,8 +355,8 @@ function figures(block) {
   }
   if (block.bits) {
     const [bits, first, last] = block.bits;
-    list.push(["Reveals at most", withUnit(bits.toLocaleString("en-US", { maximumFractionDigits: 0 }), "bits a day"),
-      `by what was recorded ${first === last ? `on ${shortDate(first)}` : `from ${shortDate(first)} to ${shortDate(last)}`}`]);
+    list.push(["Reveals at most", withUnit(bits.toLocaleString("en-US", { maximumFractionDigits: 0 }), "bits"),
+      `a day, by what was recorded ${first === last ? `on ${shortDate(first)}` : `from ${shortDate(first)} to ${shortDate(last)}`}`]);
   }
   return list;
 }
