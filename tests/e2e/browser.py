@@ -10,7 +10,8 @@ import threading
 
 # Nothing of the browser's own may ask the network. Root, as in a container, has no sandbox.
 FLAGS = ["--headless", "--no-sandbox", "--disable-gpu", "--disable-quic", "--no-first-run",
-         "--disable-background-networking", "--disable-component-update", "--disable-sync"]
+         "--disable-background-networking", "--disable-component-update", "--disable-sync",
+         "--disable-lcd-text"]  # pictures without coloured edges are half as large
 PROGRAMS = [shutil.which("chromedriver"), shutil.which("chromium")]
 IS_INSTALLED = all(PROGRAMS)
 ENTER, TAB, RIGHT = "\ue007", "\ue004", "\ue014"

@@ -54,10 +54,10 @@ TEST_F(PageTest, NumbersAreExactAndNothingEndsTheData) {
   const auto& scalars = data["scalars"];
   EXPECT_EQ(scalars["key"], (nlohmann::json{"</script>", "least"}));
   EXPECT_EQ(scalars["value"], (nlohmann::json{-1000, "-9223372036854775808"}));
-  // -1,499 to -951: the digits change between.
-  EXPECT_EQ(data["ranges"][scalars["range"][0].get<int>()], (nlohmann::json{"499", "49", false}));
+  // -1,499 to -950: the digits change between.
+  EXPECT_EQ(data["ranges"][scalars["range"][0].get<int>()], (nlohmann::json{"499", "50", false}));
   EXPECT_EQ(data["absent"]["key"], (nlohmann::json{"other"}));
-  EXPECT_EQ(data["reasons"], (nlohmann::json{{"not_listed", ""}}));
+  EXPECT_EQ(data["reasons"], nlohmann::json::parse(R"([["not_listed", ""]])"));
   EXPECT_EQ(block(page, "index")["logs"].size(), 2u);
 }
 

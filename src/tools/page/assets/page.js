@@ -52,7 +52,9 @@ let view = null; // of that log: its tables and counts
 
 // The first cell of a row that unfolds.
 function keyCell(row, description, withButton) {
-  const name = make("span", { class: "key" }, row.key);
+  // Long keys break after their parts.
+  const name = make("span", { class: "key" });
+  for (const part of row.key.split(/(?<=[._])/)) name.append(part, make("wbr"));
   const label = withButton ? make("button", { type: "button", class: "fold", "aria-expanded": "false" }, name) : name;
   return make("th", { scope: "row", role: "rowheader" }, label,
     description ? make("span", { class: "description" }, description) : null);
