@@ -234,6 +234,15 @@ function search(keys, tables, words) {
   return found;
 }
 
+// Keys that stay for a rare reason come first: most are just not listed.
+function byReason(block, ids) {
+  const { reason } = block.absent;
+  const counts = {};
+  for (const number of reason) counts[block.reasons[number][0]] = (counts[block.reasons[number][0]] || 0) + 1;
+  const rank = (id) => counts[block.reasons[reason[id]][0]];
+  return ids.sort((a, b) => rank(a) - rank(b) || a - b);
+}
+
 function searchTexts(block) {
   if (!block.texts) {
     block.texts = {
@@ -281,7 +290,7 @@ function applySearch() {
   }
   view.found = {
     leaves: leaving,
-    stays: search(block.absent, [[metrics, block.absent.metric], [reasons, block.absent.reason]], words),
+    stays: byReason(block, search(block.absent, [[metrics, block.absent.metric], [reasons, block.absent.reason]], words)),
     gone: search(block.removedKeys, [[metrics, block.removedKeys.metric]], words),
   };
   view.isSearch = words.length > 0;
