@@ -1,0 +1,229 @@
+// The embedded engine: DuckDB over exported files, or over the Parquet files made from them.
+import fs from 'node:fs';
+import { createRequire } from 'node:module';
+import os from 'node:os';
+import path from 'node:path';
+import { quoted } from './dialect.mjs';
+import { exportedFiles, FleetError, readLogs } from './logs.mjs';
+
+const CONVERTED = 'parquet';
+const MANIFEST = 'files.json';
+const LOG_COLUMNS = 'file, "offset", length, device, sequence, day, version, hash';
+const ROW_COLUMNS = {
+  device: 'VARCHAR', sequence: 'BIGINT', day: 'INTEGER', system_version: 'VARCHAR', configuration: 'VARCHAR',
+  key: 'VARCHAR', kind: 'VARCHAR', value: 'BIGINT', count: 'BIGINT', mean: 'DOUBLE', squared_deviations: 'DOUBLE',
+  lower: 'DOUBLE[]', upper: 'DOUBLE[]', counts: 'BIGINT[]',
+};
+
+function library() {
+  try {
+    // As NODE_PATH is honoured too, unlike by import.
+    return createRequire(import.meta.url)('@duckdb/node-api');
+  } catch (error) {
+    throw new FleetError(`DuckDB is not installed (npm install @duckdb/node-api): ${error.message.split('\n')[0]}`);
+  }
+}
+
+const text = value => quoted(value, 'duckdb');
+const pattern = folder => `${folder.replace(/[[\]*?]/g, '[$&]')}/rows-*.parquet`;
+
+function manifestOf(files) {
+  return files.map(file => {
+    const { size, mtimeMs } = fs.statSync(file);
+    return { name: path.basename(file), size, mtimeMs };
+  });
+}
+
+/** The folder of Parquet files that hold what the exported files hold now. */
+function convertedFolder(directory, files) {
+  const folder = path.join(directory, CONVERTED);
+  let manifest;
+  try {
+    manifest = fs.readFileSync(path.join(folder, MANIFEST), 'utf8');
+  } catch {
+    return undefined;
+  }
+  // Whoever keeps the Parquet files only has removed the others.
+  if (files.length === 0 || manifest === JSON.stringify(manifestOf(files))) return folder;
+  process.stderr.write(`${folder}: older than the exported files, which are read instead; see convert\n`);
+  return undefined;
+}
+
+export class DuckDb {
+  dialect = 'duckdb';
+  tables = { rows: 'rows', all_rows: 'rows', logs: 'logs', all_logs: 'logs' };
+
+  /** Opens the directory; `key`, if given, is the only one whose rows are wanted. */
+  static async open(directory, key) {
+    const engine = new DuckDb();
+    await engine.connect();
+    try {
+      const files = exportedFiles(directory);
+      const converted = convertedFolder(directory, files);
+      if (converted) await engine.useParquet(converted);
+      else await engine.useExported(directory, files, key);
+    } catch (error) {
+      engine.close();
+      throw error;
+    }
+    return engine;
+  }
+
+  async connect() {
+    this.temporary = fs.mkdtempSync(path.join(os.tmpdir(), 'tallyfleet-'));
+    const { DuckDBInstance } = library();
+    this.instance = await DuckDBInstance.create(path.join(this.temporary, 'work.duckdb'));
+    this.connection = await this.instance.connect();
+    // Files of others are read: nothing of them may be code, or reach further.
+    await this.run(`SET temp_directory = ${text(this.temporary)}; SET autoinstall_known_extensions = false;
+      SET autoload_known_extensions = false`);
+  }
+
+  async run(sql) {
+    await this.connection.run(sql);
+  }
+
+  /** The rows of an answer as arrays; integers become numbers. */
+  async query(sql) {
+    const reader = await this.connection.runAndReadAll(sql);
+    return reader.getRowsJS().map(row => row.map(plain));
+  }
+
+  close() {
+    this.connection?.closeSync();
+    this.instance?.closeSync();
+    fs.rmSync(this.temporary, { recursive: true, force: true });
+  }
+
+  async useParquet(folder) {
+    await this.run(`CREATE VIEW logs AS FROM read_parquet(${text(path.join(folder, 'logs.parquet'))});
+      CREATE VIEW rows AS FROM read_parquet(${text(pattern(folder))})`);
+  }
+
+  async useExported(directory, files, key) {
+    if (files.length === 0) throw new FleetError(`${directory}: no exported files (*.ndjson)`);
+    await this.findLogs(files);
+    const cleaned = await this.withoutRefused(files);
+    const columns = Object.entries(ROW_COLUMNS).map(([name, type]) => `"${name}": '${type}'`).join(', ');
+    await this.run(`CREATE TABLE rows AS SELECT *, coalesce(system_version, '') AS version
+      FROM read_ndjson([${text(cleaned)}], columns = {${columns}}, ignore_errors = true)
+      WHERE device IS NOT NULL AND sequence IS NOT NULL AND day IS NOT NULL
+        AND (kind = 'scalar' AND value IS NOT NULL OR kind = 'distribution' AND "count" BETWEEN 0 AND 4294967295)
+        AND ${key === undefined ? 'key IS NOT NULL' : `key = ${text(key)}`}`);
+  }
+
+  /** Lists every log of the files, and decides which of those with one identity is kept: the first. */
+  async findLogs(files) {
+    await this.run(`CREATE TABLE found (file INTEGER, "offset" BIGINT, length BIGINT, device VARCHAR,
+      sequence BIGINT, day INTEGER, version VARCHAR, hash VARCHAR)`);
+    const appender = await this.connection.createAppender('found');
+    for (const [number, file] of files.entries()) {
+      for (const log of readLogs(file)) appendLog(appender, number, log);
+    }
+    appender.closeSync();
+    await this.run(`CREATE TABLE logs AS SELECT ${LOG_COLUMNS}, CASE
+        WHEN hash IS NULL THEN 'unreadable'
+        WHEN row_number() OVER identical > 1 THEN 'duplicate'
+        WHEN row_number() OVER same > 1 THEN 'conflict'
+        WHEN device IS NULL THEN 'bare' WHEN day IS NULL THEN 'undated' ELSE 'kept' END AS state
+      FROM found WINDOW
+        identical AS (PARTITION BY device, sequence, hash ORDER BY file, "offset"),
+        same AS (PARTITION BY device, sequence, CASE WHEN device IS NULL THEN hash END ORDER BY file, "offset");
+      DROP TABLE found`);
+  }
+
+  /** The files, with copies in place of those that hold something refused. */
+  async withoutRefused(files) {
+    const refused = await this.query(`SELECT file, "offset", length FROM logs
+      WHERE state IN ('unreadable', 'duplicate', 'conflict') ORDER BY file, "offset"`);
+    const ofFile = groupBy(refused);
+    return files.map((file, number) => {
+      if (!ofFile.has(number)) return file;
+      const copy = path.join(this.temporary, `${number}.ndjson`);
+      copyWithout(file, copy, ofFile.get(number));
+      return copy;
+    });
+  }
+
+  /** Writes the Parquet files beside the exported ones: sorted by key, day and device, one for a month. */
+  static async convert(directory) {
+    const files = exportedFiles(directory);
+    const manifest = JSON.stringify(manifestOf(files));
+    const engine = new DuckDb();
+    const folder = path.join(directory, CONVERTED);
+    const made = path.join(directory, `.${CONVERTED}-${process.pid}`);
+    await engine.connect();
+    try {
+      await engine.useExported(directory, files);
+      fs.mkdirSync(made);
+      await engine.run(`COPY (FROM logs ORDER BY day, device) TO ${text(path.join(made, 'logs.parquet'))}
+        (FORMAT parquet, COMPRESSION zstd)`);
+      const months = await engine.query(
+        `SELECT DISTINCT strftime(DATE '1970-01-01' + day, '%Y-%m') AS month FROM rows ORDER BY month`);
+      for (const [month] of months.length ? months : [['none']]) {
+        await engine.run(`COPY (FROM rows WHERE strftime(DATE '1970-01-01' + day, '%Y-%m') = ${text(month)}
+          ORDER BY key, day, device) TO ${text(path.join(made, `rows-${month}.parquet`))}
+          (FORMAT parquet, COMPRESSION zstd, ROW_GROUP_SIZE 61440)`);
+      }
+      fs.writeFileSync(path.join(made, MANIFEST), manifest);
+      fs.rmSync(folder, { recursive: true, force: true });
+      fs.renameSync(made, folder);
+    } finally {
+      engine.close();
+      fs.rmSync(made, { recursive: true, force: true });
+    }
+    return folder;
+  }
+}
+
+function plain(value) {
+  if (typeof value === 'bigint') return Number(value);
+  return Array.isArray(value) ? value.map(plain) : value;
+}
+
+function groupBy(rows) {
+  const groups = new Map();
+  for (const row of rows) {
+    if (!groups.has(row[0])) groups.set(row[0], []);
+    groups.get(row[0]).push(row);
+  }
+  return groups;
+}
+
+function appendLog(appender, file, log) {
+  const { device = null, sequence = null, day = null, version = null } = log.header ?? {};
+  appender.appendInteger(file);
+  appender.appendBigInt(BigInt(log.offset));
+  appender.appendBigInt(BigInt(log.length));
+  if (device === null) appender.appendNull(); else appender.appendVarchar(device);
+  if (sequence === null) appender.appendNull(); else appender.appendBigInt(BigInt(sequence));
+  if (day === null) appender.appendNull(); else appender.appendInteger(day);
+  if (version === null) appender.appendNull(); else appender.appendVarchar(version);
+  if (log.refused) appender.appendNull(); else appender.appendVarchar(log.hash);
+  appender.endRow();
+}
+
+/** Copies a file without some ranges of it. */
+function copyWithout(file, copy, ranges) {
+  const from = fs.openSync(file, 'r');
+  const to = fs.openSync(copy, 'wx', 0o600);
+  const buffer = Buffer.allocUnsafe(1 << 20);
+  const copyRange = (begin, end) => {
+    for (let got; begin < end; begin += got) {
+      got = fs.readSync(from, buffer, 0, Math.min(buffer.length, end - begin), begin);
+      if (got === 0) return;
+      fs.writeSync(to, buffer, 0, got);
+    }
+  };
+  try {
+    let at = 0;
+    for (const [, offset, length] of ranges) {
+      copyRange(at, offset);
+      at = offset + length;
+    }
+    copyRange(at, fs.fstatSync(from).size);
+  } finally {
+    fs.closeSync(from);
+    fs.closeSync(to);
+  }
+}

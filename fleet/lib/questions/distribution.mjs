@@ -1,0 +1,53 @@
+// How a key is distributed over the fleet, by day and version.
+import { dateOf } from '../logs.mjs';
+
+const LEVELS = [0.01, 0.05, 0.25, 0.5, 0.75, 0.95, 0.99];
+
+export const summary = 'a key over the fleet, by day and version';
+export const parameters = { key: { help: 'the key' } };
+export const columns = ['date', 'version', 'devices', 'p1', 'p5', 'p25', 'p50', 'p75', 'p95', 'p99',
+  'samples', 'mean', 'deviation', 'lower', 'upper', 'counts'];
+export const plot = { x: 'date', y: ['p5', 'p25', 'p50', 'p75', 'p95'], series: 'version' };
+
+const ALL = null; // the version of a row about all versions
+const nameOf = (day, version) => `${day} ${version}`;
+
+async function groupsOf({ query, sql, parameters, first, last }, version) {
+  const values = { key: parameters.key, first, last };
+  const pieces = { version: version ?? 'version' };
+  const value = text => (version ? ALL : text);
+  const groups = new Map();
+  for (const [day, text, devices, ...quantiles] of await query('distribution', values, { values: sql('values', values, pieces) })) {
+    groups.set(nameOf(day, value(text)), { day, version: value(text), devices, quantiles, buckets: [] });
+  }
+  for (const [day, text, devices, ...merged] of await query('merged', values, { samples: sql('samples', values, pieces) })) {
+    Object.assign(groups.get(nameOf(day, value(text))), { sampled: devices, merged });
+  }
+  for (const [day, text, from, to, devices, samples] of await query('histogram', values, pieces)) {
+    groups.get(nameOf(day, value(text)))?.buckets.push({ from, to, devices, samples });
+  }
+  return [...groups.values()];
+}
+
+const bound = (value, open) => value ?? open;
+
+function rowOf(group, anonymity) {
+  const { devices, sampled = 0, merged: [samples, mean, squares] = [] } = group;
+  const buckets = anonymity.buckets(group.buckets.sort((one, other) =>
+    bound(one.to, Infinity) - bound(other.to, Infinity) || bound(one.from, -Infinity) - bound(other.from, -Infinity)), false);
+  // Devices that send the key as the other kind are few, or the two are two groups.
+  const told = devices - sampled === 0 || devices - sampled >= anonymity.k;
+  const lists = buckets.length && told ? ['from', 'to', 'samples'].map(part => buckets.map(bucket => bucket[part])) : [null, null, null];
+  return [dateOf(group.day), group.version, anonymity.devices(devices),
+    ...LEVELS.map((level, index) => anonymity.quantile(devices, level, group.quantiles[index])),
+    ...[samples, mean, Math.sqrt(squares / samples)].map(value => (told ? anonymity.value(sampled, value) : null)), ...lists];
+}
+
+export async function answer(context) {
+  const { anonymity } = context;
+  const ofVersions = anonymity.release(await groupsOf(context), group => group.devices, group => group.day);
+  const ofAll = anonymity.release(await groupsOf(context, "'all'"), group => group.devices, group => group.day);
+  return [...ofAll, ...ofVersions]
+    .sort((one, other) => one.day - other.day || (one.version === ALL ? -1 : other.version === ALL ? 1 : one.version < other.version ? -1 : 1))
+    .map(group => rowOf(group, anonymity));
+}

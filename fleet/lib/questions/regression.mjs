@@ -1,0 +1,86 @@
+// Whether a key differs between two versions: for the typical device, for a few devices, and for the same
+// device before and after.
+import { FleetError } from '../logs.mjs';
+import { shareDifference, signTest, trimmedDifference } from '../statistics.mjs';
+
+export const summary = 'a key in two versions, and how sure a difference is';
+export const parameters = {
+  key: { help: 'the key' },
+  baseline: { help: 'the former version; the last but one by default', fallback: '' },
+  candidate: { help: 'the latter version; the last by default', fallback: '' },
+};
+export const columns = ['test', 'baseline', 'candidate', 'devices_baseline', 'devices_candidate', 'value_baseline',
+  'value_candidate', 'difference', 'low', 'high', 'p_below', 'found'];
+export const plot = { x: 'test', y: ['difference'], low: 'low', high: 'high' };
+
+const PROBABILITIES = [0.001, 0.01, 0.05];
+const FACTOR = 1.5; // a figure that rose or fell by half
+
+/** Whether a difference is found, and how sure; the exact probability would tell counts. */
+function verdict(p) {
+  const below = PROBABILITIES.find(limit => p < limit);
+  return [below ?? null, below !== undefined];
+}
+
+async function versionsOf({ query, anonymity, parameters }, values) {
+  const known = anonymity.release(await query('versions', {}, { values }), row => row[1]);
+  const given = [parameters.baseline, parameters.candidate];
+  for (const version of given) {
+    if (version !== '' && !known.some(row => row[0] === version)) return undefined;
+  }
+  const rest = known.map(row => row[0]).filter(version => !given.includes(version));
+  const candidate = parameters.candidate || rest.pop();
+  const baseline = parameters.baseline || rest.pop();
+  if (baseline !== undefined && baseline === candidate) throw new FleetError('regression: two different versions are needed');
+  return baseline === undefined || candidate === undefined ? undefined : [baseline, candidate];
+}
+
+function typical(anonymity, before, after) {
+  const { one, other, difference, low, high, p } = trimmedDifference(before, after);
+  return [one, other, difference, low, high, ...verdict(p)];
+}
+
+/** Few devices with a multiple of what they had hide behind the mean, but not among the highest. */
+async function tail({ anonymity, query }, before, after, means) {
+  const values = { tail: before.tail, slack: Math.abs(before.tail) * 1e-12 };
+  const above = new Map(await query('tails', values, { means }));
+  const counts = [above.get(before.version) ?? 0, above.get(after.version) ?? 0];
+  const { difference, low, high, p } = shareDifference(counts[0], before.devices, counts[1], after.devices);
+  const share = anonymity.share(counts[1], after.devices);
+  // The baseline's share is 1 % by the choice of the limit, and says nothing of its devices.
+  const told = share === null ? [null, null, null, null, null] : [0.01, share, difference, low, high];
+  return [...told, ...verdict(p)];
+}
+
+async function pairs({ anonymity, query }, before, after, means) {
+  const [[both, rose, fell]] = await query('pairs',
+    { baseline: before.version, candidate: after.version, factor: FACTOR }, { means });
+  if (both < anonymity.k) return undefined;
+  const shares = [anonymity.share(fell, both), anonymity.share(rose, both)];
+  // One group the fewer of which are few is told as one that has none.
+  const difference = shares[1] ?? (shares[0] === null ? null : -shares[0]);
+  return { both, row: [...shares, difference, null, null, ...verdict(signTest(rose, fell))] };
+}
+
+const groupOf = ([version, devices, top, middle, cut, least, greatest, sum, squares]) =>
+  ({ version, devices, tail: top, middle, cut, least, greatest, sum, squares });
+
+export async function answer(context) {
+  const { anonymity, query, sql, parameters, first, last } = context;
+  const values = sql('values', { key: parameters.key, first, last }, { version: 'version' });
+  const versions = await versionsOf(context, values);
+  if (versions === undefined) return [];
+  const means = sql('means', { versions }, { values });
+  const groups = (await query('regression', {}, { means })).map(groupOf);
+  const [before, after] = versions.map(version => groups.find(group => group.version === version));
+  const head = test => [test, ...versions];
+  const devices = [before, after].map(group => anonymity.devices(group.devices));
+  const rows = [
+    [...head('typical'), ...devices, ...typical(anonymity, before, after)],
+    [...head('tail'), ...devices, ...await tail(context, before, after, means)],
+  ];
+  const paired = await pairs(context, before, after, means);
+  if (paired === undefined) anonymity.withheld++;
+  else rows.push([...head('paired'), anonymity.devices(paired.both), anonymity.devices(paired.both), ...paired.row]);
+  return rows;
+}

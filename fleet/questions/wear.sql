@@ -1,0 +1,2 @@
+-- Devices by wear.
+SELECT @integer(floor(level / {step})) AS bucket, count(*) FROM ({fits}) AS f GROUP BY bucket ORDER BY bucket
