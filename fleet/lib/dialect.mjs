@@ -7,6 +7,7 @@ const MACROS = {
   uniq: { duckdb: 'count(DISTINCT $1)', clickhouse: 'uniqExact($1)' },
   sorted: { duckdb: 'list_sort(list($1))', clickhouse: 'arraySort(groupArray($1))' },
   explode: { duckdb: 'unnest($1)', clickhouse: 'arrayJoin($1)' },
+  indices: { duckdb: 'range($1)', clickhouse: 'range(toUInt64($1))' },
   float: { duckdb: 'CAST($1 AS DOUBLE)', clickhouse: 'toFloat64($1)' },
   integer: { duckdb: 'CAST($1 AS BIGINT)', clickhouse: 'toInt64($1)' },
   finite: { duckdb: 'coalesce(isfinite($1), false)', clickhouse: 'ifNull(isFinite($1), 0)' },

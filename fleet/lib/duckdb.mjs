@@ -4,7 +4,7 @@ import { createRequire } from 'node:module';
 import os from 'node:os';
 import path from 'node:path';
 import { quoted } from './dialect.mjs';
-import { exportedFiles, FleetError, readLogs } from './logs.mjs';
+import { exportedFiles, FleetError, LAST_DAY, readLogs } from './logs.mjs';
 
 const CONVERTED = 'parquet';
 const MANIFEST = 'files.json';
@@ -107,7 +107,7 @@ export class DuckDb {
     const columns = Object.entries(ROW_COLUMNS).map(([name, type]) => `"${name}": '${type}'`).join(', ');
     await this.run(`CREATE TABLE rows AS SELECT *, coalesce(system_version, '') AS version
       FROM read_ndjson([${text(cleaned)}], columns = {${columns}}, ignore_errors = true)
-      WHERE device IS NOT NULL AND sequence IS NOT NULL AND day IS NOT NULL
+      WHERE device IS NOT NULL AND sequence IS NOT NULL AND day BETWEEN 0 AND ${LAST_DAY}
         AND (kind = 'scalar' AND value IS NOT NULL OR kind = 'distribution' AND "count" BETWEEN 0 AND 4294967295)
         AND ${key === undefined ? 'key IS NOT NULL' : `key = ${text(key)}`}`);
   }

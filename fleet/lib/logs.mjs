@@ -11,7 +11,7 @@ const NEWLINE = 10;
 const KEY = Buffer.from(',"key":"');
 const KIND = Buffer.from(',"kind":"');
 const PSEUDONYM = /^[0-9a-f]{32}$/;
-const LAST_DAY = 49709; // engines keep dates to 2106-02-06
+export const LAST_DAY = 49709; // engines keep dates to 2106-02-06
 // A sequence number and a day fit into one 64-bit integer, which the questions sort by.
 const LAST_SEQUENCE = 2 ** 45;
 
@@ -30,6 +30,8 @@ export function exportedFiles(directory) {
   return names.filter(name => name.endsWith('.ndjson')).sort().map(name => path.join(directory, name));
 }
 
+const isDay = day => day !== null && day >= 0 && day <= LAST_DAY;
+
 function textOrNull(value) {
   return value === undefined || value === null || (typeof value === 'string' && value.length <= 1024);
 }
@@ -39,14 +41,14 @@ function headerOf(row) {
   const { schema, device = null, sequence = null, day = null, date = null } = row;
   const valid = schema === 1 && (device === null || PSEUDONYM.test(device)) &&
     (sequence === null || (Number.isSafeInteger(sequence) && sequence > 0 && sequence < LAST_SEQUENCE)) &&
-    (day === null ? date === null
-      : Number.isSafeInteger(day) && day >= 0 && day <= LAST_DAY && date === dateOf(day)) &&
+    (day === null || Number.isSafeInteger(day)) && (date === null || (isDay(day) && date === dateOf(day))) &&
     textOrNull(row.system_version) && textOrNull(row.configuration);
   if (!valid) return undefined;
   // With half of an identity, a log is as anonymous as with none.
   const bare = device === null || sequence === null;
-  return { device: bare ? null : device, sequence: bare ? null : sequence, day,
-    version: row.system_version ?? '', configuration: row.configuration ?? '' };
+  return { device: bare ? null : device, sequence: bare ? null : sequence,
+    day: isDay(day) ? day : null,
+    version: row.system_version ?? '' };
 }
 
 function parsed(text) {

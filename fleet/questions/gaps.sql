@@ -4,7 +4,7 @@ SELECT {day} AS of_day, @uniq(device), sum(least(gap, 366))
 FROM (
   SELECT device, s[i + 2] % 131072 AS day, @div(s[i + 2], 131072) - @div(s[i + 1], 131072) - 1 AS gap
   FROM (
-    SELECT device, s, @explode(range(length(s) - 1)) AS i
+    SELECT device, s, @explode(@indices(length(s) - 1)) AS i
     FROM (
       SELECT device, @sorted(@integer(sequence) * 131072 + @integer(day)) AS s FROM {all_logs}
       WHERE state = 'kept' GROUP BY device) AS sequences) AS neighbours) AS gaps
