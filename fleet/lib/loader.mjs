@@ -3,6 +3,7 @@
 import { createHash } from 'node:crypto';
 import fs from 'node:fs';
 import path from 'node:path';
+import { setImmediate as turn } from 'node:timers/promises';
 import { quoted } from './dialect.mjs';
 import { dateOf, exportedFiles, FleetError, readLogs } from './logs.mjs';
 import { forServer, readableRows } from './rows.mjs';
@@ -59,7 +60,7 @@ class Batch {
   months = new Set();
 
   add(log, source) {
-    this.logs.push({ ...log, bytes: log.bytes && Buffer.from(log.bytes), source });
+    this.logs.push({ ...log, source });
     this.bytes += log.length;
     if (Number.isInteger(log.header?.day)) this.months.add(dateOf(log.header.day).slice(0, 7));
     this.end = log.offset + log.length;
@@ -117,7 +118,7 @@ function ledgerRow({ header, hash, source, state }) {
 async function insertRows(server, logs, counts) {
   if (logs.length === 0) return;
   try {
-    await server.insert('rows', '', logs.flatMap(log => forServer(log.bytes)));
+    await server.insert('rows', '', [forServer(logs)]);
   } catch (error) {
     if (error.status === undefined) throw error;
     // A row that the server cannot read takes the batch with it: send those that can be read.
@@ -139,24 +140,32 @@ async function flush(server, file, batch, counts) {
   }
 }
 
+async function loadFile(server, file, counts) {
+  let batch = new Batch();
+  let sending = Promise.resolve(); // the batch before, meanwhile
+  const send = async () => {
+    await sending;
+    sending = flush(server, file, batch, counts);
+    sending.catch(() => {}); // is thrown where it is awaited
+    batch = new Batch();
+  };
+  for (const log of readLogs(file.file, await file.done(server))) {
+    if (log.partial) break;
+    batch.add(log, file.source(log.offset));
+    if (batch.full) await send();
+    else if (batch.logs.length % 100 === 0) await turn();
+  }
+  if (batch.logs.length > 0) await send();
+  await sending;
+}
+
 /** Loads the exported files of a directory that are not loaded yet; returns the logs by what became of them. */
 export async function load(server, directory) {
   const counts = { loaded: 0, resumed: 0, duplicate: 0, conflict: 0, bare: 0, undated: 0, unreadable: 0 };
   try {
     const files = exportedFiles(directory);
     if (files.length === 0) throw new FleetError(`${directory}: no exported files (*.ndjson)`);
-    for (const each of files) {
-      const file = new LoadedFile(each);
-      let batch = new Batch();
-      for (const log of readLogs(each, await file.done(server))) {
-        if (log.partial) break;
-        batch.add(log, file.source(log.offset));
-        if (!batch.full) continue;
-        await flush(server, file, batch, counts);
-        batch = new Batch();
-      }
-      if (batch.logs.length > 0) await flush(server, file, batch, counts);
-    }
+    for (const file of files) await loadFile(server, new LoadedFile(file), counts);
   } finally {
     server.close();
   }
