@@ -7,7 +7,7 @@ CREATE TABLE IF NOT EXISTS tally.rows (
   day UInt16,
   date Date,
   system_version Nullable(String),
-  version String MATERIALIZED ifNull(system_version, ''),
+  version String ALIAS ifNull(system_version, ''),
   configuration Nullable(String),
   key String,
   kind Enum8('scalar' = 1, 'distribution' = 2),
