@@ -56,16 +56,18 @@ function expanded(text, dialect) {
 }
 
 /**
- * The text of questions/NAME.sql for a dialect. Values become literals; `sql`, an object too, holds pieces
- * that are put in as they are, such as the names of tables.
+ * The text of questions/NAME.sql with pieces in their places, which are such texts too, or names of tables
+ * and columns; what the user says is never a piece.
  */
-export function statement(name, dialect, values, sql) {
-  const text = fs.readFileSync(new URL(`../questions/${name}.sql`, import.meta.url), 'utf8')
-    .replace(/^--.*\n/gm, '');
-  // Values come last and in one pass, so that none of them is taken for a macro or a placeholder.
-  const pieces = text.replace(/\{([a-z_]+)\}/g, (whole, key) => (key in sql ? sql[key] : whole));
-  return expanded(pieces, dialect).replace(/\{([a-z_]+)\}/g, (_, key) => {
-    if (!(key in values)) throw new Error(`${name}.sql: nothing for {${key}}`);
+export function template(name, pieces) {
+  return fs.readFileSync(new URL(`../questions/${name}.sql`, import.meta.url), 'utf8')
+    .replace(/^--.*\n/gm, '').replace(/\{([a-z_]+)\}/g, (whole, key) => pieces[key] ?? whole);
+}
+
+/** The statement of a template. Values become literals, last and in one pass, so that nothing reads them again. */
+export function statement(text, dialect, values) {
+  return expanded(text, dialect).replace(/\{([a-z_]+)\}/g, (_, key) => {
+    if (!(key in values)) throw new Error(`nothing for {${key}}`);
     return literal(values[key], dialect);
   });
 }

@@ -6,7 +6,7 @@ import path from 'node:path';
 import { quoted } from './dialect.mjs';
 import { exportedFiles, FleetError, LAST_DAY, readLogs } from './logs.mjs';
 
-const CONVERTED = 'parquet';
+export const CONVERTED = 'parquet';
 const MANIFEST = 'files.json';
 const LOG_COLUMNS = 'file, "offset", length, device, sequence, day, version, hash';
 const ROW_COLUMNS = {
@@ -145,8 +145,11 @@ export class DuckDb {
     });
   }
 
-  /** Writes the Parquet files beside the exported ones: sorted by key, day and device, one for a month. */
-  static async convert(directory) {
+  /**
+   * Writes the Parquet files beside the exported ones, from which they are made, or from the Parquet files if
+   * there are no others: sorted by key, day and device, one for a month. Without a device's data, if given.
+   */
+  static async convert(directory, without = '') {
     const files = exportedFiles(directory);
     const manifest = JSON.stringify(manifestOf(files));
     const engine = new DuckDb();
@@ -154,15 +157,16 @@ export class DuckDb {
     const made = path.join(directory, `.${CONVERTED}-${process.pid}`);
     await engine.connect();
     try {
-      await engine.useExported(directory, files);
+      if (files.length === 0 && fs.existsSync(folder)) await engine.useParquet(folder);
+      else await engine.useExported(directory, files);
       fs.mkdirSync(made);
-      await engine.run(`COPY (FROM logs ORDER BY day, device) TO ${text(path.join(made, 'logs.parquet'))}
+      await engine.run(`COPY (FROM logs WHERE device IS DISTINCT FROM ${text(without)} ORDER BY day, device) TO ${text(path.join(made, 'logs.parquet'))}
         (FORMAT parquet, COMPRESSION zstd)`);
       const months = await engine.query(
         `SELECT DISTINCT strftime(DATE '1970-01-01' + day, '%Y-%m') AS month FROM rows ORDER BY month`);
       for (const [month] of months.length ? months : [['none']]) {
         await engine.run(`COPY (FROM rows WHERE strftime(DATE '1970-01-01' + day, '%Y-%m') = ${text(month)}
-          ORDER BY key, day, device) TO ${text(path.join(made, `rows-${month}.parquet`))}
+          AND device <> ${text(without)} ORDER BY key, day, device) TO ${text(path.join(made, `rows-${month}.parquet`))}
           (FORMAT parquet, COMPRESSION zstd, ROW_GROUP_SIZE 61440)`);
       }
       fs.writeFileSync(path.join(made, MANIFEST), manifest);

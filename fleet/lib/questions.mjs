@@ -1,7 +1,7 @@
 // What can be asked. SQL reduces a fleet to groups; what of them may be told is decided here, by the one
 // Anonymity of an answer, and so the same for every engine.
 import fs from 'node:fs';
-import { statement } from './dialect.mjs';
+import { statement, template } from './dialect.mjs';
 import { Anonymity } from './kanonymity.mjs';
 import { dateOf, FleetError } from './logs.mjs';
 import * as coverage from './questions/coverage.mjs';
@@ -51,14 +51,15 @@ export async function ask(engine, name, given) {
   const question = QUESTIONS[name];
   const parameters = parametersFrom(name, given);
   const anonymity = new Anonymity(kOfSettings());
-  const sql = (file, values = {}, pieces = {}) =>
-    statement(file, engine.dialect, values, { ...engine.tables, ...pieces });
-  const query = (file, values, pieces) => engine.query(sql(file, values, pieces));
-  const [[last]] = await query('reference', { k: anonymity.k });
+  const values = { ...parameters };
+  const sql = (file, pieces = {}) => template(file, { ...engine.tables, ...pieces });
+  const query = (file, pieces, more = {}) => engine.query(statement(sql(file, pieces), engine.dialect, { ...values, ...more }));
+  const [[last]] = await query('reference', {}, { k: anonymity.k });
   // Fewer than K devices on every day, which one engine says with null and the other with 0.
-  const rows = last === null || last === 0 ? [] : await question.answer({
-    anonymity, parameters, query, sql, last, first: Math.max(0, last - parameters.days + 1) });
-  return { question: name, engine: engine.dialect, k: anonymity.k, until: last ? dateOf(last) : null,
+  const known = last !== null && last !== 0;
+  if (known) Object.assign(values, { last, first: Math.max(0, last - parameters.days + 1) });
+  const rows = known ? await question.answer({ anonymity, parameters, query, sql, last }) : [];
+  return { question: name, engine: engine.dialect, k: anonymity.k, until: known ? dateOf(last) : null,
     columns: question.columns, rows: rows.map(row => row.map(finite)), withheld: anonymity.withheld,
     plot: question.plot };
 }

@@ -1,4 +1,4 @@
--- Logs that never came, by the day of the next one: devices, and logs. A number may be wrong, so that a
+-- Logs that never came, by the day of the next one, the last day if that is unknown: devices, and logs. A number may be wrong, so that a
 -- gap counts for no more than a year.
 SELECT {day} AS of_day, @uniq(device), sum(least(gap, 366))
 FROM (
@@ -6,7 +6,7 @@ FROM (
   FROM (
     SELECT device, s, @explode(@indices(length(s) - 1)) AS i
     FROM (
-      SELECT device, @sorted(@integer(sequence) * 131072 + @integer(day)) AS s FROM {all_logs}
-      WHERE state = 'kept' GROUP BY device) AS sequences) AS neighbours) AS gaps
+      SELECT device, @sorted(@integer(sequence) * 131072 + coalesce(@integer(day), {last})) AS s FROM {all_logs}
+      WHERE state IN ('kept', 'undated') GROUP BY device) AS sequences) AS neighbours) AS gaps
 WHERE gap > 0 AND day BETWEEN {first} AND {last}
 GROUP BY of_day ORDER BY of_day

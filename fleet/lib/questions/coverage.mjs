@@ -8,14 +8,14 @@ export const plot = { x: 'date', y: ['devices', 'lost'], series: 'version' };
 
 const ALL = "'all'";
 
-async function groupsOf({ query, first, last }, day, version) {
+async function groupsOf({ query }, day, version) {
   const groups = new Map();
   const groupOf = (of, text) => {
     const name = `${of} ${text}`;
     if (!groups.has(name)) groups.set(name, { day: of, version: text, kept: [0, 0] });
     return groups.get(name);
   };
-  for (const [of, text, state, devices, logs] of await query('coverage', { first, last }, { day, version })) {
+  for (const [of, text, state, devices, logs] of await query('coverage', { day, version })) {
     groupOf(of, text)[state] = [devices, logs];
   }
   return { groups: [...groups.values()], groupOf };
@@ -30,14 +30,14 @@ function rowOf({ day, version, kept, lost, duplicate, conflict, undated, bare, u
 }
 
 export async function answer(context) {
-  const { anonymity, query, first, last } = context;
+  const { anonymity, query } = context;
   const ofKept = ({ kept: [devices] }) => devices;
   const { groups: whole, groupOf: ofWhole } = await groupsOf(context, '-1', ALL);
   const days = await groupsOf(context, 'coalesce(day, 0)', ALL);
-  for (const [day, devices, lost] of await query('gaps', { first, last }, { day: 'day' })) {
+  for (const [day, devices, lost] of await query('gaps', { day: 'day' })) {
     days.groupOf(day, 'all').lost = [devices, lost];
   }
-  for (const [, devices, lost] of await query('gaps', { first, last }, { day: '-1' })) {
+  for (const [, devices, lost] of await query('gaps', { day: '-1' })) {
     ofWhole(-1, 'all').lost = [devices, lost];
   }
   const dated = group => group.day > 0 && ofKept(group) > 0;

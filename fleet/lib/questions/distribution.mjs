@@ -12,18 +12,17 @@ export const plot = { x: 'date', y: ['p5', 'p25', 'p50', 'p75', 'p95'], series: 
 const ALL = null; // the version of a row about all versions
 const nameOf = (day, version) => `${day} ${version}`;
 
-async function groupsOf({ query, sql, parameters, first, last }, version) {
-  const values = { key: parameters.key, first, last };
+async function groupsOf({ query, sql }, version) {
   const pieces = { version: version ?? 'version' };
   const value = text => (version ? ALL : text);
   const groups = new Map();
-  for (const [day, text, devices, ...quantiles] of await query('distribution', values, { values: sql('values', values, pieces) })) {
+  for (const [day, text, devices, ...quantiles] of await query('distribution', { values: sql('values', pieces) })) {
     groups.set(nameOf(day, value(text)), { day, version: value(text), devices, quantiles, buckets: [] });
   }
-  for (const [day, text, devices, ...merged] of await query('merged', values, { samples: sql('samples', values, pieces) })) {
+  for (const [day, text, devices, ...merged] of await query('merged', { samples: sql('samples', pieces) })) {
     Object.assign(groups.get(nameOf(day, value(text))), { sampled: devices, merged });
   }
-  for (const [day, text, from, to, devices, samples] of await query('histogram', values, pieces)) {
+  for (const [day, text, from, to, devices, samples] of await query('histogram', pieces)) {
     groups.get(nameOf(day, value(text)))?.buckets.push({ from, to, devices, samples });
   }
   return [...groups.values()];

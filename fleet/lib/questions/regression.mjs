@@ -23,7 +23,7 @@ function verdict(p) {
 }
 
 async function versionsOf({ query, anonymity, parameters }, values) {
-  const known = anonymity.release(await query('versions', {}, { values }), row => row[1]);
+  const known = anonymity.release(await query('versions', { values }), row => row[1]);
   const given = [parameters.baseline, parameters.candidate];
   for (const version of given) {
     if (version !== '' && !known.some(row => row[0] === version)) return undefined;
@@ -32,18 +32,18 @@ async function versionsOf({ query, anonymity, parameters }, values) {
   const candidate = parameters.candidate || rest.pop();
   const baseline = parameters.baseline || rest.pop();
   if (baseline !== undefined && baseline === candidate) throw new FleetError('regression: two different versions are needed');
-  return baseline === undefined || candidate === undefined ? undefined : [baseline, candidate];
+  return baseline === undefined || candidate === undefined ? undefined : { baseline, candidate };
 }
 
-function typical(anonymity, before, after) {
+function typical(before, after) {
   const { one, other, difference, low, high, p } = trimmedDifference(before, after);
   return [one, other, difference, low, high, ...verdict(p)];
 }
 
 /** Few devices with a multiple of what they had hide behind the mean, but not among the highest. */
-async function tail({ anonymity, query }, before, after, means) {
-  const values = { tail: before.tail, slack: Math.abs(before.tail) * 1e-12 };
-  const above = new Map(await query('tails', values, { means }));
+async function tail({ anonymity, query, means, versions }, before, after) {
+  const limit = { tail: before.tail, slack: Math.abs(before.tail) * 1e-12 };
+  const above = new Map(await query('tails', { means }, { ...versions, ...limit }));
   const counts = [above.get(before.version) ?? 0, above.get(after.version) ?? 0];
   const { difference, low, high, p } = shareDifference(counts[0], before.devices, counts[1], after.devices);
   const share = anonymity.share(counts[1], after.devices);
@@ -52,9 +52,8 @@ async function tail({ anonymity, query }, before, after, means) {
   return [...told, ...verdict(p)];
 }
 
-async function pairs({ anonymity, query }, before, after, means) {
-  const [[both, rose, fell]] = await query('pairs',
-    { baseline: before.version, candidate: after.version, factor: FACTOR }, { means });
+async function pairs({ anonymity, query, means, versions }) {
+  const [[both, rose, fell]] = await query('pairs', { means }, { ...versions, factor: FACTOR });
   if (both < anonymity.k) return undefined;
   const shares = [anonymity.share(fell, both), anonymity.share(rose, both)];
   // One group the fewer of which are few is told as one that has none.
@@ -66,20 +65,22 @@ const groupOf = ([version, devices, top, middle, cut, least, greatest, sum, squa
   ({ version, devices, tail: top, middle, cut, least, greatest, sum, squares });
 
 export async function answer(context) {
-  const { anonymity, query, sql, parameters, first, last } = context;
-  const values = sql('values', { key: parameters.key, first, last }, { version: 'version' });
+  const { anonymity, query, sql } = context;
+  const values = sql('values', { version: 'version' });
   const versions = await versionsOf(context, values);
   if (versions === undefined) return [];
-  const means = sql('means', { versions }, { values });
-  const groups = (await query('regression', {}, { means })).map(groupOf);
-  const [before, after] = versions.map(version => groups.find(group => group.version === version));
-  const head = test => [test, ...versions];
+  const means = sql('means', { values });
+  const groups = (await query('regression', { means }, versions)).map(groupOf);
+  const names = [versions.baseline, versions.candidate];
+  const [before, after] = names.map(version => groups.find(group => group.version === version));
+  const head = test => [test, ...names];
   const devices = [before, after].map(group => anonymity.devices(group.devices));
+  const compared = { ...context, means, versions };
   const rows = [
-    [...head('typical'), ...devices, ...typical(anonymity, before, after)],
-    [...head('tail'), ...devices, ...await tail(context, before, after, means)],
+    [...head('typical'), ...devices, ...typical(before, after)],
+    [...head('tail'), ...devices, ...await tail(compared, before, after)],
   ];
-  const paired = await pairs(context, before, after, means);
+  const paired = await pairs(compared);
   if (paired === undefined) anonymity.withheld++;
   else rows.push([...head('paired'), anonymity.devices(paired.both), anonymity.devices(paired.both), ...paired.row]);
   return rows;

@@ -8,8 +8,8 @@ export const plot = { x: 'key', y: ['share'] };
 
 const RECENT = 7; // days without the key, and with a log
 
-export async function answer({ anonymity, query, last, first }) {
-  const found = await query('silence', { first, last, recent: last - RECENT + 1 });
+export async function answer({ anonymity, query, last }) {
+  const found = await query('silence', {}, { recent: last - RECENT + 1 });
   return anonymity.release(found, ([, , silent]) => silent, ([key]) => key)
     .sort((one, other) => other[2] / other[1] - one[2] / one[1] || (one[0] < other[0] ? -1 : 1))
     .map(([key, senders, silent, day]) => {

@@ -34,12 +34,12 @@ function daysOf(share, support, [counted, supported, median]) {
   return [median * Math.exp(spread * normalQuantile(share)), 'extrapolated'];
 }
 
-export async function answer({ anonymity, query, sql, parameters, first, last }) {
-  const { key, limit } = parameters;
+export async function answer({ anonymity, query, sql, parameters, last }) {
+  const { limit } = parameters;
   const step = limit / STEPS;
-  const fits = sql('fits', { last, limit, never: NEVER, shortest: SHORTEST },
-    { values: sql('values', { key, first, last }, { version: "''" }) });
-  const ofWear = await query('wear', { step }, { fits });
+  const fits = sql('fits', { values: sql('values', { version: "''" }) });
+  const lines = { never: NEVER, shortest: SHORTEST };
+  const ofWear = await query('wear', { fits }, { ...lines, step });
   const all = ofWear.reduce((sum, [, devices]) => sum + devices, 0);
   if (all < anonymity.k) {
     anonymity.withheld += all > 0 ? 1 : 0;
@@ -52,7 +52,7 @@ export async function answer({ anonymity, query, sql, parameters, first, last })
       anonymity.withheld++;
       continue;
     }
-    const [days, method] = daysOf(share, support, (await query('remaining', { level: share, support }, { fits }))[0]);
+    const [days, method] = daysOf(share, support, (await query('remaining', { fits }, { ...lines, level: share, support }))[0]);
     const date = days === null || days >= NEVER ? null : dateOf(last + Math.round(days));
     rows.push(['reached', limit, null, anonymity.devices(all), share, date, method]);
   }
