@@ -20,10 +20,12 @@ fi
 optional_test_packages=(
   rustc gccgo curl
   netcat-openbsd socat python3-statsd python3-aiodogstatsd libnet-statsd-perl ruby-statsd npm
-  chromium chromium-driver
+  chromium chromium-driver clickhouse-server clickhouse-client
 )
 # The same from npm, below build/npm-clients.
-optional_npm_packages=(unix-dgram@2.0.7 hot-shots@17.1.1 node-statsd@0.1.1 axe-core@4.14.1)
+optional_npm_packages=(
+  unix-dgram@2.0.7 hot-shots@17.1.1 node-statsd@0.1.1 axe-core@4.14.1 @duckdb/node-api@1.5.6-r.1
+)
 
 say() { printf '\n== %s\n' "$*"; }
 fail() {
