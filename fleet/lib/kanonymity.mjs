@@ -22,9 +22,20 @@ export class Anonymity {
     return this.value(number, Math.round(count / this.k) * this.k);
   }
 
-  /** The share of some of the devices, if those and the others are enough. */
+  /** The share of some of the devices, from rounded numbers, if those and the others are enough. */
   share(some, all) {
-    return some < this.k || all - some < this.k ? null : some / all;
+    return some < this.k || all - some < this.k ? null : this.devices(some) / this.devices(all);
+  }
+
+  /** A bound of a share in steps of K devices; `towards` is Math.floor or Math.ceil. */
+  bound(value, all, towards) {
+    const step = this.k / this.devices(all);
+    return towards(value / step) * step;
+  }
+
+  /** Whether those left out of some devices may be found by subtraction: they are none, or enough. */
+  separable(all, some) {
+    return all === some || all - some >= this.k;
   }
 
   /** The value of rank ceil(level * number), with K devices on each side of it, itself included. */

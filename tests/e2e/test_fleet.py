@@ -136,6 +136,13 @@ class Fleet(unittest.TestCase):
                     self.assertIsNone(row["p1"])
                 for row in ask("coverage", data=data).rows:
                     self.assertTrue(row["devices"] >= K and row["devices"] % K == 0 and row["logs"] % K == 0)
+        # A few devices that lack a histogram, or send a scalar, do not show as the difference of two sums.
+        few = {"no histogram": samples(9, 5, 1.0), "a scalar": 5}
+        for name, row in few.items():
+            data = self.data(a="".join(log(device, 1, DAY, ("d", samples(9, 5, 1.0, **common) if device % 50 else row))
+                                       for device in range(150)))
+            row = ask("distribution", data=data, key="d").only(version=None)
+            self.assertEqual((row["devices"], row["counts"], row["samples"]), (150, None, None if name == "a scalar" else 1350))
         for wrong in ("days=8", "device=1", "limit"):
             self.assertIn("tallyfleet: ", tool("ask", "coverage", "--data", data, "--param", wrong,
                                                status=2 if wrong == "limit" else 1))
@@ -168,8 +175,10 @@ class Fleet(unittest.TestCase):
             for shard in shards:
                 tool("schema", "--server", shard.address, "--cluster", "fleet")
             # Two loaders at once, one of which is killed; then again from the other shard.
-            victim = subprocess.Popen(["node", fleet.TOOL, "load", "--server", shards[0].address, data])
-            other = subprocess.Popen(["node", fleet.TOOL, "load", "--server", shards[1].address, data])
+            victim = subprocess.Popen(["node", fleet.TOOL, "load", "--server", shards[0].address, data],
+                                      stdout=subprocess.DEVNULL)
+            other = subprocess.Popen(["node", fleet.TOOL, "load", "--server", shards[1].address, data],
+                                      stdout=subprocess.DEVNULL)
             while victim.poll() is None and shards[0].query("SELECT count() FROM tally.rows") == "0\n":
                 pass
             victim.send_signal(signal.SIGKILL)

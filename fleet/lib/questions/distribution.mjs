@@ -19,34 +19,48 @@ async function groupsOf({ query, sql }, version) {
   for (const [day, text, devices, ...quantiles] of await query('distribution', { values: sql('values', pieces) })) {
     groups.set(nameOf(day, value(text)), { day, version: value(text), devices, quantiles, buckets: [] });
   }
-  for (const [day, text, devices, ...merged] of await query('merged', { samples: sql('samples', pieces) })) {
-    Object.assign(groups.get(nameOf(day, value(text))), { sampled: devices, merged });
+  const merged = await query('merged', { samples: sql('samples', pieces) });
+  for (const [day, text, devices, ...figures] of merged) {
+    Object.assign(groups.get(nameOf(day, value(text))), { sampled: devices, merged: figures });
   }
-  for (const [day, text, from, to, devices, samples] of await query('histogram', pieces)) {
-    groups.get(nameOf(day, value(text)))?.buckets.push({ from, to, devices, samples });
+  if (merged.length > 0) {
+    const buckets = sql('buckets', pieces);
+    for (const [day, text, devices] of await query('bucketed', { buckets })) groups.get(nameOf(day, value(text))).bucketed = devices;
+    for (const [day, text, from, to, devices, samples] of await query('histogram', { buckets })) {
+      groups.get(nameOf(day, value(text))).buckets.push({ from, to, devices, samples });
+    }
   }
   return [...groups.values()];
 }
 
+/** The days of which samples may be told, and of which histograms: not if a subtraction shows few devices. */
+function tellable(groups, anonymity) {
+  const without = condition => new Set(groups.filter(group => !condition(group)).map(({ day }) => day));
+  const samples = without(({ devices, sampled = 0 }) => anonymity.separable(devices, sampled));
+  const buckets = without(({ sampled = 0, bucketed = 0 }) => anonymity.separable(sampled, bucketed));
+  return { samples: ({ day }) => !samples.has(day), buckets: ({ day }) => !samples.has(day) && !buckets.has(day) };
+}
+
 const bound = (value, open) => value ?? open;
 
-function rowOf(group, anonymity) {
+function rowOf(group, anonymity, told) {
   const { devices, sampled = 0, merged: [samples, mean, squares] = [] } = group;
   const buckets = anonymity.buckets(group.buckets.sort((one, other) =>
     bound(one.to, Infinity) - bound(other.to, Infinity) || bound(one.from, -Infinity) - bound(other.from, -Infinity)), false);
-  // Devices that send the key as the other kind are few, or the two are two groups.
-  const told = devices - sampled === 0 || devices - sampled >= anonymity.k;
-  const lists = buckets.length && told ? ['from', 'to', 'samples'].map(part => buckets.map(bucket => bucket[part])) : [null, null, null];
+  const lists = ['from', 'to', 'samples'].map(part =>
+    (buckets.length > 0 && told.buckets(group) ? buckets.map(bucket => bucket[part]) : null));
   return [dateOf(group.day), group.version, anonymity.devices(devices),
     ...LEVELS.map((level, index) => anonymity.quantile(devices, level, group.quantiles[index])),
-    ...[samples, mean, Math.sqrt(squares / samples)].map(value => (told ? anonymity.value(sampled, value) : null)), ...lists];
+    ...[samples, mean, Math.sqrt(squares / samples)].map(value => (told.samples(group) ? anonymity.value(sampled, value) : null)), ...lists];
 }
 
 export async function answer(context) {
   const { anonymity } = context;
   const ofVersions = anonymity.release(await groupsOf(context), group => group.devices, group => group.day);
   const ofAll = anonymity.release(await groupsOf(context, "'all'"), group => group.devices, group => group.day);
-  return [...ofAll, ...ofVersions]
+  const groups = [...ofAll, ...ofVersions];
+  const told = tellable(groups, anonymity);
+  return groups
     .sort((one, other) => one.day - other.day || (one.version === ALL ? -1 : other.version === ALL ? 1 : one.version < other.version ? -1 : 1))
-    .map(group => rowOf(group, anonymity));
+    .map(group => rowOf(group, anonymity, told));
 }

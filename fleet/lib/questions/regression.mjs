@@ -14,6 +14,7 @@ export const columns = ['test', 'baseline', 'candidate', 'devices_baseline', 'de
 export const plot = { x: 'test', y: ['difference'], low: 'low', high: 'high' };
 
 const PROBABILITIES = [0.001, 0.01, 0.05];
+const TOP = 0.01; // of the baseline's devices are above the limit of the tail
 const FACTOR = 1.5; // a figure that rose or fell by half
 
 /** Whether a difference is found, and how sure; the exact probability would tell counts. */
@@ -45,11 +46,12 @@ async function tail({ anonymity, query, means, versions }, before, after) {
   const limit = { tail: before.tail, slack: Math.abs(before.tail) * 1e-12 };
   const above = new Map(await query('tails', { means }, { ...versions, ...limit }));
   const counts = [above.get(before.version) ?? 0, above.get(after.version) ?? 0];
-  const { difference, low, high, p } = shareDifference(counts[0], before.devices, counts[1], after.devices);
+  const { low, high, p } = shareDifference(counts[0], before.devices, counts[1], after.devices);
   const share = anonymity.share(counts[1], after.devices);
+  if (share === null) return [null, null, null, null, null, ...verdict(p)];
+  const bounds = [[low, Math.floor], [high, Math.ceil]].map(([value, towards]) => anonymity.bound(value, after.devices, towards));
   // The baseline's share is 1 % by the choice of the limit, and says nothing of its devices.
-  const told = share === null ? [null, null, null, null, null] : [0.01, share, difference, low, high];
-  return [...told, ...verdict(p)];
+  return [TOP, share, share - TOP, ...bounds, ...verdict(p)];
 }
 
 async function pairs({ anonymity, query, means, versions }) {
