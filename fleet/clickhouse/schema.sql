@@ -1,14 +1,14 @@
 -- One row for each row of an export. The same log again gives the same sorting key, and the rows become
--- one. The mean is kept as its bits, since the server's parser of numbers may be off by the last one,
--- which a small variance beside a large mean would show.
+-- one. A device is 64 bits of its pseudonym's hash, since 32 random digits would be most of a row. The
+-- mean is kept as its bits, since the server's parser of numbers may be off by the last one, which a small
+-- variance beside a large mean would show.
 CREATE TABLE IF NOT EXISTS tally.rows (
-  device String,
+  device UInt64,
   sequence UInt64,
   day UInt16,
-  date Date,
-  system_version Nullable(String),
-  version String ALIAS ifNull(system_version, ''),
-  configuration Nullable(String),
+  date Date DEFAULT toDate(day),
+  version String,
+  configuration String,
   key String,
   kind Enum8('scalar' = 1, 'distribution' = 2),
   value Int64,
@@ -24,9 +24,9 @@ CREATE TABLE IF NOT EXISTS tally.rows (
 ) ENGINE = ReplacingMergeTree() PARTITION BY toYYYYMM(date) ORDER BY (key, day, device, sequence, kind);
 
 -- One row for each place where a log was found: the log that is kept, and those that are not.
--- Device and sequence are empty for a log without them.
+-- Device and sequence are 0 for a log without them.
 CREATE TABLE IF NOT EXISTS tally.logs (
-  device String,
+  device UInt64,
   sequence UInt64,
   day Nullable(UInt16),
   date Date,

@@ -1,8 +1,8 @@
 // The engine for more than one machine: ClickHouse, through its HTTP interface.
 import fs from 'node:fs';
 import http from 'node:http';
-import { quoted } from './dialect.mjs';
 import { FleetError } from './logs.mjs';
+import { deviceNumber } from './rows.mjs';
 
 const SETTINGS = {
   output_format_json_quote_64bit_integers: 0,
@@ -15,8 +15,6 @@ const SETTINGS = {
   max_insert_block_size: 10000000,
 };
 const TABLES = ['rows', 'logs', 'files'];
-
-const text = value => quoted(value, 'clickhouse');
 
 /** The statements of a file, without its comments. */
 function statementsOf(name, cluster) {
@@ -71,7 +69,7 @@ export class ClickHouse {
 
   /** Deletes all of a device on this server; on a cluster, ask each of its servers. */
   async forget(device) {
-    for (const table of ['rows', 'logs']) await this.run(`ALTER TABLE tally.${table} DELETE WHERE device = ${text(device)}`);
+    for (const table of ['rows', 'logs']) await this.run(`ALTER TABLE tally.${table} DELETE WHERE device = ${deviceNumber(device)}`);
     // The server deletes later, and answers meanwhile with the old parts.
     for (;;) {
       const [[left]] = await this.query("SELECT count() FROM system.mutations WHERE database = 'tally' AND is_done = 0");

@@ -6,7 +6,7 @@ import path from 'node:path';
 import { setImmediate as turn } from 'node:timers/promises';
 import { quoted } from './dialect.mjs';
 import { dateOf, exportedFiles, FleetError, readLogs } from './logs.mjs';
-import { forServer, readableRows } from './rows.mjs';
+import { deviceNumber, forServer, readableRows } from './rows.mjs';
 
 const BATCH_BYTES = 64 << 20;
 const BATCH_LOGS = 5000;
@@ -71,7 +71,7 @@ class Batch {
   }
 }
 
-const identityOf = ({ header, hash }) => (header.device === null ? hash : `${header.device} ${header.sequence}`);
+const identityOf = ({ header, hash }) => (header.device === null ? hash : `${deviceNumber(header.device)} ${header.sequence}`);
 
 /** What the server knows of the batch's identities: the hash of the log that was kept, and from where. */
 async function knownLogs(server, batch) {
@@ -79,16 +79,16 @@ async function knownLogs(server, batch) {
   const named = readable.filter(({ header }) => header.device !== null);
   const known = new Map();
   const take = ([device, sequence, hash, source]) =>
-    known.set(device === '' ? hash : `${device} ${sequence}`, { hash, source });
-  const ask = async condition => (await server.query(`SELECT device, sequence, hash, source FROM ${server.names.logs}
-    WHERE state IN ('kept', 'undated', 'bare') AND ${condition}`)).forEach(take);
+    known.set(device === '0' ? hash : `${device} ${sequence}`, { hash, source });
+  const ask = async condition => (await server.query(`SELECT toString(device), sequence, hash, source
+    FROM ${server.names.logs} WHERE state IN ('kept', 'undated', 'bare') AND ${condition}`)).forEach(take);
   if (named.length > 0) {
     const sequences = named.map(({ header }) => header.sequence);
-    await ask(`device IN (${text([...new Set(named.map(({ header }) => header.device))])})
+    await ask(`device IN (${[...new Set(named.map(({ header }) => deviceNumber(header.device)))].join(', ')})
       AND sequence BETWEEN ${Math.min(...sequences)} AND ${Math.max(...sequences)}`);
   }
   const bare = readable.filter(({ header }) => header.device === null).map(({ hash }) => hash);
-  if (bare.length > 0) await ask(`device = '' AND hash IN (${text(bare)})`);
+  if (bare.length > 0) await ask(`device = 0 AND hash IN (${text(bare)})`);
   return known;
 }
 
@@ -110,8 +110,8 @@ function classify(batch, known) {
 }
 
 function ledgerRow({ header, hash, source, state }) {
-  const { device, sequence, day = null, version } = header ?? {};
-  return { device: device ?? '', sequence: sequence ?? 0, day, date: dateOf(day ?? 0), version: version ?? '',
+  const { device = null, sequence, day = null, version } = header ?? {};
+  return { device: deviceNumber(device), sequence: sequence ?? 0, day, date: dateOf(day ?? 0), version: version ?? '',
     hash: hash ?? '', source, state };
 }
 

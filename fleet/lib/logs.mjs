@@ -48,7 +48,7 @@ function headerOf(row) {
   const bare = device === null || sequence === null;
   return { device: bare ? null : device, sequence: bare ? null : sequence,
     day: isDay(day) ? day : null,
-    version: row.system_version ?? '' };
+    version: row.system_version ?? '', configuration: row.configuration ?? '' };
 }
 
 function parsed(text) {
@@ -109,7 +109,8 @@ class Run {
 
 /**
  * Yields the logs of a file from an offset on, and what is none:
- * { header, bytes, hash, offset, length, rows }, or { refused: true, offset, length } for a line that
+ * { header, headerLength, bytes, hash, offset, length, rows }, where each line repeats the header in its
+ * first `headerLength` bytes, or anywhere if that is 0; or { refused: true, offset, length } for a line that
  * cannot be read; `partial` if it is the last one and lacks its end, since whoever writes it may not be
  * done.
  */
@@ -169,6 +170,6 @@ function withSpace(bytes, keep, filled, file) {
 
 function finished(run, bytes, base) {
   const log = bytes.subarray(run.begin, run.end);
-  return { header: run.header, bytes: log, hash: createHash('sha256').update(log).digest('hex').slice(0, 32),
+  return { header: run.header, headerLength: run.first.length, bytes: log, hash: createHash('sha256').update(log).digest('hex').slice(0, 32),
     offset: base + run.begin, length: log.length, rows: run.rows };
 }
