@@ -23,8 +23,8 @@ function verdict(p) {
   return [below ?? null, below !== undefined];
 }
 
-async function versionsOf({ query, anonymity, parameters }, values) {
-  const known = anonymity.release(await query('versions', { values }), row => row[1]);
+async function versionsOf({ query, anonymity, parameters }) {
+  const known = anonymity.release(await query('versions'), row => row[1]);
   const given = [parameters.baseline, parameters.candidate];
   for (const version of given) {
     if (version !== '' && !known.some(row => row[0] === version)) return undefined;
@@ -68,10 +68,9 @@ const groupOf = ([version, devices, top, middle, cut, least, greatest, sum, squa
 
 export async function answer(context) {
   const { anonymity, query, sql } = context;
-  const values = sql('values', { version: 'version' });
-  const versions = await versionsOf(context, values);
+  const versions = await versionsOf(context);
   if (versions === undefined) return [];
-  const means = sql('means', { values });
+  const means = sql('means', { values: sql('values', { version: 'version' }) });
   const groups = (await query('regression', { means }, versions)).map(groupOf);
   const names = [versions.baseline, versions.candidate];
   const [before, after] = names.map(version => groups.find(group => group.version === version));
