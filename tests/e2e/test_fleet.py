@@ -1,6 +1,7 @@
 """Questions about a fleet: both engines find what is in the data, agree, and tell nothing of few devices."""
 import pathlib
 import random
+import re
 import shutil
 import signal
 import subprocess
@@ -162,6 +163,18 @@ class Fleet(unittest.TestCase):
         tool("forget", f"{1000:032x}", "--data", copy)
         self.assertEqual(ask("distribution", data=copy, key="new").rows, [], "one device fewer than K")
 
+    def run_document(self, address=None):
+        """The commands of docs/fleet.md that take files, or those that take a server."""
+        folder = pathlib.Path(tempfile.mkdtemp(dir=self.folder))
+        shutil.copytree(self.generated(), folder / "exported")
+        lines = re.findall(r"^node fleet/tallyfleet.mjs (.*)$", (TOP / "docs/fleet.md").read_text(), re.MULTILINE)
+        for line in lines:
+            if ("--server" in line) == (address is not None):
+                tool(*line.replace("exported", str(folder / "exported")).replace("localhost:8123", address or "").split())
+
+    def test_the_document_s_commands_run(self):
+        self.run_document()
+
     def engines(self, data):
         """What ask takes for DuckDB and, if there is one, for a server that has loaded the same."""
         return Engines(self.folder, data)
@@ -171,6 +184,8 @@ class Fleet(unittest.TestCase):
         data, untidy = self.generated(), self.untidy()
         with tempfile.TemporaryDirectory(dir=self.folder) as folder, local_servers.running(f"{folder}/one") as (one,), \
                 local_servers.running(f"{folder}/two", 2) as shards:
+            self.run_document(one.address)
+            one.query("DROP DATABASE tally")
             tool("schema", "--server", one.address)
             for shard in shards:
                 tool("schema", "--server", shard.address, "--cluster", "fleet")
