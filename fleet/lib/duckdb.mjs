@@ -6,7 +6,7 @@ import path from 'node:path';
 import { quoted } from './dialect.mjs';
 import { exportedFiles, FleetError, LAST_DAY, readLogs } from './logs.mjs';
 
-export const CONVERTED = 'parquet';
+const CONVERTED = 'parquet';
 const MANIFEST = 'files.json';
 const LOG_COLUMNS = 'file, "offset", length, device, sequence, day, version, hash';
 const ROW_COLUMNS = {
@@ -25,7 +25,8 @@ function library() {
 }
 
 const text = value => quoted(value, 'duckdb');
-const pattern = folder => `${folder.replace(/[[\]*?]/g, '[$&]')}/rows-*.parquet`;
+// The names of files are patterns to DuckDB.
+const exactly = file => file.replace(/[[\]*?]/g, '[$&]');
 
 function manifestOf(files) {
   return files.map(file => {
@@ -34,19 +35,45 @@ function manifestOf(files) {
   });
 }
 
-/** The folder of Parquet files that hold what the exported files hold now. */
-function convertedFolder(directory, files) {
+/** The manifest of the Parquet files, if there are any. Those that a conversion put aside before it ended come back. */
+function manifestIn(directory) {
   const folder = path.join(directory, CONVERTED);
-  let manifest;
+  if (!fs.existsSync(folder) && fs.existsSync(aside(directory))) fs.renameSync(aside(directory), folder);
   try {
-    manifest = fs.readFileSync(path.join(folder, MANIFEST), 'utf8');
+    return fs.readFileSync(path.join(folder, MANIFEST), 'utf8');
   } catch {
     return undefined;
   }
-  // Whoever keeps the Parquet files only has removed the others.
-  if (files.length === 0 || manifest === JSON.stringify(manifestOf(files))) return folder;
-  process.stderr.write(`${folder}: older than the exported files, which are read instead; see convert\n`);
-  return undefined;
+}
+
+const aside = directory => path.join(directory, `.${CONVERTED}.former`);
+
+export const hasConverted = directory => manifestIn(directory) !== undefined;
+
+/** Whether the Parquet files hold what there is: what the exported files hold now, or all if there are none. */
+function isConverted(directory, files) {
+  const manifest = manifestIn(directory);
+  if (manifest === undefined) return false;
+  if (files.length === 0 || manifest === JSON.stringify(manifestOf(files))) return true;
+  const gone = JSON.parse(manifest).find(({ name }) => !fs.existsSync(path.join(directory, name)));
+  if (gone) {
+    throw new FleetError(`${directory}: ${CONVERTED} holds ${gone.name}, which is gone, and there are new files: ` +
+      'put it back, or give new files a directory of their own');
+  }
+  return false;
+}
+
+function replaceFolder(directory, made) {
+  for (const name of fs.readdirSync(made)) {
+    const descriptor = fs.openSync(path.join(made, name));
+    fs.fsyncSync(descriptor);
+    fs.closeSync(descriptor);
+  }
+  const folder = path.join(directory, CONVERTED);
+  fs.rmSync(aside(directory), { recursive: true, force: true });
+  if (fs.existsSync(folder)) fs.renameSync(folder, aside(directory));
+  fs.renameSync(made, folder);
+  fs.rmSync(aside(directory), { recursive: true, force: true });
 }
 
 export class DuckDb {
@@ -59,8 +86,7 @@ export class DuckDb {
     await engine.connect();
     try {
       const files = exportedFiles(directory);
-      const converted = convertedFolder(directory, files);
-      if (converted) await engine.useParquet(converted);
+      if (isConverted(directory, files)) await engine.useParquet(path.join(directory, CONVERTED));
       else await engine.useExported(directory, files, key);
     } catch (error) {
       engine.close();
@@ -96,8 +122,8 @@ export class DuckDb {
   }
 
   async useParquet(folder) {
-    await this.run(`CREATE VIEW logs AS FROM read_parquet(${text(path.join(folder, 'logs.parquet'))});
-      CREATE VIEW rows AS FROM read_parquet(${text(pattern(folder))})`);
+    await this.run(`CREATE VIEW logs AS FROM read_parquet(${text(`${exactly(folder)}/logs.parquet`)});
+      CREATE VIEW rows AS FROM read_parquet(${text(`${exactly(folder)}/rows-*.parquet`)})`);
   }
 
   async useExported(directory, files, key) {
@@ -106,7 +132,7 @@ export class DuckDb {
     const cleaned = await this.withoutRefused(files);
     const columns = Object.entries(ROW_COLUMNS).map(([name, type]) => `"${name}": '${type}'`).join(', ');
     await this.run(`CREATE TABLE rows AS SELECT *, coalesce(system_version, '') AS version
-      FROM read_ndjson([${text(cleaned)}], columns = {${columns}}, ignore_errors = true)
+      FROM read_ndjson([${text(cleaned.map(exactly))}], columns = {${columns}}, ignore_errors = true)
       WHERE device IS NOT NULL AND sequence IS NOT NULL AND day BETWEEN 0 AND ${LAST_DAY}
         AND (kind = 'scalar' AND value IS NOT NULL OR kind = 'distribution' AND "count" BETWEEN 0 AND 4294967295)
         AND ${key === undefined ? 'key IS NOT NULL' : `key = ${text(key)}`}`);
@@ -152,12 +178,13 @@ export class DuckDb {
   static async convert(directory, without = '') {
     const files = exportedFiles(directory);
     const manifest = JSON.stringify(manifestOf(files));
+    const converted = isConverted(directory, files);
     const engine = new DuckDb();
     const folder = path.join(directory, CONVERTED);
     const made = path.join(directory, `.${CONVERTED}-${process.pid}`);
     await engine.connect();
     try {
-      if (files.length === 0 && fs.existsSync(folder)) await engine.useParquet(folder);
+      if (files.length === 0 && converted) await engine.useParquet(folder);
       else await engine.useExported(directory, files);
       fs.mkdirSync(made);
       await engine.run(`COPY (FROM logs WHERE device IS DISTINCT FROM ${text(without)} ORDER BY day, device) TO ${text(path.join(made, 'logs.parquet'))}
@@ -170,8 +197,7 @@ export class DuckDb {
           (FORMAT parquet, COMPRESSION zstd, ROW_GROUP_SIZE 61440)`);
       }
       fs.writeFileSync(path.join(made, MANIFEST), manifest);
-      fs.rmSync(folder, { recursive: true, force: true });
-      fs.renameSync(made, folder);
+      replaceFolder(directory, made);
     } finally {
       engine.close();
       fs.rmSync(made, { recursive: true, force: true });

@@ -1,7 +1,6 @@
 // Deletes a device's data from exported files, and from what was made of them.
 import fs from 'node:fs';
-import path from 'node:path';
-import { CONVERTED, DuckDb } from './duckdb.mjs';
+import { DuckDb, hasConverted } from './duckdb.mjs';
 import { exportedFiles, readLogs } from './logs.mjs';
 
 /** Rewrites a file without a device's logs; what is no log is kept out too if it names the device. */
@@ -28,5 +27,5 @@ function rewrite(file, device) {
 export async function forgetInFiles(directory, device) {
   const files = exportedFiles(directory);
   for (const file of files) rewrite(file, device);
-  if (fs.existsSync(path.join(directory, CONVERTED))) await DuckDb.convert(directory, device);
+  if (hasConverted(directory)) await DuckDb.convert(directory, device);
 }

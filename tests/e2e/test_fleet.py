@@ -155,11 +155,16 @@ class Fleet(unittest.TestCase):
             tool("convert", copy)
             for question, parameters in questions:
                 self.assertEqual(ask(question, data=copy, **parameters).all, ask(question, data=data, **parameters).all)
-        (copy / "d.ndjson").write_text("".join(log(device, 1, DAY, ("new", 1)) for device in range(1000, 1000 + K)))
+        (copy / "d[1].ndjson").write_text("".join(log(device, 1, DAY, ("new", 1)) for device in range(1000, 1000 + K)))
         self.assertEqual(len(ask("distribution", data=copy, key="new").rows), 2)
         tool("convert", copy)
         for file in copy.glob("*.ndjson"):
             file.unlink()
+        (copy / "new[1].ndjson").write_text(log(1, 1, DAY, ("new", 1)))
+        for command in (("ask", "coverage", "--data", copy), ("convert", copy)):
+            self.assertIn("is gone", tool(*command, status=1), "or the Parquet files' data would be")
+        (copy / "new[1].ndjson").unlink()
+        (copy / "parquet").rename(copy / ".parquet.former")  # as if a conversion had been switched off
         tool("forget", f"{1000:032x}", "--data", copy)
         self.assertEqual(ask("distribution", data=copy, key="new").rows, [], "one device fewer than K")
 
