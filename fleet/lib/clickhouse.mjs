@@ -40,7 +40,8 @@ export class ClickHouse {
     const name = table => `tally.${table}${this.sharded ? '_all' : ''}`;
     this.names = Object.fromEntries(TABLES.map(table => [table, name(table)]));
     // FINAL drops repeated rows before the server has merged them; without it where they make no difference.
-    this.tables = { rows: `${name('rows')} FINAL`, logs: `${name('logs')} FINAL`, all_rows: name('rows'), all_logs: name('logs') };
+    this.tables = { rows: `${name('rows')} FINAL`, logs: `${name('logs')} FINAL`,
+      all_rows: name('rows'), all_logs: name('logs') };
     return this;
   }
 
@@ -69,7 +70,8 @@ export class ClickHouse {
 
   /** Deletes all of a device on this server; on a cluster, ask each of its servers. */
   async forget(device) {
-    for (const table of ['rows', 'logs']) await this.run(`ALTER TABLE tally.${table} DELETE WHERE device = ${deviceNumber(device)}`);
+    const number = deviceNumber(device);
+    for (const table of ['rows', 'logs']) await this.run(`ALTER TABLE tally.${table} DELETE WHERE device = ${number}`);
     // The server deletes later, and answers meanwhile with the old parts.
     for (;;) {
       const [[left]] = await this.query("SELECT count() FROM system.mutations WHERE database = 'tally' AND is_done = 0");
@@ -87,8 +89,10 @@ export class ClickHouse {
         const parts = [];
         response.on('data', part => parts.push(part)).on('error', reject).on('end', () => {
           const said = Buffer.concat(parts).toString();
-          if (response.statusCode === 200) resolve(said);
-          else reject(Object.assign(new FleetError(`the server refuses: ${said.slice(0, 400).replace(/\s+/g, ' ')}`), { status: response.statusCode }));
+          const { statusCode: status } = response;
+          const short = said.slice(0, 400).replace(/\s+/g, ' ');
+          if (status === 200) resolve(said);
+          else reject(Object.assign(new FleetError(`the server refuses: ${short}`), { status }));
         });
       });
       request.on('error', error => reject(new FleetError(`${this.host}:${this.port}: ${error.message}`)));

@@ -21,7 +21,10 @@ const OPTIONS = {
 };
 
 const COMMANDS = {
-  ask: { takes: ['QUESTION'], usage: '--data DIR | --engine clickhouse --server HOST:PORT [--json] [--param NAME=VALUE]...', run: runAsk },
+  ask: {
+    takes: ['QUESTION'], run: runAsk,
+    usage: '--data DIR | --engine clickhouse --server HOST:PORT [--json] [--param NAME=VALUE]...',
+  },
   convert: { takes: ['DIR'], usage: '', run: async ([directory]) => print(await DuckDb.convert(directory)) },
   schema: { takes: [], usage: '--server HOST:PORT [--cluster NAME]', run: runSchema },
   load: { takes: ['DIR'], usage: '--server HOST:PORT [--json]', run: runLoad },

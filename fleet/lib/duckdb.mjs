@@ -187,8 +187,8 @@ export class DuckDb {
       if (files.length === 0 && converted) await engine.useParquet(folder);
       else await engine.useExported(directory, files);
       fs.mkdirSync(made);
-      await engine.run(`COPY (FROM logs WHERE device IS DISTINCT FROM ${text(without)} ORDER BY day, device) TO ${text(path.join(made, 'logs.parquet'))}
-        (FORMAT parquet, COMPRESSION zstd)`);
+      await engine.run(`COPY (FROM logs WHERE device IS DISTINCT FROM ${text(without)} ORDER BY day, device)
+        TO ${text(path.join(made, 'logs.parquet'))} (FORMAT parquet, COMPRESSION zstd)`);
       const months = await engine.query(
         `SELECT DISTINCT strftime(DATE '1970-01-01' + day, '%Y-%m') AS month FROM rows ORDER BY month`);
       for (const [month] of months.length ? months : [['none']]) {

@@ -67,7 +67,8 @@ function lineHeader(bytes, begin, end) {
     const row = parsed(bytes.toString('utf8', begin, at) + '}');
     if (row) {
       const kind = bytes.indexOf(KIND, at);
-      return { length: at - begin, row, label: kind > 0 && kind < end ? bytes.toString('latin1', at, kind + KIND.length + 1) : '' };
+      const hasKind = kind > 0 && kind < end;
+      return { length: at - begin, row, label: hasKind ? bytes.toString('latin1', at, kind + KIND.length + 1) : '' };
     }
   }
   const row = parsed(bytes.toString('utf8', begin, end));
@@ -170,6 +171,7 @@ function withSpace(bytes, keep, filled, file) {
 
 function finished(run, bytes, base) {
   const log = bytes.subarray(run.begin, run.end);
-  return { header: run.header, headerLength: run.first.length, bytes: log, hash: createHash('sha256').update(log).digest('hex').slice(0, 32),
+  const hash = createHash('sha256').update(log).digest('hex').slice(0, 32);
+  return { header: run.header, headerLength: run.first.length, bytes: log, hash,
     offset: base + run.begin, length: log.length, rows: run.rows };
 }

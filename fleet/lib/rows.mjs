@@ -115,7 +115,8 @@ function readableRow(line, members) {
   const valid = kind === 'distribution' && isCount(count) && count < 2 ** 32 && listOf(counts, isCount) &&
     [minimum, maximum, mean, squares].every(isBound) && listOf(lower, isBound) && listOf(upper, isBound);
   if (!valid) return undefined;
-  return { ...common, count, minimum, maximum, squared_deviations: squares, ...(mean === null ? {} : { mean_bits: bitsOf(mean) }),
+  return { ...common, count, minimum, maximum, squared_deviations: squares,
+    ...(mean === null ? {} : { mean_bits: bitsOf(mean) }),
     lower: lower ?? [], upper: upper ?? [], counts: counts ?? [] };
 }
 

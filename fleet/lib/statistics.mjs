@@ -94,11 +94,11 @@ export function trimmedDifference(first, second) {
   const other = trimmed(second);
   const error = Math.sqrt(one.error + other.error);
   const difference = other.mean - one.mean;
-  if (!(error > 0)) return { one: one.mean, other: other.mean, difference, low: difference, high: difference, p: difference === 0 ? 1 : 0 };
+  const means = { one: one.mean, other: other.mean, difference };
+  if (!(error > 0)) return { ...means, low: difference, high: difference, p: difference === 0 ? 1 : 0 };
   const freedom = error ** 4 / (one.error ** 2 / one.freedom + other.error ** 2 / other.freedom);
   const reach = studentQuantile95(freedom) * error;
-  return { one: one.mean, other: other.mean, difference, low: difference - reach, high: difference + reach,
-    p: studentTwoSided(difference / error, freedom) };
+  return { ...means, low: difference - reach, high: difference + reach, p: studentTwoSided(difference / error, freedom) };
 }
 
 function trimmed({ devices, cut, middle, least, greatest, sum, squares }) {

@@ -15,5 +15,6 @@ export function tableOf({ columns, rows, withheld, k, until }) {
   const widths = lines[0].map((_, index) => Math.max(...lines.map(line => line[index].length)));
   const table = rows.length === 0 ? []
     : lines.map(line => line.map((text, index) => text.padEnd(widths[index])).join('  ').trimEnd());
-  return [...table, `${rows.length} rows until ${until ?? 'no day'}; ${withheld} withheld about fewer than ${k} devices`].join('\n');
+  const summary = `${rows.length} rows until ${until ?? 'no day'}; ${withheld} withheld about fewer than ${k} devices`;
+  return [...table, summary].join('\n');
 }

@@ -81,6 +81,16 @@ class Fleet(unittest.TestCase):
         no_key = ask("distribution", data=data, key="'; DROP TABLE rows; --\\' @uniq(x) {k}")
         self.assertEqual((no_key.rows, no_key.all["withheld"]), ([], 0))
 
+    def test_statistics_are_those_of_the_tables(self):
+        cases = {"studentQuantile95(10)": 2.228138852, "normalQuantile(0.01)": -2.326347874, "signTest(6, 0)": 0.03125,
+                 "studentTwoSided(2.228138852, 10)": 0.05, "shareDifference(48, 80, 56, 70).low": 0.0524,
+                 "shareDifference(48, 80, 56, 70).high": 0.3339}
+        script = f"import * as s from '{TOP}/fleet/lib/statistics.mjs';" \
+                 f"console.log(JSON.stringify([{','.join('s.' + case for case in cases)}]))"
+        printed = subprocess.run(["node", "--input-type=module", "-e", script], check=True, capture_output=True).stdout
+        for (case, expected), found in zip(cases.items(), fleet.json.loads(printed)):
+            self.assertAlmostEqual(expected, found, 4, case)
+
     def test_logs_that_are_lost_repeated_or_unreadable(self):
         answer = ask("coverage", data=self.untidy())
         whole = answer.only(date=None, version=None)

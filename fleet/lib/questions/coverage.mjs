@@ -3,7 +3,8 @@ import { dateOf } from '../logs.mjs';
 
 export const summary = 'devices and logs, by day and version; lost and repeated logs';
 export const parameters = {};
-export const columns = ['date', 'version', 'devices', 'logs', 'lost', 'duplicates', 'conflicts', 'undated', 'bare', 'unreadable'];
+export const columns = ['date', 'version', 'devices', 'logs', 'lost', 'duplicates', 'conflicts', 'undated', 'bare',
+  'unreadable'];
 export const plot = { x: 'date', y: ['devices', 'lost'], series: 'version' };
 
 const ALL = "'all'";

@@ -25,7 +25,9 @@ async function groupsOf({ query, sql }, version) {
   }
   if (merged.length > 0) {
     const buckets = sql('buckets', pieces);
-    for (const [day, text, devices] of await query('bucketed', { buckets })) groups.get(nameOf(day, value(text))).bucketed = devices;
+    for (const [day, text, devices] of await query('bucketed', { buckets })) {
+      groups.get(nameOf(day, value(text))).bucketed = devices;
+    }
     for (const [day, text, from, to, devices, samples] of await query('histogram', { buckets })) {
       groups.get(nameOf(day, value(text))).buckets.push({ from, to, devices, samples });
     }
@@ -51,7 +53,8 @@ function rowOf(group, anonymity, told) {
     (buckets.length > 0 && told.buckets(group) ? buckets.map(bucket => bucket[part]) : null));
   return [dateOf(group.day), group.version, anonymity.devices(devices),
     ...LEVELS.map((level, index) => anonymity.quantile(devices, level, group.quantiles[index])),
-    ...[samples, mean, Math.sqrt(squares / samples)].map(value => (told.samples(group) ? anonymity.value(sampled, value) : null)), ...lists];
+    ...[samples, mean, Math.sqrt(squares / samples)].map(value =>
+      (told.samples(group) ? anonymity.value(sampled, value) : null)), ...lists];
 }
 
 export async function answer(context) {
@@ -60,7 +63,8 @@ export async function answer(context) {
   const ofAll = anonymity.release(await groupsOf(context, "'all'"), group => group.devices, group => group.day);
   const groups = [...ofAll, ...ofVersions];
   const told = tellable(groups, anonymity);
+  // Those of all versions come first, and stay there.
   return groups
-    .sort((one, other) => one.day - other.day || (one.version === ALL ? -1 : other.version === ALL ? 1 : one.version < other.version ? -1 : 1))
+    .sort((one, other) => one.day - other.day || (one.version ?? '').localeCompare(other.version ?? ''))
     .map(group => rowOf(group, anonymity, told));
 }

@@ -49,7 +49,7 @@ async function tail({ anonymity, query, means, versions }, before, after) {
   const { low, high, p } = shareDifference(counts[0], before.devices, counts[1], after.devices);
   const share = anonymity.share(counts[1], after.devices);
   if (share === null) return [null, null, null, null, null, ...verdict(p)];
-  const bounds = [[low, Math.floor], [high, Math.ceil]].map(([value, towards]) => anonymity.bound(value, after.devices, towards));
+  const bounds = [anonymity.bound(low, after.devices, Math.floor), anonymity.bound(high, after.devices, Math.ceil)];
   // The baseline's share is 1 % by the choice of the limit, and says nothing of its devices.
   return [TOP, share, share - TOP, ...bounds, ...verdict(p)];
 }
