@@ -75,9 +75,11 @@ function addRows(out, { header, headerLength, bytes }) {
   }
 }
 
-/** The rows of logs in one piece. */
+const out = new Output();
+
+/** The rows of logs in one piece, which is valid until the next call. */
 export function forServer(logs) {
-  const out = new Output();
+  out.filled = 0;
   for (const log of logs) {
     if (log.headerLength > 0) {
       addRows(out, log);
