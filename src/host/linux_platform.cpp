@@ -45,7 +45,7 @@ std::string userDataFolder(const DeviceRoot& root) {
 Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& options) {
   const DeviceDirectory described(root, "/device");
   const auto log = options.log ? options.log : makeSystemLogOfEnvironment();
-  const auto clock = std::make_shared<LinuxClock>();
+  const auto clock = options.clock ? options.clock : std::make_shared<LinuxClock>();
   const auto description = std::make_shared<DeviceDescription>(described, log);
   const auto access = options.readOnlyPreferences ? PropertyListPreferences::Access::ReadOnly
                                                   : PropertyListPreferences::Access::ReadWrite;

@@ -15,6 +15,7 @@ struct LinuxPlatformOptions {
   bool readOnlyPreferences = false;
   // Null: that of the root, of a recording its first sample.
   std::shared_ptr<const SystemTree> tree = nullptr;
+  std::shared_ptr<Clock> clock = nullptr;  // null: the system's
 };
 
 // All services of the device whose root is the folder. Cheap: nothing is opened or read before a
