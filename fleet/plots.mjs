@@ -5,9 +5,9 @@ const WIDTH = 400, HEIGHT = 230;
 const LEFT = 46, RIGHT = 8, TOP = 10, BOTTOM = 30;
 const INNER = { width: WIDTH - LEFT - RIGHT, height: HEIGHT - TOP - BOTTOM };
 
-export const escaped = (text) => String(text).replace(/[&<>"']/g, (letter) => `&#${letter.charCodeAt(0)};`);
+export const escaped = text => String(text).replace(/[&<>"']/g, letter => `&#${letter.charCodeAt(0)};`);
 
-const rounded = (number) => Number(number.toFixed(2));
+const rounded = number => Number(number.toFixed(2));
 
 // "1.5 M"
 export function shortNumber(value) {
@@ -23,7 +23,7 @@ export function shortNumber(value) {
 export function ticks(low, high, about = 5) {
   const span = high > low ? high - low : Math.abs(high) || 1;
   const rough = span / about, power = 10 ** Math.floor(Math.log10(rough));
-  const step = [1, 2, 5, 10].map((one) => one * power).find((one) => one >= rough);
+  const step = [1, 2, 5, 10].map(one => one * power).find(one => one >= rough);
   const first = Math.floor(low / step + 1e-9), last = Math.ceil((low + span) / step - 1e-9);
   return Array.from({ length: last - first + 1 }, (_, index) => Number(((first + index) * step).toPrecision(12)));
 }
@@ -31,17 +31,17 @@ export function ticks(low, high, about = 5) {
 function axis(values, about) {
   const marks = ticks(Math.min(...values), Math.max(...values), about);
   const low = marks[0], span = marks.at(-1) - low;
-  return { marks, part: (value) => (value - low) / span };
+  return { marks, part: value => (value - low) / span };
 }
 
-const xOf = (part) => rounded(LEFT + part * INNER.width);
-const yOf = (part) => rounded(TOP + (1 - part) * INNER.height);
+const xOf = part => rounded(LEFT + part * INNER.width);
+const yOf = part => rounded(TOP + (1 - part) * INNER.height);
 
 const text = (x, y, words, anchor = 'middle', kind = 'label') =>
   `<text class="${kind}" x="${rounded(x)}" y="${rounded(y)}" text-anchor="${anchor}">${escaped(words)}</text>`;
 
 function horizontalGrid({ marks, part }) {
-  return marks.map((mark) => `<path class="grid" d="M${LEFT} ${yOf(part(mark))}h${INNER.width}"/>` +
+  return marks.map(mark => `<path class="grid" d="M${LEFT} ${yOf(part(mark))}h${INNER.width}"/>` +
     text(LEFT - 5, yOf(part(mark)) + 4, shortNumber(mark), 'end')).join('');
 }
 
@@ -56,7 +56,7 @@ function svg(title, description, content, height = HEIGHT) {
     `${content}</svg>`;
 }
 
-const legend = (names) => `<ul class="legend">${names.map((name, index) =>
+const legend = names => `<ul class="legend">${names.map((name, index) =>
   `<li><span class="swatch series${index}"></span>${escaped(name)}</li>`).join('')}</ul>`;
 
 // Runs of points without a gap.
@@ -66,23 +66,23 @@ function runs(points) {
     if (point) found.at(-1).push({ ...point, index });
     else if (found.at(-1).length) found.push([]);
   });
-  return found.filter((run) => run.length);
+  return found.filter(run => run.length);
 }
 
 // names: below the axis. series: [{name, points}], a point for each name: {low, middle, high} or null.
 export function lines({ title, description, names, series }) {
   const values = series.flatMap(({ points }) => points.filter(Boolean).flatMap(({ low, middle, high }) =>
-    [low, middle, high])).filter((value) => value !== null && value !== undefined);
+    [low, middle, high])).filter(value => value !== null && value !== undefined);
   if (!values.length) return '';
   const scale = axis(values);
-  const place = (index) => xOf(names.length > 1 ? index / (names.length - 1) : 0.5);
+  const place = index => xOf(names.length > 1 ? index / (names.length - 1) : 0.5);
   const at = (point, field) => `${place(point.index)} ${yOf(scale.part(point[field]))}`;
-  const drawn = series.map(({ points }, number) => runs(points).map((run) => {
-    const middle = run.map((point) => at(point, 'middle'));
+  const drawn = series.map(({ points }, number) => runs(points).map(run => {
+    const middle = run.map(point => at(point, 'middle'));
     const dot = run.length > 1 ? '' : `<circle class="dot series${number}" r="2.5" ` +
       `cx="${middle[0].split(' ')[0]}" cy="${middle[0].split(' ')[1]}"/>`;
     const band = run[0].low === undefined ? '' : `<path class="band series${number}" d="M${
-      [...run.map((point) => at(point, 'high')), ...run.toReversed().map((point) => at(point, 'low'))].join('L')}Z"/>`;
+      [...run.map(point => at(point, 'high')), ...run.toReversed().map(point => at(point, 'low'))].join('L')}Z"/>`;
     return `${band}<path class="line series${number}" d="M${middle.join('L')}"/>${dot}`;
   }).join('')).join('');
   return svg(title, description, horizontalGrid(scale) + drawn + namesBelow(names, place)) +
@@ -92,7 +92,7 @@ export function lines({ title, description, names, series }) {
 // marks: [{index, name}], upright lines at the left of a bar.
 export function bars({ title, description, names, values, marks = [] }) {
   if (!values.length) return '';
-  const scale = axis([0, ...values.filter((value) => value !== null)]);
+  const scale = axis([0, ...values.filter(value => value !== null)]);
   const width = INNER.width / values.length;
   const drawn = values.map((value, index) => value === null ? '' :
     `<rect class="bar series0" x="${rounded(LEFT + index * width + width * 0.1)}" width="${rounded(width * 0.8)}" ` +
@@ -100,7 +100,7 @@ export function bars({ title, description, names, values, marks = [] }) {
   const upright = marks.map(({ index, name }) => `<path class="mark" d="M${rounded(LEFT + index * width)} ${TOP}` +
     `v${INNER.height}"/>${text(LEFT + index * width - 4, TOP + 10, name, 'end')}`).join('');
   return svg(title, description, horizontalGrid(scale) + drawn + upright +
-    namesBelow(names, (index) => LEFT + (index + 0.5) * width));
+    namesBelow(names, index => LEFT + (index + 0.5) * width));
 }
 
 // rows: [{name, low, middle, high, expected}]; a line at 0, and a diamond at what was expected.
@@ -109,9 +109,9 @@ export function intervals({ title, description, rows }) {
   const step = 46, height = TOP + rows.length * step + BOTTOM, left = 12;
   const values = rows.flatMap(({ low, middle, high, expected }) => [low, middle, high, expected ?? 0]);
   const scale = axis([0, ...values], 4);
-  const x = (value) => rounded(left + scale.part(value) * (WIDTH - left - 16));
+  const x = value => rounded(left + scale.part(value) * (WIDTH - left - 16));
   const bottom = height - BOTTOM + 4;
-  const grid = scale.marks.map((mark) => `<path class="${mark === 0 ? 'zero' : 'grid'}" d="M${x(mark)} ${TOP}` +
+  const grid = scale.marks.map(mark => `<path class="${mark === 0 ? 'zero' : 'grid'}" d="M${x(mark)} ${TOP}` +
     `V${bottom}"/>${text(x(mark), height - 10, shortNumber(mark))}`).join('');
   const drawn = rows.map(({ name, low, middle, high, expected }, index) => {
     const y = TOP + index * step + 30;
@@ -121,6 +121,18 @@ export function intervals({ title, description, rows }) {
       `M${x(high)} ${y - 5}v10"/><circle class="dot series0" cx="${x(middle)}" cy="${y}" r="4.5"/>${truth}`;
   }).join('');
   return svg(title, description, grid + drawn, height);
+}
+
+// rows: [{name, share}], shares from 0 to 1, as bars to the right.
+export function shares({ title, description, rows }) {
+  if (!rows.length) return '';
+  const step = 34, height = TOP + rows.length * step, left = 8, room = WIDTH - 70;
+  const drawn = rows.map(({ name, share }, index) => {
+    const y = TOP + index * step, width = rounded(room * share);
+    return `${text(left, y + 9, name, 'start')}<rect class="bar series0" x="${left}" y="${y + 13}" width="${width}" ` +
+      `height="13"/>${text(left + width + 6, y + 24, `${Math.round(share * 100)} %`, 'start')}`;
+  }).join('');
+  return svg(title, description, drawn, height);
 }
 
 // A row for each name, a column for each day; shares from 0 to 1, or null where nothing is known.
@@ -141,12 +153,12 @@ export function calendar({ title, description, names, days, shares }) {
 }
 
 export function table({ columns, rows }) {
-  const cell = (value) => typeof value === 'number' || value === null ? `<td class="number">${
+  const cell = value => typeof value === 'number' || value === null ? `<td class="number">${
     escaped(value === null ? '–' : Number.isInteger(value) ? value : Number(value.toPrecision(6)))}</td>` :
     `<td>${escaped(Array.isArray(value) ? value.join(', ') : value)}</td>`;
   return `<div class="wide" tabindex="0"><table><thead><tr>${columns.map((name) =>
     `<th scope="col">${escaped(name.replaceAll('_', ' '))}</th>`).join('')}</tr></thead><tbody>${
-    rows.map((row) => `<tr>${row.map(cell).join('')}</tr>`).join('')}</tbody></table></div>`;
+    rows.map(row => `<tr>${row.map(cell).join('')}</tr>`).join('')}</tbody></table></div>`;
 }
 
 const STYLE = `

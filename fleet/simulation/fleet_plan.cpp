@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <numbers>
 #include <numeric>
 
 #include <nlohmann/json.hpp>
@@ -16,10 +17,11 @@ constexpr double kNeverUpdated = 0.10, kWakeTwiceAsOften = 0.03;
 constexpr double kLose = 0.05, kRepeat = 0.05, kDelay = 0.05, kFallSilent = 0.02;
 constexpr double kOffPerDay = 0.01;
 constexpr std::int32_t kWrongClockAhead = 3650;
-// All disks are of one age when the first day begins; how fast they wear differs tenfold.
-constexpr double kAgeInDays = 150, kSlowestWear = 0.04, kWearRange = 10;
+// All disks are of one age when the first day begins. How many days they have left after the last
+// one differs as lifetimes do: its logarithm is normally distributed.
+constexpr double kAgeInDays = 150, kMedianDaysLeft = 560, kLifetimeSpread = 0.85;
 constexpr double kWornPercent = 90, kWornShare = 0.01;
-constexpr double kFewestWakeups = 300, kWakeupRange = 3;
+constexpr double kFewestWakeups = 400, kWakeupRange = 1.75;
 
 enum class Order : std::uint64_t { Versions, Wear, Troubles, Wakeups };
 
@@ -40,6 +42,20 @@ std::size_t countOf(double share, std::size_t devices) {
 // Where a place lies among all, from 0 to 1.
 double quantile(std::size_t place, std::size_t devices) {
   return (static_cast<double>(place) + 0.5) / static_cast<double>(devices);
+}
+
+// Of the normal distribution.
+double normalQuantile(double level) {
+  double low = -10, high = 10;
+  for (int i = 0; i < 64; ++i) {
+    const double middle = (low + high) / 2;
+    (std::erfc(-middle / std::numbers::sqrt2) / 2 < level ? low : high) = middle;
+  }
+  return low;
+}
+
+double daysLeft(double level) {
+  return kMedianDaysLeft * std::exp(kLifetimeSpread * normalQuantile(level));
 }
 
 // Takes parts of an order off its front.
@@ -70,7 +86,8 @@ FleetPlan::FleetPlan(const FleetSize& size) : size_(size), devices_(size.devices
     device.wakesTwiceAsOften = version.isIn(kWakeTwiceAsOften);
     device.dailyWakeups =
         kFewestWakeups * std::pow(kWakeupRange, quantile(wakeups[i], size.devices));
-    device.wearPerDay = kSlowestWear * std::pow(kWearRange, quantile(wear[i], size.devices));
+    device.wearPerDay =
+        kWornPercent / (kAgeInDays + size.days + daysLeft(quantile(wear[i], size.devices)));
     // Neither at the start nor at the end, where a gap could not be seen.
     const int amid = size.days / 4 + static_cast<int>(i % static_cast<std::size_t>(size.days / 2));
     if (trouble.isIn(kLose)) device.lostDay = amid;
@@ -97,14 +114,10 @@ bool FleetPlan::isOff(std::size_t device, int day) const {
 }
 
 std::int32_t FleetPlan::dayOfWornDevices() const {
-  std::vector<double> days;
-  for (const DevicePlan& device : devices_)
-    days.push_back(kWornPercent / device.wearPerDay - kAgeInDays);
-  std::ranges::sort(days);
   const auto worn =
-      static_cast<std::size_t>(std::ceil(kWornShare * static_cast<double>(days.size())));
-  return size_.firstDay +
-         static_cast<std::int32_t>(std::ceil(days[std::max<std::size_t>(worn, 1) - 1]));
+      static_cast<std::size_t>(std::ceil(kWornShare * static_cast<double>(size_.devices)));
+  const double left = daysLeft(quantile(worn - 1, size_.devices));
+  return size_.firstDay + size_.days + static_cast<std::int32_t>(std::ceil(left));
 }
 
 std::string FleetPlan::truths() const {
