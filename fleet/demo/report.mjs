@@ -74,8 +74,8 @@ const dayText = day => new Date(day * 86400000).toISOString().slice(0, 10);
 const SECTIONS = {
   start: answer => ({ heading: 'How long the player takes to start', text: 'The means of the devices in milliseconds, by day and version: median, and the band from quartile to quartile.',
     figure: byDay(answer, 'Start of the player') }),
-  wakeups: answer => ({ heading: 'Wake-ups by the network', text: 'Per device and day, by version: median, and the band from quartile to quartile.',
-    figure: byDay(answer, 'Wake-ups by the network'),
+  wakeups: answer => ({ heading: 'Wake-ups by the radio', text: 'Per device and day, by version: median, and the band from quartile to quartile.',
+    figure: byDay(answer, 'Wake-ups by the radio'),
     note: `Simulated: the new version doubles them on ${truths.wakeups.affected_devices} of ${truths.devices} devices, too few to move a median.` }),
   regression: answer => ({ heading: 'Does the new version wake devices more often?', text: foundWords(answer),
     figure: regressionFigures(answer),
