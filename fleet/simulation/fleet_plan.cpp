@@ -5,6 +5,7 @@
 #include <numbers>
 #include <numeric>
 
+#include <fmt/format.h>
 #include <nlohmann/json.hpp>
 
 #include "simulation/random.h"
@@ -111,6 +112,12 @@ bool FleetPlan::isOff(std::size_t device, int day) const {
   return day > 0 && Random({size_.seed, static_cast<std::uint64_t>(Purpose::Power), device,
                             static_cast<std::uint64_t>(day)})
                             .uniform() < kOffPerDay;
+}
+
+std::string FleetPlan::pseudonym(std::size_t device) const {
+  Random random({size_.seed, static_cast<std::uint64_t>(Purpose::Pseudonym), device});
+  const std::uint64_t high = random.bits();
+  return fmt::format("{:016x}{:016x}", high, random.bits());
 }
 
 std::int32_t FleetPlan::dayOfWornDevices() const {

@@ -44,6 +44,8 @@ class FleetPlan {
   // Of a device whose disk wears at this rate, on a day.
   static double percentUsed(double wearPerDay, int day);
   bool isOff(std::size_t device, int day) const;
+  // Devices draw theirs from the kernel; here a seed always gives the same fleet.
+  std::string pseudonym(std::size_t device) const;
 
   // What there is to find, as JSON.
   std::string truths() const;

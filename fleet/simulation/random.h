@@ -40,6 +40,6 @@ class Random {
 };
 
 // What numbers are asked for, as a part of their purpose.
-enum class Purpose : std::uint64_t { Order, Habits, Machine, Metrics, Samples, Power };
+enum class Purpose : std::uint64_t { Order, Habits, Machine, Metrics, Samples, Power, Pseudonym };
 
 }  // namespace tally::simulation

@@ -11,6 +11,7 @@
 #include "driver/daily_job.h"
 #include "host/host_platform.h"
 #include "host/spool/log_spool.h"
+#include "host/spool/submission_identity.h"
 #include "host/store/store_importer.h"
 #include "simulation/maker_metrics.h"
 
@@ -54,8 +55,10 @@ SimulatedDevice::SimulatedDevice(const Folders& folders, const FleetPlan& plan, 
       device_(plan.device(number)),
       number_(number),
       machine_(root_, plan, number) {
-  const auto directory = DeviceRoot(root_.string()).make("/Library/Application Support/Tallybook");
-  failed_ = !directory || !writeFileAtomically(*directory, "Whitelist_Nimbus.plist", whitelist);
+  const DeviceRoot root(root_.string());
+  const auto directory = root.make("/Library/Application Support/Tallybook");
+  failed_ = !directory || !writeFileAtomically(*directory, "Whitelist_Nimbus.plist", whitelist) ||
+            !IdentityFile(root).write({plan.pseudonym(number), {}});
 }
 
 SimulatedDevice::~SimulatedDevice() {
