@@ -48,7 +48,8 @@ function horizontalGrid({ marks, part }) {
 // Few enough of the names below the axis that they do not overlap.
 function namesBelow(names, place) {
   const every = Math.ceil(names.length / 5);
-  return names.map((name, index) => index % every ? '' : text(place(index), HEIGHT - 12, name)).join('');
+  return names.map((name, index) => index % every ? '' :
+    place(index) > WIDTH - 20 ? text(WIDTH - 1, HEIGHT - 12, name, 'end') : text(place(index), HEIGHT - 12, name)).join('');
 }
 
 function svg(title, description, content, height = HEIGHT) {
@@ -63,13 +64,14 @@ const legend = names => `<ul class="legend">${names.map((name, index) =>
 function runs(points) {
   const found = [[]];
   points.forEach((point, index) => {
-    if (point) found.at(-1).push({ ...point, index });
+    if (point) found.at(-1).push({ index, ...point });
     else if (found.at(-1).length) found.push([]);
   });
   return found.filter(run => run.length);
 }
 
-// names: below the axis. series: [{name, points}], a point for each name: {low, middle, high} or null.
+// names: below the axis. series: [{name, points}], a point for each name: {low, middle, high} or null; low
+// and high may be null, and there is no band then.
 export function lines({ title, description, names, series }) {
   const values = series.flatMap(({ points }) => points.filter(Boolean).flatMap(({ low, middle, high }) =>
     [low, middle, high])).filter(value => value !== null && value !== undefined);
@@ -81,8 +83,9 @@ export function lines({ title, description, names, series }) {
     const middle = run.map(point => at(point, 'middle'));
     const dot = run.length > 1 ? '' : `<circle class="dot series${number}" r="2.5" ` +
       `cx="${middle[0].split(' ')[0]}" cy="${middle[0].split(' ')[1]}"/>`;
-    const band = run[0].low === undefined ? '' : `<path class="band series${number}" d="M${
-      [...run.map(point => at(point, 'high')), ...run.toReversed().map(point => at(point, 'low'))].join('L')}Z"/>`;
+    const known = runs(run.map(point => (point.low === null || point.high === null ? null : point)));
+    const band = known.map(part => `<path class="band series${number}" d="M${
+      [...part.map(point => at(point, 'high')), ...part.toReversed().map(point => at(point, 'low'))].join('L')}Z"/>`).join('');
     return `${band}<path class="line series${number}" d="M${middle.join('L')}"/>${dot}`;
   }).join('')).join('');
   return svg(title, description, horizontalGrid(scale) + drawn + namesBelow(names, place)) +

@@ -19,10 +19,10 @@ const percent = share => `${Number((share * 100).toFixed(1))} %`;
 const versionsOf = rows => unique(rows.map(({ version }) => version).filter(version => version !== null));
 
 function byDay(answer, title) {
-  const rows = rowsOf(answer).filter(({ p25, p75 }) => p25 !== null && p75 !== null);
+  const rows = rowsOf(answer).filter(({ p50 }) => p50 !== null);
   const dates = unique(rows.map(({ date }) => date));
   const at = new Map(rows.map(row => [`${row.version} ${row.date}`, row]));
-  const series = versionsOf(rows).map(version => ({ name: version, points: dates.map(date => {
+  const series = [null, ...versionsOf(rows)].map(version => ({ name: version ?? 'all versions', points: dates.map(date => {
     const row = at.get(`${version} ${date}`);
     return row && { low: row.p25, middle: row.p50, high: row.p75 };
   }) }));
@@ -72,9 +72,9 @@ function coverageFigure(answer) {
 const dayText = day => new Date(day * 86400000).toISOString().slice(0, 10);
 
 const SECTIONS = {
-  start: answer => ({ heading: 'How long the player takes to start', text: 'The means of the devices in milliseconds, by day and version: median, and the band from quartile to quartile.',
+  start: answer => ({ heading: 'How long the player takes to start', text: 'The means of the devices in milliseconds, by day and version: median, and the band from quartile to quartile where it may be told.',
     figure: byDay(answer, 'Start of the player') }),
-  wakeups: answer => ({ heading: 'Wake-ups by the radio', text: 'Per device and day, by version: median, and the band from quartile to quartile.',
+  wakeups: answer => ({ heading: 'Wake-ups by the radio', text: 'Per device and day, by version: median, and the band from quartile to quartile where it may be told.',
     figure: byDay(answer, 'Wake-ups by the radio'),
     note: `Simulated: the new version doubles them on ${truths.wakeups.affected_devices} of ${truths.devices} devices, too few to move a median.` }),
   regression: answer => ({ heading: 'Does the new version wake devices more often?', text: foundWords(answer),
@@ -101,7 +101,7 @@ const sections = Object.entries(SECTIONS).map(([name, sectionOf]) => {
 });
 fs.writeFileSync(path.join(directory, 'fleet.html'), page({
   title: `A fleet of ${truths.devices} devices in ${truths.days} days`,
-  lead: `Simulated from ${dayText(truths.first_day)} on: made by the daily job itself, exported, and asked with ${
-    json('answers/coverage.json').engine}. Answers about fewer than ${json('answers/coverage.json').k} devices are withheld.`,
+  lead: `Simulated from ${dayText(truths.first_day)} on: made by the daily job itself, exported, and asked with DuckDB. Answers about fewer than ${
+    json('answers/coverage.json').k} devices are withheld.`,
   sections,
 }));

@@ -14,7 +14,8 @@ namespace tally::simulation {
 namespace {
 
 // The shares of the fleet are exact, whatever the seed.
-constexpr double kNeverUpdated = 0.10, kWakeTwiceAsOften = 0.03;
+// So many that a small fleet too has enough devices of either version to tell of.
+constexpr double kNeverUpdated = 0.30, kWakeTwiceAsOften = 0.03;
 constexpr double kLose = 0.05, kRepeat = 0.05, kDelay = 0.05, kFallSilent = 0.02;
 constexpr double kOffPerDay = 0.01;
 constexpr std::int32_t kWrongClockAhead = 3650;
