@@ -68,7 +68,7 @@ class Demo(unittest.TestCase):
     def test_what_stopped_and_what_was_lost_is_named(self):
         keys = {row["key"]: row for row in self.ask("silence").rows}
         self.assertEqual(list(keys)[0], self.truths["stopped_key"])
-        self.assertGreater(keys[self.truths["stopped_key"]]["share"], 0.8)
+        self.assertAlmostEqual(keys[self.truths["stopped_key"]]["share"], self.truths["updated_devices"] / DEVICES, delta=0.1)
         whole = self.ask("coverage").only(date=None, version=None)
         for column, truth in (("lost", "lost_logs"), ("duplicates", "repeated_logs")):
             self.assertAlmostEqual(whole[column], self.truths[truth], delta=FEW, msg=column)
@@ -76,7 +76,7 @@ class Demo(unittest.TestCase):
     def test_the_page_stands_alone_and_the_answers_keep_k(self):
         page = (self.output / "fleet.html").read_text()
         self.assertNotRegex(page, r"<(script|link|img|iframe)|https?:|url\(|@import")
-        self.assertEqual(page.count("<svg") >= 5, True, page[:500])
+        self.assertGreaterEqual(page.count("<svg"), 5)
         self.assertIn(self.truths["stopped_key"], self.said)
         told = Answer((self.output / "answers/regression.json").read_text())
         self.assertEqual((told.all["k"], told.only(test="paired")["difference"]), (fleet.K, None))
