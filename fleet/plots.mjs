@@ -70,9 +70,16 @@ function runs(points) {
   return found.filter(run => run.length);
 }
 
+// A band on a few days alone says nothing, and would take the height from the line.
+function withoutRareBand(points) {
+  const known = points.filter(Boolean), banded = known.filter(({ low, high }) => low !== null && high !== null);
+  return banded.length * 2 > known.length ? points : points.map(point => point && { ...point, low: null, high: null });
+}
+
 // names: below the axis. series: [{name, points}], a point for each name: {low, middle, high} or null; low
 // and high may be null, and there is no band then.
-export function lines({ title, description, names, series }) {
+export function lines({ title, description, names, series: given }) {
+  const series = given.map(({ name, points }) => ({ name, points: withoutRareBand(points) }));
   const values = series.flatMap(({ points }) => points.filter(Boolean).flatMap(({ low, middle, high }) =>
     [low, middle, high])).filter(value => value !== null && value !== undefined);
   if (!values.length) return '';

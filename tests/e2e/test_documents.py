@@ -30,6 +30,7 @@ RUN_BY_OTHERS = {
     "scripts/lint": ".ci/run", "scripts/fuzz 20": ".ci/run",
     "scripts/fuzz 600": ".ci/run, for a shorter time", "scripts/load": "the test bench.load, at a smaller size",
     "scripts/test --arch armhf": ".ci/run", "scripts/vm --resets 5": ".ci/run",
+    "scripts/fleet-demo": "test_fleet_demo.py, with fewer devices",
     "scripts/bench": "by hand, when docs/performance.md is made anew",
 }
 # Its blocks need a recorder, and are in more languages than the examples: test_recipes.py runs them.
