@@ -99,17 +99,14 @@ export function lines({ title, description, names, series: given }) {
     legend(series.map(({ name }) => name));
 }
 
-// marks: [{index, name}], upright lines at the left of a bar.
-export function bars({ title, description, names, values, marks = [] }) {
+export function bars({ title, description, names, values }) {
   if (!values.length) return '';
   const scale = axis([0, ...values.filter(value => value !== null)]);
   const width = INNER.width / values.length;
   const drawn = values.map((value, index) => value === null ? '' :
     `<rect class="bar series0" x="${rounded(LEFT + index * width + width * 0.1)}" width="${rounded(width * 0.8)}" ` +
     `y="${yOf(scale.part(value))}" height="${rounded(INNER.height * scale.part(value))}"/>`).join('');
-  const upright = marks.map(({ index, name }) => `<path class="mark" d="M${rounded(LEFT + index * width)} ${TOP}` +
-    `v${INNER.height}"/>${text(LEFT + index * width - 4, TOP + 10, name, 'end')}`).join('');
-  return svg(title, description, horizontalGrid(scale) + drawn + upright +
+  return svg(title, description, horizontalGrid(scale) + drawn +
     namesBelow(names, index => LEFT + (index + 0.5) * width));
 }
 
@@ -185,7 +182,7 @@ p { margin: .3em 0 .8em; } .quiet { color: var(--quiet); }
 section { min-width: 0; border-top: 2px solid var(--rule); padding-top: 12px; }
 svg { display: block; width: 100%; max-width: 600px; height: auto; }
 .label { fill: var(--quiet); font: 12px system-ui, sans-serif; }
-.grid { stroke: var(--rule); } .zero, .mark { stroke: var(--quiet); } .mark { stroke-dasharray: 3 3; }
+.grid { stroke: var(--rule); } .zero { stroke: var(--quiet); }
 .series0 { --tone: var(--series0); } .series1 { --tone: var(--series1); }
 .series2 { --tone: var(--series2); } .series3 { --tone: var(--series3); }
 .line { fill: none; stroke: var(--tone); stroke-width: 2; } .band { fill: var(--tone); fill-opacity: .18; }
