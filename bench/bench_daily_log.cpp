@@ -14,7 +14,7 @@
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
 #include "process_cost.h"
-#include "report/distribution_summary.h"
+#include "report/distribution_pass.h"
 #include "sample_device.h"
 
 namespace {
@@ -49,12 +49,15 @@ int passOverSamples(const char* root) {
   const auto history = openSqliteHistory(metricsStoreFile(std::string(root)),
                                          [](const std::string&) { std::exit(1); });
   std::size_t number = 0;
+  DistributionPass pass(*platform().log, [](std::string_view, const DistributionResult& result) {
+    keep = result.summary.mean;
+  });
   history->enumerateDistributions(
       "", std::numeric_limits<std::int32_t>::min(), std::numeric_limits<std::int32_t>::max(),
       [&](std::string_view key, std::int32_t, DistributionValues& values, bool&) {
-        keep = summariseDistribution(*platform().log, values, key, *options[number++ % 2])
-                   .summary.mean;
+        pass.add(values, key, *options[number++ % 2]);
       });
+  pass.finish();
   return number > 0 ? 0 : 1;
 }
 

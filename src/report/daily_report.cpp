@@ -27,6 +27,7 @@ void readHistory(MetricsStore& store, std::int32_t day, LogValues& values, ReadF
         }
       });
   figures.damagedRows = history->damagedRows();
+  values.finishDistributions();
 }
 
 }  // namespace

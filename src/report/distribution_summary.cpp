@@ -2,9 +2,7 @@
 
 #include <algorithm>
 #include <limits>
-#include <memory>
 #include <new>
-#include <optional>
 
 namespace tally {
 namespace {
@@ -15,20 +13,14 @@ constexpr std::size_t kSampleBatch = 1024;
 // The most that weights add up to: nobody records so many samples one by one afterwards.
 constexpr std::uint64_t kMostWeight = std::uint64_t{1} << 62;
 
-template <bool kWithHistogram>
-DistributionSummary addSamples(DistributionSummary summary, std::span<const double> samples,
-                               const HistogramIntervals* intervals,
-                               std::span<std::uint64_t> counts) {
-  auto* const buckets = counts.data();  // bucketOf() stays within them
+DistributionSummary addSamples(DistributionSummary summary, std::span<const double> samples) {
   for (const double sample : samples) {
-    // The latency of the division dominates; the bucket search runs in parallel with it.
     ++summary.count;
     const double delta = sample - summary.mean;
     summary.mean += delta / static_cast<double>(summary.count);
     summary.squaredDeviations += delta * (sample - summary.mean);
     summary.minimum = sample < summary.minimum ? sample : summary.minimum;
     summary.maximum = sample > summary.maximum ? sample : summary.maximum;
-    if constexpr (kWithHistogram) ++buckets[intervals->bucketOf(sample)];
   }
   return summary;
 }
@@ -72,14 +64,13 @@ void DistributionSummary::add(std::span<const double> samples,
     *this = addWeighted(*this, samples, weights, intervals, counts);
     return;
   }
+  if (intervals != nullptr) intervals->count(samples, counts.data());
   if (count == 0) {
     minimum = maximum = mean = samples.front();
     count = 1;
-    if (intervals != nullptr) ++counts[intervals->bucketOf(samples.front())];
     samples = samples.subspan(1);
   }
-  *this = intervals != nullptr ? addSamples<true>(*this, samples, intervals, counts)
-                               : addSamples<false>(*this, samples, nullptr, {});
+  *this = addSamples(*this, samples);
 }
 
 KvRef<KvArray> DistributionSummary::toArray() const {
@@ -89,32 +80,40 @@ KvRef<KvArray> DistributionSummary::toArray() const {
                           KvNumber::int32(static_cast<std::int32_t>(std::min(count, kMost)))});
 }
 
+DistributionCounter::DistributionCounter(SystemLog& log, std::string_view key,
+                                         const ScalarOptions& options) {
+  const auto* boundaries = options.getAs<KvArray>(kOptionIntervals);
+  if (boundaries == nullptr) return;
+  log.message(LogLevel::Debug, "Treating key {} as a histogram", key);
+  intervals_.emplace(*boundaries);
+  counters_.reset(new (std::nothrow) std::uint64_t[intervals_->bucketCount()]());
+  if (!counters_) {
+    log.repeated(LogLevel::Default, "distributions without a histogram",
+                 "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
+                 key);
+  }
+}
+
+void DistributionCounter::addToHistogram(std::span<const double> samples) {
+  if (counters_) intervals_->count(samples, counters_.get());
+}
+
+DistributionResult DistributionCounter::result() const {
+  DistributionResult result;
+  result.summary = summary;
+  result.hasHistogram = counters_ != nullptr;
+  if (counters_) result.histogram = makeHistogramDictionary(*intervals_, counts());
+  return result;
+}
+
 DistributionResult summariseDistribution(SystemLog& log, DistributionValues& values,
                                          std::string_view key, const ScalarOptions& options) {
-  DistributionResult result;
-  std::optional<HistogramIntervals> intervals;
-  std::unique_ptr<std::uint64_t[]> counters;
-  std::span<std::uint64_t> counts;
-  if (const auto* boundaries = options.getAs<KvArray>(kOptionIntervals)) {
-    log.message(LogLevel::Debug, "Treating key {} as a histogram", key);
-    intervals.emplace(*boundaries);
-    counters.reset(new (std::nothrow) std::uint64_t[intervals->bucketCount()]());
-    result.hasHistogram = counters != nullptr;
-    if (result.hasHistogram) {
-      counts = {counters.get(), intervals->bucketCount()};
-    } else {
-      log.repeated(LogLevel::Default, "distributions without a histogram",
-                   "Couldn't allocate histCounts for key {}. Will not calculate histogram values",
-                   key);
-    }
-  }
-  const HistogramIntervals* counted = result.hasHistogram ? &*intervals : nullptr;
+  DistributionCounter counter(log, key, options);
   double batch[kSampleBatch];
   while (const std::size_t count = values.nextValues(batch, nullptr, kSampleBatch)) {
-    result.summary.add({batch, count}, values.weights(), counted, counts);
+    counter.add({batch, count}, values.weights());
   }
-  if (counted != nullptr) result.histogram = makeHistogramDictionary(*counted, counts);
-  return result;
+  return counter.result();
 }
 
 }  // namespace tally

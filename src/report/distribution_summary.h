@@ -2,6 +2,8 @@
 #pragma once
 
 #include <cstdint>
+#include <memory>
+#include <optional>
 #include <span>
 #include <string_view>
 
@@ -36,6 +38,30 @@ struct DistributionResult {
   DistributionSummary summary;
   bool hasHistogram = false;      // "intervals" were given and their counters could be allocated
   KvRef<KvDictionary> histogram;  // null when no bucket has samples
+};
+
+// A distribution while its samples are read. The options must outlive it; the key is for messages.
+class DistributionCounter {
+ public:
+  DistributionCounter(SystemLog& log, std::string_view key, const ScalarOptions& options);
+  // As DistributionSummary::add().
+  void add(std::span<const double> samples, std::span<const std::uint32_t> weights) {
+    summary.add(samples, weights, histogram(), counts());
+  }
+  // Counts samples in their buckets alone.
+  void addToHistogram(std::span<const double> samples);
+  DistributionResult result() const;
+
+  DistributionSummary summary;
+
+ private:
+  const HistogramIntervals* histogram() const { return counters_ ? &*intervals_ : nullptr; }
+  std::span<std::uint64_t> counts() const {
+    return counters_ ? std::span(counters_.get(), intervals_->bucketCount())
+                     : std::span<std::uint64_t>();
+  }
+  std::optional<HistogramIntervals> intervals_;
+  std::unique_ptr<std::uint64_t[]> counters_;  // null: no histogram
 };
 
 // Reads every sample, in one pass and constant memory. The key is for messages.

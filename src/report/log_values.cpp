@@ -1,7 +1,5 @@
 #include "report/log_values.h"
 
-#include "report/distribution_summary.h"
-
 namespace tally {
 
 const ScalarOptions* LogValues::scalarOptions(std::string_view key) const {
@@ -30,9 +28,7 @@ void LogValues::addScalar(std::int64_t value, std::string_view key, const Scalar
   scalars_->set(key, KvNumber::int64(roundScalar(value, options, steps)));
 }
 
-void LogValues::addDistribution(DistributionValues& values, std::string_view key,
-                                const ScalarOptions& options) {
-  const DistributionResult result = summariseDistribution(log_, values, key, options);
+void LogValues::setDistribution(std::string_view key, const DistributionResult& result) {
   // A histogram without samples removes that of an earlier row of the key.
   if (result.hasHistogram) histograms_->set(key, result.histogram);
   distributions_->set(key, result.summary.toArray());

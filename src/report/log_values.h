@@ -13,6 +13,7 @@
 #include "kv/value.h"
 #include "platform/metrics_store.h"
 #include "platform/tables/own_metrics.h"
+#include "report/distribution_pass.h"
 
 namespace tally {
 
@@ -29,7 +30,13 @@ class LogValues {
   // Without a whitelist no key is admitted. The log and the trace, which may be null, must outlive
   // this object.
   LogValues(SystemLog& log, std::unique_ptr<Whitelist> whitelist, KeyTrace* trace)
-      : log_(log), whitelist_(std::move(whitelist)), trace_(trace) {}
+      : whitelist_(std::move(whitelist)),
+        trace_(trace),
+        pass_(log, [this](std::string_view key, const DistributionResult& result) {
+          setDistribution(key, result);
+        }) {}
+  LogValues(const LogValues&) = delete;
+  LogValues& operator=(const LogValues&) = delete;
 
   // Null: the key must not be reported.
   const ScalarOptions* scalarOptions(std::string_view key) const;
@@ -39,9 +46,13 @@ class LogValues {
 
   // Records the value as its options round it.
   void addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options);
-  // Reads every sample; records the five statistics and, with "intervals", the histogram.
+  // Reads every sample; records the five statistics and, with "intervals", the histogram, at the
+  // latest by finishDistributions().
   void addDistribution(DistributionValues& values, std::string_view key,
-                       const ScalarOptions& options);
+                       const ScalarOptions& options) {
+    pass_.add(values, key, options);
+  }
+  void finishDistributions() { pass_.finish(); }
   bool empty() const;
 
   // Frees the whitelist, after which no key is admitted; returns the digest of its file, which is
@@ -52,9 +63,11 @@ class LogValues {
   const KvRef<KvDictionary>& histograms() const { return histograms_; }
 
  private:
-  SystemLog& log_;
+  void setDistribution(std::string_view key, const DistributionResult& result);
+
   std::unique_ptr<Whitelist> whitelist_;
   KeyTrace* trace_;
+  DistributionPass pass_;
   KvRef<KvDictionary> scalars_ = KvDictionary::create();
   KvRef<KvDictionary> distributions_ = KvDictionary::create();
   KvRef<KvDictionary> histograms_ = KvDictionary::create();

@@ -1,10 +1,14 @@
 // Bucketing and summarising, at their limits.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <bit>
 #include <cmath>
 #include <limits>
 #include <random>
 
+#include "fakes/fake_platform.h"
+#include "report/distribution_pass.h"
 #include "report/distribution_summary.h"
 #include "report/histogram.h"
 
@@ -65,6 +69,10 @@ TEST(Histogram, TheSearchAnswersLikeAScan) {
       ASSERT_EQ(intervals.bucketOf(probe), scan(set, probe))
           << kvText(array.get()) << " sample " << probe;
     }
+    std::vector<std::uint64_t> counted(set.size() + 1), expected(set.size() + 1);
+    intervals.count(probes, counted.data());
+    for (const double probe : probes) ++expected[scan(set, probe)];
+    ASSERT_EQ(counted, expected) << kvText(array.get());
   }
 }
 
@@ -108,6 +116,74 @@ TEST(DistributionSummary, TheFiveNumbers) {
       EXPECT_EQ(text, c.expected) << c.name << ", batch " << batch;
     }
   }
+}
+
+class SampleList final : public DistributionValues {
+ public:
+  SampleList(std::vector<double> samples, bool isWeighted)
+      : samples_(std::move(samples)), isWeighted_(isWeighted) {}
+  std::size_t nextValues(double* values, std::uint32_t*, std::size_t capacity) override {
+    const std::size_t count = std::min({capacity, samples_.size() - taken_, std::size_t{700}});
+    std::copy_n(samples_.begin() + static_cast<std::ptrdiff_t>(taken_), count, values);
+    taken_ += count;
+    weights_.assign(isWeighted_ && taken_ > 900 ? count : 0, 3);
+    return count;
+  }
+  std::span<const std::uint32_t> weights() const override { return weights_; }
+
+ private:
+  std::vector<double> samples_;
+  std::vector<std::uint32_t> weights_;
+  std::size_t taken_ = 0;
+  bool isWeighted_;
+};
+
+std::string bitsOf(const DistributionResult& result) {
+  std::string text;
+  const auto& s = result.summary;
+  for (const double number : {s.minimum, s.maximum, s.mean, s.squaredDeviations}) {
+    // Which of several NaNs results is the processor's choice.
+    text +=
+        std::isnan(number) ? "nan " : std::to_string(std::bit_cast<std::uint64_t>(number)) + " ";
+  }
+  return text + std::to_string(s.count) + kvText(result.histogram.get());
+}
+
+TEST(DistributionPass, SideBySideHasTheBitsOfEachAlone) {
+  fakes::FakeSystemLog log;
+  std::mt19937_64 random(11);
+  const auto none = ScalarOptions::create(), some = ScalarOptions::create();
+  some->set("intervals", boundaries({-1, 0, 2.5, 1000}));
+  const std::size_t sizes[] = {0,
+                               1,
+                               2,
+                               255,
+                               700,
+                               1024,
+                               5000,
+                               DistributionPass::kMostKept - 1,
+                               DistributionPass::kMostKept,
+                               DistributionPass::kMostKept + 1,
+                               40000};
+  std::vector<std::string> expected, found;
+  DistributionPass pass(log, [&](std::string_view key, const DistributionResult& result) {
+    found.push_back(std::string(key) + bitsOf(result));
+  });
+  for (int i = 0; i < 150; ++i) {
+    std::vector<double> samples(sizes[random() % std::size(sizes)]);
+    for (double& sample : samples) {
+      const std::uint64_t bits = random();
+      sample = i % 3 == 0 ? std::bit_cast<double>(bits)  // NaNs, infinities, denormals
+                          : static_cast<double>(bits % 100000) / 64;
+    }
+    const auto& options = i % 2 == 0 ? *none : *some;
+    const std::string key = std::to_string(i) + ": ";
+    SampleList alone(samples, i % 7 == 0), beside(samples, i % 7 == 0);
+    expected.push_back(key + bitsOf(summariseDistribution(log, alone, key, options)));
+    pass.add(beside, key, options);
+  }
+  pass.finish();
+  EXPECT_EQ(found, expected);
 }
 
 TEST(DistributionSummary, TheCountSaturates) {
