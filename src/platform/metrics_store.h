@@ -42,14 +42,21 @@ class HistoryStore {
       std::function<void(std::string_view key, std::int32_t day, std::int64_t value, bool& stop)>;
   using DistributionHandler = std::function<void(std::string_view key, std::int32_t day,
                                                  DistributionValues& values, bool& stop)>;
+  // Whether rows of the key are wanted.
+  using KeyFilter = std::function<bool(std::string_view key)>;
   virtual ~HistoryStore() = default;
   // Calls the handler, before returning, for every row whose key begins with keyPrefix and whose
-  // day lies in (minimumDay, maximumDay], ordered by day and then by key (bytewise).
+  // day lies in (minimumDay, maximumDay], ordered by day and then by key (bytewise). With a filter,
+  // rows of other keys are passed over without reading their samples.
   virtual void enumerateScalars(std::string_view keyPrefix, std::int32_t minimumDay,
                                 std::int32_t maximumDay, const ScalarHandler& handler) = 0;
   virtual void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
-                                      std::int32_t maximumDay,
-                                      const DistributionHandler& handler) = 0;
+                                      std::int32_t maximumDay, const DistributionHandler& handler,
+                                      const KeyFilter& wanted) = 0;
+  void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
+                              std::int32_t maximumDay, const DistributionHandler& handler) {
+    enumerateDistributions(keyPrefix, minimumDay, maximumDay, handler, nullptr);
+  }
   // Whether any sample counts for more than one.
   virtual bool hasWeights() { return false; }
   // Rows that the enumerations until now left out, being damaged; empty if one could not be read to

@@ -21,11 +21,13 @@ void readHistory(MetricsStore& store, std::int32_t day, LogValues& values, ReadF
                               }
                             });
   history->enumerateDistributions(
-      "", before, day, [&](std::string_view key, std::int32_t, DistributionValues& samples, bool&) {
+      "", before, day,
+      [&](std::string_view key, std::int32_t, DistributionValues& samples, bool&) {
         if (const auto* options = values.distributionOptions(key)) {
           values.addDistribution(samples, key, *options);
         }
-      });
+      },
+      [&](std::string_view key) { return values.admitsDistribution(key); });
   figures.damagedRows = history->damagedRows();
   values.finishDistributions();
 }

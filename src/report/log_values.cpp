@@ -12,10 +12,17 @@ const ScalarOptions* LogValues::distributionOptions(std::string_view key) const 
 
 OwnMetrics LogValues::admittedOwn() const {
   OwnMetrics admitted;
-  for (std::size_t i = 0; i < kOwnMetricCount; ++i) {
-    if (scalarOptions(kOwnMetrics[i].key) != nullptr) admitted.add(static_cast<OwnMetric>(i));
+  for (std::size_t i = 0; whitelist_ && i < kOwnMetricCount; ++i) {
+    // Being admitted is not enough: an internal device admits what nobody named.
+    if (whitelist_->matchScalarKey(kOwnMetrics[i].key).entry != nullptr) {
+      admitted.add(static_cast<OwnMetric>(i));
+    }
   }
   return admitted;
+}
+
+bool LogValues::admitsDistribution(std::string_view key) const {
+  return whitelist_ && whitelist_->matchDistributionKey(key).options != nullptr;
 }
 
 void LogValues::addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options) {

@@ -43,6 +43,8 @@ class LogValues {
   const ScalarOptions* distributionOptions(std::string_view key) const;
   // The job's own figures that may be reported.
   OwnMetrics admittedOwn() const;
+  // Whether distributionOptions() has an answer; nothing is logged.
+  bool admitsDistribution(std::string_view key) const;
 
   // Records the value as its options round it.
   void addScalar(std::int64_t value, std::string_view key, const ScalarOptions& options);

@@ -57,10 +57,11 @@ class FakeHistoryStore final : public HistoryStore {
          });
   }
   void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
-                              std::int32_t maximumDay,
-                              const DistributionHandler& handler) override {
+                              std::int32_t maximumDay, const DistributionHandler& handler,
+                              const KeyFilter& wanted) override {
     each(rows_.distributions, keyPrefix, minimumDay, maximumDay,
          [&](const FakeRows::Place& place, const FakeSamples& samples, bool& stop) {
+           if (wanted && !wanted(place.second)) return;
            FakeDistributionValues values(samples, rows_.batch);
            handler(place.second, place.first, values, stop);
          });

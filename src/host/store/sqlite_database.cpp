@@ -244,6 +244,23 @@ Status Database::limitMemory(std::size_t bytes) {
 
 void Database::releaseMemory() { ::sqlite3_db_release_memory(handle_.get()); }
 
+Status Database::addPredicate(const char* name,
+                              const std::function<bool(std::string_view)>& predicate) {
+  const auto call = [](sqlite3_context* context, int, sqlite3_value** arguments) {
+    const auto& test =
+        *static_cast<const std::function<bool(std::string_view)>*>(::sqlite3_user_data(context));
+    const auto* const text = reinterpret_cast<const char*>(::sqlite3_value_text(arguments[0]));
+    const auto length = static_cast<std::size_t>(::sqlite3_value_bytes(arguments[0]));
+    ::sqlite3_result_int(context, text != nullptr && test({text, length}) ? 1 : 0);
+  };
+  const int code =
+      ::sqlite3_create_function_v2(handle_.get(), name, 1, SQLITE_UTF8 | SQLITE_DIRECTONLY,
+                                   const_cast<std::function<bool(std::string_view)>*>(&predicate),
+                                   call, nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) return error();
+  return Done{};
+}
+
 bool Database::wasReplaced() const {
   int moved = 0;
   const int code = ::sqlite3_file_control(handle_.get(), "main", SQLITE_FCNTL_HAS_MOVED, &moved);

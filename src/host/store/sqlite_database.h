@@ -3,6 +3,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <span>
 #include <string>
@@ -80,6 +81,9 @@ class Database {
   Status limitMemory(std::size_t bytes);
   // Frees the pages that are kept for later.
   void releaseMemory();
+  // Makes the predicate a function of SQL, with one argument of text. It must outlive the
+  // statements that call it, and none of them may be running.
+  Status addPredicate(const char* name, const std::function<bool(std::string_view)>& predicate);
   // Whether its directory has another file under this name by now, or none.
   bool wasReplaced() const;
   // A failure, in words that name the file; without a reason, the last call's.

@@ -72,11 +72,11 @@ class SqliteHistory final : public HistoryStore {
   }
 
   void enumerateDistributions(std::string_view keyPrefix, std::int32_t minimumDay,
-                              std::int32_t maximumDay,
-                              const DistributionHandler& handler) override {
+                              std::int32_t maximumDay, const DistributionHandler& handler,
+                              const KeyFilter& wanted) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
     StoreFaults faults(database_, onFault_, &losses_);
-    const Sources sources = openSampleSources(database_, faults, range);
+    const Sources sources = openSampleSources(database_, faults, range, wanted);
     bool stop = false;
     while (!stop) {
       const SampleSource* first = nullptr;
@@ -125,7 +125,7 @@ class EmptyHistory final : public HistoryStore {
   void enumerateScalars(std::string_view, std::int32_t, std::int32_t,
                         const ScalarHandler&) override {}
   void enumerateDistributions(std::string_view, std::int32_t, std::int32_t,
-                              const DistributionHandler&) override {}
+                              const DistributionHandler&, const KeyFilter&) override {}
 };
 
 }  // namespace

@@ -1,5 +1,7 @@
 #include "host/store/samples/sample_source.h"
 
+#include <fmt/format.h>
+
 #include <algorithm>
 #include <optional>
 #include <unordered_map>
@@ -15,6 +17,9 @@ namespace {
 // for each; a checkpoint has no such limit.
 constexpr std::size_t kMostArrivals = 4u << 20;
 
+// Of SQL: whether samples of a key are wanted.
+constexpr const char* kWantedFunction = "tally_wanted";
+
 bool prepare(Database& database, StoreFaults& faults, Statement& statement,
              const std::string& text) {
   auto prepared = database.prepare(text);
@@ -26,66 +31,131 @@ bool prepare(Database& database, StoreFaults& faults, Statement& statement,
   return static_cast<bool>(prepared);
 }
 
+// A walk along a table whose primary key is (day, key, number). Finding a row anew costs the
+// database several of its neighbours with all their blobs, so that a row is read, blob and all,
+// when the walk comes to it; of keys that are not wanted the blob stays on the disk.
+class RowWalk {
+ public:
+  RowWalk(Database& database, StoreFaults& faults) : database_(database), faults_(faults) {}
+
+  // The columns that tell whether a row is sound, and its blob. False if the table cannot be read.
+  bool open(std::string_view table, std::string_view columns, std::string_view blob,
+            const StoreRange& range, bool filtered) {
+    const std::string wanted =
+        filtered ? fmt::format("iif({}(key), {}, NULL)", kWantedFunction, blob) : std::string(blob);
+    if (!prepare(database_, faults_, rows_,
+                 fmt::format("SELECT day, key, number, {}, {} FROM {}{} ORDER BY day, key, number",
+                             wanted, columns, table, StoreRange::kCondition))) {
+      return false;
+    }
+    range.bindTo(rows_);
+    return true;
+  }
+
+  // Goes on to the next row that is sound and wanted; false at the end. isSound is given the row
+  // and its first column of those of open().
+  template <class IsSound>
+  bool next(const IsSound& isSound) {
+    Step step = Step::Done;
+    while ((step = rows_.step()) == Step::Row) {
+      if (!order_.follows(rows_, day(), key(), number())) {
+        faults_.fail(damagedTree(database_));
+        return false;
+      }
+      if (!isStoreKey(key()) || !isSound(rows_, kFirstColumn)) {
+        faults_.addDamaged(key(), day());
+      } else if (!blob().empty()) {
+        return true;
+      }
+    }
+    if (step == Step::Failed) faults_.fail(database_.error());
+    return false;
+  }
+
+  std::int64_t day() const { return rows_.integer(0); }
+  std::string_view key() const { return rows_.text(1); }
+  std::int64_t number() const { return rows_.integer(2); }
+  std::span<const std::byte> blob() const { return rows_.blob(3); }
+  const Statement& row() const { return rows_; }
+  static constexpr int kFirstColumn = 4;
+
+ private:
+  Database& database_;
+  StoreFaults& faults_;
+  Statement rows_;
+  RowOrder order_;
+};
+
+// Which rows of a walk belong to the key whose samples are read.
+class OpenKey {
+ public:
+  void open(bool isHere) {
+    isOpen_ = isHere;
+    isTaken_ = false;
+  }
+  void close() { isOpen_ = false; }
+  // The row where the source is, then each that follows; false when the next is of another key.
+  bool takeRow(SampleSource& source) {
+    if (!isOpen_) return false;
+    if (!std::exchange(isTaken_, true)) return true;
+    const std::int32_t day = source.place().first;
+    key_ = source.place().second;
+    source.advance();
+    return isOpen_ = !source.atEnd() && source.place() == SamplePlace(day, key_);
+  }
+
+ private:
+  bool isOpen_ = false, isTaken_ = false;
+  std::string key_;
+};
+
 // Samples in two columns: `chunks` or `recent`.
 class ChunkSource final : public SampleSource {
  public:
   ChunkSource(Database& database, StoreFaults& faults, std::string_view table,
-              const StoreRange& range)
-      : database_(database), faults_(faults) {
-    const std::string from = " FROM " + std::string(table);
-    const std::string ofKey = from + " WHERE day = ?1 AND key = ?2";
+              const StoreRange& range, bool filtered)
+      : database_(database), faults_(faults), rows_(database, faults) {
     const bool prepared =
-        prepare(database_, faults_, rows_,
-                "SELECT day, key, samples, length(sample_values), length(sample_offsets), "
-                "number" +
-                    from + std::string(StoreRange::kCondition) + " ORDER BY day, key, number") &&
-        prepare(database_, faults_, values_,
-                "SELECT number, samples, " + std::string(kBoundedValues) +
-                    ", length(sample_offsets)" + ofKey + " ORDER BY number") &&
-        prepare(database_, faults_, offsets_, "SELECT sample_offsets" + ofKey + " AND number = ?3");
-    if (!prepared) {
+        rows_.open(table, "samples, length(sample_values), length(sample_offsets)", kBoundedValues,
+                   range, filtered) &&
+        prepare(database_, faults_, offsets_,
+                fmt::format("SELECT sample_offsets FROM {} WHERE day = ?1 AND key = ?2 AND number "
+                            "= ?3",
+                            table));
+    if (prepared) {
+      ChunkSource::advance();
+    } else {
       end();
-      return;
     }
-    range.bindTo(rows_);
-    advance();
   }
 
   void advance() override {
-    Step step = Step::Done;
-    while ((step = rows_.step()) == Step::Row) {
-      const std::int64_t day = rows_.integer(0);
-      const std::string_view key = rows_.text(1);
-      if (!order_.follows(rows_, day, key, rows_.integer(5))) {
-        end();
-        return faults_.fail(damagedTree(database_));
-      }
-      if (isStoreKey(key) && chunkIsSound(rows_.integer(2), rows_.integer(3), rows_.integer(4))) {
-        return moveTo(day, key);
-      }
-      faults_.addDamaged(key, day);
+    const bool found = rows_.next([](const Statement& row, int first) {
+      return chunkIsSound(row.integer(first), row.integer(first + 1), row.integer(first + 2));
+    });
+    if (found) {
+      moveTo(rows_.day(), rows_.key());
+    } else {
+      end();
     }
-    end();
-    if (step == Step::Failed) faults_.fail(database_.error());
   }
 
   void openSamples(std::int32_t day, std::string_view key) override {
-    values_.reset();
-    values_.bind(1, std::int64_t{day}).bind(2, key);
-    offsets_.reset();
-    offsets_.bind(1, std::int64_t{day}).bind(2, key);
-    offsetsOfChunk_ = false;
-    chunk_ = {};
+    open_.open(!atEnd() && place() == SamplePlace(day, key));
     taken_ = held_ = 0;
-    lastChunk_.reset();
   }
   std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) override {
-    if (taken_ == held_ && !nextChunk()) return 0;
+    if (taken_ == held_) {
+      taken_ = held_ = 0;
+      if (!open_.takeRow(*this)) return 0;
+      held_ = static_cast<std::size_t>(rows_.row().integer(RowWalk::kFirstColumn));
+      hasOffsets_ = false;
+    }
     const std::size_t count = std::min(capacity, held_ - taken_);
-    unpackValues(chunk_, taken_, {values, count});
+    unpackValues(rows_.blob(), taken_, {values, count});
     if (offsets != nullptr) {
       std::fill_n(offsets, count, 0);
-      if (offsetsOfChunk_ || fetchOffsets()) {
+      if (hasOffsets_ || fetchOffsets()) {
         unpackOffsets(offsets_.blob(0), taken_, {offsets, count});
       }
     }
@@ -93,49 +163,27 @@ class ChunkSource final : public SampleSource {
     return count;
   }
   void closeSamples() override {
-    values_.reset();
+    open_.close();
     offsets_.reset();
   }
 
  private:
-  bool nextChunk() {
-    Step step = Step::Done;
-    while ((step = values_.step()) == Step::Row) {
-      const std::int64_t number = values_.integer(0);
-      if (lastChunk_ && number <= *lastChunk_) {
-        faults_.fail(damagedTree(database_));
-        break;
-      }
-      lastChunk_ = number;
-      chunk_ = values_.blob(2);
-      // Damaged ones were counted by the walk over the rows.
-      if (!chunkIsSound(values_.integer(1), std::ssize(chunk_), values_.integer(3))) continue;
-      held_ = static_cast<std::size_t>(values_.integer(1));
-      taken_ = 0;
-      offsetsOfChunk_ = false;
-      return true;
-    }
-    if (step == Step::Failed) faults_.fail(database_.error());
-    held_ = taken_ = 0;
-    return false;
-  }
-
   bool fetchOffsets() {
     offsets_.reset();
-    const Step step = offsets_.bind(3, values_.integer(0)).step();
+    const Step step =
+        offsets_.bind(1, rows_.day()).bind(2, rows_.key()).bind(3, rows_.number()).step();
     if (step == Step::Failed) faults_.fail(database_.error());
-    return offsetsOfChunk_ = step == Step::Row;
+    return hasOffsets_ = step == Step::Row;
   }
 
   Database& database_;
   StoreFaults& faults_;
-  Statement rows_, values_, offsets_;
-  RowOrder order_;
-  std::optional<std::int64_t> lastChunk_;
-  // The chunk in hand: the column of its values, and how many of them were delivered.
-  std::span<const std::byte> chunk_;
+  RowWalk rows_;
+  OpenKey open_;
+  Statement offsets_;
+  // Of the chunk in hand: how many samples it holds, and how many of them were delivered.
   std::size_t held_ = 0, taken_ = 0;
-  bool offsetsOfChunk_ = false;
+  bool hasOffsets_ = false;
 };
 
 // Samples in packed blobs. Which row is next is known to the classes below.
@@ -196,67 +244,44 @@ class BlobSource : public SampleSource {
 
 class PackedSource final : public BlobSource {
  public:
-  PackedSource(Database& database, StoreFaults& faults, const StoreRange& range)
-      : BlobSource(database, faults) {
-    const bool prepared =
-        prepare(database, faults, rows_,
-                "SELECT day, key, number, " + std::string(kPackedSummary) + " FROM packed" +
-                    std::string(StoreRange::kCondition) + " ORDER BY day, key, number") &&
-        prepare(database, faults, blobs_,
-                "SELECT number, " + std::string(kBoundedBlob) +
-                    " FROM packed WHERE day = ?1 AND key = ?2 ORDER BY number");
-    if (!prepared) {
+  PackedSource(Database& database, StoreFaults& faults, const StoreRange& range, bool filtered)
+      : BlobSource(database, faults), rows_(database, faults) {
+    if (rows_.open(kPackedTable, kPackedSummary, kBoundedBlob, range, filtered)) {
+      PackedSource::advance();
+    } else {
       end();
-      return;
     }
-    range.bindTo(rows_);
-    PackedSource::advance();
   }
 
   void advance() override {
-    Step step = Step::Done;
-    while ((step = rows_.step()) == Step::Row) {
-      const std::int64_t day = rows_.integer(0);
-      const std::string_view key = rows_.text(1);
-      if (!order_.follows(rows_, day, key, rows_.integer(2))) return fail(damagedTree(database_));
-      if (isStoreKey(key) && packedRowIsSound(rows_, 3)) return moveTo(day, key);
-      faults_.addDamaged(key, day);
+    if (rows_.next(packedRowIsSound)) {
+      moveTo(rows_.day(), rows_.key());
+    } else {
+      end();
     }
-    end();
-    if (step == Step::Failed) faults_.fail(database_.error());
   }
 
   void openSamples(std::int32_t day, std::string_view key) override {
     clear();
-    last_.reset();
-    blobs_.reset();
-    blobs_.bind(1, std::int64_t{day}).bind(2, key);
+    open_.open(!atEnd() && place() == SamplePlace(day, key));
   }
-  void closeSamples() override { blobs_.reset(); }
+  void closeSamples() override { open_.close(); }
 
  private:
   std::optional<std::span<const std::byte>> nextBlob() override {
-    const Step step = blobs_.step();
-    if (step == Step::Failed) faults_.fail(database_.error());
-    if (step != Step::Row) return std::nullopt;
-    const std::int64_t number = blobs_.integer(0);
-    if (last_ && number <= *last_) {
-      faults_.fail(damagedTree(database_));
-      return std::nullopt;
-    }
-    last_ = number;
-    return blobs_.blob(1);
+    if (!open_.takeRow(*this)) return std::nullopt;
+    return rows_.blob();
   }
 
-  Statement rows_, blobs_;
-  RowOrder order_;
-  std::optional<std::int64_t> last_;
+  RowWalk rows_;
+  OpenKey open_;
 };
 
 // Rows in the order of arrival, which are put into the order of day and key in memory.
 class ArrivalSource final : public BlobSource {
  public:
-  ArrivalSource(Database& database, StoreFaults& faults, const StoreRange& range)
+  ArrivalSource(Database& database, StoreFaults& faults, const StoreRange& range,
+                const HistoryStore::KeyFilter& wanted)
       : BlobSource(database, faults) {
     Statement rows;
     const bool prepared =
@@ -270,7 +295,7 @@ class ArrivalSource final : public BlobSource {
       return;
     }
     range.bindTo(rows);
-    readOrder(rows);
+    readOrder(rows, wanted);
     if (!atEnd()) ArrivalSource::advance();
   }
 
@@ -297,7 +322,7 @@ class ArrivalSource final : public BlobSource {
     SamplePlace place() const { return {day, key}; }
   };
 
-  void readOrder(Statement& rows) {
+  void readOrder(Statement& rows, const HistoryStore::KeyFilter& wanted) {
     std::unordered_map<std::string, std::size_t> found;  // places by day and key
     std::string name;
     std::optional<std::int64_t> last;
@@ -312,6 +337,7 @@ class ArrivalSource final : public BlobSource {
         faults_.addDamaged(key, day);
         continue;
       }
+      if (wanted && !wanted(key)) continue;
       if (++count > kMostArrivals) {
         return fail(database_.error("more new rows than can be put in order; checkpoint first"));
       }
@@ -342,22 +368,30 @@ class ArrivalSource final : public BlobSource {
 
 }  // namespace
 
-std::vector<std::unique_ptr<SampleSource>> openSampleSources(Database& database,
-                                                             StoreFaults& faults,
-                                                             const StoreRange& range) {
+std::vector<std::unique_ptr<SampleSource>> openSampleSources(
+    Database& database, StoreFaults& faults, const StoreRange& range,
+    const HistoryStore::KeyFilter& wanted) {
   std::vector<std::unique_ptr<SampleSource>> sources;
-  sources.push_back(std::make_unique<ChunkSource>(database, faults, "chunks", range));
-  sources.push_back(std::make_unique<ChunkSource>(database, faults, "recent", range));
+  const bool filtered = static_cast<bool>(wanted);
+  if (filtered) {
+    if (const Status added = database.addPredicate(kWantedFunction, wanted); !added) {
+      faults.fail(added.error());
+      return sources;
+    }
+  }
+  for (const char* const table : {"chunks", "recent"}) {
+    sources.push_back(std::make_unique<ChunkSource>(database, faults, table, range, filtered));
+  }
   const auto has = [&](std::string_view table) {
     const auto exists = hasTable(database, table);
     if (!exists) faults.fail(exists.error());
     return exists && *exists;
   };
   if (has(kPackedTable)) {
-    sources.push_back(std::make_unique<PackedSource>(database, faults, range));
+    sources.push_back(std::make_unique<PackedSource>(database, faults, range, filtered));
   }
   if (has(kArrivalsTable)) {
-    sources.push_back(std::make_unique<ArrivalSource>(database, faults, range));
+    sources.push_back(std::make_unique<ArrivalSource>(database, faults, range, wanted));
   }
   return sources;
 }

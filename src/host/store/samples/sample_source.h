@@ -12,6 +12,7 @@
 
 #include "host/store/sqlite_database.h"
 #include "host/store/store_rows.h"
+#include "platform/metrics_store.h"
 
 namespace tally {
 
@@ -49,9 +50,11 @@ class SampleSource {
 };
 
 // The sources of a store in the order in which the samples of a key were recorded: chunks, recent,
-// packed, arrivals; without those that the store lacks. They borrow all arguments.
+// packed, arrivals; without those that the store lacks. They borrow all arguments. An empty filter
+// wants every key.
 std::vector<std::unique_ptr<SampleSource>> openSampleSources(Database& database,
                                                              StoreFaults& faults,
-                                                             const StoreRange& range);
+                                                             const StoreRange& range,
+                                                             const HistoryStore::KeyFilter& wanted);
 
 }  // namespace tally
