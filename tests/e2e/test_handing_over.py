@@ -30,8 +30,9 @@ class HandingOver(DeviceTest):
         return messages
 
     def take(self, to=f"/{OUTGOING}", *more, status=0):
-        self.device.tool("report", "take", "--to", to, *more, status=status)
-        return sorted((self.device.root / to[1:]).glob("*.log"))
+        out = self.device.root / to[1:]
+        self.device.tool("report", "take", "--to", out, *more, status=status)
+        return sorted(out.glob("*.log"))
 
     def marks(self, logs):
         return [(info["DevicePseudonym"], info["SequenceNumber"]) for info in map(self.device.info, logs)]
@@ -94,14 +95,14 @@ class Take(HandingOver):
     def test_where_logs_are_not_moved(self):
         self.submit(0)
         root = self.device.root
-        for case, target, status in (("not from the root", "out", 2), ("missing", "/out", 1), ("the spool", f"/{SPOOL}", 1),
+        for case, target, status in (("missing, and what is above", "/out/put", 1), ("the spool", f"/{SPOOL}", 1),
                                      ("a file", "/device/device.plist", 1), ("another user's link", "/theirs/link", 1)):
             if "link" in case:
                 (root / "theirs").mkdir()
                 (root / "theirs/link").symlink_to(root / OUTGOING)
                 (root / "theirs").chmod(0o777)
             with self.subTest(case):
-                self.device.tool("report", "take", "--to", target, status=status)
+                self.device.tool("report", "take", "--to", f"{root}{target}", status=status)
                 self.assertEqual(len(self.device.log_files()), 1)
         if os.getuid() == 0 and subprocess.run(["mount", "-t", "tmpfs", "tally", root / OUTGOING],
                                                check=False, capture_output=True).returncode == 0:

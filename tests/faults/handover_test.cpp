@@ -85,7 +85,7 @@ class HandoverWalk : public testing::Test, InMemory, protected TemporaryFolder {
       fakes::FakeSystemLog log;
       (void)LogHandover(DeviceRoot(at("device")), log, {}, [] {
         return true;
-      }).take(to, std::nullopt);
+      }).take(device(to.substr(1)), std::nullopt);
       if (cut) endWithPowerCut();
       ::_exit(0);
     }

@@ -157,7 +157,7 @@ Status LogHandover::recover(const Directory& spool) const {
     log_.fault("hand-over: journal", "{} is damaged: the logs of the spool are handed over again",
                spool.pathOf(kJournalFile));
   } else {
-    const auto to = root_.open(journal->directory);
+    const auto to = DeviceRoot("").open(journal->directory);
     if (to) {
       if (auto settled = settle(spool, *to, *journal); !settled) return settled;
     } else if (to.error().systemError != ENOENT) {
@@ -200,7 +200,13 @@ Status LogHandover::settle(const Directory& spool, const Directory& to,
 }
 
 Result<LogHandover::Target> LogHandover::open(const Directory& spool, const std::string& to) const {
-  auto directory = root_.open(to);
+  const std::size_t slash = to.find_last_of('/');
+  auto directory = DeviceRoot("").open(to);
+  if (!directory && directory.error().systemError == ENOENT && slash != to.npos) {
+    const auto parent = DeviceRoot("").open(to.substr(0, slash));
+    if (!parent) return parent.error();
+    directory = parent->makeDirectory(to.substr(slash + 1), 0700);
+  }
   if (!directory) return directory.error();
   if (isSame(*directory, spool)) return Error{directory->path() + " is the spool itself"};
   struct stat status {};

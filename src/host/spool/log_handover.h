@@ -29,7 +29,8 @@ class LogHandover {
   LogHandover(DeviceRoot root, SystemLog& log, FolderBounds bounds, std::function<bool()> consent)
       : root_(std::move(root)), log_(log), bounds_(bounds), consent_(std::move(consent)) {}
 
-  // To a directory of the device, which must exist. A log gets the next number of the directory, so
+  // To a directory of this machine, whatever the device root, by its absolute path; it is made if
+  // the one above it exists. A log gets the next number of the directory, so
   // it never replaces another, and its information comes before it. With a type code, others stay.
   // An error: nothing more can be moved now.
   Result<TakenLogs> take(const std::string& to, const std::optional<std::string>& typeCode);

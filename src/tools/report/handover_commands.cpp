@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <chrono>
+#include <filesystem>
 #include <nlohmann/json.hpp>
 
 #include "base/files/file_lock.h"
@@ -34,19 +35,19 @@ int complainOfAll(const ToolContext& context, const std::vector<std::string>& fa
 }
 
 int take(const ToolContext& context, const HandoverArguments& arguments) {
-  if (!arguments.to.starts_with('/')) {
-    return complain(context, "--to takes a directory of the device, from its root: /DIRECTORY",
-                    kBadUsage);
-  }
+  std::error_code error;
+  std::string to = std::filesystem::absolute(arguments.to, error).lexically_normal();
+  if (error) return complain(context, "--to: " + error.message(), kWrong);
+  to.resize(to.find_last_not_of('/') + 1);
   LogHandover handover(DeviceRoot(context.root), *context.platform->log,
                        folderBounds(*context.platform->preferences), consentOf(context));
-  const auto taken = handover.take(arguments.to, arguments.type);
+  const auto taken = handover.take(to, arguments.type);
   if (!taken) return complain(context, taken.error().message, kWrong);
   if (context.json) {
     printJson(context, {{"taken", taken->names}, {"bytes", taken->bytes}});
   } else {
     printLine(context, fmt::format("{} ({}) moved to {}", counted(taken->names.size(), "log"),
-                                   byteText(taken->bytes), arguments.to));
+                                   byteText(taken->bytes), to));
   }
   return complainOfAll(context, taken->faults);
 }
@@ -120,7 +121,7 @@ void addHandoverCommands(CLI::App& report, ToolContext& context) {
   Command taking = group.add("take", "Move submitted logs out of the spool, each once", take);
   taking
       .option("--to", {"DIR", ValueKind::Directory}, &arguments.to,
-              "The directory, from the device's root; it must exist")
+              "The directory; it is made if the one above it exists")
       .required();
   taking.option("--type", kTextValue, &arguments.type, "Only logs of this type code");
   group.add("hooks", "Run the hooks of /etc/tallyrun.d/submitted for each outgoing log", hooks)
