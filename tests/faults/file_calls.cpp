@@ -43,7 +43,9 @@ OpenFile& openFile(int descriptor) {
 
 std::string pathAt(int directory, std::string_view name) {
   if (directory == AT_FDCWD || name.starts_with('/')) return std::string(name);
-  return openFile(directory).path + (name == "." ? "" : "/" + std::string(name));
+  const std::string& path = openFile(directory).path;
+  if (name == ".") return path;
+  return (path == "/" ? "" : path) + "/" + std::string(name);
 }
 
 // True when the call is to fail, with errno set.
