@@ -15,6 +15,7 @@ from installed import main_with_optional_clients
 TOP = pathlib.Path(__file__).resolve().parent.parent.parent
 AXE = TOP / "build/npm-clients/node_modules/axe-core/axe.min.js"
 # Names that try to become markup, a command of a shell, or an option.
+MINUS = "\u2212"
 HOSTILE = "</script><img src=x onerror=alert(1)>\u2028<!--"
 GROUP = "-G'; touch /tmp/x #<b>"
 MANY = 100_000
@@ -95,6 +96,19 @@ class PageTest(unittest.TestCase):
                 self.assertIn(part, shown, key)
         bars = self.browser.run("return [...document.querySelectorAll('.histogram .fill')].map((bar) => bar.getAttribute('width'));")
         self.assertEqual(bars, ["50.00", "100.00", "50.00"])
+
+    def test_negative_values_turned_letters_and_a_log_that_may_not_leave(self):
+        device = Device()
+        self.addCleanup(device.remove)
+        device.whitelist(Main=group({"n\u202em": {"bucket_interval": 100}}))
+        device.store([("n\u202em", TODAY - 1, -150)])
+        device.set_preferences("vellum.tallyd", DiagnosticSubmissionEnabled=False)
+        self.open(0, self.write(device=device))
+        self.assertEqual(self.keys(), ["n\\u202em"])
+        self.assertIn(f"{MINUS}249 \u2013 {MINUS}150", self.row("n"))
+        self.assertIn("Keys that would leave", self.text("#figures dt")[0])
+        self.show("stays")
+        self.assertIn("submission is not allowed", self.text("#panel-stays [data-label=Why]")[0])
 
     def test_what_stays_is_gone_or_belongs_to_the_log(self):
         self.open()

@@ -72,7 +72,9 @@ class BlockBuilder {
   }
 
   Json build() {
-    Json block = {{"notes", log_.notes}, {"facts", pageFacts(sources_, log_)}};
+    Json block = {{"notes", log_.notes},
+                  {"facts", pageFacts(sources_, log_)},
+                  {"isNext", !log_.spooled.has_value()}};
     if (log_.content) {
       block["sameWhitelist"] = sameWhitelist_;
       if (!sameWhitelist_) block["notes"].push_back(whitelistNote());
@@ -185,10 +187,13 @@ class BlockBuilder {
     const DayAccount account =
         accountOfDay(sources_.context, sources_.judge, *log_.day, isNext ? content : nullptr);
     Json keys = Json::array(), kinds = keys, reasons = keys, metrics = keys;
+    const bool nothingLeaves = isNext && !sources_.submissionAllowed;
     for (const KeyAccount& key : account.keys) {
       const ValueState& value = key.value;
       const bool isRecorded = value.stored || value.damaged || !value.refusal.empty();
-      if (!isRecorded || (content != nullptr && loggedValue(*content, key.key, key.kind))) continue;
+      const bool isLogged =
+          content != nullptr && loggedValue(*content, key.key, key.kind) != nullptr;
+      if (!isRecorded || (isLogged && !nothingLeaves)) continue;
       std::optional<AbsenceReason> reason = key.absence;
       if (!isNext && content != nullptr) {
         reason = whyAbsentFrom(*content, key.absence, whitelist().digest);

@@ -54,7 +54,7 @@ let view = null; // of that log: its tables and counts
 function keyCell(row, description, withButton) {
   // Long keys break after their parts.
   const name = make("span", { class: "key" });
-  for (const part of row.key.split(/(?<=[._])/)) name.append(part, make("wbr"));
+  for (const part of visibleText(row.key).split(/(?<=[._])/)) name.append(part, make("wbr"));
   const label = withButton ? make("button", { type: "button", class: "fold", "aria-expanded": "false" }, name) : name;
   return make("th", { scope: "row", role: "rowheader" }, label,
     description ? make("span", { class: "description" }, description) : null);
@@ -357,7 +357,8 @@ function figures(block) {
   for (const part of [block.scalars, block.distributions]) {
     for (const former of part.former) if (former !== true) ++changed;
   }
-  const list = [["Keys that leave", block.leaving.toLocaleString("en-US"),
+  const title = index.submissionAllowed || !block.isNext ? "Keys that leave" : "Keys that would leave";
+  const list = [[title, block.leaving.toLocaleString("en-US"),
     `${counted(block.scalarCount, "scalar")}, ${counted(block.leaving - block.scalarCount, "distribution")}`],
   ["Recorded, stays here", block.absent.key.length.toLocaleString("en-US"), ""]];
   if (block.before) {

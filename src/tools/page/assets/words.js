@@ -49,7 +49,9 @@ function momentText(stamp) {
 function rangeOf(block, value, range) {
   if (range < 0 || value === "?") return null;
   const [below, above, hasGaps] = block.ranges[range];
-  return { low: BigInt(value) - BigInt(below), high: BigInt(value) + BigInt(above), hasGaps };
+  // The differences are those of 64 bits: the true values may all lie on one side of the value.
+  const within = (number) => BigInt.asIntN(64, number);
+  return { low: within(BigInt(value) - BigInt(below)), high: within(BigInt(value) + BigInt(above)), hasGaps };
 }
 
 function rangeText(range) {
@@ -92,13 +94,21 @@ function bucketWords(label, unit) {
   return `above ${number(lower)}, up to ${withUnit(number(upper), unit)}`;
 }
 
+// Characters that would reorder what is around them are shown by their number.
+function visibleText(text) {
+  return text.replace(/[\u061c\u200e\u200f\u202a-\u202e\u2066-\u2069]/g,
+    (mark) => `\\u${mark.charCodeAt(0).toString(16).padStart(4, "0")}`);
+}
+
 // Makes an element; children are elements or text.
 function make(tag, attributes, ...children) {
   const element = document.createElement(tag);
   for (const [name, value] of Object.entries(attributes || {})) {
     if (value !== null && value !== undefined && value !== false) element.setAttribute(name, value === true ? "" : value);
   }
-  for (const child of children) if (child !== null && child !== undefined) element.append(child);
+  for (const child of children) {
+    if (child !== null && child !== undefined) element.append(typeof child === "string" ? visibleText(child) : child);
+  }
   return element;
 }
 
