@@ -78,21 +78,27 @@ class Export(DeviceTest):
         hidden = whole[0].replace(b"<dict>", b"<dict><!-- </plist> <?xml --><key>c</key><string><![CDATA[</plist><?xml ]]>"
                                   b"</string>", 1)
         self.assertIn(b"<!--", hidden)
+        other = plistlib.dumps({"TypeCode": "1", "Name": "other", "DevicePseudonym": "y", "SequenceNumber": 1})
+        parts = "TBScalars", "TBDistributions", "TBDistributionsHistogram"
+        last = (1 << 53) - 1
         for stream, logs, status in [
+                (other + whole[0], 1, 0), (other + b"text\n" + whole[0], 1, 0),
+                *((whole[0] + plistlib.dumps({"TBCrashLogVersion": 1, part: []}), 1, 1) for part in parts),
                 (whole[0] * 3, 3, 0), (hidden + whole[0], 2, 0), (b"", 0, 0),
                 (whole[0][:len(whole[0]) // 2] + whole[0], 1, 1),
                 (b"noise" + whole[0] + b"noise\n" + whole[0] + b"noise", 2, 1),
                 (b"<plist><dict/></plist>" + whole[0], 1, 1),
                 (whole[0] + plistlib.dumps(plistlib.loads(whole[0]), fmt=plistlib.FMT_BINARY), 2, 0)]:
-            rows = self.rows("-", "--device", "x", "--sequence", "3", stdin=stream, status=status)
+            rows = self.rows("-", "--device", "x", "--sequence", str(last), stdin=stream, status=status)
             self.assertEqual(len(rows), logs * each, stream[:40])
-            self.assertEqual([row["sequence"] for row in rows], ([3] * each + [None] * logs * each)[:logs * each])
+            self.assertEqual([row["sequence"] for row in rows], ([last] * each + [None] * logs * each)[:logs * each])
         self.assertEqual({row["device"] for row in self.rows(str(self.logs[0]), "--device", "x")}, {PSEUDONYM})
 
         everything = len(self.rows())
         (self.spool / "0000000009-other.log").write_bytes(b"text")
         (self.spool / "0000000009-other.info.plist").write_bytes(plistlib.dumps({"TypeCode": "1", "Name": "other"}))
-        self.assertEqual(len(self.rows()), everything, "logs of other kinds are no part of it")
+        for files in [], map(str, self.spool.glob("*.log")):
+            self.assertEqual(len(self.rows(*files)), everything, "logs of other kinds are no part of it")
         self.logs[0].write_bytes(whole[0][:-20])
         self.assertEqual(len(self.rows(status=1)), everything - each)
         self.assertEqual(len(self.rows(*map(str, self.logs), status=1)), everything - each)

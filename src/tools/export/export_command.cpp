@@ -1,6 +1,5 @@
 #include "tools/export/export_command.h"
 
-#include <limits>
 #include <memory>
 
 #include "base/utf8.h"
@@ -17,7 +16,7 @@ namespace {
 struct ExportArguments {
   std::string format = "ndjson";
   std::string device, systemVersion, configuration;
-  std::optional<std::uint32_t> sequence;
+  std::optional<std::uint64_t> sequence;
   std::vector<std::string> files;
   bool timestamps = false;
 };
@@ -68,7 +67,7 @@ void addExportCommand(CLI::App& report, ToolContext& context) {
   command
       .option("--sequence", {"NUMBER", ValueKind::Number}, &arguments.sequence,
               "Sequence number, of the first log that does not say it")
-      .within(1, std::numeric_limits<int>::max());
+      .within(std::uint64_t{1}, kLargestExact);
   command.option("--system-version", kTextValue, &arguments.systemVersion,
                  "Version of the system, of logs that do not say it");
   command.option("--configuration", kTextValue, &arguments.configuration,

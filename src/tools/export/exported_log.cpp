@@ -7,9 +7,6 @@
 namespace tally::tools {
 namespace {
 
-// Whole numbers beyond it have neighbours that a double cannot tell apart.
-constexpr std::uint64_t kLargestExact = (std::uint64_t{1} << 53) - 1;
-
 // The number as a T; empty when it is not an integer, or not within a T.
 template <class T>
 std::optional<T> integerOf(const KvObject* value) {
@@ -58,6 +55,7 @@ bool readStatistics(const KvObject* value, Statistics& statistics) {
 }  // namespace
 
 LogOrigin originOf(const SpooledLog& log) {
+  if (!isDailyLog(log)) return {};
   LogOrigin origin{log.device, log.deviceSequence, log.systemVersion, ""};
   if (origin.sequence > kLargestExact) origin.sequence.reset();
   if (log.options) origin.configuration = log.options->getString("ConfigNumber").value_or("");
@@ -73,6 +71,11 @@ SkippedValues exportLog(const DailyLog& log, const LogOrigin& origin, RowFormat&
   format.beginLog({origin, dayWithDate(log),
                    integerOf<std::int64_t>(document.get("TBCrashLogVersion")),
                    document.getString("TBWhitelistDigest").value_or("")});
+  for (const char* const part : {"TBScalars", "TBDistributions", "TBDistributionsHistogram"}) {
+    if (document.contains(part) && document.getAs<KvDictionary>(part) == nullptr) {
+      skip(part, "is not a dictionary");
+    }
+  }
   for (const auto& [key, value] : log.scalars()) {
     if (const auto integer = integerOf<std::int64_t>(value.get())) {
       format.addScalar(key->view(), *integer);

@@ -10,7 +10,7 @@
 
 namespace tally::tools {
 
-// What the log's information says of it.
+// What the log's information says of it: nothing unless it says that the log is a daily one.
 LogOrigin originOf(const SpooledLog& log);
 
 // What a log holds that cannot be a row: of a type that no log has there.

@@ -13,13 +13,18 @@
 namespace tally::tools {
 namespace {
 
-constexpr std::string_view kBodySuffix = ".log", kInformationSuffix = ".info.plist";
-constexpr std::size_t kLargestInformation = 1u << 20;
+// Which log it is, as far as its information says.
+enum class LogKind { Unknown, Daily, Other };
 
-// The spool's log is a daily one as far as its information says, or its name where that is damaged.
-bool mayBeDaily(const SpooledLog& log) {
-  return log.name.empty() ? log.fileName.ends_with(fmt::format("-{}{}", kDailyLogName, kBodySuffix))
-                          : isDailyLog(log);
+LogKind kindOf(const SpooledLog& log) {
+  if (isDailyLog(log)) return LogKind::Daily;
+  // A program may submit logs of its own name without a type code.
+  const bool isDamaged = log.name.empty() || (log.name == kDailyLogName && log.typeCode.empty());
+  return isDamaged ? LogKind::Unknown : LogKind::Other;
+}
+
+bool isNamedDaily(const SpooledLog& log) {
+  return log.fileName.ends_with(fmt::format("-{}{}", kDailyLogName, kBodySuffix));
 }
 
 void fillIn(std::string& text, const std::string& known) {
@@ -59,36 +64,39 @@ void LogSources::addSpool() {
   if (!all) return fail("spool", all.error().message);
   for (const SpooledLog& log : *all) {
     if (outputFailed()) return;
-    if (!mayBeDaily(log)) continue;
+    const LogKind kind = kindOf(log);
+    if (kind == LogKind::Other || (kind == LogKind::Unknown && !isNamedDaily(log))) continue;
     const auto body = logs.read(log);
     if (!body) {
       fail(log.fileName, body.error().message);
       continue;
     }
     addBody(log.fileName, *body, originOf(log));
-    if (log.name.empty()) fail(log.fileName, "its information is missing or damaged");
+    if (kind == LogKind::Unknown) fail(log.fileName, "its information is missing or damaged");
   }
 }
 
 void LogSources::addFile(const std::string& path) {
   if (outputFailed()) return;
   if (path == "-") return addStandardInput();
-  const auto body = readFile(path, kDailyLogMaximumBytes);
-  if (!body) {
-    complain(context_, body.error().message, kWrong);
-    failed_ = true;
-    return;
-  }
   SpooledLog log;
   if (path.ends_with(kBodySuffix)) {
     const std::string stem = path.substr(0, path.size() - kBodySuffix.size());
     const std::string beside = stem + std::string(kInformationSuffix);
     const auto information = readFile(beside, kLargestInformation);
     if (information) readLogInformation(*information, log);
+    const LogKind kind = kindOf(log);
+    if (kind == LogKind::Other) return;
     const bool isBare = !information && information.error().systemError == ENOENT;
-    if (!isBare && log.name.empty()) {
+    if (!isBare && kind == LogKind::Unknown) {
       fail(beside, information ? "not the information of a log" : information.error().message);
     }
+  }
+  const auto body = readFile(path, kDailyLogMaximumBytes);
+  if (!body) {
+    complain(context_, body.error().message, kWrong);
+    failed_ = true;
+    return;
   }
   addBody(path, *body, originOf(log));
 }
@@ -112,8 +120,8 @@ void LogSources::addStandardInput() {
       continue;
     }
     if ((*document)->size() <= kLargestInformation) readLogInformation(**document, next);
-    const bool isOther = !information.name.empty() && !isDailyLog(information);
-    if (next.name.empty() && !isOther) fail(title, log.error().message);
+    const bool isOther = kindOf(information) == LogKind::Other;
+    if (kindOf(next) == LogKind::Unknown && !isOther) fail(title, log.error().message);
   }
 }
 

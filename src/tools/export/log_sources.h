@@ -22,8 +22,8 @@ class LogSources {
 
   // The submitted daily logs, oldest first. Logs of other kinds are no part of it.
   void addSpool();
-  // A file that holds one log, with the information beside it; "-" is standard input, which may
-  // hold many, each after its information or without.
+  // A file that holds one log, with the information beside it, which may say that it is no daily
+  // one; "-" is standard input, which may hold many, each after its information or without.
   void addFile(const std::string& path);
   bool failed() const { return failed_; }
 

@@ -13,10 +13,13 @@
 
 namespace tally::tools {
 
+// Whole numbers beyond it have neighbours that a double cannot tell apart.
+constexpr std::uint64_t kLargestExact = (std::uint64_t{1} << 53) - 1;
+
 // What is known of a log beside its body: empty where it is not known.
 struct LogOrigin {
   std::string device;                     // the device's pseudonym
-  std::optional<std::uint64_t> sequence;  // among the logs of that pseudonym
+  std::optional<std::uint64_t> sequence;  // among the daily logs of that pseudonym
   std::string systemVersion, configuration;
 };
 

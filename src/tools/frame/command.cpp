@@ -16,6 +16,10 @@ const Option& Option::within(int lowest, int highest) const {
   option_->check(CLI::Range(lowest, highest));
   return *this;
 }
+const Option& Option::within(std::uint64_t lowest, std::uint64_t highest) const {
+  option_->check(CLI::Range(lowest, highest));
+  return *this;
+}
 const Option& Option::within(double lowest, double highest) const {
   option_->check(CLI::Range(lowest, highest));
   return *this;

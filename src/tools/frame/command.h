@@ -26,8 +26,9 @@ constexpr Value kFileValue{"FILE", ValueKind::File};
 constexpr Value kTextValue{"TEXT", ValueKind::Text};
 
 // Where a value goes. It outlives the parsing of the command line.
-using Target = std::variant<std::string*, std::optional<std::string>*, std::vector<std::string>*,
-                            double*, std::uint16_t*, std::optional<std::uint32_t>*>;
+using Target =
+    std::variant<std::string*, std::optional<std::string>*, std::vector<std::string>*, double*,
+                 std::uint16_t*, std::optional<std::uint32_t>*, std::optional<std::uint64_t>*>;
 
 // A declared option or argument.
 class Option {
@@ -36,6 +37,7 @@ class Option {
   const Option& required() const;
   const Option& excludes(const Option& other) const;
   const Option& within(int lowest, int highest) const;
+  const Option& within(std::uint64_t lowest, std::uint64_t highest) const;
   const Option& within(double lowest, double highest) const;
   const Option& oneOf(std::vector<std::string> choices) const;
   const Option& showsDefault() const;
