@@ -104,6 +104,10 @@ class Take(HandingOver):
             with self.subTest(case):
                 self.device.tool("report", "take", "--to", f"{root}{target}", status=status)
                 self.assertEqual(len(self.device.log_files()), 1)
+        os.rename(root / SPOOL, root / "kept")
+        for target in "out/put", SPOOL:
+            self.device.tool("report", "take", "--to", f"{root}/{target}", status=1)
+        os.rename(root / "kept", root / SPOOL)
         if os.getuid() == 0 and subprocess.run(["mount", "-t", "tmpfs", "tally", root / OUTGOING],
                                                check=False, capture_output=True).returncode == 0:
             try:  # another volume, like any directory

@@ -199,7 +199,11 @@ Status LogHandover::settle(const Directory& spool, const Directory& to,
   return to.sync();
 }
 
-Result<LogHandover::Target> LogHandover::open(const Directory& spool, const std::string& to) const {
+Result<LogHandover::Target> LogHandover::open(const Directory* spool, const std::string& to) const {
+  // One that is not there yet is for the daily run to make, as its own user.
+  if (const std::string own = spoolFolder(root_).text(); spool == nullptr && to == own) {
+    return Error{own + " is the spool itself"};
+  }
   const std::size_t slash = to.find_last_of('/');
   auto directory = DeviceRoot("").open(to);
   if (!directory && directory.error().systemError == ENOENT && slash != to.npos) {
@@ -208,7 +212,9 @@ Result<LogHandover::Target> LogHandover::open(const Directory& spool, const std:
     directory = parent->makeDirectory(to.substr(slash + 1), 0700);
   }
   if (!directory) return directory.error();
-  if (isSame(*directory, spool)) return Error{directory->path() + " is the spool itself"};
+  if (spool != nullptr && isSame(*directory, *spool)) {
+    return Error{directory->path() + " is the spool itself"};
+  }
   struct stat status {};
   if (::fstat(directory->descriptor(), &status) != 0) {
     return systemError("cannot examine", directory->path());
@@ -238,9 +244,9 @@ Result<TakenLogs> LogHandover::take(const std::string& to,
     if (auto recovered = recover(*spool); !recovered) return recovered.error();
   }
   if (!consent_()) return Error{"submission is not allowed on this device"};
-  if (isMissing) return taken;
-  auto target = open(*spool, to);
+  auto target = open(isMissing ? nullptr : &*spool, to);
   if (!target) return target.error();
+  if (isMissing) return taken;
   auto logs = listSpooled(*spool);
   if (!logs) return logs.error();
   std::erase_if(*logs,

@@ -45,7 +45,7 @@ class LogHandover {
                  Journal& journal, TakenLogs& taken) const;
   Status moveOne(const Directory& spool, const SpooledLog& log, const Copy& copy, Target& target,
                  Journal& journal) const;
-  Result<Target> open(const Directory& spool, const std::string& to) const;
+  Result<Target> open(const Directory* spool, const std::string& to) const;
 
   DeviceRoot root_;
   SystemLog& log_;
