@@ -426,6 +426,7 @@ void MetricIntake::discard() {
   // Gauges and owners are remembered by their keys.
   users_.beginDay();
   keys_ = std::make_shared<HeldKeys>(keys_->day(), now_.bootSeconds);
+  refusedNames_.clear();
 }
 
 void MetricIntake::forget(const CommitBatch& batch) {

@@ -26,6 +26,14 @@ void RefusedNames::note(const Row& row) {
   kept.count += before;
 }
 
+void RefusedNames::clear() {
+  added_ = 0;
+  for (Slot& slot : slots_) {
+    slot.row = {};
+    slot.text.fill('\0');
+  }
+}
+
 std::vector<RefusedNames::Row> RefusedNames::all() const {
   std::vector<Row> rows;
   for (std::size_t i = 0; i < std::min(added_, kMost); ++i) {

@@ -29,6 +29,8 @@ class RefusedNames {
   };
   // A text that no key can have is ignored.
   void note(const Row& row);
+  // Nothing of what was noted stays in memory.
+  void clear();
   // The newest first; their texts are valid until the next note.
   std::vector<Row> all() const;
 

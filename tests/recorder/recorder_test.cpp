@@ -423,6 +423,10 @@ TEST_F(RecorderTest, TheStatusNamesTheKeysThatWereRefusedLast) {
   const auto many = named();
   EXPECT_EQ(many.size(), RefusedNames::kMost);
   EXPECT_EQ(many.front(), "p.n999 set - 1");
+  recorder->onControl(2, "forget");
+  send(kAda, "");
+  send(kAda, "");
+  EXPECT_THAT(named(), ElementsAre());
 }
 
 TEST_F(RecorderTest, OneThatIsNotUsedEndsIfItIsStartedAgain) {

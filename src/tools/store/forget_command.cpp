@@ -88,10 +88,14 @@ int forget(const ToolContext& context, const ForgetArguments& arguments) {
     if (!status) return complain(context, "not all was erased: " + status.error().message, kWrong);
   }
   if (context.json) {
-    printJson(context, {{"erased", {{"store", true}, {"files", *logs}, {"history", true}}}});
+    printJson(
+        context,
+        {{"erased", {{"store", true}, {"files", *logs}, {"pseudonym", true}, {"history", true}}}});
   } else {
-    printLine(context, fmt::format("erased: the metrics store, {}, the history of processed days",
-                                   counted(*logs, "waiting file")));
+    printLine(context,
+              fmt::format("erased: the metrics store, {}, the pseudonym of submitted logs, the "
+                          "history of processed days",
+                          counted(*logs, "waiting file")));
   }
   return kSuccess;
 }
