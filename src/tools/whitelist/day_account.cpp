@@ -173,8 +173,10 @@ std::optional<AbsenceReason> whyUnsent(const ToolContext& context, std::int32_t 
   if (day > last) {
     return AbsenceReason{Absence::DayNotProcessed,
                          last == 0
-                             ? "no day has been processed yet"
-                             : fmt::format("{} is the last day that was processed", dayText(last))};
+                             ? "the daily job has not recorded that it processed the day"
+                             : fmt::format("{} is the last day that the daily job recorded as "
+                                           "processed",
+                                           dayText(last))};
   }
   // The log may have been collected; but whoever collects does not leave earlier ones behind.
   if (day < last && hasEarlierLog(context, day)) {
