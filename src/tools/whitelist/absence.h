@@ -32,7 +32,7 @@ inline constexpr AbsenceRow kAbsences[] = {
     {"no_value_that_day", "it has no value on that day"},
     {"refused_by_recorder", "the recorder refused it, and it has no value on that day"},
     {"unreadable", "its value, its group's switch or the whitelist cannot be read"},
-    {"day_not_processed", "the day has not been processed"},
+    {"day_not_processed", "the day is not known to have been processed"},
     {"submission_forbidden", "submission is not allowed on this device"},
 };
 static_assert(std::size(kAbsences) == std::size_t(Absence::SubmissionForbidden) + 1);
