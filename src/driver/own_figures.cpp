@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
+#include <limits>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -26,7 +27,10 @@ struct Observed {
 // Set to another time, the clock is no longer as far from the time since boot as it was.
 Observed observeStep(const CounterState& kept, const ClockReading& now) {
   const std::int64_t since1970AtBoot = now.milliseconds - now.bootMilliseconds;
-  const std::int64_t moved = since1970AtBoot - static_cast<std::int64_t>(kept.last);
+  std::int64_t moved = 0;
+  if (__builtin_sub_overflow(since1970AtBoot, static_cast<std::int64_t>(kept.last), &moved)) {
+    moved = std::numeric_limits<std::int64_t>::max();
+  }
   const bool isStep = kept.epoch == now.bootId && std::abs(moved) >= kSmallestStep;
   return {isStep ? 1u : 0u, static_cast<std::uint64_t>(since1970AtBoot)};
 }

@@ -17,6 +17,10 @@ namespace {
 
 constexpr std::string_view kJournalFile = ".handover.plist";
 constexpr std::size_t kLargestJournal = 1u << 16;
+constexpr std::string_view kMarkBegin = ".handover-";
+constexpr std::size_t kLongestDirectory = 4096;
+// No log is larger; a file that says so has holes.
+constexpr std::uint64_t kLargestLog = 256u << 20;
 // Of a log that may have been held back meanwhile.
 constexpr std::string_view kSuffixes[] = {"", kHeldSuffix};
 
@@ -128,7 +132,14 @@ struct LogHandover::Journal {
     for (const std::string* name : {&journal.mark, &journal.stem, &journal.newStem}) {
       if (!name->empty() && !isSafeFileName(*name)) return std::nullopt;
     }
-    if (journal.directory.empty() || journal.mark.empty()) return std::nullopt;
+    // Names that a call can have chosen: whoever owns the spool could have written the journal.
+    if (!journal.directory.starts_with('/') || journal.directory.size() > kLongestDirectory ||
+        journal.directory.find("/..") != std::string::npos ||
+        !journal.mark.starts_with(kMarkBegin) ||
+        !isDevicePseudonym(std::string_view(journal.mark).substr(kMarkBegin.size())) ||
+        (!journal.newStem.empty() && !sequenceOf(journal.newStem))) {
+      return std::nullopt;
+    }
     return journal;
   }
 };
@@ -151,8 +162,8 @@ struct LogHandover::Target {
 Status LogHandover::recover(const Directory& spool) const {
   const auto bytes = spool.readFile(kJournalFile, kLargestJournal);
   if (!bytes && bytes.error().systemError == ENOENT) return Done{};
-  if (!bytes) return bytes.error();
-  const auto journal = Journal::parse(*bytes);
+  if (!bytes && mayBeSound(bytes.error())) return bytes.error();
+  const auto journal = bytes ? Journal::parse(*bytes) : std::nullopt;
   if (!journal) {
     log_.fault("hand-over: journal", "{} is damaged: the logs of the spool are handed over again",
                spool.pathOf(kJournalFile));
@@ -160,11 +171,14 @@ Status LogHandover::recover(const Directory& spool) const {
     const auto to = DeviceRoot("").open(journal->directory);
     if (to) {
       if (auto settled = settle(spool, *to, *journal); !settled) return settled;
-    } else if (to.error().systemError != ENOENT) {
-      return Error{"an earlier hand-over must be completed first: " + to.error().message,
-                   to.error().systemError};
     } else if (const auto isWaiting = journal->isIn(spool); !isWaiting) {
       return isWaiting.error();
+    } else if (to.error().systemError != ENOENT && *isWaiting) {
+      return Error{"an earlier hand-over must be completed first: " + to.error().message,
+                   to.error().systemError};
+    } else if (to.error().systemError != ENOENT) {
+      log_.fault("hand-over: left", "hidden files of an earlier hand-over may be left: {}",
+                 to.error().message);
     } else if (*isWaiting) {
       log_.fault("hand-over: unknown", "{}: {} is gone, so the log is handed over again",
                  bodyOf(journal->stem), journal->directory);
@@ -185,6 +199,11 @@ Status LogHandover::settle(const Directory& spool, const Directory& to,
     if (journal.hasInformation && !contains(*names, journal.temporaryInformation())) {
       if (auto removed = to.remove(informationOf(journal.newStem)); !removed) return removed;
     }
+    // Decided for good: whoever is ended from here on must not leave a journal that, without the
+    // copy, would mean the opposite.
+    Journal without = journal;
+    without.stem.clear();
+    if (auto written = without.write(spool); !written) return written;
   } else if (*isWaiting && contains(*names, journal.marker())) {
     if (auto synced = to.sync(); !synced) return synced;
     if (auto removed = removeLog(spool, journal.stem); !removed) return removed;
@@ -192,6 +211,8 @@ Status LogHandover::settle(const Directory& spool, const Directory& to,
     log_.fault("hand-over: unknown", "{}: {} has been emptied, so the log is handed over again",
                bodyOf(journal.stem), to.path());
   }
+  // The marker was there first, and goes last.
+  if (!contains(*names, journal.marker())) return Done{};
   for (const std::string& name :
        {journal.temporaryBody(), journal.temporaryInformation(), journal.marker()}) {
     if (auto removed = to.remove(name); !removed) return removed;
@@ -258,7 +279,7 @@ Result<TakenLogs> LogHandover::take(const std::string& to,
   }
   const auto random = randomHex();
   if (!random) return random.error();
-  Journal journal{to, ".handover-" + *random, {}, {}, 0, 0, false};
+  Journal journal{to, std::string(kMarkBegin) + *random, {}, {}, 0, 0, false};
   const Status moved = moveAll(*spool, *logs, *target, journal, taken);
   // The last log's removal, and that of the marks, is what a later call would do.
   const Status settled = recover(*spool);
@@ -278,7 +299,7 @@ Status LogHandover::moveAll(const Directory& spool, const std::vector<SpooledLog
         (target.logs >= bounds_.maximumLogs || target.bytes + log.bytes > bounds_.maximumBytes)) {
       return Error{target.directory.path() + " is full"};
     }
-    const Copy copy{spool.readFile(log.fileName, log.bytes),
+    const Copy copy{spool.readFile(log.fileName, std::min(log.bytes, kLargestLog)),
                     spool.readFile(informationOf(stemOfLog(log)), kLargestInformation)};
     const bool isAlone = !copy.information && copy.information.error().systemError == ENOENT;
     if (!copy.body || (!copy.information && !isAlone)) {
@@ -312,6 +333,8 @@ Status LogHandover::moveOne(const Directory& spool, const SpooledLog& log, const
   }
   if (auto synced = to.sync(); !synced) return synced;
 
+  if (target.nextNumber > kLastSequence)
+    return Error{to.path() + ": the logs' numbers are used up"};
   journal.stem = stemOfLog(log);
   journal.newStem = sequencePrefix(target.nextNumber++) +
                     journal.stem.substr(sequencePrefix(log.sequence).size());

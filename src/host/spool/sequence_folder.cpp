@@ -17,7 +17,6 @@ namespace tally {
 namespace {
 
 constexpr std::size_t kDigits = 10;
-constexpr std::uint64_t kLastSequence = 9'999'999'999;
 // A log a second for thirty years.
 constexpr std::uint64_t kLastReachable = 999'999'999;
 // Logs after a stray file with a nearly unreachable number have such numbers too. They are set

@@ -24,6 +24,9 @@ struct FolderBounds {
 // Space that logs leave free on their volume.
 constexpr std::uint64_t kReservedBytes = 16u << 20;
 
+// Numbers have ten digits.
+constexpr std::uint64_t kLastSequence = 9'999'999'999;
+
 // The files of one log; their names begin with its number.
 struct SequencedLog {
   std::uint64_t sequence = 0;

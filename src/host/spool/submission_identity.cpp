@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <limits>
 #include <optional>
 
 #include "base/files/temporary_file.h"
@@ -20,7 +19,8 @@ constexpr std::size_t kPseudonymBytes = 16;
 constexpr std::size_t kLargestIdentity = 1u << 20;
 constexpr std::string_view kPseudonym = "DevicePseudonym";
 constexpr std::string_view kLastNumbers = "LastSequenceNumbers";
-constexpr std::uint64_t kLargestNumber = std::numeric_limits<std::int64_t>::max() - 1;
+// What every reader of an export can hold.
+constexpr std::uint64_t kLargestNumber = (std::uint64_t{1} << 53) - 1;
 
 std::optional<SubmissionIdentity> parseIdentity(std::string_view bytes) {
   const auto root = decodePlist(bytes);
@@ -33,16 +33,11 @@ std::optional<SubmissionIdentity> parseIdentity(std::string_view bytes) {
   for (const auto& [name, value] : *numbers) {
     const auto* const number = kvCast<KvNumber>(value.get());
     if (number == nullptr || number->asInt64() < 1) return std::nullopt;
-    identity.last[std::string(name->view())] =
-        std::min(static_cast<std::uint64_t>(number->asInt64()), kLargestNumber);
+    const auto last = static_cast<std::uint64_t>(number->asInt64());
+    if (last >= kLargestNumber) return std::nullopt;  // no device gets there
+    identity.last[std::string(name->view())] = last;
   }
   return identity;
-}
-
-// Whether the file may be sound although it cannot be read now.
-bool mayBeSound(const Error& error) {
-  const int codes[] = {EIO, EACCES, ENOMEM, EMFILE, ENFILE, ENOTDIR, ESTALE};
-  return std::ranges::find(codes, error.systemError) != std::end(codes);
 }
 
 // True if one of the spool's logs has a later number.
@@ -53,14 +48,20 @@ Result<bool> countSpooled(const Directory& spool, SubmissionIdentity& identity) 
   for (const SpooledLog& log : *logs) {
     if (log.fault && mayBeSound(*log.fault)) return *log.fault;
     if (log.device != identity.device || !log.deviceSequence) continue;
+    if (*log.deviceSequence >= kLargestNumber) continue;
     std::uint64_t& last = identity.last[log.name];
     isNews = isNews || *log.deviceSequence > last;
-    last = std::min(std::max(last, *log.deviceSequence), kLargestNumber);
+    last = std::max(last, *log.deviceSequence);
   }
   return isNews;
 }
 
 }  // namespace
+
+bool mayBeSound(const Error& error) {
+  const int codes[] = {EIO, EACCES, ENOMEM, EMFILE, ENFILE, ENOTDIR, ESTALE};
+  return std::ranges::find(codes, error.systemError) != std::end(codes);
+}
 
 Result<std::string> randomHex() {
   unsigned char bytes[kPseudonymBytes];

@@ -28,6 +28,8 @@ struct SubmissionIdentity {
 // 32 hexadecimal digits of the kernel's random numbers.
 Result<std::string> randomHex();
 // Whether a text has the form of a pseudonym.
+// Whether a file may be sound although it cannot be read now.
+bool mayBeSound(const Error& error);
 bool isDevicePseudonym(std::string_view text);
 
 // The file that keeps it. All calls but read() and hasLeftOvers() REQUIRE the lock of the spool.

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <ranges>
 
@@ -60,6 +61,12 @@ Result<Descriptor> openHook(const Directory& directory, const std::string& name)
   return file;
 }
 
+// Whether reading was refused since the name is not that of a file of the directory's user.
+bool isRefused(const Error& error) {
+  const int codes[] = {ELOOP, EPERM, EMLINK, EISDIR, ENXIO};
+  return std::ranges::find(codes, error.systemError) != std::end(codes);
+}
+
 // What a hook is told of the log; what its information does not say is not set.
 std::vector<std::string> environmentOf(const Directory& folder, const SpooledLog& log,
                                        const std::string& information) {
@@ -79,6 +86,14 @@ Status runAll(const Directory& folder, const std::vector<Hook>& hooks, const Spo
               std::chrono::seconds limit, const std::function<bool()>& consent) {
   const auto stem = log.fileName.substr(0, log.fileName.size() - kBodySuffix.size());
   const std::string information = stem + std::string(kInformationSuffix);
+  const std::array names{log.fileName, information};
+  const std::array shown{folder.identity(names[0]), folder.identity(names[1])};
+  // Whoever may write here could show a hook another file of the system under this name.
+  for (std::size_t i = 0; i < names.size(); ++i) {
+    if (auto sound = folder.readFile(names[i], 0); !sound && isRefused(sound.error())) {
+      return sound.error();
+    }
+  }
   for (const Hook& hook : hooks) {
     if (!consent()) return Error{"submission is not allowed on this device"};
     const std::string words[] = {hook.name, folder.pathOf(log.fileName),
@@ -94,9 +109,12 @@ Status runAll(const Directory& folder, const std::vector<Hook>& hooks, const Spo
   }
   // One that has been held back meanwhile has left all the same. The body goes first: information
   // alone is not a log.
-  for (const std::string& name : {log.fileName, information}) {
+  for (std::size_t i = 0; i < names.size(); ++i) {
     for (const std::string_view suffix : {std::string_view(), kHeldSuffix}) {
-      if (auto removed = folder.remove(name + std::string(suffix)); !removed) return removed;
+      const std::string name = names[i] + std::string(suffix);
+      // A hook may have removed it, and a later log have got its name.
+      if (!shown[i] || folder.identity(name) != shown[i]) continue;
+      if (auto removed = folder.remove(name); !removed) return removed;
     }
   }
   return folder.sync();
