@@ -55,13 +55,14 @@ PageLog nextLog(const PageSources& sources) {
   next.options = std::move(made.options);
   if (!sources.submissionAllowed) {
     next.notes.push_back(
-        "Submission is not allowed on this device, so nothing of this leaves. The page shows what "
-        "would leave if it was allowed.");
+        "Submission is not allowed on this device (submission_forbidden), so nothing of this "
+        "leaves. "
+        "The page shows what would leave if it was allowed.");
   }
   if (!next.content) {
     next.notes.push_back(whyNoLog(sources, *next.day));
   } else if (*next.day == platform.metricsStore->TBDaysSince1970()) {
-    next.notes.push_back("The day is not over: its values still change.");
+    next.notes.push_back("The day is not over (day_not_processed): its values still change.");
   }
   return next;
 }
