@@ -24,7 +24,7 @@ CREATE TABLE IF NOT EXISTS tally.rows (
 ) ENGINE = ReplacingMergeTree() PARTITION BY toYYYYMM(date) ORDER BY (key, day, device, sequence, kind);
 
 -- One row for each place where a log was found: the log that is kept, and those that are not.
--- Device and sequence are 0 for a log without them.
+-- Device and sequence are 0 for a log that lacks them.
 CREATE TABLE IF NOT EXISTS tally.logs (
   device UInt64,
   sequence UInt64,

@@ -14,6 +14,7 @@ const SETTINGS = {
   // A batch is one block, which the server writes whole or not at all.
   max_insert_block_size: 10000000,
 };
+const LONGEST_STANDSTILL = 600000; // milliseconds in which a deletion gets no further
 const TABLES = ['rows', 'logs', 'files'];
 
 /** The statements of a file, without its comments. */
@@ -72,10 +73,27 @@ export class ClickHouse {
   async forget(device) {
     const number = deviceNumber(device);
     for (const table of ['rows', 'logs']) await this.run(`ALTER TABLE tally.${table} DELETE WHERE device = ${number}`);
-    // The server deletes later, and answers meanwhile with the old parts.
-    for (;;) {
-      const [[left]] = await this.query("SELECT count() FROM system.mutations WHERE database = 'tally' AND is_done = 0");
-      if (left === 0) return;
+    await this.waitForDeletion(number);
+  }
+
+  /** The server deletes later, and answers meanwhile with the old parts. Gives up when nothing is done any more. */
+  async waitForDeletion(number) {
+    const [[reported]] = await this.query("SELECT count() FROM system.columns WHERE database = 'system' AND " +
+      "table = 'mutations' AND name = 'latest_fail_reason'");
+    const columns = `table, parts_to_do, ${reported > 0 ? 'latest_fail_reason' : "''"}`;
+    let former;
+    for (let end; ;) {
+      const left = await this.query(`SELECT ${columns} FROM system.mutations WHERE database = 'tally' AND is_done = 0 ` +
+        `AND position(command, '${number}') > 0 ORDER BY table`);
+      if (left.length === 0) return;
+      const [table, parts, reason] = left.find(row => row[2] !== '') ?? left[0];
+      const state = JSON.stringify(left.map(row => row[1]));
+      if (state !== former) end = Date.now() + LONGEST_STANDSTILL;
+      former = state;
+      if (reason !== '' || Date.now() > end) {
+        throw new FleetError(`${this.host}:${this.port} has not deleted all of the device: ${parts} parts of tally.${table} ` +
+          `are left, ${reason === '' ? `and none was done in ${LONGEST_STANDSTILL / 60000} minutes` : reason.slice(0, 400)}`);
+      }
       await new Promise(resolve => setTimeout(resolve, 100));
     }
   }

@@ -4,7 +4,7 @@ import { ClickHouse } from './clickhouse.mjs';
 import { DuckDb } from './duckdb.mjs';
 import { forgetInFiles } from './forget.mjs';
 import { load } from './loader.mjs';
-import { FleetError } from './logs.mjs';
+import { FleetError, isDevice } from './logs.mjs';
 import { ask, parametersFrom, parametersOf, QUESTIONS } from './questions.mjs';
 import { tableOf } from './table.mjs';
 
@@ -85,7 +85,7 @@ async function runLoad([directory], options) {
 }
 
 async function runForget([device], options) {
-  if (!/^[0-9a-f]{32}$/.test(device)) throw new UsageError('a device is 32 lower-case hexadecimal digits');
+  if (!isDevice(device)) throw new UsageError('that cannot be a device');
   if (options.server !== undefined) return (await serverOf(options).open()).forget(device);
   if (options.data === undefined) throw new UsageError('--data DIR or --server HOST:PORT is needed');
   return forgetInFiles(options.data, device);

@@ -151,10 +151,10 @@ export class DuckDb {
         WHEN hash IS NULL THEN 'unreadable'
         WHEN row_number() OVER identical > 1 THEN 'duplicate'
         WHEN row_number() OVER same > 1 THEN 'conflict'
-        WHEN device IS NULL THEN 'bare' WHEN day IS NULL THEN 'undated' ELSE 'kept' END AS state
+        WHEN sequence IS NULL THEN 'bare' WHEN day IS NULL THEN 'undated' ELSE 'kept' END AS state
       FROM found WINDOW
         identical AS (PARTITION BY device, sequence, hash ORDER BY file, "offset"),
-        same AS (PARTITION BY device, sequence, CASE WHEN device IS NULL THEN hash END ORDER BY file, "offset");
+        same AS (PARTITION BY device, sequence, CASE WHEN sequence IS NULL THEN hash END ORDER BY file, "offset");
       DROP TABLE found`);
   }
 

@@ -71,24 +71,28 @@ class Batch {
   }
 }
 
-const identityOf = ({ header, hash }) => (header.device === null ? hash : `${deviceNumber(header.device)} ${header.sequence}`);
+const identityOf = ({ header, hash }) => (header.sequence === null ? hash : `${deviceNumber(header.device)} ${header.sequence}`);
+
+const devicesOf = logs => [...new Set(logs.map(({ header }) => deviceNumber(header.device)))].join(', ');
 
 /** What the server knows of the batch's identities: the hash of the log that was kept, and from where. */
 async function knownLogs(server, batch) {
   const readable = batch.logs.filter(log => !log.refused);
-  const named = readable.filter(({ header }) => header.device !== null);
+  const named = readable.filter(({ header }) => header.sequence !== null);
   const known = new Map();
   const take = ([device, sequence, hash, source]) =>
-    known.set(device === '0' ? hash : `${device} ${sequence}`, { hash, source });
+    known.set(sequence === 0 ? hash : `${device} ${sequence}`, { hash, source });
   const ask = async condition => (await server.query(`SELECT toString(device), sequence, hash, source
     FROM ${server.names.logs} WHERE state IN ('kept', 'undated', 'bare') AND ${condition}`)).forEach(take);
   if (named.length > 0) {
     const sequences = named.map(({ header }) => header.sequence);
-    await ask(`device IN (${[...new Set(named.map(({ header }) => deviceNumber(header.device)))].join(', ')})
+    await ask(`device IN (${devicesOf(named)})
       AND sequence BETWEEN ${Math.min(...sequences)} AND ${Math.max(...sequences)}`);
   }
-  const bare = readable.filter(({ header }) => header.device === null).map(({ hash }) => hash);
-  if (bare.length > 0) await ask(`device = 0 AND hash IN (${text(bare)})`);
+  const bare = readable.filter(({ header }) => header.sequence === null);
+  if (bare.length > 0) {
+    await ask(`device IN (${devicesOf(bare)}) AND sequence = 0 AND hash IN (${text(bare.map(({ hash }) => hash))})`);
+  }
   return known;
 }
 
@@ -102,7 +106,7 @@ function classify(batch, known) {
     const identity = identityOf(log);
     const former = known.get(identity);
     if (former && former.source !== log.source) log.state = former.hash === log.hash ? 'duplicate' : 'conflict';
-    else log.state = log.header.device === null ? 'bare' : log.header.day === null ? 'undated' : 'kept';
+    else log.state = log.header.sequence === null ? 'bare' : log.header.day === null ? 'undated' : 'kept';
     // Rows are sent before their log is listed: one that is listed from this place has all of them.
     log.isNew = log.state === 'kept' && !former;
     if (!former) known.set(identity, log);

@@ -10,7 +10,6 @@ const LONGEST_LOG = 512 << 20;
 const NEWLINE = 10;
 const KEY = Buffer.from(',"key":"');
 const KIND = Buffer.from(',"kind":"');
-const PSEUDONYM = /^[0-9a-f]{32}$/;
 export const LAST_DAY = 49709; // engines keep dates to 2106-02-06
 // A sequence number and a day fit into one 64-bit integer, which the questions sort by.
 const LAST_SEQUENCE = 2 ** 45;
@@ -32,22 +31,27 @@ export function exportedFiles(directory) {
 
 const isDay = day => day !== null && day >= 0 && day <= LAST_DAY;
 
-function textOrNull(value) {
-  return value === undefined || value === null || (typeof value === 'string' && value.length <= 1024);
+const isText = value => typeof value === 'string' && value.length <= 1024;
+const textOrNull = value => value === undefined || value === null || isText(value);
+
+/** Whether a text can name a device: a pseudonym, or what whoever exported the log calls it. */
+export const isDevice = value => isText(value) && value !== '' && !value.includes('\0') && value.isWellFormed();
+
+/** The date belongs to the day; that of a day out of range is not looked at. */
+function agree(date, day) {
+  return date === null || (isDay(day) ? date === dateOf(day) : day !== null && isText(date));
 }
 
 /** The header of a log, or undefined if it is not one that this version can read. */
 function headerOf(row) {
   const { schema, device = null, sequence = null, day = null, date = null } = row;
-  const valid = schema === 1 && (device === null || PSEUDONYM.test(device)) &&
+  const valid = schema === 1 && (device === null || isDevice(device)) &&
     (sequence === null || (Number.isSafeInteger(sequence) && sequence > 0 && sequence < LAST_SEQUENCE)) &&
-    (day === null || Number.isSafeInteger(day)) && (date === null || (isDay(day) && date === dateOf(day))) &&
+    (day === null || Number.isSafeInteger(day)) && agree(date, day) &&
     textOrNull(row.system_version) && textOrNull(row.configuration);
   if (!valid) return undefined;
-  // With half of an identity, a log is as anonymous as with none.
-  const bare = device === null || sequence === null;
-  return { device: bare ? null : device, sequence: bare ? null : sequence,
-    day: isDay(day) ? day : null,
+  // A number without a device says nothing. A device without a number is kept, so that it can be forgotten.
+  return { device, sequence: device === null ? null : sequence, day: isDay(day) ? day : null,
     version: row.system_version ?? '', configuration: row.configuration ?? '' };
 }
 
