@@ -49,7 +49,7 @@ function foundWords(answer) {
 function wearFigure(answer) {
   const buckets = rowsOf(answer).filter(({ what }) => what === 'wear');
   return bars({ title: 'Devices by wear', description: 'in percent of what a disk is made for',
-    names: buckets.map(({ from, to }) => `${from}–${to} %`), values: buckets.map(({ devices }) => devices) });
+    names: buckets.map(({ from, to }) => (from === null ? `below ${to ?? '…'} %` : to === null ? `from ${from} %` : `${from}–${to} %`)), values: buckets.map(({ devices }) => devices) });
 }
 
 function wearWords(answer) {

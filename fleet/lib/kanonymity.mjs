@@ -17,9 +17,15 @@ export class Anonymity {
     return number < this.k ? null : value;
   }
 
-  /** A count of what devices did, rounded as their number is. */
+  /** A count of what devices did, in steps of what K of them did, and of K at least. */
   count(number, count) {
-    return this.value(number, Math.round(count / this.k) * this.k);
+    return this.value(number, coarse(count, Math.max(1, count / number) * this.k));
+  }
+
+  /** A sum of what devices did, in steps of what K average ones do: { told, size }; nothing if one device does more. */
+  sum(number, sum, largest) {
+    const size = sum / number * this.k;
+    return number < this.k || largest > size ? undefined : { told: coarse(sum, size), size };
   }
 
   /** The share of some of the devices, from rounded numbers, if those and the others are enough. */
@@ -38,10 +44,13 @@ export class Anonymity {
     return all === some || all - some >= this.k;
   }
 
-  /** The value of rank ceil(level * number), with K devices on each side of it, itself included. */
-  quantile(number, level, value) {
+  /**
+   * The value of rank ceil(level * number), with K devices on each side of it, itself included. It is one
+   * device's, so that it is rounded to about its standard error, of which `spread` is the distance of quartiles.
+   */
+  quantile(number, level, value, spread) {
     const rank = Math.ceil(level * number);
-    return rank < this.k || number - rank + 1 < this.k ? null : value;
+    return rank < this.k || number - rank + 1 < this.k ? null : coarse(value, spread / Math.sqrt(number));
   }
 
   /** The level nearest to the one wanted, towards the median, whose quantile may be told. */
@@ -75,26 +84,101 @@ export class Anonymity {
     return rows.filter(row => released.has(row));
   }
 
-  /**
-   * Neighbouring buckets { from, to, devices, samples } put together until each has K devices. A device is
-   * in one of them if they are `disjoint`; otherwise it may be in all of them, and they have no more
-   * devices together than the largest has.
-   */
-  buckets(buckets, disjoint) {
-    const joined = (one, other) => ({
-      from: one.from, to: other.to, samples: one.samples + other.samples,
-      devices: disjoint ? one.devices + other.devices : Math.max(one.devices, other.devices),
-    });
-    const merged = [];
+  /** Neighbouring buckets { from, to, devices }, each device in one of them, put together until each has K devices. */
+  joined(buckets) {
+    const told = [];
     let open;
     for (const bucket of buckets) {
-      open = open ? joined(open, bucket) : { ...bucket };
-      if (open.devices >= this.k) {
-        merged.push(open);
-        open = undefined;
-      }
+      open = open ? { ...open, to: bucket.to, devices: open.devices + bucket.devices } : bucket;
+      if (open.devices < this.k) continue;
+      told.push(open);
+      open = undefined;
     }
-    if (open && merged.length > 0) merged.push(joined(merged.pop(), open));
-    return merged;
+    const last = told.at(-1);
+    if (open && last) Object.assign(last, { to: open.to, devices: last.devices + open.devices });
+    return told;
+  }
+
+  /**
+   * One set of bounds for the histograms of several groups, in each bucket of which each group has K devices
+   * or none, so that subtracting groups finds no fewer. Cells { from, to, devices, parts } are buckets as
+   * reported, with what each group has there: { devices, samples }. A device may be in all cells, so that
+   * some cells have no more devices for sure than the largest has. Returns [{ from, to, samples }], with the
+   * samples of each group; nothing if there are no such bounds.
+   */
+  commonBuckets(cells) {
+    const told = [];
+    let open;
+    for (const cell of blocksOf(cells, this.k)) {
+      open = open ? united(open, cell) : cell;
+      if (!open.sure || !this.suffices(open)) continue;
+      told.push(open);
+      open = undefined;
+    }
+    if (open) told.push(open);
+    while (told.length > 1 && !this.suffices(told.at(-1))) told.push(united(...told.splice(-2)));
+    if (told.length === 0 || !this.suffices(told.at(-1))) return [];
+    // Bounds that only few devices report are not told, nor where the samples of few begin and end.
+    const from = told[0].fromSure ? told[0].from : null;
+    return told.map(({ to, sure, parts }, index) =>
+      ({ from: index > 0 ? told[index - 1].to : from, to: sure ? to : null, samples: parts.map(({ samples }) => samples) }));
+  }
+
+  suffices({ parts }) {
+    return parts.every(({ devices, samples }) => samples === 0 || devices >= this.k);
   }
 }
+
+const below = ({ from }) => from ?? -Infinity;
+const above = ({ to }) => to ?? Infinity;
+
+function united(one, other) {
+  const last = above(one) > above(other) ? one : other;
+  return { from: one.from, to: last.to, fromSure: one.fromSure,
+    sure: above(one) === above(other) ? one.sure || other.sure : last.sure,
+    parts: one.parts.map((part, index) => ({ samples: part.samples + other.parts[index].samples,
+      devices: Math.max(part.devices, other.parts[index].devices) })) };
+}
+
+/** Cells in order, those that overlap made one; a bound is sure if K devices report it. */
+function blocksOf(cells, k) {
+  const blocks = [];
+  for (const cell of cells.toSorted((one, other) => below(one) - below(other) || above(one) - above(other))) {
+    const block = { ...cell, fromSure: cell.devices >= k, sure: cell.devices >= k };
+    const last = blocks.at(-1);
+    if (!last || below(cell) >= above(last)) {
+      blocks.push(block);
+      continue;
+    }
+    if (below(cell) === below(last)) last.fromSure ||= block.fromSure;
+    blocks[blocks.length - 1] = united(last, block);
+  }
+  return blocks;
+}
+
+/**
+ * The least of 1, 2 and 5 times a power of ten that is not below a size: { digit, exponent }. It takes in a
+ * little more, since engines add up in different orders.
+ */
+function stepOf(size) {
+  let exponent = Math.floor(Math.log10(size));
+  const digit = [1, 2, 5].find(each => each * 10 ** exponent >= size * (1 - 1e-9));
+  if (digit === undefined) ++exponent;
+  return { digit: digit ?? 1, exponent };
+}
+
+/**
+ * A value as a multiple of a step not below `size`, which is how much one device may move it or more. Where
+ * no device moves it, it is told as it is.
+ */
+export function coarse(value, size, round = nearest) {
+  if (!Number.isFinite(size)) return null;
+  if (!(size > Math.abs(value) * 1e-14) || !Number.isFinite(value)) return value;
+  const { digit, exponent } = stepOf(size);
+  return Number(`${round(value / Number(`${digit}e${exponent}`)) * digit}e${exponent}`) || 0;
+}
+
+// Half a step is rounded up also if an engine has added up to a bit less.
+const nearest = value => Math.floor(value + 0.5 + 1e-9);
+export const down = value => Math.floor(value + 1e-9);
+export const up = value => Math.ceil(value - 1e-9);

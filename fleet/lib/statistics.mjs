@@ -94,7 +94,7 @@ export function trimmedDifference(first, second) {
   const other = trimmed(second);
   const error = Math.sqrt(one.error + other.error);
   const difference = other.mean - one.mean;
-  const means = { one: one.mean, other: other.mean, difference };
+  const means = { one: one.mean, other: other.mean, difference, error };
   if (!(error > 0)) return { ...means, low: difference, high: difference, p: difference === 0 ? 1 : 0 };
   const freedom = error ** 4 / (one.error ** 2 / one.freedom + other.error ** 2 / other.freedom);
   const reach = studentQuantile95(freedom) * error;

@@ -18,7 +18,7 @@ from recorder import RecordingDevice
 
 TOP = pathlib.Path(__file__).resolve().parents[2]
 SCHEMAS = {path.stem: json.loads(path.read_text()) for path in sorted((TOP / "docs/schema").glob("*.json"))}
-NOT_OF_A_COMMAND = {"common", "error", "version"}
+NOT_OF_A_COMMAND = {"common", "error", "version", "fleet-ask", "fleet-load"}
 sys.path.insert(0, str(TOP / "tests/devices"))
 import device_tree  # noqa: E402
 

@@ -1,4 +1,5 @@
 // How a key is distributed over the fleet, by day and version.
+import { coarse } from '../kanonymity.mjs';
 import { dateOf } from '../logs.mjs';
 
 const LEVELS = [0.01, 0.05, 0.25, 0.5, 0.75, 0.95, 0.99];
@@ -38,23 +39,51 @@ async function groupsOf({ query, sql }, version) {
 /** The days of which samples may be told, and of which histograms: not if a subtraction shows few devices. */
 function tellable(groups, anonymity) {
   const without = condition => new Set(groups.filter(group => !condition(group)).map(({ day }) => day));
-  const samples = without(({ devices, sampled = 0 }) => anonymity.separable(devices, sampled));
+  const samples = without(({ devices, sampled = 0, merged: [all, , , , largest] = [] }) => sampled === 0 ||
+    (anonymity.separable(devices, sampled) && anonymity.sum(sampled, all, largest) !== undefined));
   const buckets = without(({ sampled = 0, bucketed = 0 }) => anonymity.separable(sampled, bucketed));
   return { samples: ({ day }) => !samples.has(day), buckets: ({ day }) => !samples.has(day) && !buckets.has(day) };
 }
 
-const bound = (value, open) => value ?? open;
+const nameOfBucket = ({ from, to }) => `${from} ${to}`;
+
+/** Gives the groups of one day, the first of which is of all versions, their histograms. */
+function shareBuckets([whole, ...versions], anonymity) {
+  const own = versions.map(({ buckets }) => new Map(buckets.map(bucket => [nameOfBucket(bucket), bucket])));
+  const cells = whole.buckets.map(({ from, to, devices, samples }) => {
+    const parts = own.map(buckets => buckets.get(nameOfBucket({ from, to })) ?? { devices: 0, samples: 0 });
+    // What is in no version that is told follows from the others. A device may be in two versions.
+    const left = (member, all) => parts.reduce((rest, part) => rest - part[member], all);
+    return { from, to, devices, parts: [...parts, { devices: left('devices', devices), samples: left('samples', samples) }] };
+  });
+  const common = anonymity.commonBuckets(cells);
+  [...versions, whole].forEach((group, index) => {
+    const samples = bucket => (group === whole ? bucket.samples.reduce((sum, each) => sum + each) : bucket.samples[index]);
+    group.histogram = common.map(bucket => ({ ...bucket, samples: samples(bucket) })).filter(bucket => bucket.samples > 0);
+  });
+}
+
+/** The distance of the quartiles, or of the next quantiles that differ. */
+function spreadOf([p1, p5, p25, , p75, p95, p99]) {
+  return p75 - p25 || p95 - p5 || p99 - p1;
+}
+
+function figuresOf({ sampled, merged: [samples, mean, squares, error, largest, part] }, anonymity) {
+  const { told, size } = anonymity.sum(sampled, samples, largest);
+  const variance = Math.max(squares, 0) / samples;
+  const deviation = Math.sqrt(variance);
+  // What one device may move of the variance makes this of its root.
+  const moved = variance > 0 ? Math.max(part, variance * largest) / samples / (2 * deviation) : 0;
+  return { size, row: [told, coarse(mean, error), coarse(deviation, moved)] };
+}
 
 function rowOf(group, anonymity, told) {
-  const { devices, sampled = 0, merged: [samples, mean, squares] = [] } = group;
-  const buckets = anonymity.buckets(group.buckets.sort((one, other) =>
-    bound(one.to, Infinity) - bound(other.to, Infinity) || bound(one.from, -Infinity) - bound(other.from, -Infinity)), false);
-  const lists = ['from', 'to', 'samples'].map(part =>
-    (buckets.length > 0 && told.buckets(group) ? buckets.map(bucket => bucket[part]) : null));
+  const { devices, quantiles, histogram } = group;
+  const { size, row = [null, null, null] } = group.sampled > 0 && told.samples(group) ? figuresOf(group, anonymity) : {};
+  const lists = ['from', 'to', 'samples'].map(part => (histogram.length > 0 && told.buckets(group)
+    ? histogram.map(bucket => (part === 'samples' ? coarse(bucket.samples, size) : bucket[part])) : null));
   return [dateOf(group.day), group.version, anonymity.devices(devices),
-    ...LEVELS.map((level, index) => anonymity.quantile(devices, level, group.quantiles[index])),
-    ...[samples, mean, Math.sqrt(squares / samples)].map(value =>
-      (told.samples(group) ? anonymity.value(sampled, value) : null)), ...lists];
+    ...LEVELS.map((level, index) => anonymity.quantile(devices, level, quantiles[index], spreadOf(quantiles))), ...row, ...lists];
 }
 
 export async function answer(context) {
@@ -63,6 +92,7 @@ export async function answer(context) {
   const ofAll = anonymity.release(await groupsOf(context, "'all'"), group => group.devices, group => group.day);
   const groups = [...ofAll, ...ofVersions];
   const told = tellable(groups, anonymity);
+  for (const whole of ofAll) shareBuckets([whole, ...ofVersions.filter(({ day }) => day === whole.day)], anonymity);
   // Those of all versions come first, and stay there.
   return groups
     .sort((one, other) => one.day - other.day || (one.version ?? '').localeCompare(other.version ?? ''))

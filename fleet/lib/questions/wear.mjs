@@ -1,26 +1,36 @@
 // Devices by wear, and when a share of them will have reached a limit.
+import { coarse } from '../kanonymity.mjs';
 import { dateOf } from '../logs.mjs';
 import { normalQuantile } from '../statistics.mjs';
 
-const positive = text => Number(text) > 0 && Number(text) < 1e15 && Number(text);
+// Limits of one's own choice would move dates and buckets over single devices.
+const oneDigit = text => /^[1-9]0{0,14}$/.test(text) && Number(text);
 
 export const summary = 'devices by wear, and when 1 % of them reach a limit';
 export const parameters = {
   key: { help: 'the key of the wear' },
-  limit: { help: 'the wear that counts as worn out, in units of the key', fallback: '90', check: positive },
+  limit: { help: 'the wear that counts as worn out, in units of the key: one digit and zeros', fallback: '90', check: oneDigit },
 };
 export const columns = ['what', 'from', 'to', 'devices', 'share', 'date', 'method'];
 export const plot = { x: 'from', y: ['devices'], series: 'what' };
 
-const STEPS = 9; // buckets up to the limit: tenths, with a limit of 90 %
 const SHARES = [0.01, 0.1, 0.5];
 const SHORTEST = 6; // days between the first and the last of a device that has a line
 const NEVER = 1000000; // days
+const PRECISION = 0.02; // of the days until then: a quantile is one device's
 
-function bucketRows(rows, step, anonymity) {
-  const buckets = anonymity.buckets(rows.map(([bucket, devices]) =>
-    ({ from: bucket * step, to: (bucket + 1) * step, devices, samples: 0 })), true);
-  return buckets.map(({ from, to, devices }) => ['wear', from, to, anonymity.devices(devices), null, null, null]);
+/** The width of buckets: a tenth of a power of ten, so that buckets of all limits have the same bounds. */
+const stepOf = limit => 10 ** Math.max(Math.ceil(Math.log10(limit)) - 1, 0);
+
+/** Devices by wear, up to the limit and above, without a lowest and a highest. */
+function bucketRows(rows, limit, anonymity) {
+  const step = stepOf(limit);
+  const cells = Array.from({ length: Math.round(limit / step) + 1 }, (_, index) =>
+    ({ from: index * step, to: (index + 1) * step, devices: 0 }));
+  for (const [bucket, devices] of rows) cells[Math.min(Math.max(bucket, 0), cells.length - 1)].devices += devices;
+  cells[0].from = null;
+  cells.at(-1).to = null;
+  return anonymity.joined(cells).map(({ from, to, devices }) => ['wear', from, to, anonymity.devices(devices), null, null, null]);
 }
 
 /**
@@ -36,16 +46,15 @@ function daysOf(share, support, [counted, supported, median]) {
 
 export async function answer({ anonymity, query, sql, parameters, last }) {
   const { limit } = parameters;
-  const step = limit / STEPS;
   const fits = sql('fits', { values: sql('values', { version: "''" }) });
   const lines = { never: NEVER, shortest: SHORTEST };
-  const ofWear = await query('wear', { fits }, { ...lines, step });
+  const ofWear = await query('wear', { fits }, { ...lines, step: stepOf(limit) });
   const all = ofWear.reduce((sum, [, devices]) => sum + devices, 0);
   if (all < anonymity.k) {
     anonymity.withheld += all > 0 ? 1 : 0;
     return [];
   }
-  const rows = bucketRows(ofWear, step, anonymity);
+  const rows = bucketRows(ofWear, limit, anonymity);
   for (const share of SHARES) {
     const support = anonymity.supportedLevel(all, share);
     if (support === undefined || (support !== share && support >= 0.5)) {
@@ -53,7 +62,7 @@ export async function answer({ anonymity, query, sql, parameters, last }) {
       continue;
     }
     const [days, method] = daysOf(share, support, (await query('remaining', { fits }, { ...lines, level: share, support }))[0]);
-    const date = days === null || days >= NEVER ? null : dateOf(last + Math.round(days));
+    const date = days === null || days >= NEVER ? null : dateOf(last + Math.round(coarse(days, Math.abs(days) * PRECISION)));
     rows.push(['reached', limit, null, anonymity.devices(all), share, date, method]);
   }
   return rows;
