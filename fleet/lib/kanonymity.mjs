@@ -28,6 +28,14 @@ export class Anonymity {
     return number < this.k || largest > size ? undefined : { told: coarse(sum, size), size };
   }
 
+  /**
+   * A mean or another figure of which one device may move `moved`, and its standard error: in steps of the
+   * larger one of that error and of so many times `moved` that one device does not show.
+   */
+  figure(value, moved, error, round) {
+    return coarse(value, Math.max(error, Math.sqrt(this.k) * moved), round);
+  }
+
   /** The share of some of the devices, from rounded numbers, if those and the others are enough. */
   share(some, all) {
     return some < this.k || all - some < this.k ? null : this.devices(some) / this.devices(all);
@@ -168,8 +176,8 @@ function stepOf(size) {
 }
 
 /**
- * A value as a multiple of a step not below `size`, which is how much one device may move it or more. Where
- * no device moves it, it is told as it is.
+ * A value as a multiple of a step not below `size`. Where that is 0, as no device moves the value, it is told
+ * as it is.
  */
 export function coarse(value, size, round = nearest) {
   if (!Number.isFinite(size)) return null;
@@ -180,5 +188,6 @@ export function coarse(value, size, round = nearest) {
 
 // Half a step is rounded up also if an engine has added up to a bit less.
 const nearest = value => Math.floor(value + 0.5 + 1e-9);
+/** For ends of intervals, which are never told narrower than they are. */
 export const down = value => Math.floor(value + 1e-9);
 export const up = value => Math.ceil(value - 1e-9);

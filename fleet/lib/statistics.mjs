@@ -94,7 +94,7 @@ export function trimmedDifference(first, second) {
   const other = trimmed(second);
   const error = Math.sqrt(one.error + other.error);
   const difference = other.mean - one.mean;
-  const means = { one: one.mean, other: other.mean, difference, error };
+  const means = { one: one.mean, other: other.mean, difference, error, moved: Math.max(one.moved, other.moved) };
   if (!(error > 0)) return { ...means, low: difference, high: difference, p: difference === 0 ? 1 : 0 };
   const freedom = error ** 4 / (one.error ** 2 / one.freedom + other.error ** 2 / other.freedom);
   const reach = studentQuantile95(freedom) * error;
@@ -106,5 +106,5 @@ function trimmed({ devices, cut, middle, least, greatest, sum, squares }) {
   const ends = [least - middle, greatest - middle];
   const mean = (sum + cut * (ends[0] + ends[1])) / devices;
   const deviations = squares + cut * (ends[0] ** 2 + ends[1] ** 2) - devices * mean * mean;
-  return { mean: middle + sum / kept, error: Math.max(deviations, 0) / (kept * (kept - 1)), freedom: kept - 1 };
+  return { mean: middle + sum / kept, error: Math.max(deviations, 0) / (kept * (kept - 1)), freedom: kept - 1, moved: (greatest - least) / kept };
 }

@@ -1,4 +1,5 @@
 """Questions about a fleet: both engines find what is in the data, agree, and tell nothing of few devices."""
+import math
 import pathlib
 import random
 import re
@@ -123,12 +124,13 @@ class Fleet(unittest.TestCase):
                 squares = sum(Fraction(s) + n * (Fraction(m) - mean) ** 2 for n, m, s in values)
                 for where in engines:
                     row = ask("distribution", key=key, **where).only(version=None)
-                    # Told to what one device may move; half a step of up to 2.5 times that.
-                    deviation, error = float(squares / count) ** 0.5, float(sum((n * (Fraction(m) - mean)) ** 2 for n, m, _ in values)) ** 0.5
+                    # Half a step, of up to 2.5 times what √K devices may move or the standard error.
+                    deviation, moves = float(squares / count) ** 0.5, [abs(float(n * (Fraction(m) - mean))) for n, m, _ in values]
+                    error = max(math.hypot(*moves), K**0.5 * max(moves))
                     self.assertLess(abs(row["samples"] - count), 1.25 * K * count / len(values))
                     self.assertLess(abs(row["mean"] - float(mean)), 1.3 * error / count, (key, where))
                     part = max(max(float(s + n * (Fraction(m) - mean) ** 2), n * deviation**2) for n, m, s in values)
-                    self.assertLess(abs(row["deviation"] - deviation), 1.3 * part / count / 2 / deviation, (key, where))
+                    self.assertLess(abs(row["deviation"] - deviation), 1.3 * K**0.5 * part / count / 2 / deviation, (key, where))
 
     def test_tells_nothing_of_few_devices_nor_by_subtraction(self):
         sizes = {"small beside large": [30, 20, 10, 120], "small pulls another": [40, 70, 120], "one small": [3, 200],

@@ -68,13 +68,13 @@ function spreadOf([p1, p5, p25, , p75, p95, p99]) {
   return p75 - p25 || p95 - p5 || p99 - p1;
 }
 
-function figuresOf({ sampled, merged: [samples, mean, squares, error, largest, part] }, anonymity) {
+function figuresOf({ sampled, merged: [samples, mean, squares, error, largest, farthest, part] }, anonymity) {
   const { told, size } = anonymity.sum(sampled, samples, largest);
   const variance = Math.max(squares, 0) / samples;
   const deviation = Math.sqrt(variance);
   // What one device may move of the variance makes this of its root.
   const moved = variance > 0 ? Math.max(part, variance * largest) / samples / (2 * deviation) : 0;
-  return { size, row: [told, coarse(mean, error), coarse(deviation, moved)] };
+  return { size, row: [told, anonymity.figure(mean, farthest / samples, error), anonymity.figure(deviation, moved, 0)] };
 }
 
 function rowOf(group, anonymity, told) {

@@ -1,6 +1,6 @@
 // Whether a key differs between two versions: for the typical device, for a few devices, and for the same
 // device before and after.
-import { coarse, down, up } from '../kanonymity.mjs';
+import { down, up } from '../kanonymity.mjs';
 import { FleetError } from '../logs.mjs';
 import { shareDifference, signTest, trimmedDifference } from '../statistics.mjs';
 
@@ -37,11 +37,10 @@ async function versionsOf({ query, anonymity, parameters }) {
   return baseline === undefined || candidate === undefined ? undefined : { baseline, candidate };
 }
 
-function typical(before, after) {
-  const { one, other, difference, low, high, error, p } = trimmedDifference(before, after);
-  // No device moves a trimmed mean by a standard error. The interval is never told narrower than it is.
-  const told = [one, other, difference].map(value => coarse(value, error));
-  return [...told, coarse(low, error, down), coarse(high, error, up), ...verdict(p)];
+function typical(before, after, anonymity) {
+  const { one, other, difference, low, high, moved, error, p } = trimmedDifference(before, after);
+  const told = (value, round) => anonymity.figure(value, moved, error, round);
+  return [told(one), told(other), told(difference), told(low, down), told(high, up), ...verdict(p)];
 }
 
 /** Few devices with a multiple of what they had hide behind the mean, but not among the highest. */
@@ -81,7 +80,7 @@ export async function answer(context) {
   const devices = [before, after].map(group => anonymity.devices(group.devices));
   const compared = { ...context, means, versions };
   const rows = [
-    [...head('typical'), ...devices, ...typical(before, after)],
+    [...head('typical'), ...devices, ...typical(before, after, anonymity)],
     [...head('tail'), ...devices, ...await tail(compared, before, after)],
   ];
   const paired = await pairs(compared);
