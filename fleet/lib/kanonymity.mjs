@@ -148,10 +148,17 @@ function united(one, other) {
       devices: Math.max(part.devices, other.parts[index].devices) })) };
 }
 
-/** Cells in order, those that overlap made one; a bound is sure if K devices report it. */
+const overlap = (one, other) => below(one) < above(other) && below(other) < above(one);
+
+/**
+ * Cells in order, those that overlap made one; a bound is sure if K devices report it. A cell of few devices
+ * that lies across others is left out, since one device with settings of its own would join all buckets.
+ */
 function blocksOf(cells, k) {
   const blocks = [];
-  for (const cell of cells.toSorted((one, other) => below(one) - below(other) || above(one) - above(other))) {
+  const common = cells.filter(({ devices }) => devices >= k);
+  const used = cells.filter(cell => cell.devices >= k || !common.some(other => overlap(cell, other)));
+  for (const cell of used.toSorted((one, other) => below(one) - below(other) || above(one) - above(other))) {
     const block = { ...cell, fromSure: cell.devices >= k, sure: cell.devices >= k };
     const last = blocks.at(-1);
     if (!last || below(cell) >= above(last)) {

@@ -166,6 +166,11 @@ class Fleet(unittest.TestCase):
                                        for device in range(150)))
             row = ask("distribution", data=data, key="d").only(version=None)
             self.assertEqual((row["devices"], row["counts"], row["samples"]), (150, None, None if name == "a scalar" else 1500))
+        # One device with buckets of its own neither moves those of the others nor shows.
+        data = self.data(a="".join(log(device, 1, DAY, ("d", samples(9, 5, 1.0, **(common if device > 1 else {
+            "lower": [7, 90], "upper": [13, 100], "counts": [5, 4]})))) for device in range(1, 151)))
+        row = ask("distribution", data=data, key="d").only(version=None)
+        self.assertEqual((row["lower"], row["upper"]), ([None, 10], [10, None]))
         # One of the devices of version A is in a bucket in which all others are of version B.
         data = self.data(a="".join(
             log(device, 1, DAY, ("d", samples(12, 9, 1, lower=[None, 10], upper=[10, 20], counts=[7, 5]) if device == 1 or device > 100
