@@ -182,6 +182,7 @@ export class DuckDb {
     const engine = new DuckDb();
     const folder = path.join(directory, CONVERTED);
     const made = path.join(directory, `.${CONVERTED}-${process.pid}`);
+    removeUnfinished(directory);
     await engine.connect();
     try {
       if (files.length === 0 && converted) await engine.useParquet(folder);
@@ -203,6 +204,23 @@ export class DuckDb {
       fs.rmSync(made, { recursive: true, force: true });
     }
     return folder;
+  }
+}
+
+/** What conversions that were killed have left: it may hold a device that was asked to be forgotten. */
+function removeUnfinished(directory) {
+  for (const name of fs.readdirSync(directory)) {
+    const number = new RegExp(`^\\.${CONVERTED}-(\\d+)$`).exec(name)?.[1];
+    if (number && !isRunning(Number(number))) fs.rmSync(path.join(directory, name), { recursive: true, force: true });
+  }
+}
+
+function isRunning(number) {
+  try {
+    process.kill(number, 0);
+    return true;
+  } catch (error) {
+    return error.code !== 'ESRCH';
   }
 }
 

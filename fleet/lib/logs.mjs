@@ -32,7 +32,7 @@ export function exportedFiles(directory) {
 const isDay = day => day !== null && day >= 0 && day <= LAST_DAY;
 
 const isText = value => typeof value === 'string' && value.length <= 1024;
-const textOrNull = value => value === undefined || value === null || isText(value);
+const textOrNull = value => value === null || value === undefined || (isText(value) && value.isWellFormed());
 
 /** Whether a text can name a device: a pseudonym, or what whoever exported the log calls it. */
 export const isDevice = value => isText(value) && value !== '' && !value.includes('\0') && value.isWellFormed();

@@ -111,7 +111,8 @@ function readableRow(line, members) {
   }
   const { key, kind, value, count, minimum = null, maximum = null, mean = null, lower, upper, counts } = row;
   const squares = row.squared_deviations ?? null;
-  if (typeof key !== 'string') return undefined;
+  const isText = text => text === null || text.isWellFormed();
+  if (typeof key !== 'string' || ![key, members.version, members.configuration].every(isText)) return undefined;
   const common = { ...members, key, kind };
   if (kind === 'scalar') return isInteger64(value) ? { ...common, value } : undefined;
   const valid = kind === 'distribution' && isCount(count) && count < 2 ** 32 && listOf(counts, isCount) &&
