@@ -8,7 +8,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <ranges>
 
 #include "base/child_process.h"
 #include "host/spool/waiting_logs.h"
@@ -126,9 +125,11 @@ Result<std::vector<Hook>> openHooks(const DeviceRoot& root) {
   std::vector<Hook> hooks;
   auto directory = root.open("/");
   if (!directory) return directory.error();
-  for (const auto part : std::views::split(kHooksFolder.substr(1), '/')) {
+  for (std::string_view left = kHooksFolder.substr(1); !left.empty();) {
     if (auto checked = checkDirectory(*directory); !checked) return checked.error();
-    directory = directory->openDirectory(std::string_view(part.begin(), part.end()));
+    const std::size_t end = std::min(left.find('/'), left.size());
+    directory = directory->openDirectory(left.substr(0, end));
+    left.remove_prefix(std::min(end + 1, left.size()));
     if (!directory && directory.error().systemError == ENOENT) return hooks;
     if (!directory) return directory.error();
   }

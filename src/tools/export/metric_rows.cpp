@@ -204,8 +204,9 @@ Status MetricRows::finish() {
   const auto write = [&] {
     if (lastLine.empty()) return;
     std::string& text = output_.text();
-    if (family != lastKey.front()) {
-      family = lastKey.front();
+    const int ofKey = static_cast<unsigned char>(lastKey.front());
+    if (family != ofKey) {
+      family = ofKey;
       appendHeader(text, kFamilies[family]);
     }
     text += lastLine;
