@@ -54,11 +54,13 @@ export class Anonymity {
 
   /**
    * The value of rank ceil(level * number), with K devices on each side of it, itself included. It is one
-   * device's, so that it is rounded to about its standard error, of which `spread` is the distance of quartiles.
+   * device's, so that it is rounded to about its standard error: `spread` is the distance of the quartiles, and
+   * a quantile far from the median is as uncertain as it is far.
    */
-  quantile(number, level, value, spread) {
+  quantile(number, level, value, spread, median) {
     const rank = Math.ceil(level * number);
-    return rank < this.k || number - rank + 1 < this.k ? null : coarse(value, spread / Math.sqrt(number));
+    const uncertain = Math.max(spread, Math.abs(value - median)) / Math.sqrt(number);
+    return rank < this.k || number - rank + 1 < this.k ? null : coarse(value, uncertain);
   }
 
   /** The level nearest to the one wanted, towards the median, whose quantile may be told. */

@@ -130,7 +130,7 @@ bool endsWithin(pid_t child, std::chrono::milliseconds limit) {
         std::chrono::duration_cast<std::chrono::nanoseconds>(end - steady_clock::now()).count();
     if (left <= 0) return false;
     constexpr std::int64_t kSecond = 1'000'000'000;
-    const timespec patience{left / kSecond, left % kSecond};
+    const timespec patience{left / kSecond, static_cast<long>(left % kSecond)};
     ::sigtimedwait(&childEnds, nullptr, &patience);
   }
 }

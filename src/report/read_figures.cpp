@@ -22,7 +22,7 @@ void ReadFigures::addRefusals(std::int64_t count) {
 
 void ReadFigures::record(LogValues& values) const {
   if (recorderRan_) add(values, OwnMetric::RefusedInAll, refusals_);
-  if (damagedRows) {
+  if (damagedRows && admitted_.has(OwnMetric::DamagedRows)) {
     add(values, OwnMetric::DamagedRows, static_cast<std::int64_t>(*damagedRows));
   }
 }

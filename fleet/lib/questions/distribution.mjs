@@ -83,7 +83,7 @@ function rowOf(group, anonymity, told) {
   const lists = ['from', 'to', 'samples'].map(part => (histogram.length > 0 && told.buckets(group)
     ? histogram.map(bucket => (part === 'samples' ? coarse(bucket.samples, size) : bucket[part])) : null));
   return [dateOf(group.day), group.version, anonymity.devices(devices),
-    ...LEVELS.map((level, index) => anonymity.quantile(devices, level, quantiles[index], spreadOf(quantiles))), ...row, ...lists];
+    ...LEVELS.map((level, index) => anonymity.quantile(devices, level, quantiles[index], spreadOf(quantiles), quantiles[3])), ...row, ...lists];
 }
 
 export async function answer(context) {

@@ -102,15 +102,24 @@ struct LogHandover::Journal {
     return false;
   }
 
+  Result<std::string> encode() const {
+    return encodeXmlPlist(*KvDictionary::create({{"Directory", KvString::create(directory)},
+                                                 {"Mark", KvString::create(mark)},
+                                                 {"Log", KvString::create(stem)},
+                                                 {"NewName", KvString::create(newStem)},
+                                                 {"Inode", KvNumber::int64(inode)},
+                                                 {"Modified", KvNumber::int64(modified)},
+                                                 {"Information", KvBoolean::of(hasInformation)}}));
+  }
+  // Whether a later call would find the same directory by it.
+  bool canBeRead() const {
+    const auto bytes = encode();
+    const auto read = bytes ? parse(*bytes) : std::nullopt;
+    return read && read->directory == directory;
+  }
+
   Status write(const Directory& spool) const {
-    const auto bytes =
-        encodeXmlPlist(*KvDictionary::create({{"Directory", KvString::create(directory)},
-                                              {"Mark", KvString::create(mark)},
-                                              {"Log", KvString::create(stem)},
-                                              {"NewName", KvString::create(newStem)},
-                                              {"Inode", KvNumber::int64(inode)},
-                                              {"Modified", KvNumber::int64(modified)},
-                                              {"Information", KvBoolean::of(hasInformation)}}));
+    const auto bytes = encode();
     if (!bytes) return bytes.error();
     return writeFileAtomically(spool, kJournalFile, *bytes);
   }
@@ -134,7 +143,7 @@ struct LogHandover::Journal {
     }
     // Names that a call can have chosen: whoever owns the spool could have written the journal.
     if (!journal.directory.starts_with('/') || journal.directory.size() > kLongestDirectory ||
-        journal.directory.find("/..") != std::string::npos ||
+        (journal.directory + "/").find("/../") != std::string::npos ||
         !journal.mark.starts_with(kMarkBegin) ||
         !isDevicePseudonym(std::string_view(journal.mark).substr(kMarkBegin.size())) ||
         (!journal.newStem.empty() && !sequenceOf(journal.newStem))) {
@@ -196,7 +205,8 @@ Status LogHandover::settle(const Directory& spool, const Directory& to,
   if (!names) return names.error();
   if (*isWaiting && contains(*names, journal.temporaryBody())) {
     // Not renamed, so it stays in the spool. Its information may have been.
-    if (journal.hasInformation && !contains(*names, journal.temporaryInformation())) {
+    if (journal.hasInformation && contains(*names, journal.marker()) &&
+        !contains(*names, journal.temporaryInformation())) {
       if (auto removed = to.remove(informationOf(journal.newStem)); !removed) return removed;
     }
     // Decided for good: whoever is ended from here on must not leave a journal that, without the
@@ -280,6 +290,7 @@ Result<TakenLogs> LogHandover::take(const std::string& to,
   const auto random = randomHex();
   if (!random) return random.error();
   Journal journal{to, std::string(kMarkBegin) + *random, {}, {}, 0, 0, false};
+  if (!journal.canBeRead()) return Error{"--to: the journal cannot hold this path"};
   const Status moved = moveAll(*spool, *logs, *target, journal, taken);
   // The last log's removal, and that of the marks, is what a later call would do.
   const Status settled = recover(*spool);

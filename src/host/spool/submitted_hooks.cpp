@@ -89,6 +89,7 @@ Status runAll(const Directory& folder, const std::vector<Hook>& hooks, const Spo
   const std::array shown{folder.identity(names[0]), folder.identity(names[1])};
   // Whoever may write here could show a hook another file of the system under this name.
   for (std::size_t i = 0; i < names.size(); ++i) {
+    if (shown[i] && !shown[i]->regular) return Error{folder.pathOf(names[i]) + " is not a file"};
     if (auto sound = folder.readFile(names[i], 0); !sound && isRefused(sound.error())) {
       return sound.error();
     }
@@ -112,7 +113,11 @@ Status runAll(const Directory& folder, const std::vector<Hook>& hooks, const Spo
     for (const std::string_view suffix : {std::string_view(), kHeldSuffix}) {
       const std::string name = names[i] + std::string(suffix);
       // A hook may have removed it, and a later log have got its name.
-      if (!shown[i] || folder.identity(name) != shown[i]) continue;
+      const auto present = folder.identity(name);
+      if (present && present != shown[i]) {
+        return Error{folder.pathOf(name) + " is another file than the hooks were shown; it stays"};
+      }
+      if (!present) continue;
       if (auto removed = folder.remove(name); !removed) return removed;
     }
   }
