@@ -310,8 +310,9 @@ Status LogHandover::moveAll(const Directory& spool, const std::vector<SpooledLog
         (target.logs >= bounds_.maximumLogs || target.bytes + log.bytes > bounds_.maximumBytes)) {
       return Error{target.directory.path() + " is full"};
     }
-    const Copy copy{spool.readFile(log.fileName, std::min(log.bytes, kLargestLog)),
-                    spool.readFile(informationOf(stemOfLog(log)), kLargestInformation)};
+    const Copy copy{
+        spool.readFile(log.fileName, static_cast<std::size_t>(std::min(log.bytes, kLargestLog))),
+        spool.readFile(informationOf(stemOfLog(log)), kLargestInformation)};
     const bool isAlone = !copy.information && copy.information.error().systemError == ENOENT;
     if (!copy.body || (!copy.information && !isAlone)) {
       taken.faults.push_back((copy.body ? copy.information : copy.body).error().message);
