@@ -46,7 +46,8 @@ void HistogramIntervals::buildCells(std::size_t steps) {
   };
   unsigned shift = 0;
   while ((distance(steps_[steps - 1]) >> shift) >= kMostCells - 1) ++shift;
-  std::vector<std::uint16_t> cells((distance(steps_[steps - 1]) >> shift) + 2);
+  std::vector<std::uint16_t> cells(static_cast<std::size_t>(distance(steps_[steps - 1]) >> shift) +
+                                   2);
   std::size_t most = 0;
   for (std::size_t i = 0; i < steps && most <= kMostStepsOfCell;) {
     const auto cell = static_cast<std::size_t>(distance(steps_[i]) >> shift) + 1;
