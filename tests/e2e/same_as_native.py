@@ -24,7 +24,8 @@ COMMANDS = (
 # What depends on the machine and the time.
 PINNED = {"MonotonicTicks": 86_400_000_000_000, "Timebase": {"Numerator": 1, "Denominator": 1},
           "OSVersion": "5.1 (16S46)", "SystemID": "Vellum 5.1", "HardwareModel": "sample"}
-RANDOM = re.compile(rb"[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}|tallyrun\[\d+\]")  # of each storage log
+RANDOM = re.compile(rb"[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}|tallyrun\[\d+\]|"  # of each storage log
+                    rb"<key>DevicePseudonym</key>\s*<string>[0-9a-f]{32}")
 
 
 def life(root, programs):
