@@ -138,7 +138,7 @@ TEST_F(HandoverWalk, EachLogLeavesOnce) {
   for (const Fault& fault : kHandoverFaults) {
     for (const Retry& retry : kRetries) {
       long point = 1;
-      while (tryPoint(fault, retry, point) && !HasFailure()) ++point;
+      while (tryPoint(fault, retry, point) && !HasFailure()) point += FAULT_STRIDE;
       EXPECT_GT(point, fault.effect == Effect::KillHalfWay ? 5 : 20) << fault.name;
       if (HasFailure()) return;
     }
