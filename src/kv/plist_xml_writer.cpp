@@ -8,6 +8,8 @@
 #include <charconv>
 #include <cmath>
 #include <cstdint>
+#include <limits>
+#include <utility>
 
 #include "base/number_text.h"
 #include "base/time_text.h"
@@ -26,10 +28,12 @@ constexpr std::string_view kHeader =
     "<plist version=\"1.0\">\n";
 constexpr std::string_view kFooter = "</plist>\n";
 
+constexpr std::size_t kPiece = 64u << 10;
+
 // Lines of data end at this column, a tab counting 8; deeper than 8 tabs they stay where they are.
-constexpr int kDataColumns = 76;
-constexpr int kTabColumns = 8;
-constexpr int kDataMaximumTabs = 8;
+constexpr std::size_t kDataColumns = 76;
+constexpr std::size_t kTabColumns = 8;
+constexpr std::size_t kDataMaximumTabs = 8;
 
 enum : std::uint8_t { kPlain, kEscaped, kSuspect };
 
@@ -95,124 +99,159 @@ void appendReal(std::string& out, double value) {
   }
 }
 
-class Writer {
- public:
-  explicit Writer(std::size_t maximumBytes) : maximumBytes_(maximumBytes) {}
-
-  Status value(const KvObject& object, int depth) {
-    if (out_.size() > maximumBytes_) return plistTooLarge(maximumBytes_);
-    indent(depth);
-    switch (object.type()) {
-      case KvType::String:
-        text("string", static_cast<const KvString&>(object).view());
-        break;
-      case KvType::Number:
-        number(static_cast<const KvNumber&>(object));
-        break;
-      case KvType::Boolean:
-        out_ += static_cast<const KvBoolean&>(object).value() ? "<true/>\n" : "<false/>\n";
-        break;
-      case KvType::Date:
-        out_ += "<date>";
-        appendTimestamp(out_, static_cast<const KvDate&>(object).secondsSince1970());
-        out_ += "</date>\n";
-        break;
-      case KvType::Data:
-        data(static_cast<const KvData&>(object).bytes(), depth);
-        break;
-      case KvType::Array:
-        return array(static_cast<const KvArray&>(object), depth);
-      case KvType::Dictionary:
-        return dictionary(static_cast<const KvDictionary&>(object), depth);
-    }
-    return Done{};
-  }
-
-  std::string out_{kHeader};
-
- private:
-  void indent(int depth) { out_.append(static_cast<std::size_t>(depth), '\t'); }
-
-  void text(std::string_view tag, std::string_view content) {
-    ((out_ += '<') += tag) += '>';
-    appendText(out_, content);
-    ((out_ += "</") += tag) += ">\n";
-  }
-
-  void number(const KvNumber& number) {
-    if (number.isReal()) {
-      out_ += "<real>";
-      appendReal(out_, number.asDouble());
-      out_ += "</real>\n";
-      return;
-    }
-    out_ += "<integer>";
-    if (number.isUnsigned()) {
-      appendUInt64(out_, number.asUInt64());
-    } else {
-      appendInt64(out_, number.asInt64());
-    }
-    out_ += "</integer>\n";
-  }
-
-  void data(std::span<const std::byte> bytes, int depth) {
-    const int tabs = std::min(depth, kDataMaximumTabs);
-    const auto bytesPerLine = static_cast<std::size_t>(kDataColumns - kTabColumns * tabs) / 4 * 3;
-    out_ += "<data>\n";
-    for (; !bytes.empty(); bytes = bytes.subspan(std::min(bytes.size(), bytesPerLine))) {
-      indent(tabs);
-      appendBase64(out_, bytes.first(std::min(bytes.size(), bytesPerLine)));
-      out_ += '\n';
-    }
-    indent(depth);
-    out_ += "</data>\n";
-  }
-
-  Status array(const KvArray& array, int depth) {
-    if (depth == kMaximumDepth) return tooDeep();
-    if (array.empty()) return out_ += "<array/>\n", Done{};
-    out_ += "<array>\n";
-    for (const auto& item : array) {
-      if (Status status = value(*item, depth + 1); !status) return status;
-    }
-    indent(depth);
-    out_ += "</array>\n";
-    return Done{};
-  }
-
-  Status dictionary(const KvDictionary& dictionary, int depth) {
-    if (depth == kMaximumDepth) return tooDeep();
-    if (dictionary.empty()) return out_ += "<dict/>\n", Done{};
-    out_ += "<dict>\n";
-    for (const auto& [key, item] : dictionary) {
-      indent(depth + 1);
-      text("key", key->view());
-      if (Status status = value(*item, depth + 1); !status) return status;
-    }
-    indent(depth);
-    out_ += "</dict>\n";
-    return Done{};
-  }
-
-  static Error tooDeep() {
-    return Error{"the value is " + std::string(kTooDeep) + " or contains itself"};
-  }
-
-  std::size_t maximumBytes_;
-};
+Error tooDeep() { return Error{"the value is " + std::string(kTooDeep) + " or contains itself"}; }
 
 }  // namespace
+
+XmlPlistWriter::XmlPlistWriter(std::size_t maximumBytes, Sink sink)
+    : maximumBytes_(maximumBytes),
+      sink_(std::move(sink)),
+      piece_(sink_ ? kPiece : std::numeric_limits<std::size_t>::max()),
+      out_(kHeader) {}
+
+void XmlPlistWriter::beginDictionary() {
+  indent(depth_++);
+  out_ += "<dict>\n";
+}
+
+void XmlPlistWriter::endDictionary() {
+  indent(--depth_);
+  out_ += "</dict>\n";
+}
+
+void XmlPlistWriter::emptyDictionary() {
+  indent(depth_);
+  out_ += "<dict/>\n";
+}
+
+void XmlPlistWriter::key(std::string_view key) {
+  indent(depth_);
+  text("key", key);
+}
+
+void XmlPlistWriter::integer(std::int64_t value) {
+  indent(depth_);
+  out_ += "<integer>";
+  appendInt64(out_, value);
+  out_ += "</integer>\n";
+}
+
+Status XmlPlistWriter::value(const KvObject& object) {
+  if (size() > maximumBytes_) return plistTooLarge(maximumBytes_);
+  if (isLarge()) {
+    if (Status passed = passOn(); !passed) return passed;
+  }
+  indent(depth_);
+  switch (object.type()) {
+    case KvType::String:
+      text("string", static_cast<const KvString&>(object).view());
+      break;
+    case KvType::Number:
+      number(static_cast<const KvNumber&>(object));
+      break;
+    case KvType::Boolean:
+      out_ += static_cast<const KvBoolean&>(object).value() ? "<true/>\n" : "<false/>\n";
+      break;
+    case KvType::Date:
+      out_ += "<date>";
+      appendTimestamp(out_, static_cast<const KvDate&>(object).secondsSince1970());
+      out_ += "</date>\n";
+      break;
+    case KvType::Data:
+      data(static_cast<const KvData&>(object).bytes());
+      break;
+    case KvType::Array:
+      return array(static_cast<const KvArray&>(object));
+    case KvType::Dictionary:
+      return dictionary(static_cast<const KvDictionary&>(object));
+  }
+  return Done{};
+}
+
+Status XmlPlistWriter::passOn() {
+  if (!sink_) return Done{};
+  passedOn_ += out_.size();
+  const bool taken = sink_(out_);
+  out_.clear();
+  return taken ? Status(Done{}) : Error{"the document was not taken whole"};
+}
+
+Result<std::string> XmlPlistWriter::finish() {
+  out_ += kFooter;
+  if (size() > maximumBytes_) return plistTooLarge(maximumBytes_);
+  if (Status passed = passOn(); !passed) return passed.error();
+  return std::move(out_);
+}
+
+void XmlPlistWriter::text(std::string_view tag, std::string_view content) {
+  ((out_ += '<') += tag) += '>';
+  appendText(out_, content);
+  ((out_ += "</") += tag) += ">\n";
+}
+
+void XmlPlistWriter::number(const KvNumber& number) {
+  if (number.isReal()) {
+    out_ += "<real>";
+    appendReal(out_, number.asDouble());
+    out_ += "</real>\n";
+    return;
+  }
+  out_ += "<integer>";
+  if (number.isUnsigned()) {
+    appendUInt64(out_, number.asUInt64());
+  } else {
+    appendInt64(out_, number.asInt64());
+  }
+  out_ += "</integer>\n";
+}
+
+void XmlPlistWriter::data(std::span<const std::byte> bytes) {
+  const std::size_t tabs = std::min(depth_, kDataMaximumTabs);
+  const std::size_t bytesPerLine = (kDataColumns - kTabColumns * tabs) / 4 * 3;
+  out_ += "<data>\n";
+  for (; !bytes.empty(); bytes = bytes.subspan(std::min(bytes.size(), bytesPerLine))) {
+    indent(tabs);
+    appendBase64(out_, bytes.first(std::min(bytes.size(), bytesPerLine)));
+    out_ += '\n';
+  }
+  indent(depth_);
+  out_ += "</data>\n";
+}
+
+Status XmlPlistWriter::array(const KvArray& array) {
+  if (depth_ == std::size_t{kMaximumDepth}) return tooDeep();
+  if (array.empty()) return out_ += "<array/>\n", Done{};
+  out_ += "<array>\n";
+  ++depth_;
+  for (const auto& item : array) {
+    if (Status status = value(*item); !status) return status;
+  }
+  indent(--depth_);
+  out_ += "</array>\n";
+  return Done{};
+}
+
+Status XmlPlistWriter::dictionary(const KvDictionary& dictionary) {
+  if (depth_ == std::size_t{kMaximumDepth}) return tooDeep();
+  if (dictionary.empty()) return out_ += "<dict/>\n", Done{};
+  out_ += "<dict>\n";
+  ++depth_;
+  for (const auto& [name, item] : dictionary) {
+    key(name->view());
+    if (Status status = value(*item); !status) return status;
+  }
+  endDictionary();
+  return Done{};
+}
 
 Error plistTooLarge(std::size_t maximumBytes) {
   return Error{"the property list is larger than " + std::to_string(maximumBytes >> 20) + " MiB"};
 }
 
 Result<std::string> writeXmlPlist(const KvObject& root, std::size_t maximumBytes) {
-  Writer writer(maximumBytes);
-  if (Status status = writer.value(root, 0); !status) return status.error();
-  writer.out_ += kFooter;
-  if (writer.out_.size() > maximumBytes) return plistTooLarge(maximumBytes);
-  return std::move(writer.out_);
+  XmlPlistWriter writer(maximumBytes);
+  if (Status status = writer.value(root); !status) return status.error();
+  return writer.finish();
 }
 
 }  // namespace tally

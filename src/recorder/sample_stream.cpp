@@ -5,6 +5,8 @@
 #include <cstring>
 #include <limits>
 
+#include "base/varint.h"
+
 namespace tally {
 namespace {
 
@@ -15,19 +17,6 @@ constexpr double kMostWhole = 9007199254740992.0;  // 2^53
 // The longest: the byte, a real, an offset, a weight.
 constexpr std::size_t kLongest = 1 + 10 + 5 + 5;
 constexpr std::uint32_t kFirstBlock = 48, kLargestBlock = 4080;
-
-std::uint64_t zigzag(std::int64_t value) {
-  return (static_cast<std::uint64_t>(value) << 1) ^ static_cast<std::uint64_t>(value >> 63);
-}
-std::int64_t unzigzag(std::uint64_t value) {
-  return static_cast<std::int64_t>(value >> 1) ^ -static_cast<std::int64_t>(value & 1);
-}
-
-std::byte* putVarint(std::byte* out, std::uint64_t value) {
-  for (; value >= 0x80; value >>= 7) *out++ = static_cast<std::byte>(value | 0x80);
-  *out++ = static_cast<std::byte>(value);
-  return out;
-}
 
 bool isWhole(double value) {
   return std::fabs(value) < kMostWhole && value == std::trunc(value) &&
@@ -100,13 +89,8 @@ std::byte SampleStream::Reader::take() {
   return taken;
 }
 
-std::uint64_t SampleStream::Reader::takeVarint() {
-  std::uint64_t value = 0;
-  for (unsigned shift = 0;; shift += 7) {
-    const auto byte = static_cast<std::uint64_t>(take());
-    value |= (byte & 0x7f) << shift;
-    if (byte < 0x80) return value;
-  }
+std::uint64_t SampleStream::Reader::takeNumber() {
+  return takeVarint([this] { return take(); });
 }
 
 bool SampleStream::Reader::next(StreamSamples& samples, std::size_t most) {
@@ -121,13 +105,13 @@ bool SampleStream::Reader::next(StreamSamples& samples, std::size_t most) {
       std::memcpy(&value, bytes, sizeof value);
     } else {
       std::uint64_t whole = tag >> (8 - kFirstBits);
-      if ((tag & kMoreBits) != 0) whole |= takeVarint() << kFirstBits;
+      if ((tag & kMoreBits) != 0) whole |= takeNumber() << kFirstBits;
       value = static_cast<double>(unzigzag(whole));
     }
     if ((tag & kOffsetFollows) != 0) {
-      offset_ = static_cast<std::uint32_t>(std::int64_t{offset_} + unzigzag(takeVarint()));
+      offset_ = static_cast<std::uint32_t>(std::int64_t{offset_} + unzigzag(takeNumber()));
     }
-    if ((tag & kWeightFollows) != 0) weight_ = static_cast<std::uint32_t>(takeVarint());
+    if ((tag & kWeightFollows) != 0) weight_ = static_cast<std::uint32_t>(takeNumber());
     weighted = weighted || weight_ != 1;
     samples.values.push_back(value);
     samples.offsets.push_back(offset_);

@@ -37,7 +37,7 @@ class SampleStream {
 
    private:
     std::byte take();
-    std::uint64_t takeVarint();
+    std::uint64_t takeNumber();
     const SampleStream& stream_;
     std::size_t block_ = 0, position_ = 0;
     std::uint64_t left_;

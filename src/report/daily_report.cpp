@@ -45,7 +45,7 @@ OwnMetrics writeDailyLog(Platform& platform, std::int32_t day, const KvArray* ap
   const auto metadata = makeMetadata(*platform.locale);
   recordDeviceMetrics(platform, values);
   figures.record(values);
-  submitDocument(platform, *makeDocument(platform, day, values, metadata, appInfo));
+  submitLog(platform, day, values, metadata, appInfo);
   return figures.admitted();
 }
 

@@ -21,11 +21,9 @@ constexpr std::size_t kDailyLogMaximumBytes = 256u << 20;
 // The languages and the region of the user.
 KvRef<KvDictionary> makeMetadata(Locale& locale);
 
-// The document of a day; appInfo may be null. The whitelist of the values is released.
-KvRef<KvDictionary> makeDocument(Platform& platform, std::int32_t day, LogValues& values,
-                                 const KvRef<KvDictionary>& metadata, const KvArray* appInfo);
-
-// Encodes and submits it. A failure is logged.
-void submitDocument(Platform& platform, const KvDictionary& document);
+// Submits the log of a day; appInfo may be null. The whitelist of the values is released. A failure
+// is logged.
+void submitLog(Platform& platform, std::int32_t day, LogValues& values,
+               const KvRef<KvDictionary>& metadata, const KvArray* appInfo);
 
 }  // namespace tally

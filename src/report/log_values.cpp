@@ -32,17 +32,7 @@ void LogValues::addScalar(std::int64_t value, std::string_view key, const Scalar
     trace_->steps.clear();
     steps = &trace_->steps;
   }
-  scalars_->set(key, KvNumber::int64(roundScalar(value, options, steps)));
-}
-
-void LogValues::setDistribution(std::string_view key, const DistributionResult& result) {
-  // A histogram without samples removes that of an earlier row of the key.
-  if (result.hasHistogram) histograms_->set(key, result.histogram);
-  distributions_->set(key, result.summary.toArray());
-}
-
-bool LogValues::empty() const {
-  return scalars_->empty() && distributions_->empty() && histograms_->empty();
+  scalars_.set(key, roundScalar(value, options, steps));
 }
 
 std::string LogValues::releaseWhitelist() {

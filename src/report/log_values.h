@@ -10,10 +10,11 @@
 
 #include "config/whitelist.h"
 #include "config/whitelist_options.h"
-#include "kv/value.h"
 #include "platform/metrics_store.h"
 #include "platform/tables/own_metrics.h"
 #include "report/distribution_pass.h"
+#include "report/logged_distributions.h"
+#include "report/logged_scalars.h"
 
 namespace tally {
 
@@ -33,7 +34,7 @@ class LogValues {
       : whitelist_(std::move(whitelist)),
         trace_(trace),
         pass_(log, [this](std::string_view key, const DistributionResult& result) {
-          setDistribution(key, result);
+          distributions_.set(key, result);
         }) {}
   LogValues(const LogValues&) = delete;
   LogValues& operator=(const LogValues&) = delete;
@@ -55,24 +56,20 @@ class LogValues {
     pass_.add(values, key, options);
   }
   void finishDistributions() { pass_.finish(); }
-  bool empty() const;
+  bool empty() const { return scalars_.empty() && distributions_.empty(); }
 
   // Frees the whitelist, after which no key is admitted; returns the digest of its file, which is
   // empty without a whitelist.
   std::string releaseWhitelist();
-  const KvRef<KvDictionary>& scalars() const { return scalars_; }
-  const KvRef<KvDictionary>& distributions() const { return distributions_; }
-  const KvRef<KvDictionary>& histograms() const { return histograms_; }
+  const LoggedScalars& scalars() const { return scalars_; }
+  const LoggedDistributions& distributions() const { return distributions_; }
 
  private:
-  void setDistribution(std::string_view key, const DistributionResult& result);
-
   std::unique_ptr<Whitelist> whitelist_;
   KeyTrace* trace_;
   DistributionPass pass_;
-  KvRef<KvDictionary> scalars_ = KvDictionary::create();
-  KvRef<KvDictionary> distributions_ = KvDictionary::create();
-  KvRef<KvDictionary> histograms_ = KvDictionary::create();
+  LoggedScalars scalars_;
+  LoggedDistributions distributions_;
 };
 
 }  // namespace tally
