@@ -11,8 +11,11 @@
 #include <cstring>
 #include <ctime>
 #include <memory>
+#include <string>
+#include <string_view>
 #include <vector>
 
+#include "figures.h"
 #include "hwreport/hwreport.h"
 #include "hwreport/naive_samples.h"
 #include "hwreport/world.h"
@@ -214,5 +217,16 @@ int main() {
   std::printf("to reach: growth at most 1.5; sample and delta at most 400 ns\n");
   std::printf("memory of a subscribed and sampled channel: %.0f %.0f %.0f bytes (below 1536)\n",
               bytes[0], bytes[1], bytes[2]);
+  for (std::size_t i = 0; i + 1 < kCount; ++i) {
+    const std::string name = std::string("channels: ") + kOperations[i].name;
+    bench::addFigure((name + ", 100,000 channels").c_str(), times[2][i], "ns a channel",
+                     "1,000 channels", times[0][i], bench::atMost(1.25));
+    if (kOperations[i].name == std::string_view("sample") ||
+        kOperations[i].name == std::string_view("delta")) {
+      bench::addFigure((name + ", each").c_str(), times[2][i], "ns", bench::atMost(400));
+    }
+  }
+  bench::addFigure("channels: memory of each, subscribed and sampled",
+                   *std::ranges::max_element(bytes), "bytes", bench::atMost(300));
   return compareWithNaive() ? 0 : 1;
 }

@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <filesystem>
 
+#include "figures.h"
 #include "host/store/store_schema.h"
 #include "process_cost.h"
 #include "sample_device.h"
@@ -29,7 +30,12 @@ int main(int, char** arguments) {
   };
   line("tallyctl store import", import);
   line("yardstick: Python's csv and sqlite3", yardstick);
-  std::printf("ratio %.1f (to reach: at least 1 million lines/s, below 64 MiB)\n",
-              yardstick.wallSeconds / import.wallSeconds);
+  std::printf("ratio %.1f\n", yardstick.wallSeconds / import.wallSeconds);
+  const double speed = lines / import.wallSeconds / 1e6;
+  addFigure("importing a day", speed, "million lines/s", atLeast(1));
+  addFigure("importing a day, beside a script", speed, "million lines/s",
+            "Python's csv and sqlite3", lines / yardstick.wallSeconds / 1e6, noTarget());
+  addFigure("importing a day, peak", static_cast<double>(import.peakKibibytes) / 1024, "MiB",
+            atMost(64));
   return import.exitStatus != 0 || yardstick.exitStatus != 0 ? 1 : 0;
 }

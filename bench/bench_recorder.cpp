@@ -11,6 +11,7 @@
 #include <string_view>
 #include <vector>
 
+#include "figures.h"
 #include "recorder/daemon.h"
 #include "recorder/load.h"
 #include "recorder/own_network.h"
@@ -109,12 +110,19 @@ int measure() {
     }
     const Cost least = leastOf(ours), yardstick = leastOf(bare);
     print(c.label, c.perDatagram, least);
-    if (c.toReach > 0) std::printf("  (to reach: %.1f)", c.toReach * 1e-6);
     std::printf("\n");
     print("  recv and nothing else", c.perDatagram, yardstick);
     std::printf("  tallyd takes %.2f times that\n",
                 least.perMetric.sum() / yardstick.perMetric.sum());
     std::fflush(stdout);
+    const std::string name =
+        std::string("recording, ") + c.label + ", " + std::to_string(c.perDatagram) + " a datagram";
+    addFigure(name.c_str(), least.perMetric.sum() * 1e9, "ns CPU", "recv and nothing else",
+              yardstick.perMetric.sum() * 1e9, noTarget());
+    if (c.toReach > 0) {
+      addFigure((name + ", a core").c_str(), 1e-6 / least.perMetric.sum(), "million/s",
+                atLeast(c.toReach * 1e-6));
+    }
   }
   return 0;
 }

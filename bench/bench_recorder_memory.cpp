@@ -7,6 +7,7 @@
 #include <string_view>
 #include <thread>
 
+#include "figures.h"
 #include "recorder/daemon.h"
 #include "recorder/load.h"
 #include "recorder/process_figures.h"
@@ -21,9 +22,13 @@ constexpr std::int64_t kSamples = 1'000'000;
 
 double mebibytes(long kibibytes) { return static_cast<double>(kibibytes) / 1024; }
 
-void print(const char* label, const PrivateMemory& memory, const char* toReach) {
-  std::printf("%-52s %7.2f %7.2f  %s\n", label, mebibytes(memory.sum()), mebibytes(memory.dirty),
-              toReach);
+void print(const char* label, const PrivateMemory& memory) {
+  std::printf("%-52s %7.2f %7.2f\n", label, mebibytes(memory.sum()), mebibytes(memory.dirty));
+}
+
+void addMemory(const std::string& name, const PrivateMemory& memory, double mostMebibytes) {
+  addFigure(("memory of tallyd, " + name).c_str(), mebibytes(memory.sum()), "MiB",
+            atMost(mostMebibytes));
 }
 
 // The largest of many looks, while a function runs.
@@ -54,16 +59,17 @@ struct Case {
   const char* what;
   Mix::Samples samples;
   std::string_view settings;
-  const char* toReach;
+  double mostReceiving, mostCommitting;  // MiB
 };
 // By default the recorder commits at half of its limit.
 constexpr std::string_view kMoreMemory =
     "<key>MemoryLimit</key><integer>67108864</integer>"
     "<key>MetricsPerSecond</key><integer>1000000000</integer>";
+constexpr double kLimit = 32;
 constexpr Case kCases[] = {
-    {"whole milliseconds", Mix::Samples::WholeMilliseconds, kNoLimits, "(to reach: 16)"},
-    {"any doubles", Mix::Samples::Doubles, kNoLimits, "(to reach: 32, the limit)"},
-    {"any doubles, a limit of 64 MiB", Mix::Samples::Doubles, kMoreMemory, "(to reach: 24)"},
+    {"whole milliseconds", Mix::Samples::WholeMilliseconds, kNoLimits, 16, kLimit},
+    {"any doubles", Mix::Samples::Doubles, kNoLimits, kLimit, kLimit},
+    {"any doubles, a limit of 64 MiB", Mix::Samples::Doubles, kMoreMemory, 24, 64},
 };
 
 void measure(const Case& c) {
@@ -74,13 +80,14 @@ void measure(const Case& c) {
     Sender(daemon.socket()).send(datagrams, std::ssize(datagrams));
     require(daemon.settledMetrics() == kSamples, "tallyd has not taken all samples");
   });
-  print("  peak while they come", receiving, c.toReach);
+  print("  peak while they come", receiving);
+  addMemory(std::string(c.what) + ", receiving", receiving, c.mostReceiving);
   const auto held = static_cast<long long>(daemon.figure("samples_held"));
-  print(("  then, with " + std::to_string(held) + " in memory").c_str(), idleMemoryOf(daemon), "");
+  print(("  then, with " + std::to_string(held) + " in memory").c_str(), idleMemoryOf(daemon));
   const auto peak = peakDuring(daemon.process(), [&] { daemon.commit(); });
-  print("  peak while these are committed", peak,
-        c.settings == kNoLimits ? "(to reach: 32, the limit)" : "");
-  print("  afterwards", idleMemoryOf(daemon), "");
+  print("  peak while these are committed", peak);
+  addMemory(std::string(c.what) + ", committing", peak, c.mostCommitting);
+  print("  afterwards", idleMemoryOf(daemon));
 }
 
 }  // namespace
@@ -89,12 +96,16 @@ int main() {
   std::printf("%-52s %7s %7s\n", "private memory, MiB", "all", "written");
   {
     const Daemon daemon;
-    print("idle, just started", idleMemoryOf(daemon), "(to reach: 2)");
+    const PrivateMemory started = idleMemoryOf(daemon);
+    print("idle, just started", started);
+    addMemory("just started", started, 2);
     const auto datagrams = makeDatagrams({}, 20, 110'000);
     Sender(daemon.socket()).send(datagrams, std::ssize(datagrams));
     require(daemon.settledMetrics() == 110'000, "tallyd has not taken all metrics");
     daemon.commit();
-    print("idle, after a commit of 110,000 metrics", idleMemoryOf(daemon), "(to reach: 2)");
+    const PrivateMemory idle = idleMemoryOf(daemon);
+    print("idle, after a commit of 110,000 metrics", idle);
+    addMemory("idle after a commit", idle, 2);
   }
   for (const Case& c : kCases) measure(c);
   return 0;

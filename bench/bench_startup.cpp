@@ -10,6 +10,7 @@
 #include <iterator>
 #include <vector>
 
+#include "figures.h"
 #include "process_cost.h"
 
 namespace {
@@ -69,5 +70,7 @@ int main(int, char** arguments) {
               median(wall[0]) / median(wall[2]));
   std::printf("bound at once / lazily, CPU %13.3f -d, %.3f -f\n", median(cpu[0]) / median(cpu[1]),
               median(cpu[3]) / median(cpu[4]));
+  tally::bench::addFigure("starting for nothing", median(wall[0]), "ms", "an empty C++ program",
+                          median(wall[2]), tally::bench::atMost(1.5));
   return 0;
 }

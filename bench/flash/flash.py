@@ -6,11 +6,13 @@ import shutil
 import subprocess
 import sys
 
-sys.path.insert(0, str(pathlib.Path(__file__).resolve().parents[2] / "tests/vm"))
+TOP = pathlib.Path(__file__).resolve().parents[2]
+sys.path[:0] = [str(TOP / "tests/vm"), str(TOP / "bench")]
+from figures import add_figure, at_most
 from machine import Machine
 from run import FIRST_DAY
 
-INTERVALS = (1, 5, 15, 60)  # minutes
+INTERVALS, DEFAULT_INTERVAL = (1, 5, 15, 60), 15  # minutes
 METRICS = 86400 * 110
 SINGLE = 100  # values that the yardstick commits one by one
 MIB = 1 << 20
@@ -61,13 +63,17 @@ def main():
         answers = measure(minutes)
         size, requests, flushes = written(answers, "start", "day")
         whole = written(answers, "start", "report")[0]
-        goal = "  (to reach: 40)" if minutes == 15 else ""
         print(f"{minutes:3} min{size / MIB:17.1f}{whole / MIB:20.1f}{requests:10}{flushes:9}"
-              f"{size / 1024 * minutes / 1440:21.1f}{goal}", flush=True)
+              f"{size / 1024 * minutes / 1440:21.1f}", flush=True)
+        if minutes == DEFAULT_INTERVAL:
+            default = size
     for name, end in (("tallyctl store set", "set"), ("tallyctl store push", "push")):
         size, _, flushes = written(answers, f"before-{end}", end)
         print(f"{name}, a commit for each of {SINGLE} values: {size / SINGLE / 1024:.1f} KiB and "
               f"{flushes / SINGLE:.1f} flushes each; a day would be {size / SINGLE * METRICS / MIB / 1024:,.0f} GiB")
+    add_figure("a day of recording, flash written", default / MIB, "MiB", at_most(40))
+    add_figure("a day of recording, beside single commits", default / MIB, "MiB",
+               beside=(name, size / SINGLE * METRICS / MIB))
 
 
 if __name__ == "__main__":
