@@ -23,7 +23,7 @@ using namespace tally::bench;
 
 constexpr int kRuns = 3;
 constexpr int kUdpPort = 18125;
-constexpr std::int64_t kDatagrams = 500'000;  // of a run
+constexpr std::int64_t kDatagrams = 200'000;  // of a run
 constexpr std::int64_t kPool = 110'000;       // metrics that differ: 200 of each key
 
 struct Case {

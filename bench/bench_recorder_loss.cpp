@@ -21,7 +21,7 @@ using namespace tally::bench;
 using namespace std::chrono_literals;
 using std::chrono::steady_clock;
 
-constexpr int kSeconds = 2, kRuns = 3;
+constexpr int kSeconds = 1, kRuns = 3;
 constexpr int kDefaultQueue = 10, kRaisedQueue = 512;
 
 struct Case {
