@@ -187,7 +187,7 @@ int measure(const std::string& self, const std::string& yardsticks) {
             timesLess(60));
   addFigure("a large day, beside SQL", whole.cpuSeconds, "s CPU", "one SQL query", query.cpuSeconds,
             timesLess(30));
-  addFigure("the pass over its samples", pass.cpuSeconds, "s CPU", "reading the store",
+  addFigure("a large day, the pass over the samples", pass.cpuSeconds, "s CPU", "reading the store",
             floor.cpuSeconds, atMost(1.5));
   addFigure("a large day, peak", mebibytes(whole), "MiB", atMost(28));
   addFigure("a large day, growth of the peak", mebibytes(whole), "MiB",

@@ -9,7 +9,7 @@
 // table: scripts/bench names those that miss their target by more than a tenth, and fails.
 //
 // A program in another language appends the same lines to the file that BENCH_FIGURES names, fields
-// separated by tabs (bench/figures.py does it for Python):
+// separated by tabs (bench/bench_figures.py does it for Python):
 //   name, value, unit, yardstick or nothing, its value or nothing, sense, target
 #pragma once
 

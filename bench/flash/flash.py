@@ -9,7 +9,7 @@ import sys
 
 TOP = pathlib.Path(__file__).resolve().parents[2]
 sys.path[:0] = [str(TOP / "tests/vm"), str(TOP / "bench")]
-from figures import add_figure, at_most
+from bench_figures import add_figure, at_most
 from machine import Machine
 from run import FIRST_DAY
 

@@ -1,5 +1,5 @@
 """What scripts/bench runs, in the order of docs/performance.md. A new benchmark is an entry here; it prints a
-text and calls addFigure (bench/figures.h) or add_figure (bench/figures.py) for each row of the table."""
+text and calls addFigure (bench/figures.h) or add_figure (bench/bench_figures.py) for each row of the table."""
 import collections
 
 from performance import plots

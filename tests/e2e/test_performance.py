@@ -11,7 +11,7 @@ import unittest.mock
 
 TOP = pathlib.Path(__file__).resolve().parents[2]
 sys.path.insert(0, str(TOP / "bench"))
-from figures import add_figure, at_least, at_most, times_less  # noqa: E402
+from bench_figures import add_figure, at_least, at_most, times_less  # noqa: E402
 from performance import measure, page, rows  # noqa: E402
 from performance.benchmarks import BENCHMARKS, Benchmark  # noqa: E402
 
