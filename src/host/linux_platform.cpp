@@ -2,6 +2,7 @@
 
 #include "host/bus/bus_endpoint.h"
 #include "host/bus/bus_notifications.h"
+#include "host/bus/event_loop.h"
 #include "host/described/described_purgeable_space.h"
 #include "host/described/described_stackshot.h"
 #include "host/ingress/recorder_client.h"
@@ -18,7 +19,6 @@
 #include "host/system/crash_support_library.h"
 #include "host/system/device_information.h"
 #include "host/system/environment.h"
-#include "host/system/event_loop.h"
 #include "host/system/files.h"
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"

@@ -9,10 +9,10 @@
 #include <chrono>
 #include <cstring>
 
+#include "host/bus/event_loop.h"
 #include "host/linux_platform.h"
 #include "host/system/applications.h"
 #include "host/system/device_information.h"
-#include "host/system/event_loop.h"
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"
 #include "host/system/log_header_facts.h"

@@ -8,7 +8,7 @@
 #include <string>
 
 #include "host/bus/bus_connection.h"
-#include "host/system/event_loop.h"
+#include "host/bus/event_loop.h"
 #include "platform/ipc_endpoint.h"
 #include "platform/system_log.h"
 

@@ -1,25 +1,23 @@
 #include "host/system/system_log.h"
 
 #include <fmt/core.h>
-#include <sys/uio.h>
-#define SD_JOURNAL_SUPPRESS_LOCATION  // every message would name this file
-#include <systemd/sd-journal.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <cstring>
 #include <mutex>
+#include <optional>
 
 #include "base/printable.h"
 #include "base/utf8.h"
 #include "host/system/environment.h"
+#include "host/system/journal_socket.h"
 
 namespace tally {
 namespace {
 
 constexpr std::size_t kLongestMessage = 16384;
-constexpr char kJournalSocket[] = "/run/systemd/journal/socket";
 
 struct LevelName {
   LogLevel level;
@@ -27,15 +25,15 @@ struct LevelName {
   std::string_view priority;  // the journal's
 };
 constexpr std::array kLevels{
-    LevelName{LogLevel::Debug, "debug", "PRIORITY=7"},
-    LevelName{LogLevel::Info, "info", "PRIORITY=6"},
-    LevelName{LogLevel::Default, "default", "PRIORITY=5"},
-    LevelName{LogLevel::Error, "error", "PRIORITY=3"},
+    LevelName{LogLevel::Debug, "debug", "7"},
+    LevelName{LogLevel::Info, "info", "6"},
+    LevelName{LogLevel::Default, "default", "5"},
+    LevelName{LogLevel::Error, "error", "3"},
 };
 
 const LevelName& levelName(LogLevel level) { return kLevels[static_cast<std::size_t>(level)]; }
 
-iovec field(std::string_view text) { return {const_cast<char*>(text.data()), text.size()}; }
+bool isThere(std::string_view socket) { return ::access(std::string(socket).c_str(), W_OK) == 0; }
 
 // What may stand in a line of an environment variable.
 std::string shortText(std::string_view value) {
@@ -74,22 +72,25 @@ class LinuxSystemLog final : public SystemLog {
 
  private:
   bool useJournal() {
-    std::call_once(looked_,
-                   [this] { useJournal_ = !settings_.forceStandardError && journalIsThere(); });
-    return useJournal_;
+    std::call_once(looked_, [this] {
+      if (!settings_.forceStandardError && isThere(settings_.journal)) {
+        journal_.emplace(std::string(settings_.journal));
+      }
+    });
+    return journal_.has_value();
   }
 
-  bool sendToJournal(LogLevel level, std::string_view message) const {
-    const std::string text = "MESSAGE=" + readable(message);
-    const std::string identifier = "SYSLOG_IDENTIFIER=" + std::string(settings_.identifier);
-    const std::array fields{field(text), field(levelName(level).priority), field(identifier),
-                            field("SUBSYSTEM=vellum.tallyd.tallyrun")};
-    return ::sd_journal_sendv(fields.data(), static_cast<int>(fields.size())) == 0;
+  bool sendToJournal(LogLevel level, std::string_view message) {
+    const std::string text = readable(message);
+    return journal_->send(journalEntry(std::array{
+        JournalField{"MESSAGE", text}, JournalField{"PRIORITY", levelName(level).priority},
+        JournalField{"SYSLOG_IDENTIFIER", settings_.identifier},
+        JournalField{"SUBSYSTEM", "vellum.tallyd.tallyrun"}}));
   }
 
   SystemLogSettings settings_;
   std::once_flag looked_;
-  bool useJournal_ = false;
+  std::optional<JournalSocket> journal_;
 };
 
 }  // namespace
@@ -120,7 +121,7 @@ SystemLogEnvironment systemLogEnvironment() {
 
 std::string_view levelText(LogLevel level) { return levelName(level).name; }
 
-bool journalIsThere() { return ::access(kJournalSocket, W_OK) == 0; }
+bool journalIsThere() { return isThere(kJournalSocket); }
 
 std::shared_ptr<SystemLog> makeLinuxSystemLog(SystemLogSettings settings) {
   return std::make_shared<LinuxSystemLog>(settings);

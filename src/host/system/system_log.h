@@ -12,10 +12,14 @@ namespace tally {
 // Of the daily job, and of the libraries in other programs.
 constexpr std::string_view kLogIdentifier = "tallyrun";
 
+// Where the machine's journal takes messages.
+constexpr std::string_view kJournalSocket = "/run/systemd/journal/socket";
+
 struct SystemLogSettings {
   bool forceStandardError = false;
   LogLevel lowest = LogLevel::Info;
   std::string_view identifier = kLogIdentifier;  // of the program, in the journal and in lines
+  std::string_view journal = kJournalSocket;
 };
 
 // From the values of TALLYRUN_LOG and TALLYRUN_LOG_LEVEL; null is unset. An unknown value is

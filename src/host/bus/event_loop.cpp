@@ -1,4 +1,4 @@
-#include "host/system/event_loop.h"
+#include "host/bus/event_loop.h"
 
 #include <signal.h>
 #include <systemd/sd-event.h>

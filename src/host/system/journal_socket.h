@@ -1,0 +1,38 @@
+// The journal's socket, in the journal's native protocol: one datagram is one entry.
+#pragma once
+
+#include <atomic>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "base/files/file.h"
+
+namespace tally {
+
+// The name consists of capital letters, digits and underscores; the value is any bytes.
+struct JournalField {
+  std::string_view name, value;
+};
+
+// The entry's bytes. A value with a newline is preceded by its length, so that no value can look
+// like a further field.
+std::string journalEntry(std::span<const JournalField> fields);
+
+// Opened at once and never bound: the journal is looked up for each entry, so it may be restarted.
+// Any thread may call.
+class JournalSocket {
+ public:
+  explicit JournalSocket(std::string path);
+
+  // False when the journal has not taken the entry: it is absent, or its queue stays full for a
+  // second. Entries after such a second are not waited for until the journal takes one again.
+  bool send(std::string_view entry);
+
+ private:
+  std::string path_;
+  Descriptor socket_;
+  std::atomic<bool> full_ = false;
+};
+
+}  // namespace tally
