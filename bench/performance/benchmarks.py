@@ -29,7 +29,7 @@ BENCHMARKS = [
               "plistlib and json."),
     Benchmark("bench_startup", "Starting for nothing",
               "`tallyrun -d` on a day that is already processed. Yardsticks: an empty C++ program, and the same program "
-              "with symbols that are resolved at their first use, for both `-d` and `-f`."),
+              "without the module that only a run with something to do loads, for both `-d` and `-f`."),
     Benchmark("count-instructions", "Instructions of an ordinary day",
               "The instructions that an x86-64 processor executes for the sample device's day, without the kernel's work: "
               "the same on a machine of any speed and load. The time on a core is the number of instructions divided by the "

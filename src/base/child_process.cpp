@@ -9,12 +9,12 @@
 
 #include <algorithm>
 #include <array>
-#include <climits>
 #include <cstdint>
 #include <ctime>
 #include <vector>
 
 #include "base/files/file.h"
+#include "base/process.h"
 
 namespace tally {
 namespace {
@@ -178,13 +178,11 @@ Result<int> runInForeground(std::span<const std::string> words) {
 }
 
 Status startInBackground(std::span<const std::string> words) {
-  char self[PATH_MAX];
-  const ssize_t length = ::readlink("/proc/self/exe", self, sizeof self);
-  if (length <= 0) return systemError("cannot read", "/proc/self/exe");
-  std::string path(self, static_cast<std::size_t>(length));
-  path.resize(path.rfind('/') + 1);
+  auto path = programFile();
+  if (!path) return path.error();
+  path->resize(path->rfind('/') + 1);
   ::signal(SIGCHLD, SIG_IGN);  // the kernel forgets the child at its end
-  const auto child = start(path + words.front(), words, nullptr);
+  const auto child = start(*path + words.front(), words, nullptr);
   return child ? Status(Done{}) : child.error();
 }
 

@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <csignal>
 
 #include "base/files/file.h"
@@ -10,6 +11,13 @@
 namespace tally {
 
 std::string programName() { return ::program_invocation_short_name; }
+
+Result<std::string> programFile() {
+  char path[PATH_MAX];
+  const ssize_t length = ::readlink("/proc/self/exe", path, sizeof path);
+  if (length <= 0) return systemError("cannot read", "/proc/self/exe");
+  return std::string(path, static_cast<std::size_t>(length));
+}
 
 bool isRoot() { return ::geteuid() == 0; }
 

@@ -6,10 +6,14 @@
 #include <string>
 #include <string_view>
 
+#include "base/result.h"
+
 namespace tally {
 
 // The program's name without its folder.
 std::string programName();
+// The path of the running program's file, from the kernel.
+Result<std::string> programFile();
 int processID();
 // Whether it runs with root's rights to files.
 bool isRoot();

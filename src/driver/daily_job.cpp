@@ -3,6 +3,7 @@
 #include <cstdint>
 #include <string_view>
 
+#include "day_check/day_check.h"
 #include "driver/app_info_listener.h"
 
 namespace tally {
@@ -51,16 +52,14 @@ void runSwitch(Platform& platform, DailyTasks& tasks, std::string_view name) {
 
 int runDailyJob(Platform& platform, std::span<const char* const> arguments,
                 ReplaceableTasks replaceable) {
-  SystemLog& log = *platform.log;
-  log.message(LogLevel::Default, "tallyrun started");
+  logRunStarted(*platform.log);
   DailyTasks tasks(platform, replaceable);
   if (arguments.size() == 1) {
     runScheduled(platform, tasks);
   } else if (arguments.size() > 1) {
     runSwitch(platform, tasks, arguments[1]);
   }
-  log.writeOmitted();
-  log.message(LogLevel::Default, "tallyrun ended");
+  logRunEnded(*platform.log);
   return 0;
 }
 

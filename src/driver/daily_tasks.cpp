@@ -4,6 +4,7 @@
 #include <chrono>
 
 #include "config/whitelist_file.h"
+#include "day_check/day_check.h"
 #include "driver/own_figures.h"
 #include "platform/tables/known_preferences.h"
 #include "report/daily_report.h"
@@ -33,21 +34,13 @@ void DailyTasks::runIfNewDay(const KvArray* appInfo) {
   const RunTurn turn(*platform_.runLock);
   if (!turn) return;
   SystemLog& log = *platform_.log;
-  const std::int32_t yesterday = platform_.metricsStore->TBDaysSince1970() - 1;
   Preferences& preferences = *platform_.preferences;
-  const std::int32_t last =
-      preferences.SMAPreferencesGetIntegerValue(kLastProcessedDay.key, kLastProcessedDay.domain);
-  if (last >= yesterday) {
-    log.message(LogLevel::Default, "Day unchanged since last run");
-    if (last > yesterday) {
-      log.message(
-          LogLevel::Error,
-          "day {} counts as processed, but by the clock it is not over: no day is processed "
-          "until then; see tallyctl doctor",
-          last);
-    }
+  const DayCheck check = checkDay(preferences, platform_.metricsStore->TBDaysSince1970());
+  if (check.isDone()) {
+    logDayUnchanged(log, check);
     return;
   }
+  const std::int32_t yesterday = check.yesterday;
   // Asked before the day's work: a whitelist that arrives meanwhile has admitted nothing yet.
   const bool nothingAdmits = whitelistIsMissing(*platform_.files);
   runDaily(yesterday, appInfo);

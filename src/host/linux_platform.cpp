@@ -64,7 +64,7 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.ipcEndpoint = std::make_shared<BusEndpoint>(bus, eventLoop, log);
   services.notifications = std::make_shared<BusNotifications>(bus, log, root.prefix().empty());
   services.files = std::make_shared<RootedFiles>(root);
-  services.runLock = std::make_shared<FileRunLock>(metricsStoreFile(root).directory, log);
+  services.runLock = std::make_shared<FileRunLock>(runLockFolder(root), log);
   services.preferences = preferences;
   services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);

@@ -1,16 +1,18 @@
 """Days of the real programs: modes and days, the log read back by another reader, rivals and signals."""
 import bisect
 import datetime
+import fcntl
 import hashlib
 import json
 import plistlib
 import random
+import shutil
 import signal
 import subprocess
 import time
 import unittest
 
-from device import BIN, DeviceTest, LAST_DAY, PREFERENCES, TODAY, WHITELIST, checked, group, parse_messages, texts
+from device import BIN, DeviceTest, LAST_DAY, PREFERENCES, PROGRAM_DOMAIN, TODAY, WHITELIST, checked, group, parse_messages, texts
 
 YESTERDAY = TODAY - 1
 UNCHANGED = "Day unchanged since last run"
@@ -57,6 +59,28 @@ class Days(DeviceTest):
             days += logged
             self.assertEqual(self.logged_days(device), days)
             self.assertEqual(device.preferences().get(LAST_DAY), YESTERDAY if YESTERDAY in days else None)
+
+    def test_only_a_finished_day_needs_no_module(self):
+        device = self.simple()
+        device.run("-d")
+        alone = device.root / "programs/tallyrun"
+        alone.parent.mkdir()
+        shutil.copy(BIN / "tallyrun", alone)
+        missing = f"nothing is done: cannot examine {device.root}/lib/tallyrun/tallyrun-day.so: No such file or directory"
+        lock = open(device.root / "var/mobile/Library/Tallybook/tallyrun.lock", "r+b")
+        self.addCleanup(lock.close)
+        damaged = device.root / PREFERENCES / f"{PROGRAM_DOMAIN}.plist"
+        for arguments, day, prepare, lines in (
+                (["-d"], TODAY, lambda: None, ["tallyrun started", UNCHANGED, "tallyrun ended"]),
+                (["-f"], TODAY, lambda: None, [missing]),
+                (["-d"], TODAY + 1, lambda: None, [missing]),
+                (["-d"], TODAY, lambda: fcntl.flock(lock, fcntl.LOCK_EX), [missing]),
+                (["-d"], TODAY, lambda: fcntl.flock(lock, fcntl.LOCK_UN) or damaged.write_text("damaged"), [missing])):
+            prepare()
+            result = subprocess.run([alone, *arguments], capture_output=True, timeout=60, env=device.environment(day))
+            self.assertEqual(([text for _, text in parse_messages(result.stderr)], result.returncode),
+                             (lines, 127 if lines == [missing] else 0))
+        self.assertEqual(damaged.read_text(), "damaged")  # its repair is the module's, with a line
 
     def test_a_wrong_clock_costs_no_day_and_no_row(self):
         for name, wrong in {"a week ten years ahead": range(TODAY + 3650, TODAY + 3657),

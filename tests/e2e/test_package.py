@@ -58,7 +58,7 @@ class Package(unittest.TestCase):
             "bin/tallyd", "lib/systemd/system/tallyd.service", "lib/systemd/system/tallyd-udp.socket",
             *(f"lib/systemd/system/tallyrun-{unit}" for unit in (
                 "submitted.path", "submitted.service", "upload.path", "upload.service", "upload.timer")),
-            "libexec/tallyrun-nvme-health", "lib/systemd/system/tallyrun-nvme-health.service",
+            "lib/tallyrun/tallyrun-day.so", "libexec/tallyrun-nvme-health", "lib/systemd/system/tallyrun-nvme-health.service",
             f"share/dbus-1/system-services/{NAME}.service", f"share/dbus-1/services/{NAME}.service",
             f"share/dbus-1/system.d/{NAME}.conf", "share/bash-completion/completions/tallyctl",
             "share/tallyrun/Whitelist_Nimbus.plist", "share/man/man5/tallyrun-root.5.gz", "share/man/man7/tallyrun.7.gz",

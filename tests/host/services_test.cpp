@@ -16,6 +16,7 @@
 #include "host/system/kernel_values.h"
 #include "host/system/locale.h"
 #include "host/system/log_header_facts.h"
+#include "host/system/private_module.h"
 #include "host/system/run_lock.h"
 #include "host/system/system_log.h"
 #include "host/temporary_root.h"
@@ -65,6 +66,26 @@ TEST(SystemLogSettings, ComeFromTheEnvironment) {
     const auto settings = systemLogSettings(c.destination, c.level);
     EXPECT_EQ(settings.forceStandardError, c.standardError);
     EXPECT_EQ(settings.lowest, c.lowest);
+  }
+}
+
+TEST_F(ServicesTest, AModuleIsLoadedOnlyIfNoFurtherUserCanWriteIt) {
+  put("bin/program", "");
+  const std::string program = at("bin/program"), module = at("lib/tallyrun/m.so");
+  const auto fault = [&] { return functionOfModule(program, "m.so", "f").error().message; };
+  EXPECT_THAT(fault(), HasSubstr("cannot examine " + module));
+  put("lib/tallyrun/m.so", "");
+  const struct {
+    unsigned program, module, owner;
+    const char* fault;
+  } cases[] = {{0755, 0644, 0, "cannot load"}, {0755, 0664, 0, "by others"},
+               {0775, 0664, 0, "cannot load"}, {0775, 0646, 0, "by others"},
+               {0777, 0666, 0, "cannot load"}, {0755, 0644, 12345, "by others"}};
+  for (const auto& c : cases) {
+    ::chmod(program.c_str(), c.program);
+    ::chmod(module.c_str(), c.module);
+    if (c.owner != 0 && ::chown(module.c_str(), c.owner, c.owner) != 0) continue;  // only root can
+    EXPECT_THAT(fault(), HasSubstr(c.fault)) << std::oct << c.program << ' ' << c.module;
   }
 }
 

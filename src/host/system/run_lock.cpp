@@ -4,12 +4,18 @@
 
 #include <cerrno>
 
+#include "platform/metrics_store.h"
+
 namespace tally {
 namespace {
 
 constexpr std::string_view kLockName = "tallyrun.lock";
 
 }  // namespace
+
+DeviceDirectory runLockFolder(const DeviceRoot& root) {
+  return {root, std::string(kStorePath.substr(0, kStorePath.rfind('/')))};
+}
 
 bool FileRunLock::enter() {
   if (depth_ > 0) {

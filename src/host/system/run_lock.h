@@ -13,6 +13,9 @@
 
 namespace tally {
 
+// Where a device's lock lies: beside the metrics store.
+DeviceDirectory runLockFolder(const DeviceRoot& root);
+
 // When the lock file cannot be made, one error line says so and the run goes on without a lock: a
 // run on a read-only device still does its work.
 class FileRunLock final : public RunLock {

@@ -1,0 +1,40 @@
+#include "host/system/private_module.h"
+
+#include <dlfcn.h>
+#include <sys/stat.h>
+
+#include "base/files/file.h"
+
+namespace tally {
+namespace {
+
+// Whether everybody who can write the module can write the program.
+bool isAsSafe(const struct stat& module, const struct stat& program) {
+  const bool ofOwner = module.st_uid == 0 || module.st_uid == program.st_uid;
+  const bool ofGroup = (module.st_mode & S_IWGRP) == 0 ||
+                       ((program.st_mode & S_IWGRP) != 0 && module.st_gid == program.st_gid);
+  const bool ofOthers = (module.st_mode & S_IWOTH) == 0 || (program.st_mode & S_IWOTH) != 0;
+  return S_ISREG(module.st_mode) && ofOwner && ofGroup && ofOthers;
+}
+
+}  // namespace
+
+Result<void*> functionOfModule(const std::string& program, const std::string& module,
+                               const char* function) {
+  const std::string folder = program.substr(0, program.rfind('/'));
+  const std::string path = folder.substr(0, folder.rfind('/')) + "/lib/tallyrun/" + module;
+  struct stat ofProgram {
+  }, ofModule{};
+  if (::stat(program.c_str(), &ofProgram) != 0) return systemError("cannot examine", program);
+  if (::stat(path.c_str(), &ofModule) != 0) return systemError("cannot examine", path);
+  if (!isAsSafe(ofModule, ofProgram)) {
+    return Error{path + " can be written by others than " + program};
+  }
+  // A path with a slash is looked for nowhere else.
+  void* const loaded = ::dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
+  void* const found = loaded != nullptr ? ::dlsym(loaded, function) : nullptr;
+  if (found == nullptr) return Error{std::string("cannot load ") + ::dlerror()};
+  return found;
+}
+
+}  // namespace tally
