@@ -19,8 +19,8 @@ struct JournalField {
 // like a further field.
 std::string journalEntry(std::span<const JournalField> fields);
 
-// Opened at once and never bound: the journal is looked up for each entry, so it may be restarted.
-// Any thread may call.
+// Never connected: the journal is looked up for each entry, so it may be restarted. Any thread may
+// call.
 class JournalSocket {
  public:
   explicit JournalSocket(std::string path);
