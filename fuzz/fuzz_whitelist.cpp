@@ -37,12 +37,12 @@ void lookUp(const Whitelist& config, const KvDictionary& root, std::string_view 
           "a key that is admitted has options");
   config.distributionOptions(key);
   if (match.kind == WhitelistMatchKind::Exact) {
-    require(match.entry->key->view() == key, "an exact match is the key");
+    require(match.entry->key() == key, "an exact match is the key");
     return;
   }
   const KvString* const expected = longestPrefix(root, "ScalarKeyPrefixes", key);
   require((match.kind == WhitelistMatchKind::Prefix) == (expected != nullptr) &&
-              (expected == nullptr || match.entry->key->view() == expected->view()),
+              (expected == nullptr || match.entry->key() == expected->view()),
           "the longest prefix matches");
 }
 
@@ -64,17 +64,27 @@ FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
   fakes::FakePlatform fake = fakes::makeFakePlatform();
   const auto scope = fake.install();
   WhitelistFile file;
+  KvRef<KvDictionary> root;
   if (fuzz::isDocument(input.rest())) {
     readMetrics(input.rest());
-    file = parseWhitelistFile(input.rest());
+    // Piece by piece, so that each part of a document is cut somewhere; beside all at once.
+    fake.files->contents[std::string(kWhitelistPath)] = input.rest();
+    fake.files->pieceSize = 1 + size % 61;
+    file = loadWhitelistFile(platform());
+    const WhitelistFile whole = parseWhitelistFile(input.rest());
+    require(file.fault == whole.fault && file.digest == whole.digest, "pieces are the whole");
+    const auto parsed = decodePlist(input.rest());
+    if (parsed) root = KvRef<KvDictionary>::share(kvCast<KvDictionary>(parsed->get()));
+    require((file.content != nullptr) == static_cast<bool>(root), "both ways read the same");
   } else {
     file.read = true;
-    file.root = fuzz::ValueReader(input).takeDictionary();
+    root = fuzz::ValueReader(input).takeDictionary();
+    file.content = WhitelistContent::of(root);
   }
   const auto config = Whitelist::fromFile(platform(), file);
-  require((config != nullptr) == static_cast<bool>(file.root), "a file that is read is in force");
+  require((config != nullptr) == static_cast<bool>(root), "a file that is read is in force");
   if (config == nullptr) return 0;
-  for (const auto& group : *file.root) {
+  for (const auto& group : *root) {
     const auto* const sections = kvCast<KvDictionary>(group.value.get());
     if (sections == nullptr) continue;
     for (const auto& section : *sections) {
@@ -83,9 +93,9 @@ FUZZ_TARGET(whitelist)(const std::uint8_t* data, std::size_t size) {
       std::size_t looked = 0;
       for (const auto& entry : *entries) {
         const std::string key(entry.key->view());
-        lookUp(*config, *file.root, key);
-        lookUp(*config, *file.root, key + "x");
-        lookUp(*config, *file.root, std::string_view(key).substr(0, key.size() / 2));
+        lookUp(*config, *root, key);
+        lookUp(*config, *root, key + "x");
+        lookUp(*config, *root, std::string_view(key).substr(0, key.size() / 2));
         if (++looked == 8) break;
       }
     }

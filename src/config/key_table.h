@@ -8,11 +8,10 @@
 #include <vector>
 
 #include "base/hash.h"
-#include "kv/value.h"
 
 namespace tally {
 
-// An entry has a string value `key`: the whole key, or the prefix.
+// keyText(entry) is the whole key, or the prefix.
 template <class Entry>
 class KeyTable {
  public:
@@ -26,7 +25,7 @@ class KeyTable {
   }
   // Adds an entry; it replaces one of the same key that was added earlier.
   void set(Entry entry) {
-    const std::string_view key = entry.key->view();
+    const std::string_view key = keyText(entry);
     const std::uint32_t hash = hashBytes(key);
     if (const auto present = position(key, hash); present != HashIndex::kNone) {
       entries_[present] = std::move(entry);
@@ -80,7 +79,7 @@ class KeyTable {
     std::uint32_t parent;  // the longest other prefix that this one begins with, into sorted_
   };
   std::uint32_t position(std::string_view key, std::uint32_t hash) const {
-    return positions_.find(hash, [&](auto i) { return entries_[i].key->view() == key; });
+    return positions_.find(hash, [&](auto i) { return keyText(entries_[i]) == key; });
   }
   // The longest prefix of the key, into sorted_; kNone when there is none.
   std::uint32_t longest(std::string_view key) const {
@@ -97,7 +96,7 @@ class KeyTable {
     return position;
   }
   std::string_view prefixOf(const SortedPrefix& item) const {
-    return entries_[item.entry].key->view();
+    return keyText(entries_[item.entry]);
   }
   std::vector<Entry> entries_;
   HashIndex positions_;

@@ -40,6 +40,8 @@ struct Metric {
 // Receives what is wrong with a table, in words that name the file and the entry.
 using MetricFaultHandler = std::function<void(const std::string& message)>;
 
+inline std::string_view keyText(const Metric& metric) { return metric.key->view(); }
+
 class MetricTable {
  public:
   // Reads Metrics.plist, then the files of Metrics.d in the order of their names; a later entry

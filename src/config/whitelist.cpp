@@ -1,5 +1,6 @@
 #include "config/whitelist.h"
 
+#include <iterator>
 #include <utility>
 
 #include "config/internal_device.h"
@@ -12,6 +13,7 @@ class Whitelist::Loader final : public WhitelistVisitor {
   Loader(Platform& platform, Whitelist& whitelist)
       : platform_(platform),
         log_(*platform.log),
+        sources_(whitelist.sources_),
         tables_{&whitelist.scalarKeys_, &whitelist.distributionKeys_, &whitelist.scalarPrefixes_,
                 &whitelist.distributionPrefixes_} {}
 
@@ -29,8 +31,9 @@ class Whitelist::Loader final : public WhitelistVisitor {
   void beginSection(WhitelistSection section, std::size_t entries) override {
     tables_[static_cast<std::size_t>(section)]->reserve(entries);
   }
-  void entry(WhitelistSection section, WhitelistEntry entry) override {
-    tables_[static_cast<std::size_t>(section)]->set(std::move(entry));
+  void entry(WhitelistSection section, const WhitelistEntry& entry) override {
+    tables_[static_cast<std::size_t>(section)]->set(
+        {entry.key.data(), static_cast<std::uint32_t>(entry.key.size()), sourceOf(entry)});
   }
   void malformed(const WhitelistPlace& place) override {
     if (place.option) {
@@ -51,8 +54,23 @@ class Whitelist::Loader final : public WhitelistVisitor {
   }
 
  private:
+  // The entries of a group mostly share a few options, so that a small memory finds nearly all.
+  std::uint32_t sourceOf(const WhitelistEntry& entry) {
+    const auto address =
+        reinterpret_cast<std::uintptr_t>(entry.options.get()) / alignof(ScalarOptions);
+    std::uint32_t& recent = recent_[(address ^ address >> 6) % std::size(recent_)];
+    if (recent >= sources_.size() || sources_[recent].options != entry.options.get() ||
+        sources_[recent].group.data() != entry.group.data()) {
+      recent = static_cast<std::uint32_t>(sources_.size());
+      sources_.push_back({entry.options.get(), entry.group});
+    }
+    return recent;
+  }
+
   Platform& platform_;
   SystemLog& log_;
+  std::vector<Source>& sources_;
+  std::uint32_t recent_[64] = {};              // of sources_
   Entries* const tables_[kWhitelistSections];  // in the order of WhitelistSection
 };
 
@@ -73,33 +91,39 @@ std::unique_ptr<Whitelist> Whitelist::fromFile(Platform& platform, const Whiteli
     return nullptr;
   }
   whitelist->fileDigest_ = file.digest;
-  if (!file.root) {
+  if (!file.content) {
     log.message(LogLevel::Error, "Couldn't parse the contents of the config file. Error: {}",
                 file.fault);
     return nullptr;
   }
   Loader loader(platform, *whitelist);
-  visitWhitelist(*file.root, loader);
+  whitelist->texts_ = file.content->texts();
+  visitWhitelist(*file.content, loader);
   whitelist->scalarPrefixes_.buildPrefixIndex();
   whitelist->distributionPrefixes_.buildPrefixIndex();
   return whitelist;
 }
 
+WhitelistMatch Whitelist::matchOf(WhitelistMatchKind kind, const ListedKey& entry) const {
+  const Source& source = sources_[entry.source];
+  return {kind, &entry, source.options, source.group};
+}
+
 WhitelistMatch Whitelist::match(std::string_view key, const Entries& keys,
                                 const Entries& prefixes) const {
-  if (const WhitelistEntry* entry = keys.exact(key)) {
-    return {WhitelistMatchKind::Exact, entry, entry->options.get()};
+  if (const ListedKey* entry = keys.exact(key)) {
+    return matchOf(WhitelistMatchKind::Exact, *entry);
   }
-  if (const WhitelistEntry* entry = prefixes.longestPrefix(key)) {
-    return {WhitelistMatchKind::Prefix, entry, entry->options.get()};
+  if (const ListedKey* entry = prefixes.longestPrefix(key)) {
+    return matchOf(WhitelistMatchKind::Prefix, *entry);
   }
-  if (isInternalDevice_) return {WhitelistMatchKind::InternalDevice, nullptr, noOptions_.get()};
+  if (isInternalDevice_) return {WhitelistMatchKind::InternalDevice, nullptr, noOptions_.get(), {}};
   return {};
 }
 
 const ScalarOptions* Whitelist::logged(const WhitelistMatch& match, std::string_view key) const {
   if (match.kind == WhitelistMatchKind::Prefix) {
-    log_.message(LogLevel::Debug, "prefix match {} for {}", match.entry->key->view(), key);
+    log_.message(LogLevel::Debug, "prefix match {} for {}", match.entry->key(), key);
   } else if (match.kind == WhitelistMatchKind::InternalDevice) {
     log_.message(LogLevel::Debug, "passing @{{}} for {} as device is Orrery Internal", key);
   }

@@ -1,9 +1,11 @@
 // The whitelist: which keys may be reported, and with which options.
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "config/key_table.h"
 #include "config/whitelist_file.h"
@@ -14,10 +16,22 @@ namespace tally {
 
 // Why a key is admitted.
 enum class WhitelistMatchKind { None, Exact, Prefix, InternalDevice };
+// A key or prefix that is in force. One for each entry of a large file, so it holds little.
+struct ListedKey {
+  const char* text;
+  std::uint32_t length;
+  std::uint32_t source;  // its options and group, in the whitelist
+
+  std::string_view key() const { return {text, length}; }
+};
+inline std::string_view keyText(const ListedKey& listed) { return listed.key(); }
+
+// Borrowed from the whitelist.
 struct WhitelistMatch {
   WhitelistMatchKind kind = WhitelistMatchKind::None;
-  const WhitelistEntry* entry = nullptr;   // for Exact and Prefix
-  const ScalarOptions* options = nullptr;  // null for None; borrowed from the whitelist
+  const ListedKey* entry = nullptr;        // for Exact and Prefix
+  const ScalarOptions* options = nullptr;  // null for None
+  std::string_view group = {};             // of the entry
 };
 
 class Whitelist {
@@ -44,13 +58,20 @@ class Whitelist {
  private:
   explicit Whitelist(Platform& platform);
   class Loader;
-  using Entries = KeyTable<WhitelistEntry>;
+  using Entries = KeyTable<ListedKey>;
+  struct Source {
+    const ScalarOptions* options;
+    std::string_view group;
+  };
+  WhitelistMatch matchOf(WhitelistMatchKind kind, const ListedKey& entry) const;
   WhitelistMatch match(std::string_view key, const Entries& keys, const Entries& prefixes) const;
   const ScalarOptions* logged(const WhitelistMatch& match, std::string_view key) const;
 
   SystemLog& log_;
   const bool isInternalDevice_;
   std::string fileDigest_;
+  std::shared_ptr<const WhitelistTexts> texts_;  // what the entries point into
+  std::vector<Source> sources_;
   Entries scalarKeys_, scalarPrefixes_, distributionKeys_, distributionPrefixes_;
   KvRef<KvDictionary> noOptions_ = KvDictionary::create();
 };

@@ -6,8 +6,6 @@
 
 #include "base/hex.h"
 #include "config/internal_device.h"
-#include "config/whitelist_options.h"
-#include "kv/plist_codec.h"
 #include "platform/tables/known_preferences.h"
 
 namespace tally {
@@ -16,71 +14,91 @@ namespace {
 constexpr std::string_view kSectionNames[kWhitelistSections] = {
     "ScalarKeys", "DistributionKeys", "ScalarKeyPrefixes", "DistributionKeyPrefixes"};
 
-std::string md5Text(std::string_view bytes) {
-  MD5_CTX context;
-  MD5Init(&context);
-  MD5Update(&context, reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
-  std::uint8_t digest[MD5_DIGEST_LENGTH];
-  MD5Final(digest, &context);
-  std::string text;
-  for (const std::uint8_t byte : digest) appendHex(text, byte, 2);
-  return text;
+class Md5 {
+ public:
+  Md5() { MD5Init(&context_); }
+  void add(std::string_view bytes) {
+    MD5Update(&context_, reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size());
+  }
+  std::string finish() {
+    std::uint8_t digest[MD5_DIGEST_LENGTH];
+    MD5Final(digest, &context_);
+    std::string text;
+    for (const std::uint8_t byte : digest) appendHex(text, byte, 2);
+    return text;
+  }
+
+ private:
+  MD5_CTX context_;
+};
+
+void readContent(DocumentWindow& window, WhitelistFile& file) {
+  if (auto content = WhitelistContent::read(window)) {
+    file.content = *std::move(content);
+  } else {
+    file.fault = content.error().message;
+  }
 }
 
-// The well-formed options; the others are passed to the visitor.
-KvRef<KvDictionary> wellFormedOptions(KvDictionary& options, WhitelistPlace place,
-                                      WhitelistVisitor& visitor) {
-  const auto wellFormed = [](const KvDictionary::Entry& option) {
-    return isWellFormedOption(option.key->view(), *option.value);
-  };
-  if (std::all_of(options.begin(), options.end(), wellFormed)) {
-    return KvRef<KvDictionary>::share(&options);
-  }
-  auto kept = KvDictionary::create();
-  for (const auto& option : options) {
-    if (wellFormed(option)) {
-      kept->set(option.key, option.value);
-    } else {
-      place.option = option.key->view();
+void visitSection(const WhitelistContent& content, std::string_view group, WhitelistSection section,
+                  std::span<const WhitelistContent::Item> entries, WhitelistVisitor& visitor) {
+  WhitelistPlace place{group, sectionName(section), {}, {}};
+  visitor.beginSection(section, entries.size());
+  for (const auto& entry : entries) {
+    const std::string_view key = content.nameOf(entry);
+    place.key = key;
+    if (entry.value == WhitelistContent::kNotDictionary) {
       visitor.malformed(place);
+      continue;
     }
-  }
-  return kept;
-}
-
-void visitSection(const KvRef<KvString>& group, WhitelistSection section, const KvDictionary& keys,
-                  WhitelistVisitor& visitor) {
-  WhitelistPlace place{group->view(), sectionName(section), {}, {}};
-  visitor.beginSection(section, keys.size());
-  for (const auto& item : keys) {
-    place.key = item.key->view();
-    if (auto* options = kvCast<KvDictionary>(item.value.get())) {
-      visitor.entry(section, {item.key, wellFormedOptions(*options, place, visitor), group});
-    } else {
-      visitor.malformed(place);
+    const PooledOptions& options = content.optionsOf(entry);
+    if (options.wellFormed.get() != options.read.get()) {
+      for (const auto& option : *options.read) {
+        if (isWellFormedOption(option.key->view(), *option.value)) continue;
+        place.option = option.key->view();
+        visitor.malformed(place);
+      }
+      place.option.reset();
     }
+    visitor.entry(section, {key, options.wellFormed, group});
   }
 }
 
 }  // namespace
 
 WhitelistFile loadWhitelistFile(Platform& platform) {
-  const auto bytes = platform.files->readFile(kWhitelistPath, kPlistMaximumBytes);
-  if (bytes) return parseWhitelistFile(*bytes);
   WhitelistFile file;
-  file.fault = bytes.error().message;
+  const auto opened = platform.files->openFile(kWhitelistPath, kPlistMaximumBytes);
+  if (!opened) {
+    file.fault = opened.error().message;
+    return file;
+  }
+  Md5 digest;
+  std::optional<Error> failure;
+  DocumentWindow window([&](std::span<char> buffer) -> std::size_t {
+    const auto count = (*opened)(buffer);
+    if (!count) failure = count.error();
+    if (!count) return 0;
+    digest.add({buffer.data(), *count});
+    return *count;
+  });
+  readContent(window, file);
+  // The digest is of the whole file, also of one that is no property list.
+  while (!window.endsDocument()) window.more(window.text().size());
+  if (failure) return {.read = false, .digest = {}, .content = nullptr, .fault = failure->message};
+  file.read = true;
+  file.digest = digest.finish();
   return file;
 }
 
 WhitelistFile parseWhitelistFile(std::string_view bytes) {
   WhitelistFile file;
   file.read = true;
-  file.digest = md5Text(bytes);
-  const auto parsed = decodePlist(bytes);
-  file.root = KvRef<KvDictionary>::share(parsed ? kvCast<KvDictionary>(parsed->get()) : nullptr);
-  if (!file.root) {
-    file.fault = parsed ? "the root is not a dictionary" : parsed.error().message;
-  }
+  Md5 digest;
+  digest.add(bytes);
+  file.digest = digest.finish();
+  DocumentWindow window(bytes);
+  readContent(window, file);
   return file;
 }
 
@@ -96,24 +114,23 @@ std::optional<WhitelistSection> sectionOfName(std::string_view name) {
   return static_cast<WhitelistSection>(found - std::begin(kSectionNames));
 }
 
-void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor) {
-  for (const auto& group : root) {
-    const std::string_view name = group.key->view();
+void visitWhitelist(const WhitelistContent& content, WhitelistVisitor& visitor) {
+  for (const auto& group : content.groups()) {
+    const std::string_view name = content.nameOf(group);
     if (!visitor.beginGroup(name)) continue;
-    const auto* sections = kvCast<KvDictionary>(group.value.get());
-    if (sections == nullptr) {
+    if (group.value == WhitelistContent::kNotDictionary) {
       visitor.malformed({name, {}, {}, {}});
       continue;
     }
-    for (const auto& item : *sections) {
-      const std::string_view title = item.key->view();
+    for (const auto& item : content.sectionsOf(group)) {
+      const std::string_view title = content.nameOf(item);
       const auto section = sectionOfName(title);
       if (!section) {
         visitor.unknownSection(name, title);
-      } else if (const auto* keys = kvCast<KvDictionary>(item.value.get())) {
-        visitSection(group.key, *section, *keys, visitor);
-      } else {
+      } else if (item.value == WhitelistContent::kNotDictionary) {
         visitor.malformed({name, title, {}, {}});
+      } else {
+        visitSection(content, name, *section, content.entriesOf(item), visitor);
       }
     }
   }

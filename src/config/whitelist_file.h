@@ -1,12 +1,14 @@
 // The whitelist file: reading it and checking its form.
 #pragma once
 
+#include <memory>
 #include <optional>
 #include <span>
 #include <string>
 #include <string_view>
 
-#include "kv/value.h"
+#include "config/whitelist_content.h"
+#include "config/whitelist_options.h"
 #include "platform/platform.h"
 
 namespace tally {
@@ -18,19 +20,22 @@ constexpr std::string_view kInternalTestingGroup = "InternalTesting";
 
 // A whitelist file, as far as it could be loaded.
 struct WhitelistFile {
-  bool read = false;         // its bytes could be read
-  std::string digest;        // MD5 of the bytes, 32 lowercase hexadecimal digits
-  KvRef<KvDictionary> root;  // null when it could not be read or parsed
-  std::string fault;         // why; empty when root is there
+  bool read = false;   // its bytes could be read
+  std::string digest;  // MD5 of the bytes, 32 lowercase hexadecimal digits
+  std::shared_ptr<const WhitelistContent> content;  // null when it could not be read or parsed
+  std::string fault;                                // why; empty when content is there
 };
 WhitelistFile loadWhitelistFile(Platform& platform);
 WhitelistFile parseWhitelistFile(std::string_view bytes);
 
+// The texts are borrowed from the content of the file.
 struct WhitelistEntry {
-  KvRef<KvString> key;  // the exact key, or the prefix
+  std::string_view key;  // the exact key, or the prefix
   KvRef<KvDictionary> options;
-  KvRef<KvString> group;  // the group that it was taken from
+  std::string_view group;  // the group that it was taken from
 };
+
+inline std::string_view keyText(const WhitelistEntry& entry) { return entry.key; }
 
 enum class WhitelistSection {
   ScalarKeys,
@@ -66,13 +71,13 @@ class WhitelistVisitor {
   // At most this many entries of a section follow.
   virtual void beginSection(WhitelistSection, std::size_t) {}
   // An entry with those of its options that are well formed.
-  virtual void entry(WhitelistSection section, WhitelistEntry entry) = 0;
+  virtual void entry(WhitelistSection section, const WhitelistEntry& entry) = 0;
   // A part of the wrong type, which is skipped.
   virtual void malformed(const WhitelistPlace& place) = 0;
   // A section of an unknown name.
   virtual void unknownSection(std::string_view, std::string_view) {}
 };
-void visitWhitelist(const KvDictionary& root, WhitelistVisitor& visitor);
+void visitWhitelist(const WhitelistContent& content, WhitelistVisitor& visitor);
 
 // Whether a group of the file applies on this device.
 enum class GroupState {

@@ -6,20 +6,55 @@
 #include "kv/plist_xml_writer.h"
 
 namespace tally {
-Result<KvRef<KvObject>> decodePlist(std::string_view document, std::size_t maximumBytes) {
-  if (document.size() > maximumBytes) return plistTooLarge(maximumBytes);
-  if (document.empty()) return Error{"the property list is empty"};
-  if (isBinaryPlist(document)) {
-    auto value = readBinaryPlist(document);
-    if (!value) return Error{"damaged binary property list: " + value.error().message};
-    return value;
+namespace {
+
+class RootReceiver final : public PlistReceiver {
+ public:
+  bool wantsObject() override { return true; }
+  void beginContainer(KvType) override {}
+  void endContainer() override {}
+  void key(std::string_view) override {}
+  void value(KvRef<KvObject> value) override { root = std::move(value); }
+  KvRef<KvObject> root;
+};
+
+Status readBinary(std::string_view document, PlistReceiver& receiver) {
+  const auto value = readBinaryPlist(document);
+  if (!value) return Error{"damaged binary property list: " + value.error().message};
+  replayPlist(*value, receiver);
+  return Done{};
+}
+
+}  // namespace
+
+Status readPlist(DocumentWindow& window, PlistReceiver& receiver, std::size_t maximumBytes) {
+  constexpr std::size_t kLongestMark = 16;
+  const auto first = [&] { return window.text().find_first_not_of(" \t\r\n\xEF\xBB\xBF"); };
+  while (!window.endsDocument() &&
+         (window.text().size() < kLongestMark || first() == std::string_view::npos)) {
+    window.more(0);
   }
-  if (isUtf16Plist(document)) return readXmlPlist(document, maximumBytes);
-  const std::size_t first = document.find_first_not_of(" \t\r\n\xEF\xBB\xBF");
-  if (first == std::string_view::npos || document[first] != '<') {
+  const bool isUtf16 = isUtf16Plist(window.text());
+  if (isBinaryPlist(window.text()) || isUtf16) {
+    while (!window.endsDocument()) window.more(0);
+  }
+  const std::string_view text = window.text();
+  if (text.size() > maximumBytes) return plistTooLarge(maximumBytes);
+  if (text.empty()) return Error{"the property list is empty"};
+  if (isBinaryPlist(text)) return readBinary(text, receiver);
+  if (isUtf16) return readUtf16Plist(text, maximumBytes, receiver);
+  if (first() == std::string_view::npos || text[first()] != '<') {
     return Error{"neither an XML nor a binary property list"};
   }
-  return readXmlPlist(document, maximumBytes);
+  return readXmlPlist(window, receiver);
+}
+
+Result<KvRef<KvObject>> decodePlist(std::string_view document, std::size_t maximumBytes) {
+  DocumentWindow window(document);
+  RootReceiver receiver;
+  const Status isRead = readPlist(window, receiver, maximumBytes);
+  if (!isRead) return isRead.error();
+  return std::move(receiver.root);
 }
 
 Result<std::string> encodeXmlPlist(const KvObject& root, std::size_t maximumBytes) {

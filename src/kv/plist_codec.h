@@ -6,6 +6,8 @@
 #include <string_view>
 
 #include "base/result.h"
+#include "kv/document_window.h"
+#include "kv/plist_receiver.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -19,6 +21,11 @@ constexpr std::size_t kPlistMaximumObjects = 4'000'000;
 // larger bound is for documents that the program wrote itself.
 Result<KvRef<KvObject>> decodePlist(std::string_view document,
                                     std::size_t maximumBytes = kPlistMaximumBytes);
+
+// The same part by part; of a document in UTF-8 the window shows little at once. REQUIRES: a source
+// of the window ends before maximumBytes.
+Status readPlist(DocumentWindow& window, PlistReceiver& receiver,
+                 std::size_t maximumBytes = kPlistMaximumBytes);
 
 // An XML property list, version 1.0, UTF-8, ending in a newline. Fails when the value is nested
 // deeper than kMaximumDepth, which a reference cycle always is, or when the document would be

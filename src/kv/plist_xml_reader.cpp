@@ -1,4 +1,5 @@
-// A reader of our own, in one pass without a tree in between. The library takes quadratic time over
+// A reader of our own, in one pass without a tree in between, that needs only the element it reads
+// and not the document in memory. The library takes quadratic time over
 // references in a text and over large dictionaries, uses several times the document's size in
 // memory, and silently accepts much damage: text in a number, impossible dates, a key without a
 // value, a document that stops half-way.
@@ -16,6 +17,7 @@
 #include "kv/plist_codec.h"
 #include "kv/plist_xml_leaf.h"
 #include "kv/plist_xml_writer.h"
+#include "kv/repeated_elements.h"
 
 namespace tally {
 namespace {
@@ -38,29 +40,38 @@ struct Tag {
   bool empty = false;
 };
 
-// A container that is still open; one of the first two is set.
+// A container that is still open.
 struct Frame {
+  KvType type = KvType::Array;
+  // One of them is set, unless the receiver gets the items one by one.
   KvRef<KvArray> array;
   KvRef<KvDictionary> dictionary;
-  KvRef<KvString> key;  // waits for its value
+  KvRef<KvString> key;  // waits for its value in the dictionary
+  bool hasKey = false;  // one waits for its value
+
+  bool lacksKey() const { return type == KvType::Dictionary && !hasKey; }
 };
 
-// A problem in the line that the text ends in.
-Error errorAfter(std::string_view text, const char* problem) {
-  const auto line = std::count(text.begin(), text.end(), '\n') + 1;
-  return Error{"line " + std::to_string(line) + ": " + problem};
+// A problem in the line that so many line ends come before.
+Error errorInLine(std::size_t lineEnds, const char* problem) {
+  return Error{"line " + std::to_string(lineEnds + 1) + ": " + problem};
 }
 
 enum class PlistEncoding { Utf8, Utf16 };
 
 class Reader {
  public:
-  Reader(std::string_view document, PlistEncoding encoding)
-      : text_(document), encoding_(encoding) {}
+  Reader(DocumentWindow& window, PlistEncoding encoding, PlistReceiver& receiver)
+      : window_(window), text_(window.text()), encoding_(encoding), receiver_(receiver) {}
 
-  Result<KvRef<KvObject>> read() {
-    if (prolog() && body() && epilog()) return std::move(root_);
-    return errorAfter(text_.substr(0, position_), problem_);
+  Status read() {
+    const bool hasZeroBytes = window_.endsDocument() && window_.hasZeroBytes();
+    const bool isRead = !hasZeroBytes && wholeStep([this] { return prolog(); }) && body() &&
+                        wholeStep([this] { return epilog(); });
+    // Wherever they are, they are what is said of the document.
+    if (window_.hasZeroBytes()) return errorInLine(0, "there are zero bytes in the document");
+    if (isRead) return Done{};
+    return errorInLine(window_.linesBefore() + countLines(text_.substr(0, position_)), problem_);
   }
 
  private:
@@ -102,7 +113,7 @@ class Reader {
   }
 
   bool prolog() {
-    if (text_.find('\0') != kNone) return fail("there are zero bytes in the document");
+    wrapped_ = false;
     take(kUtf8ByteOrderMark);
     if (at("<?xml") && !checkEncoding()) return false;
     if (!skipBetween()) return false;
@@ -178,16 +189,63 @@ class Reader {
     return fail("a tag has no end");
   }
 
+  // Goes on at a position of the text, with more of the document.
+  void more(std::size_t from) {
+    window_.more(from);
+    text_ = window_.text();
+    position_ = 0;
+    objectStart_ = kNone;
+  }
+
+  // Where the window ends, a mark may be cut and a fault may be none: the step is then repeated
+  // with more of the document. It must change nothing but the position before it succeeds.
+  template <class Step>
+  bool wholeStep(Step step) {
+    constexpr std::size_t kLongestMark = 16;
+    for (;;) {
+      const std::size_t start = position_;
+      const bool isDone = step();
+      const bool isCut = !isDone || text_.size() - position_ < kLongestMark;
+      if (window_.endsDocument() || !isCut) return isDone;
+      more(start);
+    }
+  }
+
   bool body() {
     do {
-      if (!skipBetween()) return false;
-      if (atEnd()) return fail("the document ends too early");
-      if (text_[position_] != '<') return fail("there is text outside of a value");
-      Tag tag;
-      if (!readTag(tag)) return false;
-      if (!(tag.closing ? closeContainer(tag.name) : openElement(tag))) return false;
+      std::size_t start = position_;
+      const std::size_t objects = objects_;
+      while (!part()) {
+        if (window_.endsDocument()) return false;
+        objects_ = objects;
+        more(std::exchange(start, 0));
+      }
     } while (!stack_.empty());
     return true;
+  }
+
+  // An element, or a tag of a container. What fails has changed nothing but the position and the
+  // number of objects.
+  bool part() {
+    if (!skipBetween()) return false;
+    if (atEnd()) return fail("the document ends too early");
+    if (text_[position_] != '<') return fail("there is text outside of a value");
+    if (takeRepeated()) return true;
+    tagStart_ = position_;
+    Tag tag;
+    if (!readTag(tag)) return false;
+    return tag.closing ? closeContainer(tag.name) : openElement(tag);
+  }
+
+  bool takeRepeated() {
+    if (stack_.empty() || !stack_.back().hasKey || isBuilding() || !receiver_.wantsObject()) {
+      return false;
+    }
+    const auto* const known = repeated_.find(text_.substr(position_), stack_.size());
+    if (known == nullptr || objects_ + known->objects > kPlistMaximumObjects) return false;
+    position_ += known->text.size();
+    objects_ += known->objects;
+    return addValue(known->value);
   }
 
   bool epilog() {
@@ -205,8 +263,8 @@ class Reader {
 
   bool openElement(const Tag& tag) {
     if (++objects_ > kPlistMaximumObjects) return fail("there are more than 4000000 values");
-    if (tag.name == "dict") return openContainer(tag, {nullptr, KvDictionary::create(), nullptr});
-    if (tag.name == "array") return openContainer(tag, {KvArray::create(), nullptr, nullptr});
+    if (tag.name == "dict") return openContainer(tag, KvType::Dictionary);
+    if (tag.name == "array") return openContainer(tag, KvType::Array);
 
     std::string_view content;
     if (!tag.empty && !readContent(tag.name, content)) return false;
@@ -223,27 +281,56 @@ class Reader {
     return fail("unknown element");
   }
 
-  bool openContainer(const Tag& tag, Frame frame) {
+  // Whether the innermost container is a part of an object, or one itself.
+  bool isBuilding() const {
+    return !stack_.empty() && (stack_.back().array || stack_.back().dictionary);
+  }
+
+  bool openContainer(const Tag& tag, KvType type) {
     if (stack_.size() == static_cast<std::size_t>(kMaximumDepth)) {
       return fail(kTooDeep);
     }
     // Refused now, although the value is added at the closing tag.
-    if (!stack_.empty() && stack_.back().dictionary && !stack_.back().key) {
+    if (!stack_.empty() && stack_.back().lacksKey()) {
       return fail("a value in a dictionary has no key");
+    }
+    Frame frame{type, nullptr, nullptr, nullptr};
+    const bool isBuilding = this->isBuilding();
+    if (!isBuilding && !receiver_.wantsObject()) {
+      receiver_.beginContainer(type);
+    } else {
+      if (!isBuilding) {
+        objectStart_ = tagStart_;
+        objectsBefore_ = objects_ - 1;
+      }
+      if (type == KvType::Array) {
+        frame.array = KvArray::create();
+      } else {
+        frame.dictionary = KvDictionary::create();
+      }
     }
     stack_.push_back(std::move(frame));
     return !tag.empty || closeContainer(tag.name);
   }
 
   bool closeContainer(std::string_view name) {
-    if (stack_.empty() || name != (stack_.back().array ? "array" : "dict")) {
+    if (stack_.empty() || name != (stack_.back().type == KvType::Array ? "array" : "dict")) {
       return fail("a closing tag does not match");
     }
-    if (stack_.back().key) return fail("a key in a dictionary has no value");
+    if (stack_.back().hasKey) return fail("a key in a dictionary has no value");
     Frame frame = std::move(stack_.back());
     stack_.pop_back();
     if (frame.array) return addValue(std::move(frame.array));
-    return addValue(std::move(frame.dictionary));
+    if (frame.dictionary) {
+      if (!stack_.empty() && !isBuilding() && objectStart_ != kNone) {
+        repeated_.remember(text_.substr(objectStart_, position_ - objectStart_), frame.dictionary,
+                           objects_ - objectsBefore_, stack_.size());
+      }
+      return addValue(std::move(frame.dictionary));
+    }
+    if (!stack_.empty()) stack_.back().hasKey = false;
+    receiver_.endContainer();
+    return true;
   }
 
   // Reads to the closing tag. The content lies in the document, or in content_ when it differs.
@@ -299,9 +386,17 @@ class Reader {
   }
 
   bool addKey(std::string_view content) {
-    if (stack_.empty() || !stack_.back().dictionary) return fail("a key outside of a dictionary");
-    if (stack_.back().key) return fail("a key in a dictionary has no value");
-    stack_.back().key = common_.string(content);
+    if (stack_.empty() || stack_.back().type != KvType::Dictionary) {
+      return fail("a key outside of a dictionary");
+    }
+    Frame& frame = stack_.back();
+    if (frame.hasKey) return fail("a key in a dictionary has no value");
+    frame.hasKey = true;
+    if (frame.dictionary) {
+      frame.key = common_.string(content);
+    } else {
+      receiver_.key(content);
+    }
     return true;
   }
 
@@ -313,28 +408,37 @@ class Reader {
 
   bool addValue(KvRef<KvObject> value) {
     if (stack_.empty()) {
-      root_ = std::move(value);
+      receiver_.value(std::move(value));
       return true;
     }
     Frame& frame = stack_.back();
+    if (frame.lacksKey()) return fail("a value in a dictionary has no key");
+    frame.hasKey = false;
     if (frame.array) {
       frame.array->append(std::move(value));
-      return true;
+    } else if (frame.dictionary) {
+      frame.dictionary->set(std::exchange(frame.key, nullptr), std::move(value));
+    } else {
+      receiver_.value(std::move(value));
     }
-    if (!frame.key) return fail("a value in a dictionary has no key");
-    frame.dictionary->set(std::exchange(frame.key, nullptr), std::move(value));
     return true;
   }
 
-  const std::string_view text_;
+  DocumentWindow& window_;
+  std::string_view text_;         // what the window shows
   const PlistEncoding encoding_;  // of the document; the text is UTF-8
-  std::size_t position_ = 0;
+  PlistReceiver& receiver_;
+  std::size_t position_ = 0;  // in the text
   const char* problem_ = "";
   bool wrapped_ = false;  // in a plist element
   std::size_t objects_ = 0;
   std::string content_;
   std::vector<Frame> stack_;
-  KvRef<KvObject> root_;
+  std::size_t tagStart_ = 0;
+  // Of the object that is built for the receiver; none once the window has moved.
+  std::size_t objectStart_ = kNone;
+  std::size_t objectsBefore_ = 0;
+  RepeatedElements repeated_;
   CommonValues common_;
 };
 
@@ -344,17 +448,22 @@ bool isUtf16Plist(std::string_view document) {
   return document.starts_with(kBigEndianMark) || document.starts_with(kLittleEndianMark);
 }
 
-Result<KvRef<KvObject>> readXmlPlist(std::string_view document, std::size_t maximumBytes) {
-  if (!isUtf16Plist(document)) return Reader(document, PlistEncoding::Utf8).read();
+Status readXmlPlist(DocumentWindow& window, PlistReceiver& receiver) {
+  return Reader(window, PlistEncoding::Utf8, receiver).read();
+}
+
+Status readUtf16Plist(std::string_view document, std::size_t maximumBytes,
+                      PlistReceiver& receiver) {
   const auto order = document.starts_with(kBigEndianMark) ? std::endian::big : std::endian::little;
   document.remove_prefix(kBigEndianMark.size());
   std::string text;
   text.reserve(document.size() / 2);
   if (!appendUtf16(text, std::as_bytes(std::span(document)), order)) {
-    return errorAfter(text, "half of a UTF-16 character is missing");
+    return errorInLine(countLines(text), "half of a UTF-16 character is missing");
   }
   if (text.size() > maximumBytes) return plistTooLarge(maximumBytes);
-  return Reader(text, PlistEncoding::Utf16).read();
+  DocumentWindow window(text);
+  return Reader(window, PlistEncoding::Utf16, receiver).read();
 }
 
 }  // namespace tally

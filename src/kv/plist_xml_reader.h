@@ -1,20 +1,24 @@
-// Reads XML property lists into values.
+// Reads XML property lists.
 #pragma once
 
 #include <cstddef>
 #include <string_view>
 
 #include "base/result.h"
-#include "kv/value.h"
+#include "kv/document_window.h"
+#include "kv/plist_receiver.h"
 
 namespace tally {
 
 // True for documents that start with the byte order mark of UTF-16.
 bool isUtf16Plist(std::string_view document);
 
-// The root value of a document in UTF-8, or in UTF-16 with its byte order mark, which may be larger
-// than maximumBytes neither as it is nor as UTF-8. Accepts the property-list elements and nothing
-// else; errors name the line. REQUIRES: the document itself is not larger.
-Result<KvRef<KvObject>> readXmlPlist(std::string_view document, std::size_t maximumBytes);
+// Reads a document in UTF-8. Accepts the property-list elements and nothing else; errors name the
+// line. The window is then at the end of the document, whatever the result.
+Status readXmlPlist(DocumentWindow& window, PlistReceiver& receiver);
+
+// The same for a document in UTF-16, which may not be larger than maximumBytes as UTF-8. REQUIRES:
+// it starts with its byte order mark.
+Status readUtf16Plist(std::string_view document, std::size_t maximumBytes, PlistReceiver& receiver);
 
 }  // namespace tally

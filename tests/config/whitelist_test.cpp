@@ -90,7 +90,7 @@ TEST_F(WhitelistTest, TheLastGroupOfTheFileWins) {
   const auto config = load(group("Z", section("ScalarKeys", entry("k", 1))) +
                            group("A", section("ScalarKeys", entry("k", 2))));
   EXPECT_EQ(figureOf(config->scalarOptions("k")), "2");
-  EXPECT_EQ(config->matchScalarKey("k").entry->group->view(), "A");
+  EXPECT_EQ(config->matchScalarKey("k").group, "A");
 }
 
 TEST_F(WhitelistTest, GroupsAreSwitchedByTaskingAndByTheKindOfDevice) {

@@ -74,6 +74,7 @@ struct FakeFiles final : Files {
   std::map<std::string, std::string, std::less<>> contents;
   std::map<std::string, std::uint64_t, std::less<>> sizes;  // of files without contents
   std::vector<std::string> reads;
+  std::size_t pieceSize = SIZE_MAX;  // at most this much of an open file is read at once
 
   Result<std::string> readFile(std::string_view path, std::size_t limit) override {
     reads.emplace_back(path);
@@ -81,6 +82,17 @@ struct FakeFiles final : Files {
     if (found == contents.end()) return Error{std::string(path) + ": No such file or directory", 2};
     if (found->second.size() > limit) return Error{std::string(path) + ": too large"};
     return found->second;
+  }
+  Result<FileSource> openFile(std::string_view path, std::size_t limit) override {
+    auto whole = readFile(path, limit);
+    if (!whole) return whole.error();
+    return FileSource([left = *std::move(whole),
+                       piece = pieceSize](std::span<char> into) mutable -> Result<std::size_t> {
+      const std::size_t count = std::min({left.size(), into.size(), piece});
+      std::copy_n(left.begin(), count, into.begin());
+      left.erase(0, count);
+      return count;
+    });
   }
   std::optional<std::uint64_t> fileSize(std::string_view path) override {
     if (const auto found = sizes.find(path); found != sizes.end()) return found->second;

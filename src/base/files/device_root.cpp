@@ -192,14 +192,28 @@ Result<DeviceRoot::Location> DeviceRoot::locate(std::string_view path, bool foll
   return Error{std::string(path) + " is not a regular file"};
 }
 
-Result<std::string> DeviceRoot::readFile(std::string_view path, std::size_t limit) const {
+template <class Read>
+auto DeviceRoot::readAt(std::string_view path, Read read) const
+    -> decltype(read(std::declval<const Directory&>(), std::string())) {
   const auto direct = locate(path, /*followsLinks=*/false);
   if (!direct) return direct.error();
-  auto content = direct->directory.readFile(direct->name, limit);
+  auto content = read(direct->directory, direct->name);
   if (content || content.error().systemError != ELOOP) return content;
   const auto target = locate(path, /*followsLinks=*/true);
   if (!target) return target.error();
-  return target->directory.readFile(target->name, limit);
+  return read(target->directory, target->name);
+}
+
+Result<std::string> DeviceRoot::readFile(std::string_view path, std::size_t limit) const {
+  return readAt(path, [limit](const Directory& directory, const std::string& name) {
+    return directory.readFile(name, limit);
+  });
+}
+
+Result<FileReader> DeviceRoot::openForReading(std::string_view path, std::size_t limit) const {
+  return readAt(path, [limit](const Directory& directory, const std::string& name) {
+    return directory.openForReading(name, limit);
+  });
 }
 
 std::optional<FileIdentity> DeviceRoot::identity(std::string_view path) const {

@@ -29,6 +29,7 @@ class DeviceRoot {
 
   // As of Directory, for a file at a path. ENOENT when a directory on the way is missing.
   Result<std::string> readFile(std::string_view path, std::size_t limit) const;
+  Result<FileReader> openForReading(std::string_view path, std::size_t limit) const;
   std::optional<FileIdentity> identity(std::string_view path) const;
 
  private:
@@ -40,6 +41,10 @@ class DeviceRoot {
   Result<Directory> openRoot() const;
   Result<Directory> walk(std::string_view path) const;
   // followsLinks: for the last component; on the way they always are.
+  // What read(directory, name) returns for the file at a path.
+  template <class Read>
+  auto readAt(std::string_view path, Read read) const
+      -> decltype(read(std::declval<const Directory&>(), std::string()));
   Result<Location> locate(std::string_view path, bool followsLinks) const;
 
   std::string prefix_;

@@ -191,6 +191,12 @@ Result<std::string> Directory::readFile(std::string_view name, std::size_t limit
   return readDescriptor(file->get(), pathOf(name), limit);
 }
 
+Result<FileReader> Directory::openForReading(std::string_view name, std::size_t limit) const {
+  auto file = openFile(name, O_RDONLY);
+  if (!file) return file.error();
+  return FileReader::start(*std::move(file), pathOf(name), limit);
+}
+
 Result<Descriptor> Directory::openForWriting(std::string_view name) const {
   return openFile(name, O_WRONLY);
 }

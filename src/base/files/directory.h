@@ -55,6 +55,8 @@ class Directory {
   // belongs to that user or to root: any other may be somebody else's file under this name (EPERM,
   // EMLINK).
   Result<std::string> readFile(std::string_view name, std::size_t limit) const;
+  // Opens such a file to read it piece by piece.
+  Result<FileReader> openForReading(std::string_view name, std::size_t limit) const;
   // Opens a file for writing under the same conditions.
   Result<Descriptor> openForWriting(std::string_view name) const;
   // Creates a file, which must not exist yet (EEXIST).

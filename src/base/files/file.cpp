@@ -16,6 +16,15 @@ Error tooLarge(const std::string& path, std::size_t limit) {
   return {path + " is larger than " + std::to_string(limit) + " bytes", EFBIG};
 }
 
+// The size of a regular file that is not larger than limit.
+Result<std::size_t> sizeToRead(int descriptor, const std::string& path, std::size_t limit) {
+  struct stat status {};
+  if (::fstat(descriptor, &status) != 0) return systemError("cannot examine", path);
+  if (!S_ISREG(status.st_mode)) return Error{path + " is not a regular file"};
+  if (static_cast<std::uint64_t>(status.st_size) > limit) return tooLarge(path, limit);
+  return static_cast<std::size_t>(status.st_size);
+}
+
 }  // namespace
 
 int Descriptor::close() {
@@ -42,15 +51,12 @@ Result<std::string> readFile(const std::string& path, std::size_t limit) {
 Result<std::string> readDescriptor(int descriptor, const std::string& path, std::size_t limit) {
   constexpr std::size_t kPiece = 128u << 10;
   constexpr std::size_t kSmallestPiece = 4096;  // files of the kernel report a size of 0
-  struct stat status {};
-  if (::fstat(descriptor, &status) != 0) return systemError("cannot examine", path);
-  if (!S_ISREG(status.st_mode)) return Error{path + " is not a regular file"};
-  if (static_cast<std::uint64_t>(status.st_size) > limit) return tooLarge(path, limit);
+  const auto size = sizeToRead(descriptor, path, limit);
+  if (!size) return size.error();
   // Through a buffer that stays in the cache, so that the contents are written to memory once.
   std::string contents;
-  contents.reserve(static_cast<std::size_t>(status.st_size));
-  std::vector<char> piece(
-      std::clamp(static_cast<std::size_t>(status.st_size) + 1, kSmallestPiece, kPiece));
+  contents.reserve(*size);
+  std::vector<char> piece(std::clamp(*size + 1, kSmallestPiece, kPiece));
   for (;;) {
     const auto count = retried([&] { return ::read(descriptor, piece.data(), piece.size()); });
     if (count < 0) return systemError("cannot read", path);
@@ -58,6 +64,19 @@ Result<std::string> readDescriptor(int descriptor, const std::string& path, std:
     contents.append(piece.data(), static_cast<std::size_t>(count));
     if (contents.size() > limit) return tooLarge(path, limit);
   }
+}
+
+Result<FileReader> FileReader::start(Descriptor file, std::string path, std::size_t limit) {
+  if (const auto size = sizeToRead(file.get(), path, limit); !size) return size.error();
+  return FileReader(std::move(file), std::move(path), limit);
+}
+
+Result<std::size_t> FileReader::read(std::span<char> buffer) {
+  const auto count = retried([&] { return ::read(file_.get(), buffer.data(), buffer.size()); });
+  if (count < 0) return systemError("cannot read", path_);
+  read_ += static_cast<std::size_t>(count);
+  if (read_ > limit_) return tooLarge(path_, limit_);
+  return static_cast<std::size_t>(count);
 }
 
 std::optional<std::uint64_t> fileSize(const std::string& path) {

@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -47,6 +48,24 @@ auto retried(Call call) {
 // The error of a system call on a path; the reason is that of errno or of the given code.
 Error systemError(std::string_view what, const std::string& path);
 Error systemError(std::string_view what, const std::string& path, int code);
+
+// An open file that is read from its start to its end.
+class FileReader {
+ public:
+  // The path names the file in messages. Refuses directories, devices and files larger than limit.
+  static Result<FileReader> start(Descriptor file, std::string path, std::size_t limit);
+  // Fills the front of the buffer with what follows, and returns how much; 0 at the end. An error
+  // also if the file has grown past the limit.
+  Result<std::size_t> read(std::span<char> buffer);
+
+ private:
+  FileReader(Descriptor file, std::string path, std::size_t limit)
+      : file_(std::move(file)), path_(std::move(path)), limit_(limit) {}
+  Descriptor file_;
+  std::string path_;
+  std::size_t limit_;
+  std::size_t read_ = 0;
+};
 
 // The whole file. Refuses directories, devices and files larger than limit, without reading them.
 Result<std::string> readFile(const std::string& path, std::size_t limit);

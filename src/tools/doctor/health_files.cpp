@@ -99,28 +99,29 @@ void examineWhitelist(const ToolContext& context, HealthChecks& checks) {
   constexpr const char* kSubject = "whitelist";
   Platform& platform = *context.platform;
   const WhitelistFile file = loadWhitelistFile(platform);
-  if (!file.root) {
+  if (!file.content) {
     const bool there = platform.files->fileSize(kWhitelistPath).has_value();
     checks.push_back({there ? Health::Wrong : Health::Missing, kSubject,
                       (there ? file.fault : std::string("none")) + "; nothing is reported"});
     return;
   }
-  std::vector<Finding> findings = checkWhitelist(platform, *file.root);
+  std::vector<Finding> findings = checkWhitelist(platform, *file.content);
   const KnownMetrics metrics(MetricTable::load(context.root, [&](const std::string& message) {
     findings.push_back({Severity::Fault, "", "", "", "", message});
   }));
-  std::ranges::move(checkMetrics(context, metrics, *file.root), std::back_inserter(findings));
+  std::ranges::move(checkMetrics(context, metrics, *file.content), std::back_inserter(findings));
   const auto faults =
       static_cast<std::size_t>(std::ranges::count(findings, Severity::Fault, &Finding::severity));
   checks.push_back({faults > 0 ? Health::Wrong : Health::Ok, kSubject,
                     fmt::format("{}, {}{}", counted(faults, "fault"),
                                 counted(findings.size() - faults, "surprise"),
                                 findings.empty() ? "" : "; see tallyctl whitelist check")});
-  for (const auto& group : *file.root) {
-    const GroupState state = groupState(platform, group.key->view());
+  for (const auto& group : file.content->groups()) {
+    const std::string_view name = file.content->nameOf(group);
+    const GroupState state = groupState(platform, name);
     if (state == GroupState::DisabledByTasking || state == GroupState::SwitchUnreadable) {
-      checks.push_back({Health::Missing, kSubject,
-                        fmt::format("the group {} {}", group.key->view(), whyNotInForce(state))});
+      checks.push_back(
+          {Health::Missing, kSubject, fmt::format("the group {} {}", name, whyNotInForce(state))});
     }
   }
 }

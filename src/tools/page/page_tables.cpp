@@ -29,9 +29,9 @@ int PageTables::entryOf(const WhitelistMatch& match, KeyKind kind) {
   // Thousands of keys may be listed one by one: they share a row where the group and the options
   // are the same.
   const bool isListed = match.entry != nullptr;
-  const std::string_view group = isListed ? match.entry->group->view() : "";
+  const std::string_view group = isListed ? match.group : "";
   const bool isPrefix = match.kind == WhitelistMatchKind::Prefix;
-  const std::string_view prefix = isPrefix ? match.entry->key->view() : "";
+  const std::string_view prefix = isPrefix ? match.entry->key() : "";
   const std::string options = optionsText(*match.options);
   return entries_.numberOf({kind, isListed, std::string(group), std::string(prefix), options}, [&] {
     inverses_.emplace_back(*match.options);

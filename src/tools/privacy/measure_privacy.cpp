@@ -104,13 +104,13 @@ class Measurer {
 };
 
 void Measurer::addEntry(const KeyCandidate& candidate) {
-  const std::string_view text = candidate.entry.key->view();
+  const std::string_view text = candidate.entry.key;
   const auto [place, isNew] = places_.try_emplace(
       Place(candidate.section, text), static_cast<std::uint32_t>(report_.entries.size()));
   if (isNew) report_.entries.emplace_back();
   EntryExposure& entry = report_.entries[place->second];  // the last one of the file decides
   entry.section = candidate.section;
-  entry.group = candidate.entry.group->view();
+  entry.group = candidate.entry.group;
   entry.entry = text;
   entry.options = candidate.entry.options;
 }
@@ -122,8 +122,7 @@ std::uint32_t Measurer::entryOf(const WhitelistMatch& match, KeyKind kind) {
                                                          : WhitelistSection::ScalarKeys)
                                                : (prefix ? WhitelistSection::DistributionKeyPrefixes
                                                          : WhitelistSection::DistributionKeys);
-  const std::string_view text =
-      match.entry != nullptr ? match.entry->key->view() : std::string_view();
+  const std::string_view text = match.entry != nullptr ? match.entry->key() : std::string_view();
   const auto [place, isNew] =
       places_.try_emplace(Place(section, text), static_cast<std::uint32_t>(report_.entries.size()));
   if (isNew) {  // an internal device reports what no entry admits

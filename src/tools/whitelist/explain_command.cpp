@@ -80,7 +80,7 @@ void printRows(const ToolContext& context, const KeyStory& story) {
 
 void printVerdicts(const ToolContext& context, const KeyStory& story) {
   printHeading(context, "In the whitelist");
-  if (!story.judge.file().root) return printLine(context, "  there is none", Ink::Doubtful);
+  if (!story.judge.file().content) return printLine(context, "  there is none", Ink::Doubtful);
   Table table({{""}, {"", Align::Left, true}});
   for (const KeyKind kind : story.kinds()) {
     const KeyVerdict& verdict = kind == KeyKind::Scalar ? story.scalar : story.distribution;
@@ -93,7 +93,7 @@ void printVerdicts(const ToolContext& context, const KeyStory& story) {
       const std::string_view off = whyNotInForce(other.state);
       table.add({"", Cell(fmt::format("passed over: {} {} ({} {})",
                                       isPrefixSection(other.section) ? "prefix" : "entry",
-                                      other.entry.key->view(), other.entry.group->view(),
+                                      other.entry.key, other.entry.group,
                                       !off.empty() ? off : "has it less specific or earlier"),
                           Ink::Faint)});
     }
@@ -251,7 +251,7 @@ int explain(const ToolContext& context, const ExplainArguments& arguments) {
     printJson(context, storyJson(story));
     return present ? kSuccess : kWrong;
   }
-  if (!story.judge.file().root) {
+  if (!story.judge.file().content) {
     printLine(context,
               "No whitelist can be used, so nothing is reported: " + story.judge.file().fault,
               Ink::Bad);

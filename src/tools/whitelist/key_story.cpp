@@ -51,8 +51,8 @@ class KeyCollector final : public WhitelistVisitor {
  public:
   explicit KeyCollector(std::set<std::string, std::less<>>& keys) : keys_(keys) {}
   bool beginGroup(std::string_view) override { return true; }
-  void entry(WhitelistSection section, WhitelistEntry found) override {
-    if (!isPrefixSection(section)) keys_.emplace(found.key->view());
+  void entry(WhitelistSection section, const WhitelistEntry& found) override {
+    if (!isPrefixSection(section)) keys_.emplace(found.key);
   }
   void malformed(const WhitelistPlace&) override {}
 
@@ -67,7 +67,7 @@ std::vector<std::string> similarKeys(const ToolContext& context, const KeyStory&
       metricsStoreFile(context.root), [&keys](const StoreKey& key) { keys.emplace(key.key); },
       [](const std::string&) {});
   KeyCollector collector(keys);
-  if (const auto& whitelist = story.judge.file().root) visitWhitelist(*whitelist, collector);
+  if (const auto& whitelist = story.judge.file().content) visitWhitelist(*whitelist, collector);
   const std::vector<std::string_view> known(keys.begin(), keys.end());
   auto near = nearestWords(story.key, known, kSuggested);
   if (near.empty() && !story.key.empty()) {

@@ -49,14 +49,14 @@ class MetricChecker final : public WhitelistVisitor {
     return true;
   }
   void malformed(const WhitelistPlace&) override {}
-  void entry(WhitelistSection section, WhitelistEntry entry) override {
-    const std::string_view key = entry.key->view();
+  void entry(WhitelistSection section, const WhitelistEntry& entry) override {
+    const std::string_view key = entry.key;
     if (!key.empty() && !isStoreKey(key)) return;  // said already
     if (!key.empty()) {
       isPrefixSection(section) ? checkPrefix(section, entry) : checkKey(section, entry);
     }
     if (isScalarSection(section)) return;
-    (isPrefixSection(section) ? prefixes_ : keys_).set(std::move(entry));
+    (isPrefixSection(section) ? prefixes_ : keys_).set(entry);
   }
 
   // After the last entry.
@@ -97,9 +97,8 @@ class MetricChecker final : public WhitelistVisitor {
 
   void add(Severity severity, WhitelistSection section, const WhitelistEntry& entry,
            std::string_view option, std::string message) {
-    findings.push_back({severity, std::string(entry.group->view()),
-                        std::string(sectionName(section)), std::string(entry.key->view()),
-                        std::string(option), std::move(message)});
+    findings.push_back({severity, std::string(entry.group), std::string(sectionName(section)),
+                        std::string(entry.key), std::string(option), std::move(message)});
   }
 
   void addContradiction(WhitelistSection section, const WhitelistEntry& entry,
@@ -113,16 +112,16 @@ class MetricChecker final : public WhitelistVisitor {
   }
 
   void checkKey(WhitelistSection section, const WhitelistEntry& entry) {
-    const Metric* const metric = metrics_.find(entry.key->view());
+    const Metric* const metric = metrics_.find(entry.key);
     if (metric == nullptr) {
-      undescribed_.emplace_back(entry.key->view());
+      undescribed_.emplace_back(entry.key);
     } else if (metric->type && !isOfKind(*metric->type, isScalarSection(section))) {
       addContradiction(section, entry, *metric);
     }
   }
 
   void checkPrefix(WhitelistSection section, const WhitelistEntry& entry) {
-    const std::string_view prefix = entry.key->view();
+    const std::string_view prefix = entry.key;
     const bool scalar = isScalarSection(section);
     const Metric* const around = metrics_.prefixOf(prefix);
     const MetricTable::Below below = metrics_.below(prefix);
@@ -233,7 +232,7 @@ void MetricChecker::checkStore(const ToolContext& context) {
 }  // namespace
 
 std::vector<Finding> checkMetrics(const ToolContext& context, const KnownMetrics& metrics,
-                                  const KvDictionary& whitelist) {
+                                  const WhitelistContent& whitelist) {
   MetricChecker checker(metrics);
   visitWhitelist(whitelist, checker);
   checker.finish(context);

@@ -12,6 +12,6 @@ namespace tally::tools {
 // recorded as two types or as another than the table's; boundaries in another unit than the samples
 // of the store.
 std::vector<Finding> checkMetrics(const ToolContext& context, const KnownMetrics& metrics,
-                                  const KvDictionary& whitelist);
+                                  const WhitelistContent& whitelist);
 
 }  // namespace tally::tools

@@ -74,13 +74,13 @@ class Checker final : public WhitelistVisitor {
     }
   }
 
-  void entry(WhitelistSection section, WhitelistEntry entry) override {
+  void entry(WhitelistSection section, const WhitelistEntry& entry) override {
     ++entriesOfGroup_;
-    const WhitelistPlace place{*group_, sectionName(section), entry.key->view(), {}};
+    const WhitelistPlace place{*group_, sectionName(section), entry.key, {}};
     checkKey(section, place);
     checkOptions(section, place, *entry.options);
     checkRepetition(section, place, entry);
-    if (inForce_) inForceTable(section).insert_or_assign(std::string(entry.key->view()), entry);
+    if (inForce_) inForceTable(section).insert_or_assign(std::string(entry.key), entry);
   }
 
   void finish() {
@@ -209,8 +209,7 @@ class Checker final : public WhitelistVisitor {
     if (!kvEqual(present.options.get(), entry.options.get())) {
       add(Severity::Surprise, place,
           fmt::format("the group {} lists it too, with {}; the later group wins, with {}",
-                      present.group->view(), optionsText(*present.options),
-                      optionsText(*entry.options)));
+                      present.group, optionsText(*present.options), optionsText(*entry.options)));
     }
     present = entry;
   }
@@ -219,23 +218,23 @@ class Checker final : public WhitelistVisitor {
   void checkNesting(WhitelistSection section, const Table& entries, const Table& prefixes) {
     for (const auto& [key, entry] : entries) {
       if (!isStoreKey(key)) continue;  // a fault already; and one of megabytes has as many prefixes
-      const WhitelistPlace place{entry.group->view(), sectionName(section), key, {}};
+      const WhitelistPlace place{entry.group, sectionName(section), key, {}};
       const bool exact = !isPrefixSection(section);
       if (const auto same = prefixes.find(key); exact && same != prefixes.end()) {
         add(Severity::Surprise, place,
             fmt::format("the group {} has a prefix of the same text, which this exact key shadows",
-                        same->second.group->view()));
+                        same->second.group));
       }
       const WhitelistEntry* around = outerPrefix(prefixes, key);
       if (around == nullptr) continue;
       if (!exact && kvEqual(around->options.get(), entry.options.get())) {
         add(Severity::Surprise, place,
-            fmt::format("says the same as the prefix {} of the group {}", around->key->view(),
-                        around->group->view()));
+            fmt::format("says the same as the prefix {} of the group {}", around->key,
+                        around->group));
       } else if (entry.options->empty() && haveEffect(*around->options)) {
         add(Severity::Surprise, place,
             fmt::format("reported without options, though the prefix {} around it has {}",
-                        around->key->view(), optionsText(*around->options)));
+                        around->key, optionsText(*around->options)));
       }
     }
   }
@@ -260,9 +259,9 @@ class Checker final : public WhitelistVisitor {
 
 }  // namespace
 
-std::vector<Finding> checkWhitelist(Platform& platform, const KvDictionary& root) {
+std::vector<Finding> checkWhitelist(Platform& platform, const WhitelistContent& whitelist) {
   Checker checker(platform);
-  visitWhitelist(root, checker);
+  visitWhitelist(whitelist, checker);
   checker.finish();
   return std::move(checker.findings);
 }

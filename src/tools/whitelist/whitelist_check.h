@@ -20,7 +20,7 @@ struct Finding {
 };
 
 // In the file's order; faults and surprises mixed.
-std::vector<Finding> checkWhitelist(Platform& platform, const KvDictionary& root);
+std::vector<Finding> checkWhitelist(Platform& platform, const WhitelistContent& whitelist);
 
 // "Radio, ScalarKeys, vellum.radio.calls, sig_fig".
 std::string placeText(const Finding& finding);

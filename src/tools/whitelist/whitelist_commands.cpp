@@ -53,7 +53,7 @@ class EntryCounter final : public WhitelistVisitor {
  public:
   std::size_t groups = 0, entries[kWhitelistSections] = {};
   bool beginGroup(std::string_view) override { return ++groups > 0; }
-  void entry(WhitelistSection section, WhitelistEntry) override {
+  void entry(WhitelistSection section, const WhitelistEntry&) override {
     ++entries[static_cast<std::size_t>(section)];
   }
   void malformed(const WhitelistPlace&) override {}
@@ -104,9 +104,9 @@ void printCheck(const ToolContext& context, const WhitelistArguments& arguments,
                 const Checked& checked) {
   const auto& [file, metrics, findings, privacy] = checked;
   printLine(context, "Whitelist " + fileName(arguments), Ink::Strong);
-  if (file.root) {
+  if (file.content) {
     EntryCounter counter;
-    visitWhitelist(*file.root, counter);
+    visitWhitelist(*file.content, counter);
     const auto& n = counter.entries;
     printLine(context, fmt::format("  {}: scalars {} and {}, distributions {} and {}",
                                    counted(counter.groups, "group"), counted(n[0], "key"),
@@ -146,15 +146,15 @@ int check(const ToolContext& context, const WhitelistArguments& arguments) {
       }));
   Checked checked{load(context, arguments), metrics.ofDevice(), {}, {}};
   std::vector<Finding>& findings = checked.findings;
-  if (const auto& root = checked.file.root) {
-    findings = checkWhitelist(*context.platform, *root);
-    std::ranges::move(checkMetrics(context, metrics, *root), std::back_inserter(findings));
+  if (const auto& content = checked.file.content) {
+    findings = checkWhitelist(*context.platform, *content);
+    std::ranges::move(checkMetrics(context, metrics, *content), std::back_inserter(findings));
   } else {
     findings.push_back({Severity::Fault, "", "", "", "",
                         "the file cannot be used, so nothing is reported: " + checked.file.fault});
   }
   std::ranges::move(ofTables, std::back_inserter(findings));
-  if (arguments.privacy && checked.file.root) {
+  if (arguments.privacy && checked.file.content) {
     const WhitelistJudge judge(*context.platform, checked.file);
     checked.privacy = measurePrivacy(context, judge, metrics);
   }

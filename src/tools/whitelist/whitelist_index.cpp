@@ -16,8 +16,8 @@ class WhitelistIndex::Collector final : public WhitelistVisitor {
     state_ = groupState(platform_, name);
     return true;
   }
-  void entry(WhitelistSection section, WhitelistEntry entry) override {
-    candidates_.push_back({section, std::move(entry), state_});
+  void entry(WhitelistSection section, const WhitelistEntry& entry) override {
+    candidates_.push_back({section, entry, state_});
   }
   void malformed(const WhitelistPlace&) override {}
 
@@ -27,12 +27,12 @@ class WhitelistIndex::Collector final : public WhitelistVisitor {
   GroupState state_ = GroupState::InForce;
 };
 
-WhitelistIndex::WhitelistIndex(Platform& platform, const KvDictionary& root) {
+WhitelistIndex::WhitelistIndex(Platform& platform, const WhitelistContent& content) {
   Collector collector(platform, candidates_);
-  visitWhitelist(root, collector);
+  visitWhitelist(content, collector);
   const auto place = [this](std::uint32_t i) {
     const KeyCandidate& candidate = candidates_[i];
-    return std::tuple(isPrefixSection(candidate.section), candidate.entry.key->view());
+    return std::tuple(isPrefixSection(candidate.section), candidate.entry.key);
   };
   order_.resize(candidates_.size());
   std::iota(order_.begin(), order_.end(), 0U);

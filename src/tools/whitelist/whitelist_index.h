@@ -18,7 +18,8 @@ struct KeyCandidate {
 
 class WhitelistIndex {
  public:
-  WhitelistIndex(Platform& platform, const KvDictionary& root);
+  // The content must outlive the index.
+  WhitelistIndex(Platform& platform, const WhitelistContent& content);
   // Those that name the key, in the order of the file. Valid as long as the index. Takes
   // logarithmic time, and a step for each that is found.
   std::vector<const KeyCandidate*> find(std::string_view key) const;
@@ -29,11 +30,12 @@ class WhitelistIndex {
   class Collector;
   // The candidates of one text.
   struct Run {
-    KvRef<KvString> key;
+    std::string_view key;
     std::uint32_t first, count;  // of order_
   };
   std::vector<KeyCandidate> candidates_;
   std::vector<std::uint32_t> order_;  // of candidates_, by exactness and text
+  friend std::string_view keyText(const Run& run) { return run.key; }
   KeyTable<Run> exact_, prefixes_;
 };
 

@@ -7,8 +7,8 @@ namespace tally::tools {
 namespace {
 
 std::string entryText(WhitelistSection section, const WhitelistEntry& entry) {
-  if (!isPrefixSection(section)) return fmt::format("the group {}", entry.group->view());
-  return fmt::format("the prefix {} of the group {}", entry.key->view(), entry.group->view());
+  if (!isPrefixSection(section)) return fmt::format("the group {}", entry.group);
+  return fmt::format("the prefix {} of the group {}", entry.key, entry.group);
 }
 
 // The entry of the kind that comes nearest to admitting the key: one whose switch cannot be read
@@ -26,8 +26,7 @@ const KeyCandidate* nearestOf(const std::vector<const KeyCandidate*>& candidates
 bool isDecisive(const KeyCandidate& candidate, const WhitelistMatch& match) {
   return match.entry != nullptr && candidate.state == GroupState::InForce &&
          isPrefixSection(candidate.section) == (match.kind == WhitelistMatchKind::Prefix) &&
-         candidate.entry.key->view() == match.entry->key->view() &&
-         candidate.entry.group->view() == match.entry->group->view();
+         candidate.entry.key == match.entry->key() && candidate.entry.group == match.group;
 }
 
 }  // namespace
@@ -51,7 +50,7 @@ std::string optionsText(const KvDictionary& options) {
 
 WhitelistJudge::WhitelistJudge(Platform& platform, WhitelistFile file)
     : file_(std::move(file)), config_(Whitelist::fromFile(platform, file_)) {
-  if (config_) index_ = std::make_unique<WhitelistIndex>(platform, *file_.root);
+  if (config_) index_ = std::make_unique<WhitelistIndex>(platform, *file_.content);
 }
 
 WhitelistMatch WhitelistJudge::match(std::string_view key, KeyKind kind) const {
@@ -84,12 +83,11 @@ KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
   verdict.match = match(key, kind);
   switch (verdict.match.kind) {
     case WhitelistMatchKind::Exact:
-      verdict.reason = fmt::format("the group {} lists it", verdict.match.entry->group->view());
+      verdict.reason = fmt::format("the group {} lists it", verdict.match.group);
       break;
     case WhitelistMatchKind::Prefix:
-      verdict.reason =
-          fmt::format("the group {} lists the prefix {}", verdict.match.entry->group->view(),
-                      verdict.match.entry->key->view());
+      verdict.reason = fmt::format("the group {} lists the prefix {}", verdict.match.group,
+                                   verdict.match.entry->key());
       break;
     case WhitelistMatchKind::InternalDevice:
       verdict.reason = "it is not listed, but this is an internal device";
@@ -111,18 +109,18 @@ KeyVerdict WhitelistJudge::judge(std::string_view key, KeyKind kind) const {
 
 Json jsonOf(const KeyVerdict& verdict) {
   Json json = {{"reported", verdict.admitted()}, {"reason", verdict.reason}};
-  if (const WhitelistEntry* entry = verdict.match.entry) {
-    json["group"] = entry->group->view();
+  if (const ListedKey* entry = verdict.match.entry) {
+    json["group"] = verdict.match.group;
     json["match"] = verdict.match.kind == WhitelistMatchKind::Exact ? "exact" : "prefix";
-    json["entry"] = entry->key->view();
+    json["entry"] = entry->key();
   }
   if (verdict.absence) json["absence"] = rowOf(*verdict.absence).name;
   if (verdict.admitted()) json["options"] = jsonOf(verdict.match.options);
   Json others = Json::array();
   for (const KeyCandidate& other : verdict.others) {
-    others.push_back({{"group", other.entry.group->view()},
+    others.push_back({{"group", other.entry.group},
                       {"section", sectionName(other.section)},
-                      {"entry", other.entry.key->view()},
+                      {"entry", other.entry.key},
                       {"options", jsonOf(other.entry.options.get())},
                       {"inForce", other.state == GroupState::InForce}});
   }
