@@ -6,7 +6,9 @@ from performance import plots
 
 # name: the program, below scripts or build/bin, and its arguments. what: is measured, with which yardstick.
 # draw: makes its picture of its text, plots.NAME(path, lines).
-Benchmark = collections.namedtuple("Benchmark", "name title what picture draw", defaults=(None, None))
+# when_named: runs only when it is named, since it takes as long as all others and a machine's speed does not
+# change what it counts.
+Benchmark = collections.namedtuple("Benchmark", "name title what picture draw when_named", defaults=(None, None, False))
 
 BENCHMARKS = [
     Benchmark("bench_daily_log", "The daily log of a large day",
@@ -81,7 +83,7 @@ BENCHMARKS = [
               "A day in an emulated machine whose clock is set forward in steps of two seconds; sectors written are counted "
               "at its block layer: ext4 with blocks of 4 KiB, synced after each commit. The default is 15 minutes: an hour "
               "would write a third and lose four times as much in a crash, 5 minutes write twice as much. Yardstick: values "
-              "that are committed one by one."),
+              "that are committed one by one.", when_named=True),
     Benchmark("bench-page", "The owner's page of a large day",
               "Opening `tallyctl report page` of a day of 100,000 keys in headless Chromium, from the start of the "
               "navigation to the first frame with rows; the least of three openings. Yardstick: a plain table of the same "

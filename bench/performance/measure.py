@@ -61,12 +61,12 @@ def measure(benchmark, top):
 
 
 def run(benchmarks, names, top, table_path):
-    """Measures those that are named, or all, and leaves the others' figures as they are. The exit status:
-    1 if a benchmark failed, or gave a ratio that misses its target by more than the tolerance, or gives one
-    no longer."""
+    """Measures those that are named, or all that need no name, and leaves the others' figures as they are. The
+    exit status: 1 if a benchmark failed, or gave a ratio that misses its target by more than the tolerance, or
+    gives one no longer."""
     table, faults = Table(table_path, benchmarks), []
     for benchmark in benchmarks:
-        if names and benchmark.name not in names:
+        if benchmark.name not in names and (names or benchmark.when_named):
             continue
         print(f"== {benchmark.name}", flush=True)
         try:

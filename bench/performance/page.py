@@ -6,7 +6,7 @@ from performance import rows
 
 HEAD = """# Performance
 
-`scripts/bench` measures everything, keeps it in [performance.json](performance.json), and writes this page from there. Every figure has a yardstick from the same run: compare the ratios, not the times of different machines. A ratio is figure to yardstick, or yardstick to figure where a cost is to be so many times lower; a figure without a yardstick is compared with its target. Targets are the project's own. `scripts/bench` fails if one is missed by more than {tolerance:.0f} %.
+`scripts/bench` measures, keeps the figures in [performance.json](performance.json), and writes this page from there. Every figure has a yardstick from the same run: compare the ratios, not the times of different machines. A ratio is figure to yardstick, or yardstick to figure where a cost is to be so many times lower; a figure without a yardstick is compared with its target. Targets are the project's own. `scripts/bench` fails if one is missed by more than {tolerance:.0f} %.
 """
 COLUMNS = "| figure | value | yardstick | ratio | target | |\n|---|--:|---|--:|---|---|"
 
