@@ -218,8 +218,16 @@ class TALLY_API KvArray final : public KvObject {
   KvItems<KvRef<KvObject>> items_;
 };
 
+// Where the entries of a dictionary come from that are made when they are first asked for.
+struct KvPending {
+  const class KvDictionarySource* source;
+  std::uint32_t row;    // which of the source's dictionaries it is
+  std::uint32_t marks;  // the source's notes about it
+};
+
 // String keys to values, enumerated in the order of first insertion. A small dictionary is a flat
-// vector; a larger one carries a hash index.
+// vector; a larger one carries a hash index. The entries of one of very many may be made only when
+// they are asked for, so reading may allocate, and one thread at a time may do it.
 class TALLY_API KvDictionary final : public KvObject {
  public:
   static constexpr KvType kType = KvType::Dictionary;
@@ -232,27 +240,27 @@ class TALLY_API KvDictionary final : public KvObject {
   static KvRef<KvDictionary> create(
       std::initializer_list<std::pair<std::string_view, KvRef<KvObject>>> entries);
 
-  std::size_t size() const noexcept { return entries_.size(); }
-  bool empty() const noexcept { return entries_.empty(); }
-  bool contains(std::string_view key) const noexcept { return get(key) != nullptr; }
+  std::size_t size() const { return entries().size(); }
+  bool empty() const { return entries().empty(); }
+  bool contains(std::string_view key) const { return get(key) != nullptr; }
   // Borrowed; null when the key is missing. The second is faster where the dictionaries' own keys
   // are the same object.
-  KvObject* get(std::string_view key) const noexcept;
-  KvObject* get(const KvString& key) const noexcept;
+  KvObject* get(std::string_view key) const;
+  KvObject* get(const KvString& key) const;
   // Null when the key is missing or its value is of another type.
   template <class T>
-  T* getAs(std::string_view key) const noexcept {
+  T* getAs(std::string_view key) const {
     return kvCast<T>(get(key));
   }
   template <class T>
-  T* getAs(const KvString& key) const noexcept {
+  T* getAs(const KvString& key) const {
     return kvCast<T>(get(key));
   }
   // Empty when the key is missing or its value is not a number (string, boolean).
-  std::optional<std::int64_t> getInt64(std::string_view key) const noexcept;
-  std::optional<double> getDouble(std::string_view key) const noexcept;
-  std::optional<bool> getBool(std::string_view key) const noexcept;
-  std::optional<std::string_view> getString(std::string_view key) const noexcept;
+  std::optional<std::int64_t> getInt64(std::string_view key) const;
+  std::optional<double> getDouble(std::string_view key) const;
+  std::optional<bool> getBool(std::string_view key) const;
+  std::optional<std::string_view> getString(std::string_view key) const;
 
   // Replaces in place or adds at the end; a null value removes the key.
   void set(std::string_view key, KvRef<KvObject> value);
@@ -263,26 +271,38 @@ class TALLY_API KvDictionary final : public KvObject {
   // Removes every entry of which the predicate is true, in one pass.
   template <class Predicate>
   void removeIf(Predicate predicate) {
-    if (entries_.removeIf(predicate) != 0) rebuildIndex();
+    if (entries().removeIf(predicate) != 0) rebuildIndex();
   }
   // Sets every entry of other in this dictionary.
   void merge(const KvDictionary& other);
-  auto begin() const noexcept { return entries_.begin(); }
-  auto end() const noexcept { return entries_.end(); }
+  auto begin() const { return entries().begin(); }
+  auto end() const { return entries().end(); }
   // A new dictionary of the same keys and values, with capacity for some more.
   KvRef<KvDictionary> copy(std::size_t more = 0, KvArena* arena = nullptr) const;
 
  private:
   friend class KvObject;
   friend class KvMaker;
+  friend class KvPendingAccess;
   explicit KvDictionary(std::uint32_t capacity) noexcept;
+  // Takes over a reference to the source.
+  explicit KvDictionary(const KvPending* pending) noexcept;
   ~KvDictionary();
-  std::size_t find(std::string_view key, std::uint32_t hash) const noexcept;
-  std::size_t find(std::string_view key) const noexcept;
-  std::size_t find(const KvString& key) const noexcept;
+  std::size_t find(std::string_view key, std::uint32_t hash) const;
+  std::size_t find(std::string_view key) const;
+  std::size_t find(const KvString& key) const;
   void append(KvRef<KvString> key, KvRef<KvObject> value);
   void rebuildIndex();
-  KvItems<Entry> entries_;
+  KvItems<Entry>& entries() const {
+    if (isPending_) fill();
+    return entries_;
+  }
+  void fill() const;
+  mutable bool isPending_ = false;
+  union {
+    mutable KvItems<Entry> entries_;
+    mutable KvPending pending_;  // instead of entries
+  };
   std::unique_ptr<class HashIndex> index_;  // null while the dictionary is small
 };
 

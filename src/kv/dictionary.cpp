@@ -4,6 +4,7 @@
 #include <algorithm>
 
 #include "base/hash.h"
+#include "kv/dictionary_source.h"
 #include "kv/maker.h"
 
 namespace tally {
@@ -16,7 +17,33 @@ constexpr std::size_t kNotFound = static_cast<std::size_t>(-1);
 
 KvDictionary::KvDictionary(std::uint32_t capacity) noexcept
     : KvObject(kType), entries_(this + 1, capacity) {}
-KvDictionary::~KvDictionary() = default;
+KvDictionary::KvDictionary(const KvPending* pending) noexcept
+    : KvObject(kType), isPending_(true), pending_(*pending) {}
+
+KvDictionary::~KvDictionary() {
+  if (isPending_) {
+    pending_.source->release();
+  } else {
+    entries_.~KvItems();
+  }
+}
+
+void KvDictionary::fill() const {
+  const KvPending pending = pending_;
+  isPending_ = false;
+  auto* const self = const_cast<KvDictionary*>(this);  // no value is made const
+  new (&self->entries_) KvItems<Entry>(self + 1, 0);
+  try {
+    pending.source->fill(*self, pending);
+  } catch (...) {
+    entries_.~KvItems();
+    self->index_.reset();
+    pending_ = pending;
+    isPending_ = true;
+    throw;
+  }
+  pending.source->release();
+}
 
 KvRef<KvDictionary> KvDictionary::create(std::size_t capacity, KvArena* arena) {
   auto dictionary = KvMaker::makeContainer<KvDictionary, Entry>(arena, capacity);
@@ -31,7 +58,7 @@ KvRef<KvDictionary> KvDictionary::create(
   return dictionary;
 }
 
-std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const noexcept {
+std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const {
   const auto isKey = [&](std::size_t i) { return entries_[i].key->view() == key; };
   if (index_) {
     const std::uint32_t found = index_->find(hash, isKey);
@@ -43,11 +70,13 @@ std::size_t KvDictionary::find(std::string_view key, std::uint32_t hash) const n
   return kNotFound;
 }
 
-std::size_t KvDictionary::find(std::string_view key) const noexcept {
+std::size_t KvDictionary::find(std::string_view key) const {
+  if (isPending_) fill();
   return find(key, index_ ? hashBytes(key) : 0);
 }
 
-std::size_t KvDictionary::find(const KvString& key) const noexcept {
+std::size_t KvDictionary::find(const KvString& key) const {
+  if (isPending_) fill();
   if (index_) return find(key.view(), key.hash_);
   for (std::size_t i = 0; i < entries_.size(); ++i) {
     const KvString* const other = entries_[i].key.get();
@@ -56,12 +85,12 @@ std::size_t KvDictionary::find(const KvString& key) const noexcept {
   return kNotFound;
 }
 
-KvObject* KvDictionary::get(const KvString& key) const noexcept {
+KvObject* KvDictionary::get(const KvString& key) const {
   const std::size_t found = find(key);
   return found == kNotFound ? nullptr : entries_[found].value.get();
 }
 
-KvObject* KvDictionary::get(std::string_view key) const noexcept {
+KvObject* KvDictionary::get(std::string_view key) const {
   const std::size_t found = find(key);
   return found == kNotFound ? nullptr : entries_[found].value.get();
 }
@@ -120,32 +149,32 @@ bool KvDictionary::remove(std::string_view key) {
 
 void KvDictionary::merge(const KvDictionary& other) {
   if (&other == this) return;
-  for (const Entry& entry : other.entries_) set(entry.key, entry.value);
+  for (const Entry& entry : other.entries()) set(entry.key, entry.value);
 }
 
 KvRef<KvDictionary> KvDictionary::copy(std::size_t more, KvArena* arena) const {
-  auto dictionary = create(entries_.size() + more, arena);
+  auto dictionary = create(entries().size() + more, arena);
   dictionary->entries_.appendWithinRoom(entries_);
   if (index_) dictionary->index_ = std::make_unique<HashIndex>(*index_);
   return dictionary;
 }
 
-std::optional<std::int64_t> KvDictionary::getInt64(std::string_view key) const noexcept {
+std::optional<std::int64_t> KvDictionary::getInt64(std::string_view key) const {
   const auto* number = getAs<KvNumber>(key);
   return number != nullptr ? std::optional(number->asInt64()) : std::nullopt;
 }
 
-std::optional<double> KvDictionary::getDouble(std::string_view key) const noexcept {
+std::optional<double> KvDictionary::getDouble(std::string_view key) const {
   const auto* number = getAs<KvNumber>(key);
   return number != nullptr ? std::optional(number->asDouble()) : std::nullopt;
 }
 
-std::optional<bool> KvDictionary::getBool(std::string_view key) const noexcept {
+std::optional<bool> KvDictionary::getBool(std::string_view key) const {
   const auto* boolean = getAs<KvBoolean>(key);
   return boolean != nullptr ? std::optional(boolean->value()) : std::nullopt;
 }
 
-std::optional<std::string_view> KvDictionary::getString(std::string_view key) const noexcept {
+std::optional<std::string_view> KvDictionary::getString(std::string_view key) const {
   const auto* string = getAs<KvString>(key);
   return string != nullptr ? std::optional(string->view()) : std::nullopt;
 }

@@ -10,6 +10,7 @@
 #include "base/hash.h"
 #include "base/large_memory.h"
 #include "base/utf8.h"
+#include "kv/array_changes.h"
 #include "kv/maker.h"
 
 namespace tally {
@@ -158,14 +159,17 @@ void KvArray::append(KvRef<KvObject> item) {
 }
 
 void KvArray::removeAt(std::size_t index) {
+  kvNoteArrayChange();
   if (index < items_.size()) items_.removeAt(index);
 }
 
 void KvArray::replaceAt(std::size_t index, KvRef<KvObject> item) {
+  kvNoteArrayChange();
   if (index < items_.size() && item) items_[index] = std::move(item);
 }
 
 void KvArray::removeAt(std::span<const std::size_t> indexes) {
+  kvNoteArrayChange();
   std::size_t index = 0;
   items_.removeIf([&](const auto&) {
     const bool removed = !indexes.empty() && indexes.front() == index;
