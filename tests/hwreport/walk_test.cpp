@@ -37,13 +37,22 @@ int walk(Mode mode, KvDictionary* collection, const std::map<std::string, int>& 
   };
   if (mode == Mode::Iterate) return iterateChannels(collection, answer);
   if (mode == Mode::Prune) return pruneChannels(collection, answer);
-  KvArena arena;
-  if (mode == Mode::Transform) {
-    const auto handler = [&](KvDictionary* one, KvDictionary*) { return answer(one); };
-    return transformChannels(collection, arena, handler, output);
-  }
-  const auto handler = [&](KvDictionary*, KvDictionary* one, KvDictionary*) { return answer(one); };
-  return deltaChannels(collection, nested().get(), arena, handler, output);
+  const auto step = [&](const LevelChannels& channels, const LevelChannels*,
+                        KvRef<ChannelFrame>* made) {
+    int result = 0;
+    std::vector<std::uint32_t> kept;
+    *made = channels.copy();
+    for (std::uint32_t i = 0; i < channels.array().size() && !walkFailed(result); ++i) {
+      auto* const one = channels.array().getAs<KvDictionary>(i);
+      const int answered = one != nullptr ? answer(one) : HwIterFailed;
+      result = walkFailed(answered) ? answered : result | answered;
+      if (answered == 0) kept.push_back(i);
+    }
+    (*made)->keepRows(std::move(kept));
+    return result;
+  };
+  const bool delta = mode == Mode::Delta;
+  return transformLevels(collection, delta ? nested().get() : nullptr, delta, step, output);
 }
 
 TEST(Walk, ResultsInEveryMode) {

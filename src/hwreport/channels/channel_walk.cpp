@@ -1,19 +1,53 @@
-// One engine for the four modes, so that they agree about order and failures.
+// One engine for all walks, so that they agree about order and failures.
 #include "hwreport/channels/channel_walk.h"
 
 #include <vector>
 
 #include "hwreport/channels/keys.h"
-#include "hwreport/channels/pairing.h"
 #include "hwreport/channels/type_word.h"
 
 namespace tally {
+
+LevelChannels::LevelChannels(const KvDictionary& level)
+    : level_(&level), frame_(KvRef<const ChannelFrame>::share(ChannelFrame::behind(level))) {
+  if (frame_) return;
+  const KvObject* const held = level.get(*keys().channels);
+  array_ = kvCast<KvArray>(held);
+  malformed_ = held != nullptr && array_ == nullptr;
+  if (array_ != nullptr) {
+    frame_ = KvRef<const ChannelFrame>::share(ChannelFrame::behind(*array_));
+  }
+}
+
+KvRef<ChannelFrame> LevelChannels::copy() const {
+  return frame_ && frame_->hasAllRows() && !frame_->isSampled()
+             ? frame_->copyWithoutElements()
+             : ChannelFrame::of(array(), ChannelFrame::Elements::Copied);
+}
+
+KvRef<ChannelFrame> LevelChannels::copyWithoutElements() const {
+  return frame_ && frame_->hasAllRows() ? frame_->copyWithoutElements()
+                                        : ChannelFrame::of(array(), ChannelFrame::Elements::Left);
+}
+
+KvRef<ChannelFrame> LevelChannels::copyOfFrame() const {
+  return frame_ ? frame_->copyWithoutElements() : copyWithoutElements();
+}
+
+const KvArray& LevelChannels::array() const {
+  return array_ != nullptr ? *array_ : *level_->getAs<KvArray>(*keys().channels);
+}
+
+bool LevelChannels::isWhole(const ChannelFrame& frame) const {
+  return array_ == nullptr || array_->size() == frame.size();
+}
+
 namespace {
 
 // Collections have at most four levels; a deeper one contains itself.
 constexpr int kMaximumDepth = 16;
 
-// What a mode does with the channels of one array. The output is null unless the mode makes one.
+// What a walk does with the channels of one level.
 class Mode {
  public:
   struct Traits {
@@ -21,31 +55,41 @@ class Mode {
   };
   explicit Mode(const Traits& given) : traits(given) {}
   virtual ~Mode() = default;
-  virtual int visit(KvArray& channels, const KvArray* others, KvArray* output) = 0;
+  // Of a level that has some.
+  virtual int visit(KvDictionary& level, const KvDictionary* other,
+                    KvRef<ChannelFrame>* output) = 0;
   const Traits traits;
+};
+
+// The output of one level. A level of channels alone stays a frame.
+class LevelOutput {
+ public:
+  KvRef<ChannelFrame> channels;
+  void set(const KvRef<KvString>& key, KvRef<KvDictionary> level) {
+    named().set(key, std::move(level));
+  }
+  KvRef<KvDictionary> take() {
+    if (!made_ && channels) return channels->makeLevel();
+    named();
+    return std::move(made_);
+  }
+
+ private:
+  KvDictionary& named() {
+    if (!made_) {
+      made_ = KvDictionary::create();
+      if (channels) made_->set(keys().channels, channels->makeArray());
+    }
+    return *made_;
+  }
+  KvRef<KvDictionary> made_;
 };
 
 int walkLevel(Mode& mode, KvDictionary* collection, const KvDictionary* other, int depth,
               KvRef<KvDictionary>* output);
 
-int walkArray(Mode& mode, KvDictionary& collection, const KvDictionary* other,
-              KvDictionary* output) {
-  const auto& key = keys().channels;
-  KvObject* const held = collection.get(*key);
-  if (held == nullptr) return HwIterContinue;
-  const auto channels = KvRef<KvArray>::share(kvCast<KvArray>(held));
-  const KvArray* const others = other != nullptr ? other->getAs<KvArray>(*key) : nullptr;
-  if (!channels || (other != nullptr && others == nullptr)) return HwIterFailed;
-  const auto kept = mode.traits.makesOutput ? KvArray::create(channels->size()) : nullptr;
-  const int result = mode.visit(*channels, others, kept.get());
-  if (walkFailed(result)) return result;
-  if (output != nullptr) output->set(key, kept);
-  if (mode.traits.prunes && channels->empty()) collection.remove(key->view());
-  return result;
-}
-
 int walkNamed(Mode& mode, KvDictionary& collection, const KvDictionary* other, int depth,
-              const KvRef<KvString>& key, KvDictionary* output) {
+              const KvRef<KvString>& key, LevelOutput& output) {
   KvObject* const held = collection.get(*key);
   if (held == nullptr) return HwIterContinue;
   const auto level = KvRef<KvDictionary>::share(kvCast<KvDictionary>(held));
@@ -71,7 +115,7 @@ int walkNamed(Mode& mode, KvDictionary& collection, const KvDictionary* other, i
     walked = true;
   }
   if (!walked) return HwIterFailed;
-  if (output != nullptr) output->set(key, kept);
+  if (kept) output.set(key, kept);
   if (mode.traits.prunes) {
     level->removeIf([](const KvDictionary::Entry& entry) {
       const auto* sub = kvCast<KvDictionary>(entry.value.get());
@@ -86,26 +130,27 @@ int walkLevel(Mode& mode, KvDictionary* collection, const KvDictionary* other, i
               KvRef<KvDictionary>* output) {
   if (collection == nullptr || depth > kMaximumDepth) return HwIterFailed;
   if (mode.traits.needsOther && other == nullptr) return HwIterFailed;
-  KvRef<KvDictionary> made;
-  if (mode.traits.makesOutput) made = KvDictionary::create();
-  int result = walkArray(mode, *collection, other, made.get());
-  for (const auto* key : {&keys().drivers, &keys().channelGroups}) {
-    if (walkFailed(result)) return result;
-    const int levelResult = walkNamed(mode, *collection, other, depth, *key, made.get());
-    result = walkFailed(levelResult) ? levelResult : result | levelResult;
+  LevelOutput made;
+  int result = mode.visit(*collection, other, &made.channels);
+  // A level of which there is a frame has no others below it.
+  if (!walkFailed(result) && ChannelFrame::behind(*collection) == nullptr) {
+    for (const auto* key : {&keys().drivers, &keys().channelGroups}) {
+      const int levelResult = walkNamed(mode, *collection, other, depth, *key, made);
+      result = walkFailed(levelResult) ? levelResult : result | levelResult;
+      if (walkFailed(result)) break;
+    }
   }
   if (walkFailed(result)) return result;
-  if (output != nullptr) *output = std::move(made);
+  if (output != nullptr && mode.traits.makesOutput) *output = made.take();
   return result;
 }
 
 // The channels of a large collection are scattered over memory, and a walk would mostly wait for
-// them. So it prefetches: first the dictionaries, then their values, then the type word, which is
-// next to the id.
+// them. So it prefetches: first the dictionaries, then their values or those of their rows, then
+// the type word, which is next to the id.
 constexpr std::size_t kDictionariesAhead = 32;
 constexpr std::size_t kValuesAhead = 24;
 constexpr std::size_t kLegendAhead = 20;
-constexpr std::size_t kCallbackAhead = 16;
 constexpr std::size_t kCacheLine = 64;
 
 void fetchAhead(const KvArray& channels, std::size_t i) {
@@ -114,7 +159,12 @@ void fetchAhead(const KvArray& channels, std::size_t i) {
     for (std::size_t line = 0; line < 3; ++line) __builtin_prefetch(start + line * kCacheLine);
   }
   if (const auto* const next = channels.getAs<KvDictionary>(i + kValuesAhead)) {
-    for (const auto& entry : *next) __builtin_prefetch(entry.value.get());
+    if (const auto row = FrameChannel::of(next); row.frame != nullptr) {
+      __builtin_prefetch(row.legend());
+      row.frame->block().prefetch(row.row());
+    } else {
+      for (const auto& entry : *next) __builtin_prefetch(entry.value.get());
+    }
   }
   __builtin_prefetch(
       legendElement(channels.getAs<KvDictionary>(i + kLegendAhead), kLegendTypeWord));
@@ -135,31 +185,28 @@ int eachChannel(const KvArray& channels, Step step) {
   return result;
 }
 
-class Iterate final : public Mode {
+// A mode that shows each channel to a callback.
+class Visit final : public Mode {
  public:
-  explicit Iterate(const HwReportCallback& callback) : Mode({}), callback_(callback) {}
-  int visit(KvArray& channels, const KvArray*, KvArray*) override {
-    return eachChannel(channels,
-                       [&](KvDictionary* channel, std::size_t) { return callback_(channel); });
-  }
-
- private:
-  const HwReportCallback& callback_;
-};
-
-class Prune final : public Mode {
- public:
-  explicit Prune(const HwReportCallback& callback) : Mode({.prunes = true}), callback_(callback) {}
-  int visit(KvArray& channels, const KvArray*, KvArray*) override {
+  Visit(const HwReportCallback& callback, bool prunes)
+      : Mode({.prunes = prunes}), callback_(callback) {}
+  int visit(KvDictionary& level, const KvDictionary*, KvRef<ChannelFrame>*) override {
+    KvObject* const held = level.get(*keys().channels);
+    if (held == nullptr) return HwIterContinue;
+    const auto channels = KvRef<KvArray>::share(kvCast<KvArray>(held));
+    if (!channels) return HwIterFailed;
     // Dropped channels are removed in one pass: closing the gap after each would take quadratic
     // time.
     std::vector<std::size_t> dropped;
-    const int result = eachChannel(channels, [&](KvDictionary* channel, std::size_t i) {
+    const int result = eachChannel(*channels, [&](KvDictionary* channel, std::size_t i) {
       const int one = callback_(channel);
-      if (one == HwIterDrop) dropped.push_back(i);
+      if (traits.prunes && one == HwIterDrop) dropped.push_back(i);
       return one;
     });
-    channels.removeAt(dropped);
+    if (!dropped.empty()) channels->removeAt(dropped);
+    if (traits.prunes && !walkFailed(result) && channels->empty()) {
+      level.remove(keys().channels->view());
+    }
     return result;
   }
 
@@ -169,73 +216,37 @@ class Prune final : public Mode {
 
 class Transform final : public Mode {
  public:
-  Transform(KvArena& arena, const TransformCallback& callback,
-            const std::function<void(const KvDictionary&)>& ahead)
-      : Mode({.makesOutput = true}), arena_(arena), callback_(callback), ahead_(ahead) {}
-  int visit(KvArray& channels, const KvArray*, KvArray* output) override {
-    return eachChannel(channels, [&](KvDictionary* channel, std::size_t i) {
-      if (ahead_) {
-        const auto* const next = channels.getAs<KvDictionary>(i + kCallbackAhead);
-        if (next != nullptr) ahead_(*next);
-      }
-      auto copy = channel->copy(1, &arena_);  // space for the elements
-      const int one = callback_(channel, copy.get());
-      if (one == HwIterContinue) output->append(std::move(copy));
-      return one;
-    });
+  Transform(const LevelStep& step, bool needsOther)
+      : Mode({.makesOutput = true, .needsOther = needsOther}), step_(step) {}
+  int visit(KvDictionary& level, const KvDictionary* other, KvRef<ChannelFrame>* output) override {
+    const LevelChannels channels(level);
+    if (channels.malformed()) return HwIterFailed;
+    if (!channels) return HwIterContinue;
+    if (other == nullptr) return step_(channels, nullptr, output);
+    const LevelChannels others(*other);
+    return others ? step_(channels, &others, output) : HwIterFailed;
   }
 
  private:
-  KvArena& arena_;
-  const TransformCallback& callback_;
-  const std::function<void(const KvDictionary&)>& ahead_;
-};
-
-class Delta final : public Mode {
- public:
-  Delta(KvArena& arena, const DeltaCallback& callback)
-      : Mode({.makesOutput = true, .needsOther = true}), arena_(arena), callback_(callback) {}
-  int visit(KvArray& channels, const KvArray* others, KvArray* output) override {
-    EarlierChannels earlier(*others);
-    return eachChannel(channels, [&](KvDictionary* channel, std::size_t i) -> int {
-      const auto counterpart = earlier.counterpartOf(*channel, i);
-      if (!counterpart) return HwIterFailed;
-      auto copy = channel->copy(0, &arena_);
-      const int one =
-          *counterpart != nullptr ? callback_(*counterpart, channel, copy.get()) : HwIterContinue;
-      if (one == HwIterContinue) output->append(std::move(copy));
-      return one;
-    });
-  }
-
- private:
-  KvArena& arena_;
-  const DeltaCallback& callback_;
+  const LevelStep& step_;
 };
 
 }  // namespace
 
 int iterateChannels(KvDictionary* collection, const HwReportCallback& callback) {
-  Iterate mode(callback);
+  Visit mode(callback, false);
   return walkLevel(mode, collection, nullptr, 0, nullptr);
 }
 
 int pruneChannels(KvDictionary* collection, const HwReportCallback& callback) {
-  Prune mode(callback);
+  Visit mode(callback, true);
   return walkLevel(mode, collection, nullptr, 0, nullptr);
 }
 
-int transformChannels(KvDictionary* collection, KvArena& arena, const TransformCallback& callback,
-                      KvRef<KvDictionary>* output,
-                      const std::function<void(const KvDictionary&)>& ahead) {
-  Transform mode(arena, callback, ahead);
-  return walkLevel(mode, collection, nullptr, 0, output);
-}
-
-int deltaChannels(KvDictionary* later, KvDictionary* earlier, KvArena& arena,
-                  const DeltaCallback& callback, KvRef<KvDictionary>* output) {
-  Delta mode(arena, callback);
-  return walkLevel(mode, later, earlier, 0, output);
+int transformLevels(KvDictionary* collection, const KvDictionary* other, bool needsOther,
+                    const LevelStep& step, KvRef<KvDictionary>* output) {
+  Transform mode(step, needsOther);
+  return walkLevel(mode, collection, other, 0, output);
 }
 
 int HwReportPrune(KvDictionary* collection, const HwReportCallback& callback) {

@@ -9,6 +9,7 @@
 #include "hwreport/channels.h"
 #include "hwreport/channels/keys.h"
 #include "hwreport/channels/printf_hex.h"
+#include "hwreport/channels/type_word.h"
 #include "platform/platform.h"
 
 namespace tally {
@@ -23,6 +24,15 @@ KvRef<KvString> nameOfID(std::uint64_t id) {
     name[length++] = static_cast<char>(byte);
   }
   return length != 0 ? KvString::create({name, length}) : nullptr;
+}
+
+KvRef<KvString> nameOfLegend(const KvArray* legend) {
+  if (legend == nullptr) return nullptr;
+  if (auto* const name = legend->getAs<KvString>(kLegendChannelName)) {
+    return KvRef<KvString>::share(name);
+  }
+  const std::uint64_t id = bitsOf(legend->get(kLegendChannelID));
+  return id != kHwReportInvalidValue ? nameOfID(id) : nullptr;
 }
 
 KvRef<KvString> HwReportCopyDriverName(HwRegistryEntry driver) {

@@ -1,29 +1,14 @@
-// Cuts the channels' runs out of the hub's region.
+// Takes samples.
 #include "hwreport/samples.h"
 
-#include "hwreport/channel.h"
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
-#include "hwreport/channels/keys.h"
 #include "hwreport/channels/raw_element.h"
-#include "hwreport/sampling/run_index.h"
+#include "hwreport/sampling/frame_sampler.h"
 #include "hwreport/sampling/subscription.h"
 
 namespace tally {
 namespace {
-
-// Writes the type of a channel that was requested by its id alone. The legend channel array is
-// shared, so every copy of the channel gets it.
-void learnType(const KvDictionary& channel, const ElementRun& run) {
-  auto* const legend = channel.getAs<KvArray>(*keys().legendChannel);
-  if (legend == nullptr) return;
-  auto type = KvNumber::uint64(run.typeWord().bits);
-  if (legend->size() == kLegendTypeWord) {
-    legend->append(std::move(type));
-  } else {
-    legend->replaceAt(kLegendTypeWord, std::move(type));
-  }
-}
 
 KvRef<KvDictionary> cutSamples(KvDictionary* subscribed, std::span<const std::byte> buffer,
                                KvRef<HwReportError>* error) {
@@ -32,30 +17,19 @@ KvRef<KvDictionary> cutSamples(KvDictionary* subscribed, std::span<const std::by
     reportError(error, HwErrBadArgument, kMessage);
     return nullptr;
   }
-  RunIndex index(buffer);
   HwResult pending = HwErrGeneral;
-  KvArena arena;
   KvRef<KvDictionary> samples;
-  const int result = transformChannels(
-      subscribed, arena,
-      [&](KvDictionary* channel, KvDictionary* copy) {
-        const auto run =
-            index.find(HwReportChannelGetDriverID(channel), HwReportChannelGetChannelID(channel));
-        if (!run) {
-          if (index.stopped()) return 1;
-          pending = HwErrNotFound;
-          return HwIterDrop;
-        }
-        if (HwReportChannelGetFormat(channel) == kHwReportFormatUnknown) {
-          learnType(*channel, ElementRun(*run));
-        }
-        copy->set(keys().rawElements, KvData::create(*run, &arena));
-        return HwIterContinue;
+  const int result = transformLevels(
+      subscribed, nullptr, false,
+      [&](const LevelChannels& channels, const LevelChannels*, KvRef<ChannelFrame>* output) {
+        *output = channels.copyWithoutElements();
+        const bool whole = channels.isWhole(**output);
+        const auto sampled = FrameSampler::sample(**output, buffer);
+        if (sampled == FrameSampler::Result::Stopped) return 1;
+        if (sampled == FrameSampler::Result::SomeMissing) pending = HwErrNotFound;
+        return whole ? HwIterContinue : HwIterFailed;
       },
-      &samples,
-      [&](const KvDictionary& channel) {
-        index.fetch(HwReportChannelGetDriverID(&channel), HwReportChannelGetChannelID(&channel));
-      });
+      &samples);
   if (!walkFailed(result)) return samples;
   reportError(error, pending, kMessage);
   return nullptr;

@@ -2,7 +2,7 @@
 
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
-#include "hwreport/channels/interest_list.h"
+#include "hwreport/sampling/interest_list.h"
 #include "platform/platform.h"
 #include "platform/protocol/hub_protocol.h"
 
@@ -81,9 +81,18 @@ KvRef<HwReportSubscription> HwReportCreateSubscription(const void*, KvDictionary
     return nullptr;
   }
   InterestList interests;
-  const std::int32_t count = interests.fill(desired);
-  if (count <= 0) {
-    reportError(error, HwErrBadArgument, count < 0 ? "iteration error" : "no channels");
+  KvRef<KvDictionary> copy;
+  const int copied = transformLevels(
+      desired, nullptr, false,
+      [&](const LevelChannels& channels, const LevelChannels*, KvRef<ChannelFrame>* output) {
+        *output = channels.copy();
+        interests.add(**output);
+        return channels.isWhole(**output) ? HwIterContinue : HwIterFailed;
+      },
+      &copy);
+  if (walkFailed(copied) || interests.count() == 0) {
+    const char* const reason = walkFailed(copied) ? "iteration error" : "no channels";
+    reportError(error, HwErrBadArgument, reason);
     return nullptr;
   }
   if (!interests.complete()) {
@@ -92,13 +101,6 @@ KvRef<HwReportSubscription> HwReportCreateSubscription(const void*, KvDictionary
   }
   const auto subscription = KvRef<Subscription>::adopt(new Subscription(platform().deviceRegistry));
   if (subscription->connect(interests.bytes(), error) != 0) return nullptr;
-  KvRef<KvDictionary> copy;
-  KvArena arena;
-  const auto keep = [](KvDictionary*, KvDictionary*) { return HwIterContinue; };
-  if (walkFailed(transformChannels(desired, arena, keep, &copy))) {
-    reportError(error, HwErrGeneral);
-    return nullptr;
-  }
   *subscribed = std::move(copy);
   return subscription;
 }

@@ -1,15 +1,14 @@
 // Subtracts samples.
 #include "hwreport/samples.h"
 
-#include <cstring>
+#include <optional>
 #include <vector>
 
-#include "hwreport/channel.h"
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/error_maker.h"
 #include "hwreport/channels/keys.h"
+#include "hwreport/channels/pairing.h"
 #include "hwreport/channels/raw_element.h"
-#include "hwreport/values.h"
 
 namespace tally {
 namespace {
@@ -18,25 +17,37 @@ constexpr HwResult kDeltaFailed = 1;
 
 constexpr bool isValid(std::uint64_t value) { return value != kHwReportInvalidValue; }
 
-// The elements of a result channel.
-class Elements {
+// Where the elements of a result go.
+class Result {
  public:
-  explicit Elements(std::span<const std::byte> basis) : bytes_(basis.begin(), basis.end()) {}
-  void setSlot(std::size_t index, std::size_t number, std::uint64_t value) {
-    std::memcpy(bytes_.data() + index * element::kSize + element::slot(number), &value,
-                sizeof(value));
+  // Copies the first elements of a run, and bytes of its tail, to be changed.
+  virtual WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t tail = 0) = 0;
+
+ protected:
+  ~Result() = default;
+};
+
+// Runs of a block have no tails.
+class ResultInBlock final : public Result {
+ public:
+  ResultInBlock(RunBlock& block, std::size_t row) : block_(block), row_(row) {}
+  WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t) override {
+    return block_.addCopy(row_, run, elements);
   }
-  // All slots of all elements: a run may have more of them than its 16-bit count.
-  void invalidate() {
-    for (std::size_t index = 0; index < bytes_.size() / element::kSize; ++index) {
-      for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
-        setSlot(index, slot, kHwReportInvalidValue);
-      }
-    }
+
+ private:
+  RunBlock& block_;
+  const std::size_t row_;
+};
+
+class ResultInData final : public Result {
+ public:
+  WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t tail) override {
+    bytes_.resize(elements * element::kSize + tail);
+    run.copyTo(bytes_);
+    return {bytes_.data() + kElementIDs, element::kSize};
   }
-  void storeIn(KvDictionary& channel, KvArena* arena) const {
-    channel.set(keys().rawElements, KvData::create(bytes_, arena));
-  }
+  KvRef<KvData> data() const { return KvData::create(bytes_); }
 
  private:
   std::vector<std::byte> bytes_;
@@ -45,114 +56,152 @@ class Elements {
 // The value of the slots that a simple channel's difference does not fill.
 enum class OtherSlots { KeepEarlier, Invalidate };
 
-struct Pair {
-  const KvDictionary* earlier;
-  const KvDictionary* later;
-  KvDictionary* result;  // its elements are taken to be the earlier's
-  KvArena* arena;        // for the result's; may be null
-};
-
-bool subtractSimple(const Pair& pair, OtherSlots others) {
-  const auto later = HwReportSimpleGetIntegerValue(pair.later);
-  const auto earlier = HwReportSimpleGetIntegerValue(pair.earlier);
-  const auto laterBits = static_cast<std::uint64_t>(later);
-  const auto earlierBits = static_cast<std::uint64_t>(earlier);
-  if (!isValid(laterBits) || !isValid(earlierBits)) return false;
-  const auto* const basis = pair.earlier->getAs<KvData>(*keys().rawElements);
-  Elements elements(basis->bytes());
-  if (others == OtherSlots::Invalidate) elements.invalidate();
-  elements.setSlot(0, simple_slot::kValue, laterBits - earlierBits);
-  elements.storeIn(*pair.result, pair.arena);
+bool subtractSimple(const ChannelReading& earlier, const ChannelReading& later, OtherSlots others,
+                    Result& result) {
+  const auto before = earlier.runOfFormat(kHwReportFormatSimple);
+  const auto after = later.runOfFormat(kHwReportFormatSimple);
+  if (!before || !after || before->count() != 1 || after->count() != 1) return false;
+  const std::uint64_t earlierValue = before->slot(0, simple_slot::kValue);
+  const std::uint64_t laterValue = after->slot(0, simple_slot::kValue);
+  if (!isValid(earlierValue) || !isValid(laterValue)) return false;
+  // A run may have more elements than its 16-bit count.
+  const WritableRun made = result.copy(*before, before->elements(), before->tail());
+  for (std::size_t i = 0; others == OtherSlots::Invalidate && i < before->elements(); ++i) {
+    for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
+      made.setSlot(i, slot, kHwReportInvalidValue);
+    }
+  }
+  made.setSlot(0, simple_slot::kValue, laterValue - earlierValue);
   return true;
 }
 
-// The runs of a state or histogram pair whose runs and legends agree on the number of elements.
-bool readRuns(const Pair& pair, std::uint8_t format, ElementRun* earlier, ElementRun* later) {
-  const auto earlierRun = runOfLegend(pair.earlier, format);
-  const auto laterRun = runOfLegend(pair.later, format);
-  if (!earlierRun || !laterRun) return false;
-  const std::uint16_t count = earlierRun->count();
-  if (count != countOfFormat(pair.result, format) || count != laterRun->count()) return false;
-  *earlier = *earlierRun;
-  *later = *laterRun;
-  return true;
-}
-
-bool subtractStates(const Pair& pair) {
-  ElementRun earlier, later;
-  if (!readRuns(pair, kHwReportFormatState, &earlier, &later)) return false;
-  Elements elements(later.bytes());
+bool subtractStates(const ElementRun& earlier, const ElementRun& later, Result& result) {
+  const WritableRun made = result.copy(later, later.count());
   for (std::size_t i = 0; i < later.count(); ++i) {
     for (const auto slot : {state_slot::kInTransitions, state_slot::kResidency}) {
       const std::uint64_t before = earlier.slot(i, slot), after = later.slot(i, slot);
       if (!isValid(before) || !isValid(after)) return false;
-      elements.setSlot(i, slot, after - before);
+      made.setSlot(i, slot, after - before);
     }
   }
-  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
-bool subtractBuckets(const Pair& pair) {
-  ElementRun earlier, later;
-  if (!readRuns(pair, kHwReportFormatHistogram, &earlier, &later)) return false;
-  Elements elements(later.bytes());
+bool subtractBuckets(const ElementRun& earlier, const ElementRun& later, Result& result) {
+  const WritableRun made = result.copy(later, later.count());
   for (std::size_t i = 0; i < later.count(); ++i) {
     const std::uint64_t before = earlier.slot(i, bucket_slot::kHits);
     const std::uint64_t after = later.slot(i, bucket_slot::kHits);
     if (!isValid(before) || !isValid(after)) return false;
-    elements.setSlot(i, bucket_slot::kHits, after - before);
+    made.setSlot(i, bucket_slot::kHits, after - before);
     const std::uint64_t sum = later.slot(i, bucket_slot::kSum);
     if (after == before) {
-      elements.setSlot(i, bucket_slot::kSum, kHwReportInvalidValue);
+      made.setSlot(i, bucket_slot::kSum, kHwReportInvalidValue);
     } else if (before != 0) {
-      elements.setSlot(i, bucket_slot::kSum, sum - earlier.slot(i, bucket_slot::kSum));
+      made.setSlot(i, bucket_slot::kSum, sum - earlier.slot(i, bucket_slot::kSum));
     }
   }
-  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
 
-bool subtractArrays(const Pair& pair) {
-  const auto earlier = runOfFormat(pair.earlier, kHwReportFormatSimpleArray);
-  const auto later = runOfFormat(pair.later, kHwReportFormatSimpleArray);
-  if (!earlier || !later || earlier->count() != later->count()) return false;
-  Elements elements(later->bytes());
-  for (std::size_t i = 0; i < later->count(); ++i) {
+bool subtractArrays(const ElementRun& earlier, const ElementRun& later, Result& result) {
+  const WritableRun made = result.copy(later, later.count());
+  for (std::size_t i = 0; i < later.count(); ++i) {
     for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
-      const std::uint64_t before = earlier->slot(i, slot), after = later->slot(i, slot);
-      if (isValid(before)) elements.setSlot(i, slot, isValid(after) ? after - before : before);
+      const std::uint64_t before = earlier.slot(i, slot), after = later.slot(i, slot);
+      if (isValid(before)) made.setSlot(i, slot, isValid(after) ? after - before : before);
     }
   }
-  elements.storeIn(*pair.result, pair.arena);
   return true;
 }
+
+// The formats whose runs are subtracted element by element.
+struct RunFormat {
+  std::uint8_t format;
+  // The run that can be subtracted; empty when there is none.
+  std::optional<ElementRun> (ChannelReading::*run)(std::uint8_t format) const;
+  bool (*subtract)(const ElementRun& earlier, const ElementRun& later, Result& result);
+};
+constexpr RunFormat kRunFormats[] = {
+    {kHwReportFormatState, &ChannelReading::runOfLegend, subtractStates},
+    {kHwReportFormatHistogram, &ChannelReading::runOfLegend, subtractBuckets},
+    {kHwReportFormatSimpleArray, &ChannelReading::runOfFormat, subtractArrays},
+};
 
 // Puts later - earlier into the result; 0 or the code of the error that was reported.
-HwResult subtract(const Pair& pair, OtherSlots others, KvRef<HwReportError>* error) {
-  const std::uint8_t format = HwReportChannelGetFormat(pair.later);
-  const std::uint8_t earlierFormat = HwReportChannelGetFormat(pair.earlier);
-  if (format == kHwReportFormatUnknown || earlierFormat == kHwReportFormatUnknown) {
+HwResult subtract(const ChannelReading& earlier, const ChannelReading& later, OtherSlots others,
+                  Result& result, KvRef<HwReportError>* error) {
+  const std::uint8_t format = later.format();
+  if (format == kHwReportFormatUnknown || earlier.format() == kHwReportFormatUnknown) {
     return reportError(error, HwErrBadArgument);
   }
-  if (format != earlierFormat) return reportError(error, HwErrBadArgument, "mismatched formats");
-  bool done = false;
-  switch (format) {
-    case kHwReportFormatSimple:
-      return subtractSimple(pair, others) ? 0 : reportError(error, HwErrGeneral);
-    case kHwReportFormatState:
-      done = subtractStates(pair);
-      break;
-    case kHwReportFormatHistogram:
-      done = subtractBuckets(pair);
-      break;
-    case kHwReportFormatSimpleArray:
-      done = subtractArrays(pair);
-      break;
-    default:
-      return reportError(error, HwErrUnsupportedFormat, "unknown report format");
+  if (format != earlier.format()) return reportError(error, HwErrBadArgument, "mismatched formats");
+  if (format == kHwReportFormatSimple) {
+    const bool done = subtractSimple(earlier, later, others, result);
+    return done ? 0 : reportError(error, HwErrGeneral);
   }
-  return done ? 0 : reportError(error, kDeltaFailed);
+  for (const RunFormat& known : kRunFormats) {
+    if (known.format != format) continue;
+    const auto before = (earlier.*known.run)(format), after = (later.*known.run)(format);
+    const bool done = before && after && before->count() == after->count() &&
+                      known.subtract(*before, *after, result);
+    return done ? 0 : reportError(error, kDeltaFailed);
+  }
+  return reportError(error, HwErrUnsupportedFormat, "unknown report format");
+}
+
+// The difference of two samples of the same channels, in the order of the later one's runs. False
+// when it cannot be made so; then nothing has been reported.
+bool subtractRows(const ChannelFrame& earlier, const ChannelFrame& later, ChannelFrame& result) {
+  const auto index = later.rows().index();
+  if (!index->complete() || !later.hasRowsOf(earlier)) return false;
+  const RunBlock& before = earlier.block();
+  const RunBlock& after = later.block();
+  std::size_t done = 0;
+  const auto ahead = [&](std::size_t row) {
+    index->prefetchType(row);
+    before.prefetchPlace(row);
+    result.block().prefetchPlace(row);
+  };
+  const bool all = after.eachInOrder(ahead, [&](std::size_t row) {
+    if (!before.has(row)) return false;
+    const TypeWord type{index->typeBits(row)};
+    ResultInBlock made(result.block(), row);
+    ++done;
+    return subtract({type, before.run(row)}, {type, after.run(row)}, OtherSlots::Invalidate, made,
+                    nullptr) == 0;
+  });
+  if (!all) return false;
+  for (const auto& repeated : index->repeated()) {
+    if (!result.block().has(repeated.first)) continue;
+    if (index->typeBits(repeated.row) != index->typeBits(repeated.first)) return false;
+    result.block().share(repeated.row, repeated.first);
+    ++done;
+  }
+  return done == later.size();
+}
+
+// The same channel by channel, in their order, with a search for those that have moved.
+int subtractChannels(const KvArray& earlier, const KvArray& later, ChannelFrame& result,
+                     KvRef<HwReportError>* error, bool* explained) {
+  EarlierChannels counterparts(earlier);
+  for (std::size_t i = 0; i < later.size(); ++i) {
+    const auto* const channel = later.getAs<KvDictionary>(i);
+    if (channel == nullptr) return HwIterFailed;
+    const auto counterpart = counterparts.counterpartOf(*channel, i);
+    if (!counterpart) return HwIterFailed;
+    const std::size_t row = result.rowOf(i);
+    if (*counterpart == nullptr) {
+      result.copyElements(row, *channel);
+      continue;
+    }
+    ResultInData made;
+    *explained = subtract(readingOf(*counterpart), readingOf(channel), OtherSlots::Invalidate, made,
+                          error) != 0;
+    if (*explained) return HwIterFailed;
+    result.setElements(row, made.data());
+  }
+  return HwIterContinue;
 }
 
 }  // namespace
@@ -164,13 +213,18 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
     return nullptr;
   }
   bool explained = false;
-  KvArena arena;
   KvRef<KvDictionary> delta;
-  const int result = deltaChannels(
-      later, earlier, arena,
-      [&](KvDictionary* before, KvDictionary* after, KvDictionary* made) {
-        explained = subtract({before, after, made, &arena}, OtherSlots::Invalidate, error) != 0;
-        return explained ? 1 : HwIterContinue;  // a code may be even; any failure ends the walk
+  const int result = transformLevels(
+      later, earlier, true,
+      [&](const LevelChannels& after, const LevelChannels* before, KvRef<ChannelFrame>* output) {
+        *output = after.copyOfFrame();
+        (*output)->makeBlock(after.frame() != nullptr ? after.frame()->block().sizeOfRuns() : 0);
+        const bool inFrames = before->frame() != nullptr && after.frame() != nullptr;
+        if (inFrames && subtractRows(*before->frame(), *after.frame(), **output)) {
+          return HwIterContinue;
+        }
+        (*output)->makeBlock(0);
+        return subtractChannels(before->array(), after.array(), **output, error, &explained);
       },
       &delta);
   if (!walkFailed(result)) return delta;
@@ -180,9 +234,12 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
 
 KvRef<KvDictionary> HwReportSampleCreateDelta(KvDictionary* earlier, KvDictionary* later,
                                               KvRef<HwReportError>* error) {
-  auto result = earlier != nullptr ? earlier->copy() : nullptr;
-  if (subtract({earlier, later, result.get(), nullptr}, OtherSlots::KeepEarlier, error) != 0)
-    return nullptr;
+  ResultInData made;
+  const HwResult failure =
+      subtract(readingOf(earlier), readingOf(later), OtherSlots::KeepEarlier, made, error);
+  if (failure != 0) return nullptr;
+  auto result = earlier->copy();
+  result->set(keys().rawElements, made.data());
   return result;
 }
 

@@ -8,6 +8,7 @@
 
 #include "base/process.h"
 #include "hwreport/channel.h"
+#include "hwreport/channels/keys.h"
 #include "hwreport/channels/printf_hex.h"
 #include "hwreport/channels/raw_element.h"
 #include "hwreport/values.h"

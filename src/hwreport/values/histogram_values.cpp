@@ -3,6 +3,8 @@
 
 #include <algorithm>
 
+#include "base/byte_reader.h"
+#include "hwreport/channels/keys.h"
 #include "hwreport/channels/raw_element.h"
 
 namespace tally {

@@ -2,6 +2,7 @@
 
 #include <limits>
 
+#include "hwreport/channels/keys.h"
 #include "hwreport/channels/naming.h"
 #include "hwreport/channels/raw_element.h"
 #include "hwreport/values.h"
