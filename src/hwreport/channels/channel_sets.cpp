@@ -1,6 +1,9 @@
 // The channels of many drivers, and the filters over them.
-#include "hwreport/channel.h"
 #include "hwreport/channels.h"
+
+#include <functional>
+
+#include "hwreport/channel.h"
 #include "hwreport/channels/channel_builder.h"
 #include "hwreport/channels/channel_walk.h"
 #include "hwreport/channels/drivers.h"
@@ -37,23 +40,9 @@ bool sameText(const KvString* a, const KvString* b) {
   return a != nullptr && b != nullptr && a->view() == b->view();
 }
 
-// All channels for which keep is true.
-template <class Keep>
-KvRef<KvDictionary> copyChannelsWhere(std::int32_t options, KvRef<HwReportError>* error,
-                                      Keep keep) {
-  auto collection = HwReportCopyAllChannels(options, error);
-  if (!collection) return nullptr;
-  const int result = pruneChannels(collection.get(), [&](KvDictionary* channel) {
-    return keep(channel) ? HwIterContinue : HwIterDrop;
-  });
-  if (!walkFailed(result)) return collection;
-  reportError(error, HwErrGeneral, "channel pruning failed");
-  return nullptr;
-}
-
-}  // namespace
-
-KvRef<KvDictionary> HwReportCopyAllChannels(std::int32_t options, KvRef<HwReportError>* error) {
+// The channels of all drivers. Those of each are handed to the step before they are merged.
+KvRef<KvDictionary> copyAllChannels(std::int32_t options, KvRef<HwReportError>* error,
+                                    const std::function<void(KvDictionary* channels)>& step) {
   // The presence of the property is enough, whatever its value.
   const auto matching = KvDictionary::create(
       {{kMatchProperty, KvDictionary::create({{kLegendPublicProperty, KvBoolean::of(true)}})}});
@@ -68,11 +57,39 @@ KvRef<KvDictionary> HwReportCopyAllChannels(std::int32_t options, KvRef<HwReport
       }
       return 0;
     }
+    if (step) step(channels.get());
     const HwResult merged = mergeDriver(*collection, *channels, error);
     explained = merged != 0;
     return merged;
   });
   return walked(result, explained, std::move(collection), error);
+}
+
+// All channels for which keep is true.
+template <class Keep>
+KvRef<KvDictionary> copyChannelsWhere(std::int32_t options, KvRef<HwReportError>* error,
+                                      Keep keep) {
+  const auto filter = [&](KvDictionary* channels) {
+    return pruneChannels(channels, [&](KvDictionary* channel) {
+      return keep(channel) ? HwIterContinue : HwIterDrop;
+    });
+  };
+  // A driver's channels are filtered while they are in the cache. Where there are levels, a channel
+  // that is dropped still decides on their order.
+  if ((options & (kHwReportByDriver | kHwReportByGroup)) == 0) {
+    return copyAllChannels(options, error, filter);
+  }
+  auto collection = copyAllChannels(options, error, nullptr);
+  if (!collection) return nullptr;
+  if (!walkFailed(filter(collection.get()))) return collection;
+  reportError(error, HwErrGeneral, "channel pruning failed");
+  return nullptr;
+}
+
+}  // namespace
+
+KvRef<KvDictionary> HwReportCopyAllChannels(std::int32_t options, KvRef<HwReportError>* error) {
+  return copyAllChannels(options, error, nullptr);
 }
 
 KvRef<KvDictionary> HwReportCopyChannelsForDrivers(KvDictionary* matching, std::int32_t options,
