@@ -23,21 +23,45 @@ namespace {
 
 using namespace tally;
 
-// Every fourth entry has an option: with one for each, a million of them would be more values than
-// a whitelist may have.
-std::string whitelist(int entries) {
+// With an option for each, a million entries would be more values than a whitelist may have.
+enum class Options { Two, ForEveryFourth };
+
+std::string whitelist(int entries, Options options) {
   std::string text =
       "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n"
       "\t<key>Bench</key>\n\t<dict>\n\t\t<key>ScalarKeys</key>\n\t\t<dict>\n";
+  const auto option = [](std::string_view key, std::string_view type, std::string_view value) {
+    return fmt::format("\t\t\t\t<key>{0}</key>\n\t\t\t\t<{1}>{2}</{1}>\n", key, type, value);
+  };
+  const std::string figures = option("sig_fig", "integer", "2");
+  const std::string both = figures + option("type", "string", "scalar");
   for (int i = 0; i < entries; ++i) {
-    text += fmt::format("\t\t\t<key>app.counter.{}</key>\n", i);
-    text += i % 4 != 0 ? "\t\t\t<dict/>\n"
-                       : fmt::format(
-                             "\t\t\t<dict>\n\t\t\t\t<key>sig_fig</key>\n\t\t\t\t"
-                             "<integer>{}</integer>\n\t\t\t</dict>\n",
-                             1 + i / 4 % 3);
+    const bool isShort = options == Options::ForEveryFourth;
+    text += fmt::format("\t\t\t<key>{}.counter.{}</key>\n",
+                        isShort ? "app" : "com.example.subsystem", i);
+    text += isShort && i % 4 != 0
+                ? "\t\t\t<dict/>\n"
+                : fmt::format("\t\t\t<dict>\n{}\t\t\t</dict>\n", isShort ? figures : both);
   }
   return text + "\t\t</dict>\n\t</dict>\n</dict>\n</plist>\n";
+}
+
+// Of this process, in the kernel's account of it.
+double mebibytes(std::string_view name) {
+  std::ifstream status("/proc/self/status");
+  for (std::string word; status >> word;) {
+    long kibibytes = 0;
+    if (word == name && status >> kibibytes) return static_cast<double>(kibibytes) / 1024;
+  }
+  return 0;
+}
+
+// What a command prints.
+std::string outputOf(const std::string& command) {
+  std::FILE* const pipe = ::popen(command.c_str(), "r");
+  char text[256] = {};
+  if (pipe != nullptr) text[std::fread(text, 1, sizeof text - 1, pipe)] = '\0';
+  return pipe != nullptr && ::pclose(pipe) == 0 ? text : "?";
 }
 
 // Where reading stops.
@@ -47,7 +71,12 @@ void load(const std::string& root, Until until) {
   Platform platform = makeLinuxPlatform(DeviceRoot(root));
   if (until == Until::Nothing) return;
   if (until == Until::Tables) {
-    if (Whitelist::load(platform) == nullptr) std::exit(1);
+    const double before = mebibytes("VmRSS:");
+    const auto kept = Whitelist::load(platform);
+    if (!kept) std::exit(1);
+    const double peak = mebibytes("VmHWM:") - before;
+    ::malloc_trim(0);
+    fmt::print("peak {:5.1f} MiB, then holds {:5.1f} MiB", peak, mebibytes("VmRSS:") - before);
     return;
   }
   const auto file = platform.files->openFile(kWhitelistPath, kPlistMaximumBytes);
@@ -62,52 +91,36 @@ constexpr std::pair<const char*, Until> kMeasurements[] = {{"nothing", Until::No
                                                            {"content", Until::Content},
                                                            {"tables", Until::Tables}};
 
-double residentMebibytes() {
-  ::malloc_trim(0);
-  std::ifstream statistics("/proc/self/statm");
-  long size = 0, resident = 0;
-  statistics >> size >> resident;
-  return static_cast<double>(resident) * 4096 / (1 << 20);
-}
-
-// What a command takes beyond another that does the same but for what is measured.
-struct Cost {
-  double milliseconds, mebibytes;
-};
-Cost costBeyond(const std::vector<std::string>& without, const std::vector<std::string>& command) {
+// Milliseconds of CPU that a command takes beyond one that does the same but what is measured.
+double costBeyond(const std::vector<std::string>& without,
+                  const std::vector<std::string>& command) {
   constexpr int kRuns = 7;
   const auto base = bench::medianRun(kRuns, without), cost = bench::medianRun(kRuns, command);
   if (base.exitStatus != 0 || cost.exitStatus != 0) std::exit(1);
-  return {(cost.cpuSeconds - base.cpuSeconds) * 1e3,
-          static_cast<double>(cost.peakKibibytes - base.peakKibibytes) / 1024};
+  return (cost.cpuSeconds - base.cpuSeconds) * 1e3;
 }
 
-void measure(const std::string& self, int entries) {
+void measure(const std::string& self, int entries, Options options) {
   char root[] = "/tmp/bench_whitelist.XXXXXX";
   if (::mkdtemp(root) == nullptr) std::exit(1);
   const std::string path = bench::whitelistPath(root);
   std::filesystem::create_directories(std::filesystem::path(path).parent_path());
-  std::ofstream(path) << whitelist(entries);
+  std::ofstream(path) << whitelist(entries, options);
 
-  const Cost decoded = costBeyond({self, "bytes", root}, {self, "content", root});
-  const Cost loaded = costBeyond({self, "nothing", root}, {self, "tables", root});
+  const double decoded = costBeyond({self, "bytes", root}, {self, "content", root});
+  const double loaded = costBeyond({self, "nothing", root}, {self, "tables", root});
   const std::string read = "import plistlib, sys; file = open(sys.argv[1], 'rb'); ";
-  const Cost python = costBeyond({"python3", "-c", read + "file.read()", path},
-                                 {"python3", "-c", read + "plistlib.load(file)", path});
-  Platform platform = makeLinuxPlatform(DeviceRoot(root));
-  const double before = residentMebibytes();
-  const auto kept = Whitelist::load(platform);
-  const double resident = residentMebibytes() - before;
-  fmt::print(
-      "{:>9} entries, {:5.1f} MiB: decoded in {:6.1f} ms CPU ({:.0f} ns each), plistlib "
-      "{:7.1f} ms, {:.0f} times that\n",
-      entries, static_cast<double>(std::filesystem::file_size(path)) / (1 << 20),
-      decoded.milliseconds, decoded.milliseconds * 1e6 / entries, python.milliseconds,
-      python.milliseconds / decoded.milliseconds);
-  fmt::print(
-      "{:>17} with digest and tables {:6.1f} ms CPU, peak {:5.1f} MiB, then holds {:5.1f} "
-      "MiB; plistlib peak {:6.1f} MiB\n",
-      "", loaded.milliseconds, loaded.mebibytes, resident, python.mebibytes);
+  const double python = costBeyond({"python3", "-c", read + "file.read()", path},
+                                   {"python3", "-c", read + "plistlib.load(file)", path});
+  fmt::print("{:>9} entries, {}, {:.1f} MiB\n", entries,
+             options == Options::Two ? "two options each" : "an option for every fourth",
+             static_cast<double>(std::filesystem::file_size(path)) / (1 << 20));
+  fmt::print("    decoded               {:7.1f} ms CPU  {:4.0f} ns each\n", decoded,
+             decoded * 1e6 / entries);
+  fmt::print("    yardstick: plistlib   {:7.1f} ms CPU  {:4.1f} times that\n", python,
+             python / decoded);
+  fmt::print("    with digest, tables   {:7.1f} ms CPU  {}\n", loaded,
+             outputOf(fmt::format("{} tables {}", self, root)));
   std::filesystem::remove_all(root);
 }
 
@@ -121,6 +134,9 @@ int main(int count, char** arguments) {
     return 2;
   }
   const std::string self = std::filesystem::canonical(arguments[0]);
-  for (const int entries : {10'000, 100'000, 1'000'000}) measure(self, entries);
+  measure(self, 100'000, Options::Two);
+  for (const int entries : {10'000, 100'000, 1'000'000}) {
+    measure(self, entries, Options::ForEveryFourth);
+  }
   return 0;
 }

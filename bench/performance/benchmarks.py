@@ -29,6 +29,9 @@ BENCHMARKS = [
     Benchmark("bench_export", "Exporting logs",
               "`tallyctl report export` of a spool of 1,000 logs. Yardstick: a Python script that makes the same rows with "
               "plistlib and json."),
+    Benchmark("bench_whitelist", "Reading a whitelist",
+              "A whitelist of one group is read from its file into the tables of the daily job. Yardstick: Python's "
+              "plistlib loads the same file."),
     Benchmark("bench_startup", "Starting for nothing",
               "`tallyrun -d` on a day that is already processed. Yardsticks: an empty C++ program, and the same program "
               "without the module that only a run with something to do loads, for both `-d` and `-f`."),

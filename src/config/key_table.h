@@ -25,8 +25,18 @@ class KeyTable {
   }
   // Adds an entry; it replaces one of the same key that was added earlier.
   void set(Entry entry) {
-    const std::string_view key = keyText(entry);
+    const std::uint32_t hash = hashBytes(keyText(entry));
+    set(std::move(entry), hash);
+  }
+  // The same in two steps. Of many entries the first steps of some come first, and bring what the
+  // second ones look at into the cache. REQUIRES: the table has capacity.
+  std::uint32_t prepare(std::string_view key) const {
     const std::uint32_t hash = hashBytes(key);
+    positions_.prefetch(hash);
+    return hash;
+  }
+  void set(Entry entry, std::uint32_t hash) {
+    const std::string_view key = keyText(entry);
     if (const auto present = position(key, hash); present != HashIndex::kNone) {
       entries_[present] = std::move(entry);
       return;

@@ -32,8 +32,19 @@ class Whitelist::Loader final : public WhitelistVisitor {
     tables_[static_cast<std::size_t>(section)]->reserve(entries);
   }
   void entry(WhitelistSection section, const WhitelistEntry& entry) override {
-    tables_[static_cast<std::size_t>(section)]->set(
-        {entry.key.data(), static_cast<std::uint32_t>(entry.key.size()), sourceOf(entry)});
+    Entries& table = *tables_[static_cast<std::size_t>(section)];
+    if (waitingFor_ != &table || waiting_ == std::size(waitingEntries_)) flush();
+    waitingFor_ = &table;
+    waitingEntries_[waiting_++] = {
+        {entry.key.data(), static_cast<std::uint32_t>(entry.key.size()), sourceOf(entry)},
+        table.prepare(entry.key)};
+  }
+  // After the last entry.
+  void flush() {
+    for (std::size_t i = 0; i < waiting_; ++i) {
+      waitingFor_->set(waitingEntries_[i].entry, waitingEntries_[i].hash);
+    }
+    waiting_ = 0;
   }
   void malformed(const WhitelistPlace& place) override {
     if (place.option) {
@@ -70,7 +81,15 @@ class Whitelist::Loader final : public WhitelistVisitor {
   Platform& platform_;
   SystemLog& log_;
   std::vector<Source>& sources_;
-  std::uint32_t recent_[64] = {};              // of sources_
+  std::uint32_t recent_[64] = {};  // of sources_
+  // Prepared for a table, and not in it yet.
+  struct Waiting {
+    ListedKey entry;
+    std::uint32_t hash;
+  };
+  Waiting waitingEntries_[32];
+  std::size_t waiting_ = 0;
+  Entries* waitingFor_ = nullptr;
   Entries* const tables_[kWhitelistSections];  // in the order of WhitelistSection
 };
 
@@ -99,6 +118,7 @@ std::unique_ptr<Whitelist> Whitelist::fromFile(Platform& platform, const Whiteli
   Loader loader(platform, *whitelist);
   whitelist->texts_ = file.content->texts();
   visitWhitelist(*file.content, loader);
+  loader.flush();
   whitelist->scalarPrefixes_.buildPrefixIndex();
   whitelist->distributionPrefixes_.buildPrefixIndex();
   return whitelist;

@@ -1,5 +1,7 @@
 #include "config/whitelist_content.h"
 
+#include <algorithm>
+#include <array>
 #include <utility>
 
 #include "base/hash.h"
@@ -81,28 +83,50 @@ class WhitelistContent::Builder final : public PlistReceiver {
   // Leaves one item of each name from the first one on.
   void joinRepeated(Items& all, std::size_t first) const {
     constexpr std::size_t kFew = 12;  // up to here a scan beats an index
-    const bool isLarge = all.size() - first > kFew;
-    HashIndex index;
-    if (isLarge) index.reserve(all.size() - first);
     std::size_t kept = first;
-    for (std::size_t i = first; i < all.size(); ++i) {
-      const std::string_view name = nameOf(all[i]);
-      const auto isSame = [&](std::size_t other) { return nameOf(all[other]) == name; };
-      std::size_t same = first;
-      if (isLarge) {
-        const auto found = index.findOrAdd(hashBytes(name), static_cast<std::uint32_t>(kept),
-                                           [&](std::uint32_t other) { return isSame(other); });
-        same = found != HashIndex::kNone ? found : kept;
-      } else {
-        while (same < kept && !isSame(same)) ++same;
-      }
-      if (same == kept) {
-        all[kept++] = all[i];
-      } else {
-        all[same].value = all[i].value;
+    if (all.size() - first > kFew) {
+      kept = joinByIndex(all, first);
+    } else {
+      for (std::size_t i = first; i < all.size(); ++i) {
+        std::size_t same = first;
+        while (same < kept && nameOf(all[same]) != nameOf(all[i])) ++same;
+        kept += join(all, i, same, kept);
       }
     }
     all.resize(kept);
+  }
+
+  // Keeps item i at the end of what is kept, or its value in a kept one of the same name.
+  static std::size_t join(Items& all, std::size_t i, std::size_t same, std::size_t kept) {
+    if (same == kept) {
+      all[kept] = all[i];
+      return 1;
+    }
+    all[same].value = all[i].value;
+    return 0;
+  }
+
+  // Some hashes ahead, since each slot of a large index is one that the cache does not have.
+  std::size_t joinByIndex(Items& all, std::size_t first) const {
+    HashIndex index;
+    index.reserve(all.size() - first);
+    std::size_t kept = first;
+    std::array<std::uint32_t, 32> hashes;
+    for (std::size_t i = first; i < all.size();) {
+      const std::size_t block = std::min(all.size() - i, hashes.size());
+      for (std::size_t j = 0; j < block; ++j) {
+        hashes[j] = hashBytes(nameOf(all[i + j]));
+        index.prefetch(hashes[j]);
+      }
+      for (std::size_t j = 0; j < block; ++j, ++i) {
+        const std::string_view name = nameOf(all[i]);
+        const auto found =
+            index.findOrAdd(hashes[j], static_cast<std::uint32_t>(kept),
+                            [&](std::uint32_t other) { return nameOf(all[other]) == name; });
+        kept += join(all, i, found != HashIndex::kNone ? found : kept, kept);
+      }
+    }
+    return kept;
   }
 
   std::shared_ptr<WhitelistTexts> texts_ = std::make_shared<WhitelistTexts>();
