@@ -7,7 +7,7 @@ namespace tally {
 namespace {
 
 // Shows what options hold, in their order. Values of several types may have the same text.
-std::string textOf(const KvDictionary& options) {
+std::string contentText(const KvDictionary& options) {
   std::string text;
   for (const auto& option : options) {
     text.append(option.key->view()) += '\0';
@@ -38,11 +38,11 @@ std::uint32_t OptionsPool::add(const KvRef<KvDictionary>& options) {
 }
 
 std::uint32_t OptionsPool::addUnlessKnown(const KvRef<KvDictionary>& options) {
-  const std::string text = textOf(*options);
+  const std::string text = contentText(*options);
   const auto number = static_cast<std::uint32_t>(pool_.size());
   const auto known = byContent_.findOrAdd(hashBytes(text), number, [&](std::uint32_t i) {
     const KvDictionary& other = *pool_[i].read;
-    return textOf(other) == text && kvIdentical(&other, options.get());
+    return contentText(other) == text && kvIdentical(&other, options.get());
   });
   if (known != HashIndex::kNone) return known;
   pool_.push_back({options, wellFormedOf(options)});
