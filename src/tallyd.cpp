@@ -115,7 +115,9 @@ int run(const Arguments& arguments) {
     log->message(LogLevel::Error, "{}", ingress.error().message);
     return kFailed;
   }
-  const auto store = makeSqliteRecordingStore(metricsStoreFile(root));
+  StoreFile file = metricsStoreFile(root);
+  file.notify = [log](const std::string& message) { log->write(LogLevel::Error, message); };
+  const auto store = makeSqliteRecordingStore(std::move(file));
   Recorder recorder({.store = *store,
                      .ingress = **ingress,
                      .log = *log,

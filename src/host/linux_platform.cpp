@@ -68,7 +68,9 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.preferences = preferences;
   services.systemConfiguration = std::make_shared<FileSystemConfiguration>(root, log, access);
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
-  services.metricsStore = makeSqliteMetricsStore(metricsStoreFile(root), log, clock);
+  StoreFile store = metricsStoreFile(root);
+  store.notify = [log](const std::string& message) { log->write(LogLevel::Error, message); };
+  services.metricsStore = makeSqliteMetricsStore(std::move(store), log, clock);
   services.crashReporting =
       std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, consent);
   services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);

@@ -26,7 +26,6 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
   } cases[] = {
       {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
       {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
-      {"newer", [&] { sql("PRAGMA user_version = 2"); }, "newer version"},
       {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
       {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE chunks"); }, "its tables are not"},
       {"endless view",

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "base/files/file.h"
+#include "base/files/set_aside.h"
 #include "base/files/temporary_file.h"
 #include "kv/plist_codec.h"
 
@@ -16,7 +17,7 @@ namespace {
 constexpr std::string_view kSuffix = ".plist";
 constexpr std::string_view kLockName = ".preferences.lock";
 // Damaged files that are kept for diagnosis.
-constexpr int kDamagedFilesKept = 8;
+constexpr std::uint32_t kDamagedFilesKept = 8;
 
 std::string fileNameOf(std::string_view domain) { return fmt::format("{}{}", domain, kSuffix); }
 
@@ -162,7 +163,7 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
   const bool wasWritable = state.writable;
   state.stored = KvDictionary::create();
   const auto moved =
-      locked != nullptr ? setAside(*locked, domain) : Status(Error{"its directory is not locked"});
+      locked != nullptr ? moveAside(*locked, domain) : Status(Error{"its directory is not locked"});
   state.writable = static_cast<bool>(moved);
   if (moved) {
     report(domain, "damaged, set aside", fault);
@@ -172,14 +173,12 @@ void PropertyListPreferences::recover(Domain& state, std::string_view domain,
   }
 }
 
-Status PropertyListPreferences::setAside(const Directory& folder, std::string_view domain) const {
+Status PropertyListPreferences::moveAside(const Directory& folder, std::string_view domain) {
   const std::string name = fileNameOf(domain);
-  for (int number = 1; number <= kDamagedFilesKept; ++number) {
-    const std::string aside = fmt::format("{}.damaged-{}", name, number);
-    if (!folder.identity(aside)) return folder.rename(name, aside);
-  }
+  const auto aside = setAside(folder, name, kDamagedWord, kDamagedFilesKept);
+  if (aside) return Done{};
   // A file that is damaged again and again must not fill the volume.
-  return folder.remove(name);
+  return aside.error().systemError == EEXIST ? folder.remove(name) : aside.error();
 }
 
 Result<FileLock> PropertyListPreferences::lockFolder(const Directory& folder) {

@@ -16,6 +16,9 @@
 
 namespace tally {
 
+// In the names of damaged files that are set aside (base/files/set_aside.h).
+inline constexpr std::string_view kDamagedWord = "damaged";
+
 // The preferences of whoever owns the directory: the program's own user, another user, the system.
 // A domain is read at its first use and again whenever another process has replaced its file.
 // Writes are kept per key and merged into the file's content when they are synchronised, so that
@@ -61,7 +64,7 @@ class PropertyListPreferences final : public Preferences {
   void reload(Domain& state, std::string_view domain, const Directory* locked);
   void recover(Domain& state, std::string_view domain, const std::string& fault,
                const Directory* locked);
-  Status setAside(const Directory& folder, std::string_view domain) const;
+  static Status moveAside(const Directory& folder, std::string_view domain);
   Result<FileLock> lockFolder(const Directory& folder);
   static bool isStored(const Domain& state);
   WriteResult writePending(Domain& state, std::string_view domain);

@@ -261,6 +261,23 @@ Status Database::addPredicate(const char* name,
   return Done{};
 }
 
+// With the mode set before the first transaction, SQLite locks the file for as long as it is open,
+// and every other connection holds a lock on it.
+Result<bool> Database::shutOthersOut(std::chrono::milliseconds patience) {
+  ::sqlite3_busy_timeout(handle_.get(), static_cast<int>(patience.count()));
+  const auto locked = execute("PRAGMA locking_mode = EXCLUSIVE; BEGIN EXCLUSIVE; COMMIT");
+  const bool isBusy = !locked && busy();
+  ::sqlite3_busy_handler(handle_.get(), waitForLock, nullptr);
+  if (!locked && !isBusy) return locked.error();
+  return !isBusy;
+}
+
+Status Database::foldLog() {
+  const int code = ::sqlite3_wal_checkpoint_v2(handle_.get(), nullptr, SQLITE_CHECKPOINT_TRUNCATE,
+                                               nullptr, nullptr);
+  return code == SQLITE_OK ? Status(Done{}) : error();
+}
+
 bool Database::wasReplaced() const {
   int moved = 0;
   const int code = ::sqlite3_file_control(handle_.get(), "main", SQLITE_FCNTL_HAS_MOVED, &moved);

@@ -1,6 +1,7 @@
 // SQLite handles that close themselves, and the few calls that the metrics store makes.
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
@@ -84,6 +85,11 @@ class Database {
   // Makes the predicate a function of SQL, with one argument of text. It must outlive the
   // statements that call it, and none of them may be running.
   Status addPredicate(const char* name, const std::function<bool(std::string_view)>& predicate);
+  // Shuts all other connections out until this one is closed. False when one of them stays open for
+  // longer than the patience. REQUIRES: nothing was read or written through this connection.
+  Result<bool> shutOthersOut(std::chrono::milliseconds patience);
+  // Writes all of the write-ahead log into the file and empties it. An error while others use it.
+  Status foldLog();
   // Whether its directory has another file under this name by now, or none.
   bool wasReplaced() const;
   // A failure, in words that name the file; without a reason, the last call's.

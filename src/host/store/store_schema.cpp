@@ -10,6 +10,7 @@
 #include <iterator>
 
 #include "base/utf8.h"
+#include "host/store/store_aside.h"
 #include "platform/metrics_store.h"
 
 namespace tally {
@@ -108,6 +109,9 @@ Result<std::optional<Directory>> directoryOf(const StoreFile& file) {
   return Error{"metrics store " + file.text() + ": " + std::strerror(errno), errno};
 }
 
+// As the error of a system call, which none of those that open a store has.
+constexpr int kNewerStore = EPROTONOSUPPORT;
+
 // False for a database in which nothing was ever made. REQUIRES: a transaction, since another
 // process may be making the store right now.
 Result<bool> isStore(Database& database) {
@@ -115,16 +119,14 @@ Result<bool> isStore(Database& database) {
   if (!application) return application.error();
   const auto version = database.integer("PRAGMA user_version");
   if (!version) return version.error();
+  if (auto newer = newerThanKnown(database); !newer.empty()) {
+    return Error{database.error(newer).message, kNewerStore};
+  }
   const auto objects = database.integer("SELECT count(*) FROM sqlite_schema");
   if (!objects) return objects.error();
   if (*application == 0 && *version == 0 && *objects == 0) return false;
   if (*application != kApplicationId || *version < 1) {
     return database.error("a database, but not a metrics store");
-  }
-  if (*version > kSchemaVersion) {
-    return database.error("written by a newer version of the program (schema " +
-                          std::to_string(*version) + ", this one knows " +
-                          std::to_string(kSchemaVersion) + ")");
   }
   if (auto checked = checkTables(database); !checked) return checked.error();
   return true;
@@ -226,7 +228,19 @@ Result<std::optional<Database>> openStoreForReading(const StoreFile& file) {
   return readFrom(Database::open(**directory, file.name, Database::Access::Immutable));
 }
 
-Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing) {
+std::string newerThanKnown(Database& database) {
+  const auto application = database.integer("PRAGMA application_id");
+  const auto version = database.integer("PRAGMA user_version");
+  if (!application || *application != kApplicationId || !version || *version <= kSchemaVersion) {
+    return {};
+  }
+  return "written by a newer version of the program (schema " + std::to_string(*version) +
+         ", this one knows " + std::to_string(kSchemaVersion) + ")";
+}
+
+namespace {
+
+Result<std::optional<Database>> openForWriting(const StoreFile& file, IfMissing ifMissing) {
   const bool create = ifMissing == IfMissing::Create;
   auto directory = directoryOf(file);
   if (!directory) return directory.error();
@@ -252,6 +266,15 @@ Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMis
   // The log of a large import is not kept at its full length.
   if (auto set = database->execute("PRAGMA journal_size_limit = 4194304"); !set) return set.error();
   return std::optional<Database>(std::move(*database));
+}
+
+}  // namespace
+
+Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing) {
+  auto store = openForWriting(file, ifMissing);
+  if (store || store.error().systemError != kNewerStore) return store;
+  if (auto moved = setNewerStoreAside(file); !moved) return moved.error();
+  return openForWriting(file, ifMissing);
 }
 
 }  // namespace tally

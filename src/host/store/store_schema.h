@@ -1,6 +1,7 @@
 // The metrics store as a file: its place, its identity, and how it is opened.
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -15,6 +16,8 @@ namespace tally {
 struct StoreFile {
   DeviceDirectory directory;
   std::string name;
+  // Told what was done to the file itself, in words that name it; may be empty.
+  std::function<void(const std::string& message)> notify = {};
 
   // For messages.
   std::string text() const { return directory.text() + "/" + name; }
@@ -40,14 +43,18 @@ Result<bool> hasTable(Database& database, std::string_view name);
 // Makes one of them if it is missing. REQUIRES: a transaction of a writer.
 Status makeOptionalTable(Database& database, std::string_view name);
 
+// What makes a store one of a newer version of the program, in words; empty for any other file, and
+// when it cannot be read. No table is looked at.
+std::string newerThanKnown(Database& database);
+
 // Opens the store in its present state: later commits of others are not seen. Nothing is created.
 // Empty when there is no store yet; an error when there is something else in its place, or a store
-// of a newer version of the program.
+// of a newer version of the program, which the next writer sets aside.
 Result<std::optional<Database>> openStoreForReading(const StoreFile& file);
 
 enum class IfMissing { Leave, Create };
-// Opens the store for writing. With Leave, empty when there is no store yet. Whatever is not a
-// store, or is a newer one, is left as it is.
+// Opens the store for writing. With Leave, empty when there is no store yet. One of a newer version
+// of the program is set aside (store_aside.h); whatever is not a store is left as it is.
 Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing);
 
 }  // namespace tally

@@ -51,6 +51,17 @@ inline constexpr KnownPreference kKnownPreferences[] = {
      "what happens to waiting logs, structured data and events when the user forbids submission: "
      "`hold` renames them to `NAME.held` until it is allowed again; any other value deletes them",
      "delete"},
+    {kProgramDomain, "StoreConversion", PreferenceType::String,
+     "when a checkpoint converts a metrics store of the former format, which older versions of the "
+     "program can read: `at once`, `never`, or after 30 days on which the daily run worked",
+     "after 30 days"},
+    {kProgramDomain,
+     "StoreConversionDays",
+     PreferenceType::Dictionary,
+     "kept by the program until then: the number of those `days`, and the `last` of them",
+     "absent",
+     {},
+     true},
     {kProgramDomain,
      "LastOSVersion",
      PreferenceType::String,

@@ -6,6 +6,7 @@
 #include <limits>
 
 #include "base/files/device_root.h"
+#include "base/files/set_aside.h"
 #include "host/described/described_entries.h"
 #include "host/linux_platform.h"
 #include "host/preferences/property_list_preferences.h"
@@ -20,6 +21,7 @@
 #include "tools/frame/spelling.h"
 #include "tools/metrics/known_metrics.h"
 #include "tools/report/daily_log.h"
+#include "tools/store/stores_aside.h"
 #include "tools/whitelist/metric_check.h"
 #include "tools/whitelist/whitelist_check.h"
 
@@ -128,6 +130,9 @@ void examineWhitelist(const ToolContext& context, HealthChecks& checks) {
 
 void examineStore(Platform& platform, const DeviceRoot& root, HealthChecks& checks) {
   constexpr const char* kSubject = "metrics store";
+  if (const std::string aside = describeStoresAside(root); !aside.empty()) {
+    checks.push_back({Health::Wrong, kSubject, aside});
+  }
   const StoreFile file = metricsStoreFile(root);
   const auto identity = file.directory.identity(file.name);
   if (!identity) {
@@ -179,12 +184,13 @@ void examinePreferences(const DeviceRoot& root, HealthChecks& checks) {
                       domains->empty() ? "none are set" : counted(domains->size(), "domain")});
   }
   const auto names = folder.list();
-  const auto aside =
-      names ? std::ranges::count_if(*names,
-                                    [](const std::string& name) {
-                                      return name.find(".plist.damaged-") != std::string::npos;
-                                    })
-            : 0;
+  const auto aside = names ? std::ranges::count_if(*names,
+                                                   [](const std::string& name) {
+                                                     const std::string mark =
+                                                         ".plist" + asideMark(kDamagedWord);
+                                                     return name.find(mark) != std::string::npos;
+                                                   })
+                           : 0;
   if (aside > 0) {
     checks.push_back(
         {Health::Wrong, kSubject,

@@ -10,7 +10,7 @@
 #include "host/ingress/recorder_client.h"
 #include "host/linux_platform.h"
 #include "host/spool/waiting_logs.h"
-#include "host/store/store_schema.h"
+#include "host/store/store_aside.h"
 #include "platform/tables/known_preferences.h"
 #include "tools/frame/command.h"
 #include "tools/frame/output.h"
@@ -34,14 +34,19 @@ bool isConfirmed(const ToolContext& context, const WaitingFiles& waiting) {
   return std::getline(std::cin, answer) && answer == "yes";
 }
 
-// Removes SQLite's companion files first, so that none is left for another store.
+// Those that were set aside too. Removes SQLite's companion files first, so that none is left for
+// another store.
 Status eraseStore(const DeviceRoot& root) {
   const StoreFile file = metricsStoreFile(root);
   const auto directory = file.directory.open();
   if (!directory && directory.error().systemError == ENOENT) return Done{};
   if (!directory) return directory.error();
-  for (const char* const suffix : {"-journal", "-wal", "-shm", ""}) {
-    if (auto removed = directory->remove(file.name + suffix); !removed) return removed;
+  std::vector<std::string> names{file.name};
+  for (const StoreSetAside& aside : storesSetAside(file)) names.push_back(aside.name);
+  for (const std::string& name : names) {
+    for (const char* const suffix : {"-journal", "-wal", "-shm", ""}) {
+      if (auto removed = directory->remove(name + suffix); !removed) return removed;
+    }
   }
   return directory->sync();
 }

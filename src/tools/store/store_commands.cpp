@@ -12,6 +12,7 @@
 #include "base/number_text.h"
 #include "base/time_text.h"
 #include "host/linux_platform.h"
+#include "host/store/store_aside.h"
 #include "host/store/store_history.h"
 #include "host/store/store_writer.h"
 #include "tools/frame/command.h"
@@ -22,6 +23,7 @@
 #include "tools/store/store_csv.h"
 #include "tools/store/store_dump.h"
 #include "tools/store/store_import.h"
+#include "tools/store/stores_aside.h"
 
 namespace tally::tools {
 namespace {
@@ -33,9 +35,24 @@ struct StoreArguments {
   std::optional<std::string> day;
   std::optional<std::uint32_t> offset;
   std::string prefix;
+  std::optional<std::uint32_t> aside;  // which store that was set aside; else the device's
 };
 
-StoreFile storeFile(const ToolContext& context) { return metricsStoreFile(context.root); }
+StoreFile storeFile(const ToolContext& context) {
+  StoreFile file = metricsStoreFile(context.root);
+  file.notify = [&context](const std::string& message) { complain(context, message, kSuccess); };
+  return file;
+}
+
+// The store to read. Empty after a complaint.
+std::optional<StoreFile> storeToRead(const ToolContext& context, const StoreArguments& arguments) {
+  StoreFile file = metricsStoreFile(context.root);
+  if (!arguments.aside) return file;
+  file = storeSetAside(file, *arguments.aside);
+  if (file.directory.identity(file.name)) return file;
+  complain(context, "there is no " + file.text(), kBadUsage);
+  return std::nullopt;
+}
 
 template <class Work>
 Status writeStore(const ToolContext& context, const Work& work) {
@@ -223,8 +240,10 @@ int dump(const ToolContext& context, const StoreArguments& arguments) {
     range.minimumDay = *day == range.minimumDay ? *day : *day - 1;
     range.maximumDay = *day;
   }
+  const auto file = storeToRead(context, arguments);
+  if (!file) return kBadUsage;
   std::string fault;
-  const auto history = openSqliteHistory(storeFile(context), [&](const std::string& message) {
+  const auto history = openSqliteHistory(*file, [&](const std::string& message) {
     if (fault.empty()) fault = message;
   });
   if (context.json) {
@@ -292,13 +311,17 @@ void printKeys(const ToolContext& context, const std::vector<ListedKey>& keys) {
   table.print(context);
 }
 
-int listKeys(const ToolContext& context, const StoreArguments&) {
+int listKeys(const ToolContext& context, const StoreArguments& arguments) {
+  const auto file = storeToRead(context, arguments);
+  if (!file) return kBadUsage;
   std::string fault;
-  const auto keys = gatherKeys(storeFile(context), fault);
+  const auto keys = gatherKeys(*file, fault);
   if (context.json) {
     printJson(context, keysJson(keys));
   } else {
     printKeys(context, keys);
+    const auto aside = describeStoresAside(context.root);
+    if (!arguments.aside && !aside.empty()) printLine(context, aside);
   }
   return fault.empty() ? kSuccess : complain(context, fault, kWrong);
 }
@@ -338,11 +361,18 @@ void addStoreCommands(CLI::App& app, ToolContext& context) {
   store.add("import", "Import CSV: kind,key,day,offset,value[,weight]", import)
       .argument(kFileValue, &arguments.file, "A file, or - for standard input");
 
-  addDay(store.add("dump", "Print all rows as CSV, in the form that import reads", dump),
-         "; all days by default")
-      .option("--prefix", kTextValue, &arguments.prefix, "Only keys that start with it");
+  const auto addAside = [&](const Command& reading) {
+    reading
+        .option("--aside", {"N", ValueKind::Number}, &arguments.aside,
+                "Read NAME.newer-N, a store that an older version of the program set aside")
+        .within(1, kMostStoresSetAside);
+  };
+  command = addDay(store.add("dump", "Print all rows as CSV, in the form that import reads", dump),
+                   "; all days by default");
+  command.option("--prefix", kTextValue, &arguments.prefix, "Only keys that start with it");
+  addAside(command);
 
-  store.add("keys", "List the keys, with their days and numbers of samples", listKeys);
+  addAside(store.add("keys", "List the keys, with their days and numbers of samples", listKeys));
 }
 
 }  // namespace tally::tools
