@@ -68,6 +68,7 @@ void DailyTasks::runDaily(std::int32_t day, const KvArray* appInfo) {
   tasks_.updateTaskingState(platform_);
   crashReporting.rollFixlineLogs();
   recordOwnFigures(platform_, own);  // last, so that it knows what all of this cost
+  platform_.metricsStore->close();   // its files are gone before the day's last write is synced
 }
 
 }  // namespace tally

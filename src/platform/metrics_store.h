@@ -86,6 +86,8 @@ class MetricsStore {
   // Scalars and counters set between these two are one transaction.
   virtual void beginBatch() = 0;
   virtual void endBatch() = 0;
+  // Ends what is kept open between the writes of a run; a later write opens it again.
+  virtual void close() {}
   // The history of the store on its default path. Never null: a store that is missing has no rows,
   // one that cannot be read has none either and the reason is logged at error level.
   virtual std::unique_ptr<HistoryStore> openHistory() = 0;

@@ -51,17 +51,38 @@ Status TemporaryFile::write(std::string_view bytes) {
   return Done{};
 }
 
-Status TemporaryFile::commit() {
-  const auto failure = [this](std::string_view what) {
-    const int code = errno;
-    return Error{
-        std::string(what) + " " + directory_.pathOf(temporary_) + ": " + std::strerror(code), code};
-  };
-  if (retried([&] { return ::fsync(file_.get()); }) != 0) return failure("cannot sync");
-  if (file_.close() != 0) return failure("cannot close");
+// A file system with a journal writes it once for all files whose blocks have been chosen by then,
+// and each fsync() would only choose those of its own file.
+Status TemporaryFile::syncAll(std::span<TemporaryFile* const> files) {
+  if (files.size() > 1) {
+    for (const TemporaryFile* file : files) {
+      (void)::sync_file_range(file->file_.get(), 0, 0, SYNC_FILE_RANGE_WRITE);  // a hint
+    }
+  }
+  for (TemporaryFile* file : files) {
+    const auto failure = [file](std::string_view what) {
+      const int code = errno;
+      return Error{std::string(what) + " " + file->directory_.pathOf(file->temporary_) + ": " +
+                       std::strerror(code),
+                   code};
+    };
+    if (retried([&] { return ::fsync(file->file_.get()); }) != 0) return failure("cannot sync");
+    if (file->file_.close() != 0) return failure("cannot close");
+  }
+  return Done{};
+}
+
+Status TemporaryFile::rename() {
   if (auto renamed = directory_.rename(temporary_, name_); !renamed) return renamed;
   temporary_.clear();
-  return directory_.sync();
+  return Done{};
+}
+
+Status TemporaryFile::commit() {
+  TemporaryFile* const self[] = {this};
+  if (auto synced = syncAll(self); !synced) return synced;
+  if (auto renamed = rename(); !renamed) return renamed;
+  return syncDirectory();
 }
 
 Status writeFileAtomically(const Directory& directory, std::string_view name,

@@ -1,6 +1,7 @@
 // Files that replace others as a whole.
 #pragma once
 
+#include <span>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -11,7 +12,7 @@
 
 namespace tally {
 
-// A file being written under a temporary name. Unless commit() succeeds the destructor removes it.
+// A file being written under a temporary name. Unless it gets its name the destructor removes it.
 class TemporaryFile {
  public:
   // Makes a new file in the directory that will be called name.
@@ -24,6 +25,11 @@ class TemporaryFile {
   Status write(std::string_view bytes);
   // fsync, rename to the final name, fsync of the directory.
   Status commit();
+  // The three steps of it, for files that are committed together: all contents are durable before
+  // the first file gets its name.
+  static Status syncAll(std::span<TemporaryFile* const> files);
+  Status rename();
+  Status syncDirectory() const { return directory_.sync(); }
 
  private:
   TemporaryFile(Directory directory, std::string name, std::string temporary, Descriptor file)

@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <span>
 
 #include "base/files/file.h"
 #include "base/files/file_lock.h"
@@ -132,16 +133,15 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
 
   const FolderBounds bounds = folderBounds(*preferences_);
   const std::string stem = fmt::format("{}{}", sequencePrefix(*sequence), name);
-  if (auto written = commit(*folder, *information, stem, writer, bounds.maximumBytes); !written) {
-    return written;
-  }
+  if (identity) identity->last.insert_or_assign(std::string(name), identity->next(name));
+  auto number =
+      identity ? identityFile_.prepare(*identity) : Result<TemporaryFile>(Error{identity.error()});
+  Status numbered = identity && !number ? Status(number.error()) : Done{};
+  auto written = commit(*folder, *information, stem, writer, bounds.maximumBytes,
+                        number ? &*number : nullptr, numbered);
+  if (!written) return written;
   // The log is safe. Should its number not be noted now, it is found beside the log the next time.
-  if (identity) {
-    identity->last.insert_or_assign(std::string(name), identity->next(name));
-    if (const auto noted = identityFile_.write(*identity); !noted) {
-      log_->fault("log number", "log submission: {}", noted.error().message);
-    }
-  }
+  if (!numbered) log_->fault("log number", "log submission: {}", numbered.error().message);
   if (const auto evicted = evictOldest(*folder, bounds, *sequence); !evicted) {
     log_->fault("log submission: older logs stay", "log submission: {}", evicted.error().message);
   }
@@ -150,10 +150,11 @@ Status SpoolSubmission::submit(std::string_view typeCode, std::string_view name,
 
 Status SpoolSubmission::commit(const Directory& folder, const KvDictionary& information,
                                const std::string& stem, const Writer& writer,
-                               std::uint64_t maximumBytes) {
+                               std::uint64_t maximumBytes, TemporaryFile* number,
+                               Status& numbered) {
   const auto text = encodeXmlPlist(information);
   if (!text) return text.error();
-  auto written = writeBody(folder, stem, *text, writer, maximumBytes);
+  auto written = writeFiles(folder, stem, *text, writer, maximumBytes, number, numbered);
   if (!written) {
     (void)folder.remove(stem + std::string(kBodySuffix));
     (void)folder.remove(stem + std::string(kInformationSuffix));
@@ -161,19 +162,31 @@ Status SpoolSubmission::commit(const Directory& folder, const KvDictionary& info
   return written;
 }
 
-// The information gets its name before the body does, so that no body is ever without.
-Status SpoolSubmission::writeBody(const Directory& folder, const std::string& stem,
-                                  const std::string& info, const Writer& writer,
-                                  std::uint64_t maximumBytes) {
+// The information gets its name before the body does, so that no body is ever without, and the
+// number after it, so that none is left out.
+Status SpoolSubmission::writeFiles(const Directory& folder, const std::string& stem,
+                                   const std::string& info, const Writer& writer,
+                                   std::uint64_t maximumBytes, TemporaryFile* number,
+                                   Status& numbered) {
   auto body = TemporaryFile::create(folder, stem + std::string(kBodySuffix));
   if (!body) return body.error();
   SpoolFile file(*body, folder, maximumBytes - std::min<std::uint64_t>(maximumBytes, info.size()));
   writer(file);
   if (!file.status()) return file.status();
   if (auto reserve = checkReserve(folder, info.size()); !reserve) return reserve;
-  const std::string infoName = stem + std::string(kInformationSuffix);
-  if (auto written = writeFileAtomically(folder, infoName, info); !written) return written;
-  return body->commit();
+  auto informed = TemporaryFile::create(folder, stem + std::string(kInformationSuffix));
+  if (!informed) return informed.error();
+  if (auto written = informed->write(info); !written) return written;
+  TemporaryFile* const files[] = {&*informed, &*body, number};
+  const std::span<TemporaryFile* const> all(files, number != nullptr ? 3 : 2);
+  if (auto synced = TemporaryFile::syncAll(all); !synced) return synced;
+  for (TemporaryFile* each : {&*informed, &*body}) {
+    if (auto renamed = each->rename(); !renamed) return renamed;
+  }
+  if (number != nullptr) numbered = number->rename();
+  if (auto synced = folder.sync(); !synced) return synced;
+  if (number != nullptr && numbered) numbered = number->syncDirectory();
+  return Done{};
 }
 
 void readLogInformation(std::string_view bytes, SpooledLog& log) {

@@ -54,10 +54,13 @@ class SpoolSubmission final : public LogSubmission {
  private:
   Status submit(std::string_view typeCode, std::string_view name, const KvDictionary* options,
                 const Writer& writer);
+  // The number's file, which may be null, is committed with the log; numbered is how that went.
   Status commit(const Directory& folder, const KvDictionary& information, const std::string& stem,
-                const Writer& writer, std::uint64_t maximumBytes);
-  static Status writeBody(const Directory& folder, const std::string& stem, const std::string& info,
-                          const Writer& writer, std::uint64_t maximumBytes);
+                const Writer& writer, std::uint64_t maximumBytes, TemporaryFile* number,
+                Status& numbered);
+  static Status writeFiles(const Directory& folder, const std::string& stem,
+                           const std::string& info, const Writer& writer,
+                           std::uint64_t maximumBytes, TemporaryFile* number, Status& numbered);
 
   DeviceDirectory folder_;
   IdentityFile identityFile_;

@@ -114,6 +114,11 @@ Result<SubmissionIdentity> IdentityFile::load(const Directory& spool, SystemLog&
 }
 
 Status IdentityFile::write(const SubmissionIdentity& identity) const {
+  auto file = prepare(identity);
+  return file ? file->commit() : Status(file.error());
+}
+
+Result<TemporaryFile> IdentityFile::prepare(const SubmissionIdentity& identity) const {
   const auto numbers = KvDictionary::create();
   for (const auto& [name, number] : identity.last) {
     numbers->set(name, KvNumber::int64(static_cast<std::int64_t>(number)));
@@ -123,7 +128,10 @@ Status IdentityFile::write(const SubmissionIdentity& identity) const {
   if (!bytes) return bytes.error();
   const auto folder = folder_.make();
   if (!folder) return folder.error();
-  return writeFileAtomically(*folder, kIdentityFile, *bytes);
+  auto file = TemporaryFile::create(*folder, kIdentityFile);
+  if (!file) return file;
+  if (auto written = file->write(*bytes); !written) return written.error();
+  return file;
 }
 
 Result<SubmissionIdentity> IdentityFile::reset() const {

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "base/files/device_root.h"
+#include "base/files/temporary_file.h"
 #include "platform/system_log.h"
 
 namespace tally {
@@ -34,8 +35,8 @@ bool isDevicePseudonym(std::string_view text);
 
 // The file that keeps it. All calls but read() and hasLeftOvers() REQUIRE the lock of the spool.
 //
-// A log's number is written here after the log's commit. If a run dies between the two, the number
-// is found beside the log: load() looks there, and must be called before a log is removed.
+// A log's number gets its name here after the log has its own. If a run dies between the two, the
+// number is found beside the log: load() looks there, and must be called before a log is removed.
 class IdentityFile {
  public:
   explicit IdentityFile(const DeviceRoot& root) : folder_(root, std::string(kIdentityFolder)) {}
@@ -46,6 +47,8 @@ class IdentityFile {
   // one that was damaged with one error line. An error if it cannot be read or written now.
   Result<SubmissionIdentity> load(const Directory& spool, SystemLog& log) const;
   Status write(const SubmissionIdentity& identity) const;
+  // The same, not committed yet.
+  Result<TemporaryFile> prepare(const SubmissionIdentity& identity) const;
   // A new pseudonym. Logs that wait keep the former one.
   Result<SubmissionIdentity> reset() const;
   // The next log begins with a new one.

@@ -61,6 +61,8 @@ class SqliteMetricsStore final : public MetricsStore {
     if (batchDepth_ > 0 && --batchDepth_ == 0) writeBatch();
   }
 
+  void close() override { writer_.reset(); }
+
   std::unique_ptr<HistoryStore> openHistory() override {
     return openSqliteHistory(file_, [this](const std::string& message) { report(Error{message}); });
   }

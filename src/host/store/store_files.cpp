@@ -172,10 +172,37 @@ sqlite3_vfs* base() {
   return found;
 }
 
+// SQLite syncs a log's header before the frames after it, because a former header with some of the
+// new frames could make former frames valid again. A log that holds nothing but a header has no
+// former frames: its first commit syncs both, and a sync of the file system's journal is saved.
+constexpr sqlite3_int64 kLogHeaderBytes = 32;
+int (*formerSync)(sqlite3_file*, int);
+
+int syncLog(sqlite3_file* file, int flags) {
+  sqlite3_int64 size = 0;
+  const int code = file->pMethods->xFileSize(file, &size);
+  if (code == SQLITE_OK && size <= kLogHeaderBytes) return SQLITE_OK;
+  return formerSync(file, flags);
+}
+
+// The calls on a log, which is always opened the same way.
+const sqlite3_io_methods* logMethods(const sqlite3_io_methods* former) {
+  static const sqlite3_io_methods ours = [former] {
+    sqlite3_io_methods methods = *former;
+    formerSync = methods.xSync;
+    methods.xSync = syncLog;
+    return methods;
+  }();
+  return former->xSync == formerSync ? &ours : former;
+}
+
 int open(sqlite3_vfs*, const char* path, sqlite3_file* file, int flags, int* opened) {
   file->pMethods = nullptr;
   if (path != nullptr && !placeOf(path)) return SQLITE_CANTOPEN;
-  return base()->xOpen(base(), path, file, flags, opened);
+  const int code = base()->xOpen(base(), path, file, flags, opened);
+  if (code == SQLITE_OK && (flags & SQLITE_OPEN_WAL) != 0)
+    file->pMethods = logMethods(file->pMethods);
+  return code;
 }
 
 int remove(sqlite3_vfs*, const char* path, int syncDirectory) {
