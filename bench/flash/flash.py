@@ -1,5 +1,6 @@
-"""What a day of recording writes to the disk, counted by the emulated machine's block layer: for some
-intervals between commits, and beside programs that commit each value. scripts/bench-flash starts it."""
+"""What an ordinary day and a day of recording write to the disk, counted by the emulated machine's block
+layer: for some intervals between commits, and beside programs that commit each value. With --days only the
+ordinary day, of former programs too if the machine was made with some. scripts/bench-flash starts it."""
 import concurrent.futures
 import pathlib
 import plistlib
@@ -10,7 +11,7 @@ import sys
 TOP = pathlib.Path(__file__).resolve().parents[2]
 sys.path[:0] = [str(TOP / "tests/vm"), str(TOP / "bench")]
 from bench_figures import add_figure, at_most
-from machine import Machine
+from machine import MADE, Machine
 from run import FIRST_DAY
 
 INTERVALS, DEFAULT_INTERVAL = (1, 5, 15, 60), 15  # minutes
@@ -19,6 +20,7 @@ SINGLE = 100  # values that the yardstick commits one by one
 MIB = 1 << 20
 SECTOR = 512
 LONGEST_DAY = 1200  # seconds
+DAYS = 12  # of which the last half is counted: the first ones make directories and files
 WHITELIST = {"Machine": {"ScalarKeys": {}, "DistributionKeys": {}, "ScalarKeyPrefixes": {"com.example.": {}},
                          "DistributionKeyPrefixes": {"com.example.": {}}}}
 
@@ -28,10 +30,10 @@ class FlashMachine(Machine):
     FILE_SYSTEM = ["-b", "4096", "-E", "lazy_itable_init=0,lazy_journal_init=0"]
     SIZE = "512M"
 
-    def answers(self, minutes):
+    def answers(self, **arguments):
         """By name what the machine answers: bytes written until then, or a text."""
         self.log.write_bytes(b"")
-        command = self.command(FIRST_DAY, "virtio", {"MODE": "flash", "DAY": FIRST_DAY, "MINUTES": minutes})
+        command = self.command(FIRST_DAY, "virtio", {"DAY": FIRST_DAY, **arguments})
         said = subprocess.run(command, stdin=subprocess.DEVNULL, capture_output=True, text=True, errors="replace",
                               timeout=LONGEST_DAY, check=False).stdout.splitlines()
         if "measured" not in said:
@@ -45,11 +47,33 @@ def written(answers, begin, end):
     return [(b - a) * unit for a, b, unit in zip(first, last, (SECTOR, 1, 1))]
 
 
-def measure(minutes):
-    machine = FlashMachine(f"flash-{minutes}", {
+def make_machine(name):
+    return FlashMachine(name, {
         "Library/Application Support/Tallybook/Whitelist_Nimbus.plist": WHITELIST,
         "var/mobile/Library/Preferences/vellum.tallyd.tallyrun.plist": {}}, None)
-    answers = machine.answers(minutes)
+
+
+def ordinary_day():
+    print("an ordinary day: 200 scalars and 32 distributions of 24 samples in one import, and the daily job")
+    print(f"{'programs':<14}{'recording, KiB':>15}{'daily job, KiB':>16}{'both, KiB':>11}{'requests':>10}{'flushes':>9}")
+    for name, programs in (("former", "former/bin"), ("these", "usr/bin")):
+        if not (MADE / "root" / programs / "tallyrun").exists():
+            continue
+        answers = make_machine(f"days-{name}").answers(MODE="days", PROGRAMS=f"/{programs}", LAST=DAYS - 1)
+        if answers["logs"] != str(DAYS):
+            raise SystemExit(f"not every day has a log: {answers['logs']}")
+        counted = range(DAYS // 2, DAYS)
+        recording, job = ([sum(figure) / len(counted) for figure in zip(
+            *(written(answers, f"{begin}-{day}", f"{end}-{day}") for day in counted))]
+                          for begin, end in (("begun", "recorded"), ("recorded", "reported")))
+        both = [a + b for a, b in zip(recording, job)]
+        print(f"{name:<14}{recording[0] / 1024:15.0f}{job[0] / 1024:16.0f}{both[0] / 1024:11.0f}{both[1]:10.0f}"
+              f"{both[2]:9.0f}", flush=True)
+
+
+def measure(minutes):
+    machine = make_machine(f"flash-{minutes}")
+    answers = machine.answers(MODE="flash", MINUTES=minutes)
     (machine.folder / "answers").write_text("".join(f"{name} {text}\n" for name, text in answers.items()))
     if answers["recorded"] != f"{METRICS} of {METRICS}":
         raise SystemExit(f"not all was recorded: {answers['recorded']}")
@@ -57,7 +81,10 @@ def measure(minutes):
 
 
 def main():
-    print("a day of 100 counts a second over 500 keys and 10 samples a second over 50 keys, MiB written")
+    ordinary_day()
+    if "--days" in sys.argv:
+        return
+    print("\na day of 100 counts a second over 500 keys and 10 samples a second over 50 keys, MiB written")
     print(f"{'interval':<14}{'recording':>10}{'with the daily run':>20}{'requests':>10}{'flushes':>9}"
           f"{'of each commit, KiB':>21}")
     with concurrent.futures.ThreadPoolExecutor(2) as pool:  # what is counted is not time
