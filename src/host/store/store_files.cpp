@@ -174,7 +174,8 @@ sqlite3_vfs* base() {
 
 // SQLite syncs a log's header before the frames after it, because a former header with some of the
 // new frames could make former frames valid again. A log that holds nothing but a header has no
-// former frames: its first commit syncs both, and a sync of the file system's journal is saved.
+// former frames: its first commit syncs both, and a commit of the file system's journal is saved.
+// The blocks of a log that was removed are used again only once the removal is durable.
 constexpr sqlite3_int64 kLogHeaderBytes = 32;
 int (*formerSync)(sqlite3_file*, int);
 
