@@ -1,7 +1,8 @@
 // The daily log of a large day: `tallyrun -f` as a whole, beside a query and a script that work on
-// a table with a row for each sample; and the pass over the samples alone, beside reading the same
-// store with nothing computed. Each measurement is a process of its own. "bench_daily_log growth"
-// measures the whole run and the query for days of different sizes.
+// a table with a row for each sample; and the pass over the samples alone, beside reading stores
+// with the same samples, raw and packed, with nothing computed. Each measurement is a process of
+// its own. "bench_daily_log growth" measures the whole run and the query for days of different
+// sizes.
 #include <stdlib.h>
 
 #include <algorithm>
@@ -96,7 +97,7 @@ int make(const std::string& base, std::size_t samplesEach) {
   SampleDay fewer = day;
   fewer.samplesEach /= 100;
   return makeDevice(base + "/full", day) && makeDevice(base + "/few", fewer) &&
-                 makeRowDatabase(base + "/rows.sqlite", day)
+                 makeRawDevice(base + "/raw", day) && makeRowDatabase(base + "/rows.sqlite", day)
              ? 0
              : 1;
 }
@@ -149,7 +150,8 @@ int measure(const std::string& self, const std::string& yardsticks) {
 
   const auto onFull = onDevice(full), onFew = onDevice(few);
   const std::string store = metricsStoreFile(full).text(), job = programs / "tallyrun";
-  ProcessCost whole, small, pass, floor, values, query, script;
+  const std::string raw = base + "/raw", rawStore = metricsStoreFile(raw).text();
+  ProcessCost whole, small, pass, rawPass, floor, packed, query, script;
   // In turns, so that a machine whose speed drifts slows all alike.
   for (int round = 0; round < kRounds; ++round) {
     least(query, {self, "query", rows});
@@ -158,8 +160,9 @@ int measure(const std::string& self, const std::string& yardsticks) {
     for (int again = 0; again < kRounds; ++again) {
       least(whole, {job, "-f"}, onFull);
       least(pass, {self, "pass", full});
-      least(floor, {self, "read-store", store});
-      least(values, {self, "read-values", store});
+      least(rawPass, {self, "pass", raw});
+      least(floor, {self, "read-raw", rawStore});
+      least(packed, {self, "read-store", store});
     }
     least(script, {"python3", yardsticks + "/daily_log.py", rows, whitelistPath(full),
                    std::to_string(day.day), expected});
@@ -169,8 +172,9 @@ int measure(const std::string& self, const std::string& yardsticks) {
   line("yardstick: one SQL query, a row per sample", query);
   line("yardstick: Python script, a row per sample", script);
   line("the samples' pass alone", pass);
-  line("yardstick: the whole store read, not computed", floor);
-  line("yardstick: the samples' values read, not computed", values);
+  line("the same of a raw store, schema version 1", rawPass);
+  line("yardstick: the whole raw store read", floor);
+  line("yardstick: the whole store read, not unpacked", packed);
   const ProcessCost compared =
       runProcess({"python3", yardsticks + "/compare_logs.py", newestLog(full), expected});
   std::filesystem::remove_all(base);
@@ -179,7 +183,8 @@ int measure(const std::string& self, const std::string& yardsticks) {
               compared.exitStatus == 0 ? "equal" : "DIFFERENT");
   std::printf("query / tallyrun                     %6.1f\n", query.cpuSeconds / whole.cpuSeconds);
   std::printf("script / tallyrun                    %6.1f\n", script.cpuSeconds / whole.cpuSeconds);
-  std::printf("pass / whole store read              %6.2f\n", pass.cpuSeconds / floor.cpuSeconds);
+  std::printf("pass / whole raw store read          %6.2f\n", pass.cpuSeconds / floor.cpuSeconds);
+  std::printf("pass / pass of a raw store           %6.2f\n", pass.cpuSeconds / rawPass.cpuSeconds);
   std::printf("pass / values read                   %6.2f\n", pass.cpuSeconds / values.cpuSeconds);
   std::printf("peak, 100 times the samples          %+6.1f %%\n",
               100.0 * (mebibytes(whole) / mebibytes(small) - 1));
@@ -187,8 +192,10 @@ int measure(const std::string& self, const std::string& yardsticks) {
             timesLess(60));
   addFigure("a large day, beside SQL", whole.cpuSeconds, "s CPU", "one SQL query", query.cpuSeconds,
             timesLess(30));
-  addFigure("a large day, the pass over the samples", pass.cpuSeconds, "s CPU", "reading the store",
+  addFigure("a large day, the pass over the samples", pass.cpuSeconds, "s CPU", "reading a raw store",
             floor.cpuSeconds, atMost(1.5));
+  addFigure("a large day, the pass over packed samples", pass.cpuSeconds, "s CPU",
+            "over raw ones", rawPass.cpuSeconds, atMost(1));
   addFigure("a large day, peak", mebibytes(whole), "MiB", atMost(28));
   addFigure("a large day, growth of the peak", mebibytes(whole), "MiB",
             "a hundredth of the samples", mebibytes(small), atMost(1.05));
@@ -206,11 +213,13 @@ int main(int count, char** arguments) {
   }
   if (mode == "growth") return growth(self);
   if (mode == "read-store" && count == 3) {
+    return readRows(arguments[2],
+                    {"SELECT key, day, value FROM scalars",
+                     "SELECT sample_values, sample_weights, sample_offsets FROM series"});
+  }
+  if (mode == "read-raw" && count == 3) {
     return readRows(arguments[2], {"SELECT key, day, value FROM scalars",
                                    "SELECT sample_values, sample_offsets FROM chunks"});
-  }
-  if (mode == "read-values" && count == 3) {
-    return readRows(arguments[2], {"SELECT sample_values FROM chunks"});
   }
   if (mode == "query" && count == 3) {
     return readRows(arguments[2], {"SELECT key, count(*), min(value), max(value), avg(value) "

@@ -91,9 +91,8 @@ def rival(device):
         for count in range(count + 1, count + 501):
             store.execute("BEGIN IMMEDIATE")
             store.execute("INSERT OR REPLACE INTO scalars VALUES (?, 'load.rival', ?)", (TODAY, count))
-            store.execute("INSERT INTO recent SELECT ?1, 'load.rival', ifnull(max(number), -1) + 1, 1, ?2,"
-                          " zeroblob(4) FROM recent WHERE day = ?1 AND key = 'load.rival'",
-                          (TODAY, struct.pack("<d", count)))
+            store.execute("INSERT INTO arrivals VALUES (NULL, ?, 'load.rival', 1, 1, ?)",
+                          (TODAY, struct.pack("<6BHId", 1, 0, 0, 0, 0, 0, 1, 0, count)))
             store.execute("COMMIT")
             time.sleep(max(0, start + count / 1000 - time.monotonic()))
         store.close()
@@ -222,6 +221,7 @@ class Load(DeviceTest):
         seconds, scalars, turns = 3 + 57 * SHARE, sized(20_000, 2000), sized(10, 3)
         device = self.large(SpoolMaximumLogs=1)
         tool(device, "store", "import", "-", stdin=self.rows(scalars, turns))
+        tool(device, "store", "push", "load.rival", "0", "--day", str(YESTERDAY - 1))  # makes the table
         daily(device, "-f")
 
         def readings():

@@ -11,6 +11,7 @@
 #include "base/files/temporary_file.h"
 #include "host/store/store_importer.h"
 #include "kv/plist_codec.h"
+#include "raw_store.h"
 #include "tools/store/store_csv.h"
 
 namespace tally::bench {
@@ -116,6 +117,24 @@ std::string whitelistPath(const std::string& root) {
 
 bool makeDevice(const std::string& root, const SampleDay& day) {
   return writeWhitelist(root, day) && importDay(metricsStoreFile(root), day);
+}
+
+bool makeRawDevice(const std::string& root, const SampleDay& day) {
+  auto store = RawStore::make(metricsStoreFile(root));
+  bool done = store.has_value();
+  for (std::size_t i = 0; done && i < day.scalars; ++i) {
+    done = store->addScalar(day.day, SampleDay::scalarKey(i), SampleDay::scalar(i));
+  }
+  std::vector<double> values(day.samplesEach);
+  std::vector<std::uint32_t> offsets(day.samplesEach);
+  for (std::size_t i = 0; done && i < day.distributions; ++i) {
+    for (std::size_t j = 0; j < day.samplesEach; ++j) {
+      values[j] = SampleDay::sample(i, j);
+      offsets[j] = day.offset(j);
+    }
+    done = store->addSamples(day.day, SampleDay::distributionKey(i), {values, offsets, {}});
+  }
+  return done && store->finish();
 }
 
 bool makeRowDatabase(const std::string& path, const SampleDay& day) {

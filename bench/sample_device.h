@@ -34,6 +34,8 @@ bool makeDevice(const std::string& root, const SampleDay& day);
 std::string whitelistPath(const std::string& root);
 // The same day in a database with a row for each sample, in the order of their recording.
 bool makeRowDatabase(const std::string& path, const SampleDay& day);
+// A store that has the day's samples as they are, of schema version 1.
+bool makeRawDevice(const std::string& root, const SampleDay& day);
 // And as CSV, key by key.
 bool makeCsv(const std::string& path, const SampleDay& day);
 

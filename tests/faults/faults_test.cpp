@@ -181,7 +181,8 @@ class FaultWalk : public testing::TestWithParam<Fault> {
           store->integer("SELECT value FROM scalars WHERE key = 'count' AND day = " + rows);
       EXPECT_TRUE(count && *count == countOf(day)) << day;
       const auto samples = store->integer(
-          "SELECT sum(samples) FROM (SELECT * FROM chunks UNION ALL SELECT * FROM recent) "
+          "SELECT sum(samples) FROM (SELECT day, key, samples FROM series UNION ALL "
+          "SELECT day, key, samples FROM arrivals) "
           "WHERE key = 'time' AND day = " +
           rows);
       EXPECT_TRUE(samples && *samples == kSamples) << day;

@@ -4,6 +4,7 @@
 
 #include <functional>
 #include <random>
+#include <span>
 
 #include "host/store/recording/recording_store.h"
 #include "host/store/store_history.h"
@@ -27,7 +28,8 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
       {"text", [&] { put("data/TBDataStore.sqlitedb", std::string(5000, 't')); }, "not a database"},
       {"short", [&] { std::filesystem::resize_file(path, 60); }, "malformed"},
       {"foreign", [&] { sql("PRAGMA application_id = 7"); }, "not a metrics store"},
-      {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE chunks"); }, "its tables are not"},
+      {"tables of another version", [&] { sql("PRAGMA user_version = 1"); }, "its tables are not"},
+      {"no tables", [&] { sql("DROP TABLE scalars; DROP TABLE series"); }, "its tables are not"},
       {"endless view",
        [&] {
          sql("DROP TABLE scalars; CREATE VIEW scalars AS " + kEndless +
@@ -35,7 +37,7 @@ TEST_F(StoreTest, WhatIsNoStoreIsNamedOnceAndLeftAsItIs) {
        },
        "its tables are not"},
       {"trigger",
-       [&] { sql("CREATE TRIGGER t AFTER INSERT ON scalars BEGIN DELETE FROM chunks; END"); },
+       [&] { sql("CREATE TRIGGER t AFTER INSERT ON scalars BEGIN DELETE FROM series; END"); },
        "its tables are not"},
       {"pipe", [&] { std::filesystem::remove(path), ::mkfifo(path.c_str(), 0600); },
        "not a regular file"},
@@ -142,49 +144,71 @@ TEST_F(StoreTest, WhatHasNoEndIsEnded) {
 }
 
 TEST_F(StoreTest, DamagedRowsAreLeftOutAndKept) {
-  ASSERT_TRUE(push(1, "good", {1, 2, 3}, true) && push(1, "good", {4}));
-  store()->TBClientSetValueForScalarKey("good", 1);
-  const char* const damage[] = {
-      "INSERT INTO scalars VALUES (1, 'text', 'x')",
-      "INSERT INTO scalars VALUES (1, 'real', 1.5)",
-      "INSERT INTO scalars VALUES (1, '', 1)",
-      "INSERT INTO scalars VALUES (1, CAST(x'61ff' AS TEXT), 1)",
-      "INSERT INTO chunks VALUES (1, 'good', 5, 2, zeroblob(16), zeroblob(4))",
-      "INSERT INTO chunks VALUES (1, 'lie', 0, 3, zeroblob(16), zeroblob(8))",
-      "INSERT INTO chunks VALUES (1, 'negative', 0, -1, x'', x'')",
-      "INSERT INTO chunks VALUES (1, 'huge', 0, 1152921504606846976, zeroblob(8), zeroblob(4))",
-      "INSERT INTO chunks VALUES (1, 'numbers', 0, 'two', 3, 4.5)",
-      "INSERT INTO chunks VALUES (1, 'last', 2147483647, 1, zeroblob(8), zeroblob(4))",
-      "INSERT INTO recent VALUES (1, 'odd', 0, 1, zeroblob(7), zeroblob(4))",
-      "INSERT INTO recent VALUES (1, 'good', -7, 1, zeroblob(8), x'')",
-      "INSERT INTO recent VALUES (9223372036854775807, 'far', 0, 1, zeroblob(8), zeroblob(4))",
-  };
-  for (const char* text : damage) sql(text);
-  clock->setDay(1);
-  const auto check = [&] {
-    useBoundedLog();
-    EXPECT_THAT(scalars(), ElementsAre("20514 good=1"));
-    EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1"));
-    ASSERT_EQ(errors().size(), 2u) << "one line for each enumeration";
-    EXPECT_THAT(errors()[0], HasSubstr("damaged rows are left out"));
-  };
-  check();
-  store()->TBClientCheckpoint();
-  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "3") << "the damaged ones and the far day stay";
-  check();
+  const std::string values = "x'0003" + std::string(18, '0') + std::string(32, '0') + "'";
+  const std::string constant = "x'0000" + std::string(18, '0') + std::string(16, '0') + "'";
+  const std::string offsets = "zeroblob(8)";
+  const std::string scalars[] = {"(1, 'text', 'x')", "(1, 'real', 1.5)", "(1, '', 1)",
+                                 "(1, CAST(x'61ff' AS TEXT), 1)"};
+  const std::vector<std::string> raw[] = {
+      {"chunks", "(1, 'good', 5, 2, zeroblob(16), zeroblob(4))",
+       "(1, 'lie', 0, 3, zeroblob(16), zeroblob(8))", "(1, 'negative', 0, -1, x'', x'')",
+       "(1, 'huge', 0, 1152921504606846976, zeroblob(8), zeroblob(4))",
+       "(1, 'numbers', 0, 'two', 3, 4.5)", "(1, 'last', 2147483647, 1, zeroblob(8), zeroblob(4))"},
+      {"recent", "(1, 'odd', 0, 1, zeroblob(7), zeroblob(4))",
+       "(1, 'good', -7, 1, zeroblob(8), x'')",
+       "(9223372036854775807, 'far', 0, 1, zeroblob(8), zeroblob(4))"}};
+  const std::vector<std::string> packed[] = {
+      {"series", "(1, 'good', 5, 2, 2, x'', x'', " + offsets + ")",
+       "(1, 'good', -7, 3, 3, x'" + values.substr(2) + ", x'', " + offsets + ")",
+       "(1, 'weight', 0, 1, 2, " + constant + ", x'', " + offsets + ")",
+       "(1, 'unweighted', 0, 1, 1, " + constant + ", zeroblob(4), " + offsets + ")",
+       "(1, 'form', 0, 1, 1, x'04" + constant.substr(4) + ", x'', " + offsets + ")",
+       "(1, 'huge', 0, 16385, 16385, " + constant + ", x'', " + offsets + ")",
+       "(1, 'wide', 0, 2, 2, " + constant + ", x'', zeroblob(65545))",
+       "(1, 'numbers', 0, 'two', 3, 4.5, 6, 7)",
+       "(1, 'last', 2147483647, 1, 1, " + constant + ", x'', " + offsets + ")"},
+      {"arrivals", "(7, 1, 'good', 1, 1, x'01')", "(8, 9223372036854775807, 'far', 1, 1, x'')"}};
+  for (const std::span<const std::vector<std::string>> tables :
+       {std::span(raw), std::span(packed)}) {
+    SCOPED_TRACE(tables[0][0]);
+    std::filesystem::remove_all(at("data"));
+    if (tables[0][0] == "chunks") makeRawStore();
+    clock->setDay(kToday);
+    ASSERT_TRUE(push(1, "good", {1, 2, 3}, true) && push(1, "good", {4}));
+    store()->TBClientSetValueForScalarKey("good", 1);
+    for (const std::string& row : scalars) sql("INSERT INTO scalars VALUES " + row);
+    for (const auto& table : tables) {
+      for (const std::string& row : std::span(table).subspan(1)) {
+        sql("INSERT INTO " + table[0] + " VALUES " + row);
+      }
+    }
+    clock->setDay(1);
+    const auto check = [&](const char* when) {
+      useBoundedLog();
+      EXPECT_THAT(this->scalars(), ElementsAre("20514 good=1")) << when;
+      EXPECT_THAT(lengths(), ElementsAre("1 good x4", "1 last x1")) << when;
+      ASSERT_EQ(errors().size(), 2u) << when << ": one line for each enumeration";
+      EXPECT_THAT(errors()[0], HasSubstr("damaged rows are left out"));
+    };
+    check("at first");
+    store()->TBClientCheckpoint();
+    const std::string left = sql("SELECT count(*) FROM " + tables[1][0]);
+    EXPECT_EQ(left, std::to_string(tables[1].size() - 1)) << "the damaged ones and the far day";
+    check("after a checkpoint");
+  }
 }
 
 TEST_F(StoreTest, RandomDamageIsNeverMoreThanAnError) {
   ASSERT_TRUE(push(1, "d", sequence(0, 9000), true) && push(1, "e", sequence(0, 300)));
   for (int i = 0; i < 41; ++i) ASSERT_TRUE(set(1, std::to_string(i), i));
-  for (const char* step : {"packed", "arrivals"}) {
+  for (const char* step : {"in order", "arrivals"}) {
     const auto values = sequence(0.5, 3000);
     const std::vector<std::uint32_t> offsets(values.size(), 1), weights(values.size(), 2);
     const auto recorded = makeSqliteRecordingStore(storeFile)->begin();
     const RecordedChange samples{RecordedChange::Kind::Samples, "w", 0, {values, offsets, weights}};
     ASSERT_TRUE(recorded && (*recorded)->apply(1, samples) && (*recorded)->commit()) << step;
     clock->setDay(1);
-    if (step[0] == 'p') store()->TBClientCheckpoint();
+    if (step[0] == 'i') store()->TBClientCheckpoint();
   }
   const std::string whole = get("data/TBDataStore.sqlitedb");
   std::minstd_rand random(11);

@@ -3,7 +3,7 @@
 #include <cmath>
 #include <cstring>
 
-#include "host/store/samples/sample_chunk.h"
+#include "host/store/samples/sample_row.h"
 #include "host/store/store_history.h"
 #include "host/store/store_importer.h"
 #include "host/store_fixture.h"
@@ -37,12 +37,12 @@ TEST_F(StoreTest, SamplesComeBackBitForBitInRecordedOrderHoweverTheyAreStored) {
   const double odd[] = {-0.0, std::numeric_limits<double>::infinity(), std::nan(""), 5e-324,
                         -1e300};
   std::vector<double> expected;
-  const auto record = [&](std::vector<double> values, bool toChunks) {
-    ASSERT_TRUE(push(kToday, "d", values, toChunks));
+  const auto record = [&](std::vector<double> values, bool inOrder) {
+    ASSERT_TRUE(push(kToday, "d", values, inOrder));
     expected.insert(expected.end(), values.begin(), values.end());
   };
   const auto check = [&](const char* when) {
-    for (const std::size_t batch : {std::size_t{1}, std::size_t{999}, 3 * kChunkSamples}) {
+    for (const std::size_t batch : {std::size_t{1}, std::size_t{999}, 3 * kMostRowSamples}) {
       const auto rows = distributions("d", kFirst, kLast, batch);
       ASSERT_EQ(rows.size(), 1u) << when;
       ASSERT_EQ(rows[0].values.size(), expected.size()) << when;
@@ -53,15 +53,15 @@ TEST_F(StoreTest, SamplesComeBackBitForBitInRecordedOrderHoweverTheyAreStored) {
     }
   };
   record({odd, odd + 5}, false);
-  record(sequence(0, 2 * kChunkSamples + 3), false);
+  record(sequence(0, 2 * kMostRowSamples + 3), false);
   check("pushed");
   store()->TBClientCheckpoint();
-  EXPECT_EQ(sql("SELECT count(*) FROM recent"), "0");
+  EXPECT_EQ(sql("SELECT count(*) FROM arrivals"), "0");
   check("folded");
   record(sequence(7, 10), true);
-  record(sequence(1e9, kChunkSamples), true);
+  record(sequence(1e9, kMostRowSamples), true);
   record({1}, false);
-  check("chunks and new ones");
+  check("folded and new ones");
   ASSERT_TRUE(write([](StoreWriter& writer) -> Status {
     const auto complete = writer.foldRecentUntil({});  // a time that is up
     return complete && !*complete ? Status(Done{}) : Error{"not a part"};
@@ -70,9 +70,9 @@ TEST_F(StoreTest, SamplesComeBackBitForBitInRecordedOrderHoweverTheyAreStored) {
   store()->TBClientCheckpoint();
   check("folded again");
   EXPECT_EQ(
-      sql("SELECT count(*) || ' ' || sum(samples) FROM chunks"),
-      std::to_string(expected.size() / kChunkSamples + 1) + " " + std::to_string(expected.size()))
-      << "small chunks are merged";
+      sql("SELECT count(*) || ' ' || sum(samples) FROM series"),
+      std::to_string(expected.size() / kMostRowSamples + 1) + " " + std::to_string(expected.size()))
+      << "small rows are merged";
   EXPECT_THAT(errors(), IsEmpty());
 }
 

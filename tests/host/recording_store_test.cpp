@@ -183,12 +183,12 @@ TEST_F(RecordingStoreTest, SamplesKeepTheirOrderAndWeightsWhereverTheyLie) {
   store()->TBClientCheckpoint();
   EXPECT_EQ(sql("SELECT group_concat(number) FROM arrivals"), "100") << "a damaged row stays";
   sql("DELETE FROM arrivals");
-  sql("INSERT INTO packed VALUES (20514, 'd', 50, 1, 1, x'01')");
+  sql("INSERT INTO series VALUES (20514, 'd', 50, 1, 1, x'01', x'', x'')");
   check("folded");
   ASSERT_TRUE(add(3, 2));
   store()->TBClientCheckpoint();
   check("folded again");
-  EXPECT_EQ(sql("SELECT count(*) FROM packed WHERE key = 'c'"), "2") << "rows are filled";
+  EXPECT_EQ(sql("SELECT count(*) FROM series WHERE key = 'c'"), "1") << "rows are filled";
   StoreImporter importer(storeFile);
   for (const std::uint32_t weight : {1u, 4u}) {
     ASSERT_TRUE(importer.addSample(kToday, "d", 9, weight, weight) &&
@@ -198,7 +198,7 @@ TEST_F(RecordingStoreTest, SamplesKeepTheirOrderAndWeightsWhereverTheyLie) {
   }
   ASSERT_TRUE(importer.finish());
   check("imported");
-  EXPECT_EQ(sql("SELECT count(*) FROM chunks WHERE key = 'new'"), "1");
+  EXPECT_EQ(sql("SELECT count(*) FROM series WHERE key = 'new'"), "1");
   ASSERT_TRUE(record([&](RecordingTransaction& to) {
                 return to.setOwner(kToday - 1, {"d", 1, true});
               }) &&

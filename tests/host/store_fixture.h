@@ -1,6 +1,7 @@
 // A metrics store on disk, and what a test does with it.
 #pragma once
 
+#include <fmt/format.h>
 #include <sqlite3.h>
 
 #include <limits>
@@ -45,13 +46,36 @@ class StoreTest : public TemporaryRoot {
   }
   // Each value one second after the one before.
   bool push(std::int32_t day, std::string_view key, const std::vector<double>& values,
-            bool toChunks = false) const {
+            bool inOrder = false) const {
     std::vector<std::uint32_t> offsets(values.size());
     std::iota(offsets.begin(), offsets.end(), 0u);
     return write([&](StoreWriter& writer) -> Status {
-      return toChunks ? writer.appendSamples(day, key, {values, offsets, {}})
-                      : writer.pushSamples(day, key, values, offsets);
+      return inOrder ? writer.appendSamples(day, key, {values, offsets, {}})
+                     : writer.pushSamples(day, key, values, offsets);
     });
+  }
+
+  // A store of the raw schema, as earlier versions of the program made it.
+  void makeRawStore() const {
+    const auto directory = storeFile.directory.make();
+    auto database = Database::open(*directory, storeFile.name, Database::Access::Create);
+    ASSERT_TRUE(database && database->execute("PRAGMA page_size = 8192") &&
+                database->execute("PRAGMA journal_mode = WAL; BEGIN") &&
+                makeRequiredTables(*database, kRawSchema) && enterSchema(*database, kRawSchema) &&
+                database->execute("COMMIT"));
+  }
+  // A row of `chunks` or `recent`.
+  void addRaw(const std::string& table, std::int32_t day, const std::string& key, int number,
+              const std::vector<double>& values, const std::vector<std::uint32_t>& offsets) const {
+    const auto hex = [](auto column) {
+      std::string text;
+      for (const std::byte byte : std::as_bytes(std::span(column))) {
+        text += fmt::format("{:02x}", std::to_integer<int>(byte));
+      }
+      return "x'" + text + "'";
+    };
+    sql(fmt::format("INSERT INTO {} VALUES ({}, '{}', {}, {}, {}, {})", table, day, key, number,
+                    values.size(), hex(values), hex(offsets)));
   }
 
   // "20513 key=7" for each row.

@@ -104,7 +104,8 @@ Statement& Statement::bind(int parameter, std::string_view text) {
 }
 
 Statement& Statement::bind(int parameter, std::span<const std::byte> blob) {
-  ::sqlite3_bind_blob64(handle_.get(), parameter, blob.data(), blob.size(), SQLITE_STATIC);
+  const void* const bytes = blob.data() != nullptr ? static_cast<const void*>(blob.data()) : "";
+  ::sqlite3_bind_blob64(handle_.get(), parameter, bytes, blob.size(), SQLITE_STATIC);
   return *this;
 }
 

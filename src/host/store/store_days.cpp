@@ -9,41 +9,21 @@
 namespace tally {
 namespace {
 
-struct DayTable {
-  std::string_view name;
-  bool isOptional = false;
-  bool isData = true;  // else what is there only beside data
-};
-constexpr DayTable kDayTables[] = {
-    {"scalars"},
-    {"chunks"},
-    {"recent"},
-    {kPackedTable, true},
-    {kArrivalsTable, true},
-    {kOwnersTable, true, false},
-};
-
-Result<std::vector<DayTable>> presentTables(Database& database) {
-  std::vector<DayTable> present;
-  for (const DayTable& table : kDayTables) {
-    const auto exists = table.isOptional ? hasTable(database, table.name) : Result<bool>(true);
-    if (!exists) return exists.error();
-    if (*exists) present.push_back(table);
-  }
-  return present;
-}
+constexpr std::string_view kDayTables[] = {"scalars",    kChunksTable,   kRecentTable, kPackedTable,
+                                           kSeriesTable, kArrivalsTable, kOwnersTable};
+// Owners are there only beside data.
+constexpr auto kDataTables = std::span(kDayTables).first<std::size(kDayTables) - 1>();
 
 }  // namespace
 
 Result<std::vector<std::int32_t>> daysOfStore(Database& database, std::size_t most) {
-  const auto tables = presentTables(database);
+  const auto tables = presentTables(database, kDataTables);
   if (!tables) return tables.error();
   std::string newest;
-  for (const DayTable& table : *tables) {
-    if (!table.isData) continue;
+  for (const std::string_view table : *tables) {
     newest +=
         (newest.empty() ? "SELECT max(day) AS day FROM " : " UNION ALL SELECT max(day) FROM ") +
-        std::string(table.name) + " WHERE day < ?1";
+        std::string(table) + " WHERE day < ?1";
   }
   auto query = database.prepare("SELECT max(day) FROM (" + newest + ")");
   if (!query) return query.error();
@@ -62,10 +42,10 @@ Result<std::vector<std::int32_t>> daysOfStore(Database& database, std::size_t mo
 }
 
 Status forgetDaysOfStore(Database& database, std::string_view comparison, std::int32_t day) {
-  const auto tables = presentTables(database);
+  const auto tables = presentTables(database, kDayTables);
   if (!tables) return tables.error();
-  for (const DayTable& table : *tables) {
-    auto statement = database.prepare("DELETE FROM " + std::string(table.name) + " WHERE day " +
+  for (const std::string_view table : *tables) {
+    auto statement = database.prepare("DELETE FROM " + std::string(table) + " WHERE day " +
                                       std::string(comparison));
     if (!statement) return statement.error();
     if (!statement->bind(1, std::int64_t{day}).run()) return database.error();

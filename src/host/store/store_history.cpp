@@ -10,36 +10,6 @@
 namespace tally {
 namespace {
 
-using Sources = std::vector<std::unique_ptr<SampleSource>>;
-
-// The samples of one key on one day: those of one source after the other.
-class SqliteDistributionValues final : public DistributionValues {
- public:
-  SqliteDistributionValues(const Sources& sources, std::int32_t day, std::string_view key)
-      : sources_(sources) {
-    for (const auto& source : sources_) source->openSamples(day, key);
-  }
-  ~SqliteDistributionValues() override {
-    for (const auto& source : sources_) source->closeSamples();
-  }
-  std::size_t nextValues(double* values, std::uint32_t* offsets, std::size_t capacity) override {
-    for (; current_ < sources_.size() && capacity > 0; ++current_) {
-      if (const auto count = sources_[current_]->nextValues(values, offsets, capacity)) {
-        return count;
-      }
-    }
-    return 0;
-  }
-  std::span<const std::uint32_t> weights() const override {
-    return current_ < sources_.size() ? sources_[current_]->weights()
-                                      : std::span<const std::uint32_t>();
-  }
-
- private:
-  const Sources& sources_;
-  std::size_t current_ = 0;
-};
-
 class SqliteHistory final : public HistoryStore {
  public:
   SqliteHistory(Database database, StoreFaultHandler onFault, DamagedRowHandler onDamaged)
@@ -76,27 +46,7 @@ class SqliteHistory final : public HistoryStore {
                               const KeyFilter& wanted) override {
     const StoreRange range(keyPrefix, minimumDay, maximumDay);
     StoreFaults faults(database_, onFault_, &losses_);
-    const Sources sources = openSampleSources(database_, faults, range, wanted);
-    bool stop = false;
-    while (!stop) {
-      const SampleSource* first = nullptr;
-      for (const auto& source : sources) {
-        if (source->atEnd()) continue;
-        if (first == nullptr || source->place() < first->place()) {
-          first = source.get();
-        }
-      }
-      if (first == nullptr) break;
-      const std::int32_t day = first->place().first;
-      const std::string key(first->place().second);
-      {
-        SqliteDistributionValues values(sources, day, key);
-        handler(key, day, values, stop);
-      }
-      for (const auto& source : sources) {
-        while (!source->atEnd() && source->place() == SamplePlace(day, key)) source->advance();
-      }
-    }
+    enumerateSources(openSampleSources(database_, faults, range, wanted), handler);
   }
 
   std::optional<std::uint64_t> damagedRows() override {
@@ -104,9 +54,10 @@ class SqliteHistory final : public HistoryStore {
   }
 
   bool hasWeights() override {
-    for (const std::string_view table : {kPackedTable, kArrivalsTable}) {
-      const auto exists = hasTable(database_, table);
-      if (!exists || !*exists) continue;  // a failure is the reading's to report
+    constexpr std::string_view kWeighted[] = {kPackedTable, kSeriesTable, kArrivalsTable};
+    const auto tables = presentTables(database_, kWeighted);
+    if (!tables) return false;  // the reading's to report
+    for (const std::string_view table : *tables) {
       const auto found = database_.integer("SELECT EXISTS(SELECT 1 FROM " + std::string(table) +
                                            " WHERE weight <> samples)");
       if (found && *found != 0) return true;
@@ -146,12 +97,13 @@ void listStoreKeys(const StoreFile& file, const std::function<void(const StoreKe
   if (!*store) return;
   Database& database = **store;
   StoreFaults faults(database, onFault);
-  std::string samples =
-      "SELECT day, key, samples FROM chunks UNION ALL SELECT day, key, samples FROM recent";
-  for (const std::string_view table : {kPackedTable, kArrivalsTable}) {
-    const auto exists = hasTable(database, table);
-    if (!exists) return faults.fail(exists.error());
-    if (*exists) samples += " UNION ALL SELECT day, key, samples FROM " + std::string(table);
+  const auto tables = presentTables(database, kSampleTables);
+  if (!tables) return faults.fail(tables.error());
+  std::string samples;
+  for (const std::string_view table : *tables) {
+    samples += (samples.empty() ? "SELECT day, key, samples FROM "
+                                : " UNION ALL SELECT day, key, samples FROM ") +
+               std::string(table);
   }
   const struct {
     StoreKey::Kind kind;

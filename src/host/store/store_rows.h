@@ -15,12 +15,6 @@ namespace tally {
 // Far above what a key can have on a day; a number beyond it was not written by this program.
 constexpr std::int64_t kMostRowsOfKey = std::numeric_limits<std::int32_t>::max();
 
-// The columns of a chunk, without loading one that is longer than any chunk may have.
-constexpr std::string_view kBoundedValues =
-    "iif(length(sample_values) <= 8388608, sample_values, NULL)";
-constexpr std::string_view kBoundedOffsets =
-    "iif(length(sample_offsets) <= 4194304, sample_offsets, NULL)";
-
 // Ensures that a walk along a tree ends: in a damaged file pages may form a loop, but rows in
 // rising order cannot repeat. Checking a few of them is enough.
 class RowOrder {
@@ -65,15 +59,15 @@ struct StoreRange {
   static constexpr std::string_view kCondition =
       " WHERE day > ?1 AND day <= ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4)";
 
-  StoreRange(std::string_view keyPrefix, std::int32_t minimumDay, std::int32_t maximumDay)
+  StoreRange(std::string_view keyPrefix, std::int64_t minimumDay, std::int64_t maximumDay)
       : prefix(keyPrefix), end(endOfPrefix(keyPrefix)), minimum(minimumDay), maximum(maximumDay) {}
   void bindTo(Statement& statement) const {
-    statement.bind(1, std::int64_t{minimum}).bind(2, std::int64_t{maximum}).bind(3, prefix);
+    statement.bind(1, minimum).bind(2, maximum).bind(3, prefix);
     if (!end.empty()) statement.bind(4, std::string_view(end));
   }
   std::string_view prefix;
   std::string end;
-  std::int32_t minimum, maximum;
+  std::int64_t minimum, maximum;
 };
 
 // What a reader of the store did not get to see.

@@ -17,25 +17,35 @@ namespace tally {
 namespace {
 
 constexpr std::int64_t kApplicationId = 0x54424453;  // "TBDS"
-constexpr std::int64_t kSchemaVersion = 1;
+constexpr std::int64_t kSchemaVersion = kPackedSchema;
 constexpr std::size_t kLongestKey = 512;
 
 // Days and keys are in the order of every pass, so a pass is one walk along the tree. New samples
-// go to a small table of their own, which is cheap to write; a checkpoint moves them to the chunks.
-constexpr std::string_view kSampleColumns = R"sql((
+// go to a small table of their own, which is cheap to write; a checkpoint puts them in order.
+constexpr std::string_view kRawColumns = R"sql((
   day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL, samples INTEGER NOT NULL,
   sample_values BLOB NOT NULL, sample_offsets BLOB NOT NULL,
   PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql";
 struct TableDefinition {
   std::string_view name, columns;
+  // The versions of the schema that have it.
+  std::int64_t first = 1, last = kSchemaVersion;
+
+  bool isIn(std::int64_t version) const { return first <= version && version <= last; }
   std::string text() const { return "CREATE TABLE " + std::string(name) + std::string(columns); }
 };
 constexpr TableDefinition kTables[] = {
     {"scalars", R"sql((
   day INTEGER NOT NULL, key TEXT NOT NULL, value INTEGER NOT NULL,
   PRIMARY KEY(day, key)) WITHOUT ROWID)sql"},
-    {"chunks", kSampleColumns},
-    {"recent", kSampleColumns},
+    {kChunksTable, kRawColumns, kRawSchema, kRawSchema},
+    {kRecentTable, kRawColumns, kRawSchema, kRawSchema},
+    {kSeriesTable, R"sql((
+  day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL,
+  samples INTEGER NOT NULL, weight INTEGER NOT NULL,
+  sample_values BLOB NOT NULL, sample_weights BLOB NOT NULL, sample_offsets BLOB NOT NULL,
+  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql",
+     kPackedSchema},
 };
 // Tables that are made when they are first written.
 constexpr TableDefinition kOptionalTables[] = {
@@ -54,7 +64,8 @@ constexpr TableDefinition kOptionalTables[] = {
     {kPackedTable, R"sql((
   day INTEGER NOT NULL, key TEXT NOT NULL, number INTEGER NOT NULL,
   samples INTEGER NOT NULL, weight INTEGER NOT NULL, data BLOB NOT NULL,
-  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql"},
+  PRIMARY KEY(day, key, number)) WITHOUT ROWID)sql",
+     kRawSchema, kRawSchema},
     {kOwnersTable, R"sql((
   day INTEGER NOT NULL, key TEXT NOT NULL, user INTEGER NOT NULL, distribution INTEGER NOT NULL,
   PRIMARY KEY(day, key)) WITHOUT ROWID)sql"},
@@ -71,14 +82,14 @@ constexpr TableDefinition kStatistics[] = {
 
 // Anything else could run when a table is read or written: a view in a table's place, a trigger, a
 // virtual table, a column that is computed. REQUIRES: a transaction.
-Status checkTables(Database& database) {
+Status checkTables(Database& database, std::int64_t version) {
   auto rows = database.prepare("SELECT type, name, tbl_name, sql FROM sqlite_schema");
   if (!rows) return rows.error();
   std::size_t ours = 0, others = 0;
   Step step = Step::Done;
   while ((step = rows->step()) == Step::Row) {
     const auto isRow = [&](const TableDefinition& table) {
-      return rows->text(0) == "table" && rows->text(1) == table.name &&
+      return table.isIn(version) && rows->text(0) == "table" && rows->text(1) == table.name &&
              rows->text(2) == table.name && rows->text(3) == table.text();
     };
     if (std::ranges::any_of(kTables, isRow)) {
@@ -89,7 +100,9 @@ Status checkTables(Database& database) {
     }
   }
   if (step == Step::Failed) return database.error();
-  if (ours == std::size(kTables) && others == 0) return Done{};
+  const auto expected = std::ranges::count_if(
+      kTables, [&](const TableDefinition& table) { return table.isIn(version); });
+  if (ours == static_cast<std::size_t>(expected) && others == 0) return Done{};
   return database.error("its tables are not those of a metrics store");
 }
 
@@ -128,7 +141,7 @@ Result<bool> isStore(Database& database) {
   if (*application != kApplicationId || *version < 1) {
     return database.error("a database, but not a metrics store");
   }
-  if (auto checked = checkTables(database); !checked) return checked.error();
+  if (auto checked = checkTables(database, *version); !checked) return checked.error();
   return true;
 }
 
@@ -153,12 +166,10 @@ Status useWriteAheadLog(Database& database) {
   }
 }
 
-Status defineTables(Database& database) {
-  std::string text;
-  for (const TableDefinition& table : kTables) text += table.text() + ";";
-  text += "PRAGMA application_id = " + std::to_string(kApplicationId) + ";";
-  text += "PRAGMA user_version = " + std::to_string(kSchemaVersion);
-  return database.execute(text.c_str());
+Status makeIfMissing(Database& database, const TableDefinition& table) {
+  const auto exists = hasTable(database, table.name);
+  if (!exists) return exists.error();
+  return *exists ? Status(Done{}) : database.execute(table.text().c_str());
 }
 
 Status makeTables(Database& database) {
@@ -166,13 +177,39 @@ Status makeTables(Database& database) {
   if (auto set = useWriteAheadLog(database); !set) return set;
   if (auto begun = database.execute("BEGIN IMMEDIATE"); !begun) return begun;
   const auto store = isStore(database);  // somebody else may have been first
-  Status made = !store ? Status(store.error()) : *store ? Done{} : defineTables(database);
+  Status made = store ? Status(Done{}) : store.error();
+  if (store && !*store) made = makeRequiredTables(database, kSchemaVersion);
+  if (made && !*store) made = enterSchema(database, kSchemaVersion);
   if (made) made = database.execute("COMMIT");
   if (!made) (void)database.execute("ROLLBACK");
   return made;
 }
 
 }  // namespace
+
+Status makeRequiredTables(Database& database, std::int64_t version) {
+  for (const TableDefinition& table : kTables) {
+    if (!table.isIn(version)) continue;
+    if (auto made = makeIfMissing(database, table); !made) return made;
+  }
+  return Done{};
+}
+
+Status enterSchema(Database& database, std::int64_t version) {
+  std::string text;
+  const auto drop = [&](const TableDefinition& table) {
+    if (!table.isIn(version)) text += "DROP TABLE IF EXISTS " + std::string(table.name) + ";";
+  };
+  std::ranges::for_each(kTables, drop);
+  std::ranges::for_each(kOptionalTables, drop);
+  text += "PRAGMA application_id = " + std::to_string(kApplicationId) + ";";
+  text += "PRAGMA user_version = " + std::to_string(version);
+  return database.execute(text.c_str());
+}
+
+Result<std::int64_t> schemaVersion(Database& database) {
+  return database.integer("PRAGMA user_version");
+}
 
 std::vector<std::string_view> storeTables() {
   std::vector<std::string_view> names;
@@ -189,12 +226,19 @@ Result<bool> hasTable(Database& database, std::string_view name) {
   return step == Step::Row;
 }
 
+Result<std::vector<std::string_view>> presentTables(Database& database,
+                                                    std::span<const std::string_view> names) {
+  std::vector<std::string_view> present;
+  for (const std::string_view name : names) {
+    const auto exists = hasTable(database, name);
+    if (!exists) return exists.error();
+    if (*exists) present.push_back(name);
+  }
+  return present;
+}
+
 Status makeOptionalTable(Database& database, std::string_view name) {
-  const auto exists = hasTable(database, name);
-  if (!exists) return exists.error();
-  if (*exists) return Done{};
-  const auto* const table = std::ranges::find(kOptionalTables, name, &TableDefinition::name);
-  return database.execute(table->text().c_str());
+  return makeIfMissing(database, *std::ranges::find(kOptionalTables, name, &TableDefinition::name));
 }
 
 StoreFile metricsStoreFile(const DeviceRoot& root) {

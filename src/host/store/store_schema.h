@@ -3,6 +3,7 @@
 
 #include <functional>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -31,21 +32,41 @@ bool isStoreKey(std::string_view key);
 constexpr std::string_view kStoreKeyRule =
     "a key is valid UTF-8 of 1 to 512 bytes without a zero byte";
 
-// Tables that a store may lack until something is kept in them.
-constexpr std::string_view kCountersTable = "counters", kWearTable = "wear";
-// Of what the recorder commits: new samples, those that a checkpoint has put in order, who owns a
-// key, and changes that wait for a day.
-constexpr std::string_view kArrivalsTable = "arrivals", kPackedTable = "packed",
+// Versions of the schema. In the raw one, samples that need no packing lie in chunks, as they are;
+// in the packed one, all are packed.
+constexpr std::int64_t kRawSchema = 1, kPackedSchema = 2;
+
+// The tables of samples: chunks, recent ones and packed rows of the raw schema, series of the
+// packed one; and new samples, until a checkpoint puts them in order.
+constexpr std::string_view kChunksTable = "chunks", kRecentTable = "recent",
+                           kPackedTable = "packed", kSeriesTable = "series",
+                           kArrivalsTable = "arrivals";
+// In the order in which the samples of a key were recorded.
+constexpr std::string_view kSampleTables[] = {kChunksTable, kRecentTable, kPackedTable,
+                                              kSeriesTable, kArrivalsTable};
+// Other tables that a store may lack until something is kept in them: of the job, and of the
+// recorder who owns a key, and changes that wait for a day.
+constexpr std::string_view kCountersTable = "counters", kWearTable = "wear",
                            kOwnersTable = "owners", kUndatedTable = "undated";
 // Every table that a store may have, but for SQLite's own.
 std::vector<std::string_view> storeTables();
 Result<bool> hasTable(Database& database, std::string_view name);
-// Makes one of them if it is missing. REQUIRES: a transaction of a writer.
+// Those of the tables that the store has, in the same order.
+Result<std::vector<std::string_view>> presentTables(Database& database,
+                                                    std::span<const std::string_view> names);
+// Makes one of those that a store may lack if it is missing. REQUIRES: a transaction of a writer.
 Status makeOptionalTable(Database& database, std::string_view name);
 
 // What makes a store one of a newer version of the program, in words; empty for any other file, and
 // when it cannot be read. No table is looked at.
 std::string newerThanKnown(Database& database);
+
+Result<std::int64_t> schemaVersion(Database& database);
+// A store enters a version of the schema in two steps, or an empty database becomes a store: the
+// tables that the version requires are made, and those that it does not have are removed, with all
+// that they hold. REQUIRES: one transaction of a writer.
+Status makeRequiredTables(Database& database, std::int64_t version);
+Status enterSchema(Database& database, std::int64_t version);
 
 // Opens the store in its present state: later commits of others are not seen. Nothing is created.
 // Empty when there is no store yet; an error when there is something else in its place, or a store

@@ -4,10 +4,9 @@
 #include <limits>
 #include <vector>
 
-#include "host/store/samples/sample_chunk.h"
 #include "host/store/samples/sample_folds.h"
+#include "host/store/store_conversion.h"
 #include "host/store/store_days.h"
-#include "host/store/store_rows.h"
 #include "host/store/wear_table.h"
 
 namespace tally {
@@ -22,29 +21,14 @@ Result<std::optional<StoreWriter>> StoreWriter::open(const StoreFile& file, IfMi
   auto opened = openStoreForWriting(file, ifMissing);
   if (!opened) return opened.error();
   if (!*opened) return std::optional<StoreWriter>();
-  Database& database = **opened;
-  Statements statements;
-  const struct {
-    Statement& statement;
-    std::string_view text;
-  } kTexts[] = {
-      {statements.setScalar, "INSERT OR REPLACE INTO scalars VALUES (?1, ?2, ?3)"},
-      {statements.lastRecent, "SELECT max(number) FROM recent WHERE day = ?1 AND key = ?2"},
-      {statements.addRecent, "INSERT INTO recent VALUES (?1, ?2, ?3, ?4, ?5, ?6)"},
-  };
-  for (const auto& entry : kTexts) {
-    auto prepared = database.prepare(entry.text);
-    if (!prepared) return prepared.error();
-    entry.statement = std::move(*prepared);
-  }
-  return std::optional(
-      StoreWriter(std::make_unique<Database>(std::move(database)), std::move(statements)));
+  return std::optional(StoreWriter(std::make_unique<Database>(std::move(**opened))));
 }
 
 Status StoreWriter::begin() {
-  // The transaction before may have been undone, with the table that it made.
-  packed_.reset();
-  hasPacked_.reset();
+  // The transaction before may have been undone, with the tables that it made, and another process
+  // may have given the store other tables since.
+  arrivals_.reset();
+  tail_.reset();
   return database_->execute("BEGIN IMMEDIATE");
 }
 
@@ -63,8 +47,12 @@ Status StoreWriter::checkKey(std::string_view key) const {
 
 Status StoreWriter::setScalar(std::int32_t day, std::string_view key, std::int64_t value) {
   if (auto valid = checkKey(key); !valid) return valid;
-  const bool set =
-      statements_.setScalar.bind(1, std::int64_t{day}).bind(2, key).bind(3, value).run();
+  if (!setScalar_) {
+    auto prepared = database_->prepare("INSERT OR REPLACE INTO scalars VALUES (?1, ?2, ?3)");
+    if (!prepared) return prepared.error();
+    setScalar_ = std::move(*prepared);
+  }
+  const bool set = setScalar_->bind(1, std::int64_t{day}).bind(2, key).bind(3, value).run();
   return set ? Status(Done{}) : database_->error();
 }
 
@@ -72,62 +60,28 @@ Status StoreWriter::pushSamples(std::int32_t day, std::string_view key,
                                 std::span<const double> values,
                                 std::span<const std::uint32_t> offsets) {
   if (auto valid = checkKey(key); !valid) return valid;
-  Statement& last = statements_.lastRecent;
-  last.reset();
-  if (last.bind(1, std::int64_t{day}).bind(2, key).step() != Step::Row) return database_->error();
-  std::int64_t number = last.type(0) == ColumnType::Integer ? last.integer(0) : -1;
-  last.reset();
-  for (; !values.empty(); values = values.subspan(std::min(values.size(), kChunkSamples)),
-                          offsets = offsets.subspan(std::min(offsets.size(), kChunkSamples))) {
-    const std::size_t count = std::min(values.size(), kChunkSamples);
-    if (number < -1 || ++number >= kMostRowsOfKey) {
-      return database_->error("the new samples of " + std::string(key) +
-                              " are numbered out of range");
-    }
-    const bool added = statements_.addRecent.bind(1, std::int64_t{day})
-                           .bind(2, key)
-                           .bind(3, number)
-                           .bind(4, static_cast<std::int64_t>(count))
-                           .bind(5, packValues(values.first(count)))
-                           .bind(6, packOffsets(offsets.first(count)))
-                           .run();
-    if (!added) return database_->error();
-  }
-  return Done{};
-}
-
-Result<SampleTail*> StoreWriter::tail(SampleTail::Table table) {
-  auto& tail = table == SampleTail::Table::Chunks ? chunks_ : packed_;
-  if (!tail) {
-    auto opened = SampleTail::open(*database_, table);
+  if (!arrivals_) {
+    auto opened = ArrivalTable::open(*database_);
     if (!opened) return opened.error();
-    tail = std::move(*opened);
+    arrivals_ = std::move(*opened);
   }
-  return &*tail;
+  return arrivals_->add(day, key, {values, offsets, {}});
 }
 
-Result<bool> StoreWriter::isPacked(std::int32_t day, std::string_view key) {
-  if (!hasPacked_) {
-    const auto exists = hasTable(*database_, kPackedTable);
-    if (!exists) return exists.error();
-    hasPacked_ = *exists;
+Result<SampleTail*> StoreWriter::tail() {
+  if (!tail_) {
+    auto opened = SampleTail::open(*database_);
+    if (!opened) return opened.error();
+    tail_ = std::move(*opened);
   }
-  if (!*hasPacked_) return false;
-  auto row = database_->prepare("SELECT 1 FROM packed WHERE day = ?1 AND key = ?2");
-  if (!row) return row.error();
-  const Step step = row->bind(1, std::int64_t{day}).bind(2, key).step();
-  if (step == Step::Failed) return database_->error();
-  return step == Step::Row;
+  return &*tail_;
 }
 
 Status StoreWriter::appendSamples(std::int32_t day, std::string_view key,
                                   const SampleColumns& samples) {
   if (auto valid = checkKey(key); !valid) return valid;
-  const auto packed = samples.weights.empty() ? isPacked(day, key) : Result<bool>(true);
-  if (!packed) return packed.error();
-  const auto opened = tail(*packed ? SampleTail::Table::Packed : SampleTail::Table::Chunks);
+  const auto opened = tail();
   if (!opened) return opened.error();
-  if (*packed) hasPacked_ = true;
   SampleTail& end = **opened;
   if (auto moved = end.moveTo(day, key); !moved) return moved;
   if (auto appended = end.append(samples); !appended) return appended;
@@ -145,16 +99,12 @@ Status StoreWriter::foldRecent() {
 }
 
 Result<bool> StoreWriter::foldRecentUntil(std::chrono::steady_clock::time_point end) {
-  const auto chunks = tail(SampleTail::Table::Chunks);
-  if (!chunks) return chunks.error();
-  const auto folded = tally::foldRecent(*database_, **chunks, end);
-  if (!folded || !*folded) return folded;
   const auto mayArrive = hasTable(*database_, kArrivalsTable);
   if (!mayArrive) return mayArrive.error();
   if (!*mayArrive) return true;
-  const auto packed = tail(SampleTail::Table::Packed);
-  if (!packed) return packed.error();
-  return foldArrivals(*database_, **packed, end);
+  const auto opened = tail();
+  if (!opened) return opened.error();
+  return foldArrivals(*database_, **opened, end);
 }
 
 Status StoreWriter::setCounter(const CounterState& state) {
@@ -190,9 +140,6 @@ Status StoreWriter::forgetDay(std::int32_t day) {
 }
 
 Result<bool> StoreWriter::hasRecent() {
-  const auto some = database_->integer("SELECT EXISTS(SELECT 1 FROM recent)");
-  if (!some) return some.error();
-  if (*some != 0) return true;
   const auto mayArrive = hasTable(*database_, kArrivalsTable);
   if (!mayArrive || !*mayArrive) return mayArrive;
   const auto arrivals = database_->integer("SELECT EXISTS(SELECT 1 FROM arrivals)");
@@ -214,6 +161,12 @@ Result<std::uint64_t> StoreWriter::usedBytes() {
   }
   return static_cast<std::uint64_t>(std::max<std::int64_t>(figures[0] - figures[1], 0)) *
          static_cast<std::uint64_t>(figures[2]);
+}
+
+Status StoreWriter::convertToPackedSchema(const std::function<void(const std::string&)>& onFault) {
+  arrivals_.reset();
+  tail_.reset();
+  return tally::convertToPackedSchema(*database_, onFault);
 }
 
 }  // namespace tally

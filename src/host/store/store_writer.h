@@ -3,6 +3,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <span>
@@ -10,6 +11,7 @@
 #include <string_view>
 #include <vector>
 
+#include "host/store/samples/arrival_table.h"
 #include "host/store/samples/sample_tail.h"
 #include "host/store/store_schema.h"
 #include "platform/counters/counter_state.h"
@@ -34,12 +36,11 @@ class StoreWriter {
   // Records further samples of the key, after all that it has. Both spans have the same length.
   Status pushSamples(std::int32_t day, std::string_view key, std::span<const double> values,
                      std::span<const std::uint32_t> offsets);
-  // The same for many samples, straight to where a checkpoint moves them: to the chunks, but if
-  // some count for more than one, or the key has such rows, to the packed rows, which come after
-  // these. REQUIRES: foldRecent() in this transaction.
+  // The same for many samples, straight to where a checkpoint moves them. REQUIRES: foldRecent() in
+  // this transaction.
   Status appendSamples(std::int32_t day, std::string_view key, const SampleColumns& samples);
-  // Moves new samples, pushed ones and those of the recorder, to the chunks and packed rows of
-  // their day. Damaged rows stay where they are.
+  // Puts new samples in order: those that were pushed, and those of the recorder. Damaged rows stay
+  // where they are.
   Status foldRecent();
   // The same until the time is up, but for one row at least. False when there may be more.
   Result<bool> foldRecentUntil(std::chrono::steady_clock::time_point end);
@@ -59,21 +60,19 @@ class StoreWriter {
   // The bytes of all pages in use.
   Result<std::uint64_t> usedBytes();
 
- private:
-  struct Statements {
-    Statement setScalar, lastRecent, addRecent;
-  };
-  StoreWriter(std::unique_ptr<Database> database, Statements statements)
-      : database_(std::move(database)), statements_(std::move(statements)) {}
-  Status checkKey(std::string_view key) const;
-  Result<SampleTail*> tail(SampleTail::Table table);
-  Result<bool> isPacked(std::int32_t day, std::string_view key);
+  // Gives the store the packed schema (store_conversion.h). REQUIRES: no transaction.
+  Status convertToPackedSchema(const std::function<void(const std::string&)>& onFault);
 
-  std::unique_ptr<Database> database_;  // at a place of its own, which the tails know
-  Statements statements_;
-  std::optional<Statement> setCounter_;
-  std::optional<SampleTail> chunks_, packed_;
-  std::optional<bool> hasPacked_;
+ private:
+  explicit StoreWriter(std::unique_ptr<Database> database) : database_(std::move(database)) {}
+  Status checkKey(std::string_view key) const;
+  Result<SampleTail*> tail();
+
+  std::unique_ptr<Database> database_;  // at a place of its own, which the others know
+  std::optional<Statement> setScalar_, setCounter_;
+  // Of the transaction in hand.
+  std::optional<ArrivalTable> arrivals_;
+  std::optional<SampleTail> tail_;
 };
 
 }  // namespace tally

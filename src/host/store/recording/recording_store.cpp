@@ -4,7 +4,7 @@
 #include <utility>
 
 #include "host/store/recording/undated_table.h"
-#include "host/store/samples/packed_samples.h"
+#include "host/store/samples/arrival_table.h"
 #include "host/store/store_days.h"
 #include "host/store/store_rows.h"
 
@@ -21,7 +21,7 @@ struct Connection {
 
   Database database;
   std::optional<FileIdentity> identity;
-  std::optional<Statement> getScalar, setScalar, addArrival, getOwner, setOwner;
+  std::optional<Statement> getScalar, setScalar, getOwner, setOwner;
 
   // Prepares the statement at its first use.
   Result<Statement*> prepared(std::optional<Statement>& statement, std::string_view text) {
@@ -151,29 +151,19 @@ class SqliteTransaction final : public RecordingTransaction {
     return made;
   }
 
-  Status addSamples(std::int32_t day, std::string_view key, SampleColumns samples) {
-    if (auto made = make(kArrivalsTable, hasArrivals_); !made) return made;
-    const auto add = connection_->prepared(
-        connection_->addArrival, "INSERT INTO arrivals VALUES (NULL, ?1, ?2, ?3, ?4, ?5)");
-    if (!add) return add.error();
-    for (std::size_t first = 0; first < samples.values.size(); first += kMostPackedSamples) {
-      const SampleColumns part = slice(samples, first, kMostPackedSamples);
-      const auto blob = packSamples(part);
-      const bool added = (*add)
-                             ->bind(1, std::int64_t{day})
-                             .bind(2, key)
-                             .bind(3, std::ssize(part.values))
-                             .bind(4, static_cast<std::int64_t>(weightOf(part)))
-                             .bind(5, std::span(blob))
-                             .run();
-      if (!added) return database_.error();
+  Status addSamples(std::int32_t day, std::string_view key, const SampleColumns& samples) {
+    if (!arrivals_) {
+      auto opened = ArrivalTable::open(database_);
+      if (!opened) return opened.error();
+      arrivals_ = std::move(*opened);
     }
-    return Done{};
+    return arrivals_->add(day, key, samples);
   }
 
   std::shared_ptr<Connection> connection_;
   Database& database_;
-  bool committed_ = false, hasArrivals_ = false, hasOwners_ = false;
+  std::optional<ArrivalTable> arrivals_;
+  bool committed_ = false, hasOwners_ = false;
 };
 
 class SqliteRecordingStore final : public RecordingStore {

@@ -3,13 +3,12 @@
 #include <algorithm>
 #include <array>
 #include <bit>
-#include <cfloat>
-#include <cmath>
 #include <cstring>
 #include <limits>
 #include <numeric>
 
 #include "base/byte_reader.h"
+#include "host/store/samples/decimals.h"
 
 namespace tally {
 namespace {
@@ -31,29 +30,6 @@ constexpr std::size_t kBytesBeforeValues[] = {sizeof(double), 8, 8, 8, 0, 0};
 constexpr std::size_t kBytesOfDifference[] = {0, 1, 2, 4};
 constexpr std::size_t kBytesOfWeight[] = {0, 0, 1, 2, 4};
 constexpr std::size_t kBytesBeforeWeights[] = {0, 4, 0, 0, 0};
-
-constexpr double kPowersOfTen[] = {1, 10, 100, 1000, 1e4, 1e5, 1e6};
-constexpr double kMostDigits = 9007199254740992;  // 2^53: whole numbers below it are exact
-
-bool sameBits(double a, double b) {
-  return std::bit_cast<std::uint64_t>(a) == std::bit_cast<std::uint64_t>(b);
-}
-
-double decimal(std::int64_t digits, std::size_t scale) {
-  return static_cast<double>(digits) / kPowersOfTen[scale];
-}
-
-std::optional<std::int64_t> digitsOf(double value, std::size_t scale) {
-  const double scaled = value * kPowersOfTen[scale];
-  if (!(std::abs(scaled) < kMostDigits)) return std::nullopt;
-  const auto digits = static_cast<std::int64_t>(std::nearbyint(scaled));
-  return sameBits(decimal(digits, scale), value) ? std::optional(digits) : std::nullopt;
-}
-
-bool fitsFloat(double value) {
-  return (std::abs(value) <= FLT_MAX || !std::isfinite(value)) &&
-         sameBits(static_cast<double>(static_cast<float>(value)), value);
-}
 
 // How many bytes the number takes: 1, 2, 4 or, for more than 32 bits, 8.
 std::size_t widthOf(std::uint64_t number) {
@@ -85,56 +61,22 @@ void eachNumber(std::span<const std::byte> column, const Handler& handler) {
   }
 }
 
-// The values as digits and the least scale that all of them have; empty when they have none.
-struct Decimals {
-  std::size_t scale = 0;
-  std::int64_t least = 0;
-  std::vector<std::uint64_t> excess;
-  std::size_t width = 0;
-};
-std::optional<Decimals> decimalsOf(std::span<const double> values) {
-  Decimals found;
-  // A value that a scale can express has the same bits at each larger one.
-  for (const double value : values) {
-    while (!digitsOf(value, found.scale)) {
-      if (++found.scale == std::size(kPowersOfTen)) return std::nullopt;
-    }
-  }
-  std::vector<std::int64_t> digits;
-  digits.reserve(values.size());
-  for (const double value : values) {
-    const auto number = digitsOf(value, found.scale);
-    if (!number) return std::nullopt;  // a large one, before the scale rose
-    digits.push_back(*number);
-  }
-  found.least = *std::ranges::min_element(digits);
-  std::uint64_t most = 0;
-  for (const std::int64_t number : digits) {
-    found.excess.push_back(static_cast<std::uint64_t>(number - found.least));
-    most = std::max(most, found.excess.back());
-  }
-  found.width = widthOf(most);
-  return found;
-}
-
 void putValues(std::vector<std::byte>& blob, std::span<const double> values) {
   const auto setForm = [&](ValueForm form, std::size_t scale) {
     blob[1] = std::byte{form};
     blob[2] = static_cast<std::byte>(scale);
   };
-  if (std::ranges::all_of(values, [&](double value) { return sameBits(value, values[0]); })) {
+  if (areEqual(values)) {
     setForm(kConstant, 0);
     return put(blob, values[0]);
   }
-  if (const auto decimals = decimalsOf(values); decimals && decimals->width <= 4) {
-    const ValueForm form = decimals->width == 1   ? kDecimal8
-                           : decimals->width == 2 ? kDecimal16
-                                                  : kDecimal32;
-    setForm(form, decimals->scale);
+  const auto decimals = decimalsOf(values);
+  if (const std::size_t width = decimals ? widthOf(decimals->most) : 8; width <= 4) {
+    setForm(width == 1 ? kDecimal8 : width == 2 ? kDecimal16 : kDecimal32, decimals->scale);
     put(blob, decimals->least);
-    return putColumn(blob, decimals->width, decimals->excess);
+    return putColumn(blob, width, decimals->excess);
   }
-  if (std::ranges::all_of(values, fitsFloat)) {
+  if (fitFloats(values)) {
     setForm(kFloat, 0);
     for (const double value : values) put(blob, static_cast<float>(value));
     return;
@@ -194,8 +136,9 @@ template <class T>
 void takeDecimals(const PackedLayout& layout, std::span<const std::byte> column,
                   std::vector<double>& values) {
   const std::uint64_t least = ByteReader(column).read<std::uint64_t>(0).value_or(0);
+  const double divisor = kPowersOfTen[layout.scale];
   eachNumber<T>(column.subspan(sizeof least), [&](std::size_t i, T excess) {
-    values[i] = decimal(static_cast<std::int64_t>(least + excess), layout.scale);
+    values[i] = static_cast<double>(static_cast<std::int64_t>(least + excess)) / divisor;
   });
 }
 

@@ -1,4 +1,4 @@
-// The packed form of samples: one blob that describes itself, for what the recorder commits.
+// The packed form of samples as they arrive: one blob that describes itself.
 #pragma once
 
 #include <cstddef>

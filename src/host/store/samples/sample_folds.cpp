@@ -5,7 +5,7 @@
 #include <optional>
 #include <utility>
 
-#include "host/store/samples/sample_chunk.h"
+#include "host/store/samples/packed_samples.h"
 #include "host/store/store_rows.h"
 #include "host/store/store_schema.h"
 
@@ -55,54 +55,7 @@ Result<std::vector<Arrival>> nextArrivals(Database& database, std::int64_t& afte
 
 }  // namespace
 
-Result<bool> foldRecent(Database& database, SampleTail& chunks,
-                        std::chrono::steady_clock::time_point end) {
-  auto rows = database.prepare(
-      "SELECT day, key, number, samples, " + std::string(kBoundedValues) + ", " +
-      std::string(kBoundedOffsets) +
-      " FROM recent WHERE day BETWEEN -2147483648 AND 2147483647 ORDER BY day, key, number");
-  if (!rows) return rows.error();
-  auto remove = database.prepare("DELETE FROM recent WHERE day = ?1 AND key = ?2 AND number = ?3");
-  if (!remove) return remove.error();
-  bool started = false;
-  std::int64_t day = 0;
-  std::string key;
-  SampleVectors samples;
-  Step step = Step::Done;
-  RowOrder order;
-  while ((step = rows->step()) == Step::Row) {
-    const std::int64_t number = rows->integer(2), count = rows->integer(3);
-    const auto valueColumn = rows->blob(4), offsetColumn = rows->blob(5);
-    const std::int64_t rowDay = rows->integer(0);
-    const std::string_view rowKey = rows->text(1);
-    if (!order.follows(*rows, rowDay, rowKey, number)) return damagedTree(database);
-    if (!isStoreKey(rowKey) ||
-        !chunkIsSound(count, std::ssize(valueColumn), std::ssize(offsetColumn))) {
-      continue;
-    }
-    if (!started || day != rowDay || key != rowKey) {
-      if (auto finished = chunks.finish(); !finished) return finished.error();
-      day = rowDay;
-      key = rowKey;
-      if (auto moved = chunks.moveTo(static_cast<std::int32_t>(day), key); !moved) {
-        return moved.error();
-      }
-      started = true;
-    }
-    samples.values.resize(static_cast<std::size_t>(count));
-    samples.offsets.resize(samples.values.size());
-    unpackValues(valueColumn, 0, samples.values);
-    unpackOffsets(offsetColumn, 0, samples.offsets);
-    if (auto appended = chunks.append(samples.columns()); !appended) return appended.error();
-    if (!remove->bind(1, day).bind(2, key).bind(3, number).run()) return database.error();
-    if (std::chrono::steady_clock::now() >= end) break;
-  }
-  if (step == Step::Failed) return database.error();
-  if (auto finished = chunks.finish(); !finished) return finished.error();
-  return step == Step::Done;
-}
-
-Result<bool> foldArrivals(Database& database, SampleTail& packed,
+Result<bool> foldArrivals(Database& database, SampleTail& tail,
                           std::chrono::steady_clock::time_point end) {
   auto remove = database.prepare("DELETE FROM arrivals WHERE number = ?1");
   if (!remove) return remove.error();
@@ -116,17 +69,17 @@ Result<bool> foldArrivals(Database& database, SampleTail& packed,
     bool timeIsUp = false;
     for (const Arrival& arrival : *batch) {
       if (before == nullptr || before->place() != arrival.place()) {
-        if (auto finished = packed.finish(); !finished) return finished.error();
-        if (auto moved = packed.moveTo(arrival.day, arrival.key); !moved) return moved.error();
+        if (auto finished = tail.finish(); !finished) return finished.error();
+        if (auto moved = tail.moveTo(arrival.day, arrival.key); !moved) return moved.error();
       }
       before = &arrival;
       (void)unpackSamples(arrival.blob, PackedColumns::All, samples);
-      if (auto appended = packed.append(samples.columns()); !appended) return appended.error();
+      if (auto appended = tail.append(samples.columns()); !appended) return appended.error();
       if (!remove->bind(1, arrival.number).run()) return database.error();
       timeIsUp = steady_clock::now() >= end;
       if (timeIsUp) break;
     }
-    if (auto finished = packed.finish(); !finished) return finished.error();
+    if (auto finished = tail.finish(); !finished) return finished.error();
     if (timeIsUp) return false;
   }
 }

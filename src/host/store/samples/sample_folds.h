@@ -1,4 +1,4 @@
-// Moves new samples to the tables in which each key's samples lie together.
+// Moves new samples to the table in which each key's samples lie together.
 #pragma once
 
 #include <chrono>
@@ -7,11 +7,9 @@
 
 namespace tally {
 
-// Both go on until the time is up, but for one row at least; false when there may be more. Damaged
-// rows stay where they are. REQUIRES: a transaction, and a tail of chunks, or of packed rows.
-Result<bool> foldRecent(Database& database, SampleTail& chunks,
-                        std::chrono::steady_clock::time_point end);
-Result<bool> foldArrivals(Database& database, SampleTail& packed,
+// Goes on until the time is up, but for one row at least; false when there may be more. Damaged
+// rows stay where they are. REQUIRES: a transaction, and the table of arrivals.
+Result<bool> foldArrivals(Database& database, SampleTail& tail,
                           std::chrono::steady_clock::time_point end);
 
 }  // namespace tally

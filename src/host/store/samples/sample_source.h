@@ -49,12 +49,16 @@ class SampleSource {
   std::string key_;
 };
 
-// The sources of a store in the order in which the samples of a key were recorded: chunks, recent,
-// packed, arrivals; without those that the store lacks. They borrow all arguments. An empty filter
-// wants every key.
-std::vector<std::unique_ptr<SampleSource>> openSampleSources(Database& database,
-                                                             StoreFaults& faults,
-                                                             const StoreRange& range,
-                                                             const HistoryStore::KeyFilter& wanted);
+using SampleSources = std::vector<std::unique_ptr<SampleSource>>;
+
+// The sources of a store in the order in which the samples of a key were recorded: chunks, recent
+// and packed of schema version 1, series, arrivals; without those that the store lacks. They borrow
+// all arguments. An empty filter wants every key.
+SampleSources openSampleSources(Database& database, StoreFaults& faults, const StoreRange& range,
+                                const HistoryStore::KeyFilter& wanted);
+
+// Calls the handler for each key on each day, in that order, with its samples from all sources.
+void enumerateSources(const SampleSources& sources,
+                      const HistoryStore::DistributionHandler& handler);
 
 }  // namespace tally

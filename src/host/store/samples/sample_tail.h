@@ -1,4 +1,4 @@
-// The end of a key's samples in a table of full rows, while more are being appended.
+// The end of a key's samples in the table where they lie in order, while more are being appended.
 #pragma once
 
 #include <cstdint>
@@ -12,26 +12,26 @@ namespace tally {
 
 class SampleTail {
  public:
-  enum class Table { Chunks, Packed };
-  // The database is borrowed. Makes the table if it is missing. REQUIRES: a transaction of a
-  // writer; after it was undone, the tail of a table that it made is of no use.
-  static Result<SampleTail> open(Database& database, Table table);
+  // The database is borrowed. The table is `series`, or that of packed rows of a store that lacks
+  // it, which is made if it is missing. REQUIRES: a transaction of a writer; after it was undone,
+  // what was opened is of no use.
+  static Result<SampleTail> open(Database& database);
 
   // Continues the key's last row if it has space, else starts a new one.
   Status moveTo(std::int32_t day, std::string_view key);
-  // REQUIRES: no weights in chunks.
   Status append(const SampleColumns& samples);
   // Writes what has been taken up and not filled.
   Status finish();
 
  private:
-  SampleTail(Database& database, Table table) : database_(&database), table_(table) {}
+  SampleTail(Database& database, bool isSeries);
   // Takes up the samples of the row in hand. False if it has no space, or is damaged.
   bool take(const Statement& row);
   Status write();
 
   Database* database_;
-  Table table_;
+  bool isSeries_;
+  std::size_t capacity_;  // of a row
   Statement last_, put_;
   std::int32_t day_ = 0;
   std::string key_;
