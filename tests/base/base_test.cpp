@@ -149,6 +149,14 @@ TEST_F(FileTest, ReadingRefusesWhatIsNoFileOrTooLarge) {
   ASSERT_EQ(::mkfifo(at("pipe").c_str(), 0600), 0);
   EXPECT_FALSE(readFile(at("pipe"), 9)) << "a pipe without a writer must not be waited for";
   EXPECT_FALSE(readFile("/proc/self/comm", 100)->empty()) << "its size says 0";
+  EXPECT_FALSE(here().openForReading("ok", 4));
+  auto pieces = here().openForReading("ok", 5);
+  char piece[4];
+  ASSERT_TRUE(pieces);
+  EXPECT_EQ(*pieces->read(piece), 4u);
+  put("ok", "123456");
+  EXPECT_EQ(pieces->read(piece).error().message, readFile(at("ok"), 5).error().message)
+      << "it has grown past the limit";
 }
 
 TEST_F(FileTest, AReplacementIsWholeOrNotThere) {
@@ -215,6 +223,7 @@ TEST_F(FileTest, LinksAreFollowedOnlyWhereNobodyElseCanMakeThem) {
   for (const auto& c : cases) {
     const auto text = device.readFile(c.path, 100);
     EXPECT_EQ(text ? *text : "", c.content != nullptr ? c.content : "") << c.path;
+    EXPECT_EQ(static_cast<bool>(device.openForReading(c.path, 100)), c.content != nullptr);
   }
   const auto home = device.open("/var/home/user");
   ASSERT_TRUE(home);
