@@ -94,7 +94,7 @@ constexpr std::pair<const char*, Until> kMeasurements[] = {{"nothing", Until::No
 // Milliseconds of CPU that a command takes beyond one that does the same but what is measured.
 double costBeyond(const std::vector<std::string>& without,
                   const std::vector<std::string>& command) {
-  constexpr int kRuns = 7;
+  constexpr int kRuns = 3;
   const auto base = bench::medianRun(kRuns, without), cost = bench::medianRun(kRuns, command);
   if (base.exitStatus != 0 || cost.exitStatus != 0) std::exit(1);
   return (cost.cpuSeconds - base.cpuSeconds) * 1e3;
@@ -121,6 +121,7 @@ void measure(const std::string& self, int entries, Options options) {
              python / decoded);
   fmt::print("    with digest, tables   {:7.1f} ms CPU  {}\n", loaded,
              outputOf(fmt::format("{} tables {}", self, root)));
+  std::fflush(stdout);
   std::filesystem::remove_all(root);
 }
 
