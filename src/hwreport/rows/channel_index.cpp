@@ -1,5 +1,6 @@
 #include "hwreport/rows/channel_index.h"
 
+#include <algorithm>
 #include <bit>
 
 #include "base/hash.h"
@@ -8,71 +9,95 @@
 #include "kv/array_changes.h"
 
 namespace tally {
+namespace {
+
+// How many channels ahead slots are fetched.
+constexpr std::uint32_t kSlotAhead = 8;
+
+std::size_t slotsFor(std::size_t channels) { return std::bit_ceil(channels * 4 / 3 + 2); }
+
+}  // namespace
 
 ChannelIndex::ChannelIndex(const ChannelRows& rows)
-    : rows_(rows),
-      changes_(kvArrayChanges()),
-      slots_(std::bit_ceil(rows.size() * 4 / 3 + 2), kNone) {
-  channels_.reserve(rows.size());
-  constexpr std::size_t kAhead = 16;
-  for (std::size_t row = 0; row < rows.size(); ++row) {
-    if (row + kAhead < rows.size()) __builtin_prefetch(rows.legend(row + kAhead));
-    if (row + kAhead / 2 < rows.size()) {
-      const KvArray* const next = rows.legend(row + kAhead / 2);
-      if (next != nullptr) __builtin_prefetch(next->get(kLegendTypeWord));
-    }
-    addRow(static_cast<std::uint32_t>(row));
+    : changes_(kvArrayChanges()), slots_(slotsFor(rows.size()), kNone) {
+  const auto count = static_cast<std::uint32_t>(rows.size());
+  channels_.reserve(count);
+  for (std::uint32_t i = 0; i < count + kSlotAhead; ++i) {
+    if (i < count) rows.prefetchLegends(i);
+    if (i < count) read(rows, i);
+    if (i >= kSlotAhead) place(i - kSlotAhead);
   }
 }
 
-void ChannelIndex::addRow(std::uint32_t row) {
-  if (rows_.shapeNumber(row) >= drivers_.size())
-    drivers_.push_back(bitsOf(rows_.shape(row).driverID));
-  const KvArray* const legend = rows_.legend(row);
+ChannelIndex::ChannelIndex(const ChannelIndex& other, const std::vector<std::uint32_t>& order)
+    : inOrderOfRows_(false),
+      changes_(other.changes_),
+      drivers_(other.drivers_),
+      slots_(other.slots_.size(), kNone),
+      formless_(other.formless_),
+      repeated_(other.repeated_),
+      sizeOfRuns_(other.sizeOfRuns_),
+      complete_(other.complete_) {
+  std::vector<bool> placed(other.size());
+  channels_.reserve(other.size());
+  const auto add = [&](std::uint32_t row) {
+    channels_.push_back(other.channels_[row]);
+    placed[row] = true;
+  };
+  for (const std::uint32_t row : order) add(row);
+  for (std::uint32_t row = 0; row < other.size(); ++row) {
+    if (!placed[row]) add(row);
+  }
+  for (std::uint32_t position = 0; position < size(); ++position) place(position);
+}
+
+void ChannelIndex::read(const ChannelRows& rows, std::uint32_t row) {
+  const std::uint32_t shape = rows.shapeNumber(row);
+  if (shape >= drivers_.size()) drivers_.push_back(bitsOf(rows.shape(row).driverID));
+  const KvArray* const legend = rows.legend(row);
   const Channel channel = {bitsOf(legend != nullptr ? legend->get(kLegendChannelID) : nullptr),
-                           bitsOf(legend != nullptr ? legend->get(kLegendTypeWord) : nullptr)};
+                           bitsOf(legend != nullptr ? legend->get(kLegendTypeWord) : nullptr), row,
+                           shape & INT32_MAX, 0};
   channels_.push_back(channel);
   const TypeWord type{channel.typeBits};
   if (type.format() == kHwReportFormatUnknown) formless_.push_back(row);
   sizeOfRuns_ += RunBlock::sizeOf(type.elementCount());
-  complete_ = complete_ && channel.id != kHwReportInvalidValue &&
-              channel.typeBits != kHwReportInvalidValue && driverID(row) != kHwReportInvalidValue;
-  std::size_t slot = slotOf(driverID(row), channel.id);
+  const std::uint64_t words[] = {channel.id, channel.typeBits, drivers_[shape]};
+  complete_ = complete_ && std::ranges::find(words, kHwReportInvalidValue) == std::end(words);
+  prefetchSlot(slotOf(drivers_[shape], channel.id));
+}
+
+void ChannelIndex::place(std::uint32_t position) {
+  Channel& channel = channels_[position];
+  if (channel.repeated != 0) return;
+  std::size_t slot = slotOf(drivers_[channel.shape], channel.id);
   for (; slots_[slot] != kNone; slot = (slot + 1) & (slots_.size() - 1)) {
-    const std::uint32_t other = slots_[slot];
-    if (channels_[other].id != channel.id || driverID(other) != driverID(row)) continue;
-    repeated_.push_back({row, other});
+    const Channel& other = channels_[slots_[slot]];
+    if (!isAt(slots_[slot], drivers_[channel.shape], channel.id)) continue;
+    channel.repeated = 1;
+    repeated_.push_back({channel.row, other.row, channel.typeBits == other.typeBits});
     return;
   }
-  slots_[slot] = row;
+  slots_[slot] = position;
 }
 
 bool ChannelIndex::isCurrent() const noexcept { return complete_ && changes_ == kvArrayChanges(); }
-
-std::uint32_t ChannelIndex::shapeOf(std::size_t row) const noexcept {
-  return rows_.shapeNumber(row);
-}
 
 std::size_t ChannelIndex::slotOf(std::uint64_t driverID, std::uint64_t channelID) const noexcept {
   const std::uint64_t words[] = {driverID, channelID};
   return hashWords(words) & (slots_.size() - 1);
 }
 
-void ChannelIndex::prefetchRow(std::size_t slot, const RunBlock& block) const noexcept {
-  const std::uint32_t row = slots_[slot];
-  if (row == kNone) return;
-  __builtin_prefetch(&channels_[row]);
-  rows_.prefetchShape(row);
-  block.prefetchPlace(row);
+void ChannelIndex::prefetchChannel(std::size_t slot) const noexcept {
+  if (slots_[slot] != kNone) __builtin_prefetch(&channels_[slots_[slot]]);
 }
 
-std::uint32_t ChannelIndex::find(std::size_t slot, std::uint64_t wantedDriver,
-                                 std::uint64_t wantedChannel) const noexcept {
-  for (;; slot = (slot + 1) & (slots_.size() - 1)) {
-    const std::uint32_t row = slots_[slot];
-    if (row == kNone) return kNone;
-    if (channels_[row].id == wantedChannel && driverID(row) == wantedDriver) return row;
+std::uint32_t ChannelIndex::find(std::size_t slot, std::uint64_t driverID,
+                                 std::uint64_t channelID) const noexcept {
+  while (slots_[slot] != kNone && !isAt(slots_[slot], driverID, channelID)) {
+    slot = (slot + 1) & (slots_.size() - 1);
   }
+  return slots_[slot];
 }
 
 }  // namespace tally

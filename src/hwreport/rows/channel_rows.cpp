@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "hwreport/channels/keys.h"
+#include "platform/protocol/hub_protocol.h"
 
 namespace tally {
 namespace {
@@ -97,10 +98,25 @@ void ChannelRows::add(const std::vector<ChannelEntry>& channel) {
   legends_.push_back(std::move(legend));
 }
 
+void ChannelRows::prefetchLegends(std::size_t row) const noexcept {
+  constexpr std::size_t kLegendAhead = 24, kWordsAhead = 12;
+  if (row + kLegendAhead < size()) __builtin_prefetch(legend(row + kLegendAhead));
+  const KvArray* const next = row + kWordsAhead < size() ? legend(row + kWordsAhead) : nullptr;
+  // The type word is next to the id.
+  if (next != nullptr) __builtin_prefetch(next->get(kLegendTypeWord));
+}
+
 std::shared_ptr<const ChannelIndex> ChannelRows::index() const {
   const std::lock_guard lock(mutex_);
   if (!index_ || !index_->isCurrent()) index_ = std::make_shared<ChannelIndex>(*this);
   return index_;
+}
+
+void ChannelRows::reorder(const std::shared_ptr<const ChannelIndex>& index,
+                          const std::vector<std::uint32_t>& order) const {
+  auto reordered = std::make_shared<ChannelIndex>(*index, order);
+  const std::lock_guard lock(mutex_);
+  if (index_ == index) index_ = std::move(reordered);
 }
 
 RunBlock ChannelRows::makeBlock(std::size_t sizeOfRuns) const {

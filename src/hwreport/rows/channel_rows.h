@@ -59,8 +59,9 @@ class ChannelRows {
   const ChannelShape& shape(std::size_t row) const noexcept { return shapes_[shapeOf_[row]]; }
   // Shapes are numbered in the order of their first rows.
   std::uint32_t shapeNumber(std::size_t row) const noexcept { return shapeOf_[row]; }
-  void prefetchShape(std::size_t row) const noexcept { __builtin_prefetch(&shapeOf_[row]); }
   KvArray* legend(std::size_t row) const noexcept { return legends_[row].get(); }
+  // For a pass over all rows that reads the ids and types of their legends.
+  void prefetchLegends(std::size_t row) const noexcept;
   // A name that the dictionary had already.
   KvString* name(std::size_t row) const noexcept {
     return row < names_.size() ? names_[row].get() : nullptr;
@@ -68,6 +69,10 @@ class ChannelRows {
 
   // What finds the row of a run, made anew when an array has changed since. Safe from any thread.
   std::shared_ptr<const ChannelIndex> index() const;
+
+  // Puts the index into the order of the runs of a sample, for the next ones.
+  void reorder(const std::shared_ptr<const ChannelIndex>& index,
+               const std::vector<std::uint32_t>& order) const;
 
   // A block for the runs of all rows, and its memory back.
   RunBlock makeBlock(std::size_t sizeOfRuns) const;

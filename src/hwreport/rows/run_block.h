@@ -68,22 +68,28 @@ class RunBlock {
   // The row gets the run of another one.
   void share(std::size_t row, std::size_t other) noexcept { setPlace(row, placeOf(other)); }
 
-  // The rows in the order of their runs: step(row) for each until it gives false. Some steps
-  // before, ahead(row) can have memory fetched.
+  // The runs in their order: step(row, run) for each until it gives false. Some steps before,
+  // ahead(row) can have memory fetched.
   template <class Ahead, class Step>
   bool eachInOrder(Ahead ahead, Step step) const {
-    constexpr std::size_t kBatch = 16;
+    constexpr std::size_t kAhead = 16;
+    struct {
+      std::size_t row, place;
+    } noted[kAhead];
+    std::size_t notedCount = 0, done = 0;
+    const auto next = [&] {
+      const auto& one = noted[done++ % kAhead];
+      return step(one.row, runAt(one.place));
+    };
     for (std::size_t place = firstPlace(); place * kUnit < used_;) {
-      std::size_t batch[kBatch];
-      std::size_t count = 0;
-      for (; count < kBatch && place * kUnit < used_; ++count) {
-        const Header header = headerAt(place);
-        ahead(batch[count] = header.row);
-        place += sizeAt(header) / kUnit;
-      }
-      for (std::size_t i = 0; i < count; ++i) {
-        if (!step(batch[i])) return false;
-      }
+      if (notedCount - done == kAhead && !next()) return false;
+      const Header header = headerAt(place);
+      noted[notedCount++ % kAhead] = {header.row, place};
+      ahead(header.row);
+      place += sizeAt(header) / kUnit;
+    }
+    while (done < notedCount) {
+      if (!next()) return false;
     }
     return true;
   }

@@ -67,21 +67,49 @@ bool FrameSampler::scan() {
 void FrameSampler::note(std::size_t offset, std::size_t size) {
   if (notedCount_ - added_ == noted_.size()) add();
   Noted& noted = noted_[notedCount_++ % noted_.size()];
-  noted = {offset, size, wordAt(buffer_, offset + element::kDriverID),
-           wordAt(buffer_, offset + element::kChannelID), 0};
-  noted.slot = index_->slotOf(noted.driverID, noted.channelID);
-  index_->prefetchSlot(noted.slot);
+  noted = {offset,
+           size,
+           wordAt(buffer_, offset + element::kDriverID),
+           wordAt(buffer_, offset + element::kChannelID),
+           ChannelIndex::kNone,
+           0};
+  if (index_->isAt(expected_, noted.driverID, noted.channelID)) {
+    noted.position = static_cast<std::uint32_t>(expected_++);
+    frame_.block().prefetchPlace(index_->row(noted.position));
+  } else {
+    noted.slot = index_->slotOf(noted.driverID, noted.channelID);
+    index_->prefetchSlot(noted.slot);
+  }
 }
 
 void FrameSampler::add() {
-  const Noted noted = noted_[added_++ % noted_.size()];
-  if (const std::size_t next = added_ + kRowAhead; next < notedCount_) {
-    index_->prefetchRow(noted_[next % noted_.size()].slot, frame_.block());
+  Noted noted = noted_[added_++ % noted_.size()];
+  if (const std::size_t next = added_ + kChannelAhead; next < notedCount_) {
+    const Noted& later = noted_[next % noted_.size()];
+    if (later.position == ChannelIndex::kNone) index_->prefetchChannel(later.slot);
   }
-  const std::uint32_t row = index_->find(noted.slot, noted.driverID, noted.channelID);
+  if (noted.position == ChannelIndex::kNone) {
+    noted.position = index_->find(noted.slot, noted.driverID, noted.channelID);
+    if (noted.position == ChannelIndex::kNone) return;
+    ++searched_;
+    expected_ = noted.position + 1 + (notedCount_ - added_);
+  }
   // The first run is the channel's.
-  if (row == ChannelIndex::kNone || frame_.block().has(row)) return;
-  frame_.block().add(row, buffer_.subspan(noted.offset, noted.size));
+  const std::uint32_t row = index_->row(noted.position);
+  if (!frame_.block().has(row)) {
+    frame_.block().add(row, buffer_.subspan(noted.offset, noted.size));
+  }
+}
+
+void FrameSampler::learnOrder() {
+  std::vector<std::uint32_t> order;
+  order.reserve(frame_.size());
+  frame_.block().eachInOrder([](std::uint32_t) {},
+                             [&](std::size_t row, const ElementRun&) {
+                               order.push_back(static_cast<std::uint32_t>(row));
+                               return true;
+                             });
+  frame_.rows().reorder(index_, order);
 }
 
 FrameSampler::Result FrameSampler::finish(bool stopped) {
@@ -89,6 +117,7 @@ FrameSampler::Result FrameSampler::finish(bool stopped) {
   for (const auto& repeated : index_->repeated()) block.share(repeated.row, repeated.first);
   std::vector<std::uint32_t> found;
   const auto rows = static_cast<std::uint32_t>(frame_.size());
+  if (index_->isInOrderOfRows() && searched_ > rows / 2) learnOrder();
   std::uint32_t missing = 0;
   while (missing < rows && block.has(missing)) ++missing;
   // A scan that was stopped ends the sample at the first channel that it has not found.

@@ -27,21 +27,25 @@ class FrameSampler {
   bool scan();
   void note(std::size_t offset, std::size_t size);
   void add();
+  void learnOrder();
   Result finish(bool stopped);
 
   struct Noted {
     std::size_t offset, size;
     std::uint64_t driverID, channelID;
+    std::uint32_t position;  // of the channel, or where a slot has to be looked at
     std::size_t slot;
   };
   ChannelFrame& frame_;
   const std::shared_ptr<const ChannelIndex> index_;
   const std::span<const std::byte> buffer_;
   // Runs wait here, in their order, while the memory of their look-up is fetched.
-  static constexpr std::size_t kSlotAhead = 32, kRowAhead = 16;
-  std::array<Noted, kSlotAhead> noted_{};
+  static constexpr std::size_t kWaiting = 32, kChannelAhead = 16;
+  std::array<Noted, kWaiting> noted_{};
   std::size_t notedCount_ = 0;
   std::size_t added_ = 0;
+  std::size_t expected_ = 0;  // the position of the next run, if the order is the known one
+  std::size_t searched_ = 0;  // runs for which it was not
 };
 
 }  // namespace tally

@@ -154,27 +154,29 @@ HwResult subtract(const ChannelReading& earlier, const ChannelReading& later, Ot
 // when it cannot be made so; then nothing has been reported.
 bool subtractRows(const ChannelFrame& earlier, const ChannelFrame& later, ChannelFrame& result) {
   const auto index = later.rows().index();
-  if (!index->complete() || !later.hasRowsOf(earlier)) return false;
+  if (!index->isComplete() || !later.hasRowsOf(earlier)) return false;
   const RunBlock& before = earlier.block();
-  const RunBlock& after = later.block();
   std::size_t done = 0;
+  std::size_t position = 0;  // in the index, as long as its order is that of the runs
   const auto ahead = [&](std::size_t row) {
-    index->prefetchType(row);
     before.prefetchPlace(row);
     result.block().prefetchPlace(row);
   };
-  const bool all = after.eachInOrder(ahead, [&](std::size_t row) {
+  const bool all = later.block().eachInOrder(ahead, [&](std::size_t row, const ElementRun& after) {
     if (!before.has(row)) return false;
-    const TypeWord type{index->typeBits(row)};
+    const bool known = position < index->size() && index->row(position) == row;
+    const auto type =
+        known ? TypeWord{index->typeBits(position)} : typeWordOfLegend(later.rows().legend(row));
+    ++position;
     ResultInBlock made(result.block(), row);
     ++done;
-    return subtract({type, before.run(row)}, {type, after.run(row)}, OtherSlots::Invalidate, made,
+    return subtract({type, before.run(row)}, {type, after}, OtherSlots::Invalidate, made,
                     nullptr) == 0;
   });
   if (!all) return false;
   for (const auto& repeated : index->repeated()) {
     if (!result.block().has(repeated.first)) continue;
-    if (index->typeBits(repeated.row) != index->typeBits(repeated.first)) return false;
+    if (!repeated.sameType) return false;
     result.block().share(repeated.row, repeated.first);
     ++done;
   }
