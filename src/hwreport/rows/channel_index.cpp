@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <bit>
+#include <utility>
 
 #include "base/hash.h"
 #include "hwreport/channels/type_word.h"
@@ -29,26 +30,27 @@ ChannelIndex::ChannelIndex(const ChannelRows& rows)
   }
 }
 
-ChannelIndex::ChannelIndex(const ChannelIndex& other, const std::vector<std::uint32_t>& order)
-    : inOrderOfRows_(false),
-      changes_(other.changes_),
-      drivers_(other.drivers_),
-      slots_(other.slots_.size(), kNone),
-      formless_(other.formless_),
-      repeated_(other.repeated_),
-      sizeOfRuns_(other.sizeOfRuns_),
-      complete_(other.complete_) {
-  std::vector<bool> placed(other.size());
-  channels_.reserve(other.size());
-  const auto add = [&](std::uint32_t row) {
-    channels_.push_back(other.channels_[row]);
-    placed[row] = true;
-  };
-  for (const std::uint32_t row : order) add(row);
-  for (std::uint32_t row = 0; row < other.size(); ++row) {
-    if (!placed[row]) add(row);
+void ChannelIndex::reorder(std::vector<std::uint32_t> order) {
+  std::vector<bool> placed(size());
+  for (const std::uint32_t row : order) placed[row] = true;
+  for (std::uint32_t row = 0; row < size(); ++row) {
+    if (!placed[row]) order.push_back(row);
   }
+  // In place, cycle by cycle: a second copy of all would be the largest memory of a subscription.
+  for (std::uint32_t start = 0; start < size(); ++start) {
+    const Channel first = channels_[start];
+    std::uint32_t position = start;
+    while (order[position] != start && order[position] != position) {
+      const std::uint32_t from = std::exchange(order[position], position);
+      channels_[position] = channels_[from];
+      position = from;
+    }
+    if (position != start) channels_[position] = first;
+    order[position] = position;
+  }
+  std::ranges::fill(slots_, kNone);
   for (std::uint32_t position = 0; position < size(); ++position) place(position);
+  inOrderOfRows_ = false;
 }
 
 void ChannelIndex::read(const ChannelRows& rows, std::uint32_t row) {

@@ -14,8 +14,9 @@ class ChannelRows;
 class ChannelIndex {
  public:
   explicit ChannelIndex(const ChannelRows& rows);
-  // The same in another order: some of the rows, each once. The others follow.
-  ChannelIndex(const ChannelIndex& other, const std::vector<std::uint32_t>& order);
+  // Puts the channels into another order: some of the rows, each once. The others follow. REQUIRES:
+  // they are in the order of the rows.
+  void reorder(std::vector<std::uint32_t> order);
   static constexpr std::uint32_t kNone = UINT32_MAX;
 
   bool isInOrderOfRows() const noexcept { return inOrderOfRows_; }

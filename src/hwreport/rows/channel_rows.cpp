@@ -112,11 +112,12 @@ std::shared_ptr<const ChannelIndex> ChannelRows::index() const {
   return index_;
 }
 
-void ChannelRows::reorder(const std::shared_ptr<const ChannelIndex>& index,
-                          const std::vector<std::uint32_t>& order) const {
-  auto reordered = std::make_shared<ChannelIndex>(*index, order);
+void ChannelRows::reorder(std::shared_ptr<const ChannelIndex> index,
+                          std::vector<std::uint32_t> order) const {
   const std::lock_guard lock(mutex_);
-  if (index_ == index) index_ = std::move(reordered);
+  if (index_ != index) return;
+  index.reset();
+  if (index_.use_count() == 1) index_->reorder(std::move(order));
 }
 
 RunBlock ChannelRows::makeBlock(std::size_t sizeOfRuns) const {

@@ -70,9 +70,9 @@ class ChannelRows {
   // What finds the row of a run, made anew when an array has changed since. Safe from any thread.
   std::shared_ptr<const ChannelIndex> index() const;
 
-  // Puts the index into the order of the runs of a sample, for the next ones.
-  void reorder(const std::shared_ptr<const ChannelIndex>& index,
-               const std::vector<std::uint32_t>& order) const;
+  // Puts the index into the order of the runs of a sample, for the next ones, unless somebody else
+  // uses it just now.
+  void reorder(std::shared_ptr<const ChannelIndex> index, std::vector<std::uint32_t> order) const;
 
   // A block for the runs of all rows, and its memory back.
   RunBlock makeBlock(std::size_t sizeOfRuns) const;
@@ -84,7 +84,7 @@ class ChannelRows {
   std::vector<ChannelShape> shapes_;
   std::vector<KvRef<KvString>> names_;  // shorter when the last ones have none
   mutable std::mutex mutex_;
-  mutable std::shared_ptr<const ChannelIndex> index_;
+  mutable std::shared_ptr<ChannelIndex> index_;
   // Of the samples that were released last: a sample and a difference are taken again and again,
   // and touching fresh memory would cost more than filling it.
   mutable BlockMemory spare_[2];

@@ -109,7 +109,7 @@ void FrameSampler::learnOrder() {
                                order.push_back(static_cast<std::uint32_t>(row));
                                return true;
                              });
-  frame_.rows().reorder(index_, order);
+  frame_.rows().reorder(std::move(index_), std::move(order));
 }
 
 FrameSampler::Result FrameSampler::finish(bool stopped) {
@@ -117,7 +117,6 @@ FrameSampler::Result FrameSampler::finish(bool stopped) {
   for (const auto& repeated : index_->repeated()) block.share(repeated.row, repeated.first);
   std::vector<std::uint32_t> found;
   const auto rows = static_cast<std::uint32_t>(frame_.size());
-  if (index_->isInOrderOfRows() && searched_ > rows / 2) learnOrder();
   std::uint32_t missing = 0;
   while (missing < rows && block.has(missing)) ++missing;
   // A scan that was stopped ends the sample at the first channel that it has not found.
@@ -125,6 +124,8 @@ FrameSampler::Result FrameSampler::finish(bool stopped) {
     if (stopped && row >= missing) break;
     if (block.has(row)) learnType(frame_.rows().legend(row), block.run(row));
   }
+  // The last use of the index.
+  if (index_->isInOrderOfRows() && searched_ > rows / 2) learnOrder();
   if (missing == rows) return Result::Complete;
   if (stopped) return Result::Stopped;
   for (std::uint32_t row = 0; row < rows; ++row) {

@@ -37,7 +37,7 @@ class FrameSampler {
     std::size_t slot;
   };
   ChannelFrame& frame_;
-  const std::shared_ptr<const ChannelIndex> index_;
+  std::shared_ptr<const ChannelIndex> index_;
   const std::span<const std::byte> buffer_;
   // Runs wait here, in their order, while the memory of their look-up is fetched.
   static constexpr std::size_t kWaiting = 32, kChannelAhead = 16;
