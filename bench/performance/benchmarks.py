@@ -29,6 +29,11 @@ BENCHMARKS = [
     Benchmark("bench_export", "Exporting logs",
               "`tallyctl report export` of a spool of 1,000 logs. Yardstick: a Python script that makes the same rows with "
               "plistlib and json."),
+    Benchmark("bench_store_size", "What a day takes in the store",
+              "Bytes for each sample of the whole store file, and the CPU time of reading all values, process included. "
+              "Yardsticks: a store of schema version 1, which has the samples as they are; and zstd at level 1 on the raw "
+              "columns of each key, without a store around them, as they are and with their bytes shuffled, whose time is "
+              "that of decompressing the values alone."),
     Benchmark("bench_whitelist", "Reading a whitelist",
               "A whitelist of one group is read from its file into the tables of the daily job. Yardstick: Python's "
               "plistlib loads the same file."),

@@ -15,11 +15,13 @@
 
 namespace tally {
 
-// Long enough that the end of a row's last page, which is empty, does not matter.
+// Of a row in which hardly anything changes; others hold fewer, since they would be too long.
 constexpr std::size_t kMostRowSamples = 16384;
 
 struct PackedRow {
   std::vector<std::byte> values, weights, offsets;
+
+  std::size_t bytes() const { return values.size() + weights.size() + offsets.size(); }
 };
 // REQUIRES: 1 to kMostRowSamples samples.
 PackedRow packRow(const SampleColumns& samples);
@@ -41,6 +43,10 @@ class SampleRow {
 
     // Whether a row may have that shape, whatever its values are.
     bool isPossible() const;
+    // REQUIRES: it is possible.
+    std::size_t bytes() const {
+      return static_cast<std::size_t>(valueBytes + weightBytes + offsetBytes);
+    }
   };
   // Whether the row can be unpacked: what the values begin with fits the shape.
   bool open(const Shape& shape, std::span<const std::byte> values);

@@ -16,11 +16,10 @@ namespace {
 class SeriesSource final : public SampleSource {
  public:
   SeriesSource(Database& database, StoreFaults& faults, const StoreRange& range, bool filtered)
-      : database_(database), faults_(faults), rows_(database, faults) {
+      : rows_(database, faults) {
     const std::string columns =
-        "samples, weight, length(sample_values), length(sample_weights), length(sample_offsets), "
-        "iif(weight <> samples, " +
-        std::string(kBoundedRowWeights) + ", NULL)";
+        "samples, weight, length(sample_values), length(sample_weights), length(sample_offsets), " +
+        std::string(kBoundedRowWeights) + ", " + std::string(kBoundedRowOffsets);
     if (rows_.open(kSeriesTable, columns, kBoundedRowValues, range, filtered)) {
       SeriesSource::advance();
     } else {
@@ -53,7 +52,6 @@ class SeriesSource final : public SampleSource {
       taken_ = held_ = 0;
       if (!open_.takeRow(*this)) return 0;
       held_ = row_.size();
-      hasOffsets_ = false;
     }
     const std::size_t count = std::min(capacity, held_ - taken_);
     row_.unpackValues(taken_, {values, count});
@@ -62,9 +60,7 @@ class SeriesSource final : public SampleSource {
       row_.unpackWeights(rows_.row().blob(RowWalk::kFirstColumn + 5), taken_, weights_);
     }
     if (offsets != nullptr) {
-      const bool found = hasOffsets_ || fetchOffsets();
-      row_.unpackOffsets(found ? offsets_.blob(3) : std::span<const std::byte>(), taken_,
-                         {offsets, count});
+      row_.unpackOffsets(rows_.row().blob(RowWalk::kFirstColumn + 6), taken_, {offsets, count});
     }
     taken_ += count;
     return count;
@@ -73,40 +69,11 @@ class SeriesSource final : public SampleSource {
   void closeSamples() override { open_.close(); }
 
  private:
-  // A walk of its own along the offsets, since finding a row costs the database several with all
-  // their columns: whoever reads the offsets of one row usually reads those of the next.
-  bool fetchOffsets() {
-    const auto step = [this] {
-      const Step next = offsets_.step();
-      if (next == Step::Failed) faults_.fail(database_.error());
-      hasOffsets_ = next == Step::Row && offsets_.integer(0) == rows_.day() &&
-                    offsets_.text(1) == rows_.key() && offsets_.integer(2) == rows_.number();
-      return hasOffsets_;
-    };
-    if (!walksOffsets_) {
-      const std::string text = "SELECT day, key, number, " + std::string(kBoundedRowOffsets) +
-                               " FROM series WHERE (day, key, number) >= (?1, ?2, ?3) "
-                               "ORDER BY day, key, number";
-      if (!prepareOrFail(database_, faults_, offsets_, text)) return false;
-      walksOffsets_ = true;
-    } else if (step()) {
-      return true;
-    }
-    offsets_.reset();
-    offsets_.bind(1, rows_.day()).bind(2, rows_.key()).bind(3, rows_.number());
-    return step();
-  }
-
-  Database& database_;
-  StoreFaults& faults_;
   RowWalk rows_;
   OpenKey open_;
-  Statement offsets_;
-  bool walksOffsets_ = false;
   // The row in hand: how many samples it holds, and how many of them were delivered.
   SampleRow row_;
   std::size_t held_ = 0, taken_ = 0;
-  bool hasOffsets_ = false;
   std::vector<std::uint32_t> weights_;  // of those that were delivered last
 };
 

@@ -4,8 +4,10 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "host/store/samples/packed_samples.h"
+#include "host/store/samples/sample_row.h"
 #include "host/store/sqlite_database.h"
 
 namespace tally {
@@ -24,19 +26,27 @@ class SampleTail {
   Status finish();
 
  private:
-  SampleTail(Database& database, bool isSeries);
+  SampleTail(Database& database, bool isSeries) : database_(&database), isSeries_(isSeries) {}
   // Takes up the samples of the row in hand. False if it has no space, or is damaged.
   bool take(const Statement& row);
-  Status write();
+  // The bytes of the columns of a row that lies in its page alone.
+  std::size_t shortRow() const;
+  // How many of the samples one row should hold, which is then packed.
+  std::size_t fill(const SampleColumns& samples);
+  // Writes rows until at most so many samples are left.
+  Status writeRows(std::size_t left);
 
   Database* database_;
   bool isSeries_;
-  std::size_t capacity_;  // of a row
   Statement last_, put_;
   std::int32_t day_ = 0;
   std::string key_;
   std::int64_t number_ = 0;
   SampleVectors held_;
+  // The row that was packed last, and how many samples it holds.
+  PackedRow row_;
+  std::vector<std::byte> blob_;
+  std::size_t rowSamples_ = 1024;
 };
 
 }  // namespace tally
