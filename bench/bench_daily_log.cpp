@@ -15,6 +15,7 @@
 #include "host/linux_platform.h"
 #include "host/store/store_history.h"
 #include "host/store/store_schema.h"
+#include "host/store/store_writer.h"
 #include "process_cost.h"
 #include "report/distribution_pass.h"
 #include "sample_device.h"
@@ -61,6 +62,11 @@ int passOverSamples(const char* root) {
       });
   pass.finish();
   return number > 0 ? 0 : 1;
+}
+
+int convert(const char* root) {
+  auto store = StoreWriter::open(metricsStoreFile(std::string(root)), IfMissing::Leave);
+  return store && *store && (*store)->convertToPackedSchema([](const std::string&) {}) ? 0 : 1;
 }
 
 // Keeps the run with the least CPU time, which others on the machine have disturbed least.
@@ -175,6 +181,7 @@ int measure(const std::string& self, const std::string& yardsticks) {
   line("the same of a raw store, schema version 1", rawPass);
   line("yardstick: the whole raw store read", floor);
   line("yardstick: the whole store read, not unpacked", packed);
+  line("a raw store converted", runProcess({self, "convert", raw}));
   const ProcessCost compared =
       runProcess({"python3", yardsticks + "/compare_logs.py", newestLog(full), expected});
   std::filesystem::remove_all(base);
@@ -226,6 +233,7 @@ int main(int count, char** arguments) {
     return readRows(arguments[2], {"SELECT key, count(*), min(value), max(value), avg(value) "
                                    "FROM samples GROUP BY key"});
   }
+  if (mode == "convert" && count == 3) return convert(arguments[2]);
   if (mode == "pass" && count == 3) return passOverSamples(arguments[2]);
   return measure(self, YARDSTICK_FOLDER);
 }
