@@ -93,15 +93,16 @@ NumberLayout narrowestLayout(std::span<const std::uint64_t> numbers) {
 void putNumbers(std::vector<std::byte>& column, const NumberLayout& layout,
                 std::span<const std::uint64_t> numbers) {
   const std::uint64_t mask = maskOf(layout.width);
-  std::uint64_t held = 0;  // bits that are still to be put
-  unsigned bits = 0;
+  const std::size_t start = column.size(), bytes = bytesOfBits(numbers.size(), layout.width);
+  column.resize(start + bytes + sizeof mask);  // each is put as a whole word
+  std::byte* const to = column.data() + start;
+  std::size_t bit = 0;
   for (const std::uint64_t number : numbers) {
-    held |= (number & mask) << bits;
-    for (bits += layout.width; bits >= 8; bits -= 8, held >>= 8) {
-      column.push_back(static_cast<std::byte>(held));
-    }
+    const std::uint64_t word = load<std::uint64_t>(to + bit / 8) | (number & mask) << (bit % 8);
+    std::memcpy(to + bit / 8, &word, sizeof word);
+    bit += layout.width;
   }
-  if (bits > 0) column.push_back(static_cast<std::byte>(held));
+  column.resize(start + bytes);
   for (std::size_t i = 0; i < numbers.size(); ++i) {
     if (numbers[i] <= mask) continue;
     put(column, static_cast<std::uint16_t>(i));

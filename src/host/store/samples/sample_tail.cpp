@@ -107,15 +107,19 @@ std::size_t SampleTail::fill(const SampleColumns& samples) {
         std::min(all - std::min(all, kLeastInPage), kMostOwnPages * kBytesOfOwnPage) /
         kBytesOfOwnPage;
     const std::size_t target = shortRow() + ownPages * kBytesOfOwnPage;
-    const std::size_t fitting = count * target / bytes;
+    // The middle of what is full, for the next row too.
+    const std::size_t fitting =
+        std::clamp<std::size_t>(count * (target - kMostMissing / 2) / bytes, 1, kMostRowSamples);
     if (bytes > target && count > 1) {
-      count = attempt < kMostAttempts ? std::clamp<std::size_t>(fitting, 1, count - 1) : count / 2;
+      count = attempt < kMostAttempts ? std::min(fitting, count - 1) : count / 2;
       continue;
     }
-    if (count == most || isFull(bytes, target) || attempt >= kMostAttempts) break;
-    count = std::clamp(fitting - fitting / 64, count + 1, most);
+    if (count == most || isFull(bytes, target) || attempt >= kMostAttempts) {
+      rowSamples_ = fitting;
+      return count;
+    }
+    count = std::clamp(fitting, count + 1, most);
   }
-  return rowSamples_ = count;
 }
 
 Status SampleTail::writeRows(std::size_t left) {
