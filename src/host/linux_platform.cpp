@@ -70,7 +70,8 @@ Platform makeLinuxPlatform(const DeviceRoot& root, const LinuxPlatformOptions& o
   services.servicesClient = std::make_shared<FileServicesClient>(root, log, access);
   StoreFile store = metricsStoreFile(root);
   store.notify = [log](const std::string& message) { log->write(LogLevel::Error, message); };
-  services.metricsStore = makeSqliteMetricsStore(std::move(store), log, clock);
+  services.metricsStore =
+      makeSqliteMetricsStore(std::move(store), log, clock, kMostStoreBytes, preferences);
   services.crashReporting =
       std::make_shared<LinuxCrashReporting>(root, log, clock, preferences, consent);
   services.crashSupportLibrary = std::make_shared<LinuxCrashSupportLibrary>(description);

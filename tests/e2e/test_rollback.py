@@ -76,6 +76,14 @@ class Rollback(DeviceTest):
             self.assertLessEqual(tables.items(), {name: f"CREATE TABLE {name}{columns}"
                                                   for name, columns in ACCEPTED.items()}.items())
             self.assertLessEqual(set(REQUIRED), set(tables))
+        self.assertEqual(device.preferences()["StoreConversionDays"], {"last": day, "days": 1})
+        device.tool("prefs", "set", "StoreConversion", "at once")
+        device.run("-f", day=day)
+        with self.database(device) as store:
+            self.assertGreater(store.execute("PRAGMA user_version").fetchone(), (FORMER,))
+        self.assertEqual([log["TBScalars"], log["TBDistributions"]],
+                         [device.logs()[-1][part] for part in ("TBScalars", "TBDistributions")])
+        self.assertNotIn("StoreConversionDays", device.preferences())
 
     def test_a_newer_store_is_kept_and_read_again(self):
         device = self.device

@@ -9,6 +9,7 @@
 #include <fmt/core.h>
 
 #include "base/time_text.h"
+#include "host/store/store_conversion_day.h"
 #include "host/store/store_counters.h"
 #include "host/store/store_history.h"
 #include "host/store/store_retention.h"
@@ -28,11 +29,13 @@ constexpr std::int32_t kDaysOfUnseenCounter = 30;
 class SqliteMetricsStore final : public MetricsStore {
  public:
   SqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
-                     std::shared_ptr<const Clock> clock, std::uint64_t maximumBytes)
+                     std::shared_ptr<const Clock> clock, std::uint64_t maximumBytes,
+                     std::shared_ptr<Preferences> preferences)
       : file_(std::move(file)),
         log_(std::move(log)),
         clock_(std::move(clock)),
-        maximumBytes_(maximumBytes) {}
+        maximumBytes_(maximumBytes),
+        preferences_(std::move(preferences)) {}
 
   std::int32_t TBDaysSince1970() override { return dayOfSeconds(clock_->secondsSince1970()); }
 
@@ -119,7 +122,26 @@ class SqliteMetricsStore final : public MetricsStore {
     const auto opened = writer(IfMissing::Leave);
     if (!opened) return opened.error();
     if (*opened == nullptr) return Done{};
-    StoreWriter& store = **opened;
+    if (auto done = foldAndForget(**opened); !done) return done;
+    return preferences_ ? convertIfDue(**opened) : Status(Done{});
+  }
+
+  Status convertIfDue(StoreWriter& store) {
+    const auto packed = store.isPacked();
+    if (!packed) return packed.error();
+    if (!*packed) {
+      if (!conversionIsDue(*preferences_, TBDaysSince1970())) return Done{};
+      auto converted = store.convertToPackedSchema(
+          [this](const std::string& message) { report(Error{message}); });
+      if (!converted) return converted;
+      log_->write(LogLevel::Default,
+                  fmt::format("metrics store {}: converted to the present format", file_.text()));
+    }
+    endConversion(*preferences_);
+    return Done{};
+  }
+
+  Status foldAndForget(StoreWriter& store) {
     const auto needed = needsCheckpoint(store);
     if (!needed) return needed.error();
     if (!*needed) return Done{};
@@ -207,6 +229,7 @@ class SqliteMetricsStore final : public MetricsStore {
   std::shared_ptr<SystemLog> log_;
   std::shared_ptr<const Clock> clock_;
   std::uint64_t maximumBytes_;
+  std::shared_ptr<Preferences> preferences_;
   std::optional<StoreWriter> writer_;
   std::vector<Scalar> batch_;
   std::vector<CounterState> counters_;  // of the batch too
@@ -218,9 +241,10 @@ class SqliteMetricsStore final : public MetricsStore {
 
 std::shared_ptr<MetricsStore> makeSqliteMetricsStore(StoreFile file, std::shared_ptr<SystemLog> log,
                                                      std::shared_ptr<const Clock> clock,
-                                                     std::uint64_t maximumBytes) {
+                                                     std::uint64_t maximumBytes,
+                                                     std::shared_ptr<Preferences> preferences) {
   return std::make_shared<SqliteMetricsStore>(std::move(file), std::move(log), std::move(clock),
-                                              maximumBytes);
+                                              maximumBytes, std::move(preferences));
 }
 
 }  // namespace tally

@@ -163,6 +163,12 @@ Result<std::uint64_t> StoreWriter::usedBytes() {
          static_cast<std::uint64_t>(figures[2]);
 }
 
+Result<bool> StoreWriter::isPacked() {
+  const auto version = schemaVersion(*database_);
+  if (!version) return version.error();
+  return *version == kPackedSchema;
+}
+
 Status StoreWriter::convertToPackedSchema(const std::function<void(const std::string&)>& onFault) {
   arrivals_.reset();
   tail_.reset();

@@ -60,6 +60,8 @@ class StoreWriter {
   // The bytes of all pages in use.
   Result<std::uint64_t> usedBytes();
 
+  // Whether it has the packed schema.
+  Result<bool> isPacked();
   // Gives the store the packed schema (store_conversion.h). REQUIRES: no transaction.
   Status convertToPackedSchema(const std::function<void(const std::string&)>& onFault);
 
