@@ -192,8 +192,7 @@ int measure(const std::string& self, const std::string& yardsticks) {
   std::printf("script / tallyrun                    %6.1f\n", script.cpuSeconds / whole.cpuSeconds);
   std::printf("pass / whole raw store read          %6.2f\n", pass.cpuSeconds / floor.cpuSeconds);
   std::printf("pass / pass of a raw store           %6.2f\n", pass.cpuSeconds / rawPass.cpuSeconds);
-  std::printf("pass / whole packed store read       %6.2f
-", pass.cpuSeconds / packed.cpuSeconds);
+  std::printf("pass / whole packed store read       %6.2f\n", pass.cpuSeconds / packed.cpuSeconds);
   std::printf("peak, 100 times the samples          %+6.1f %%\n",
               100.0 * (mebibytes(whole) / mebibytes(small) - 1));
   addFigure("a large day", whole.cpuSeconds, "s CPU", "a Python script", script.cpuSeconds,
