@@ -249,7 +249,6 @@ int main() {
                 times[1][i], times[2][i], times[2][i] / times[0][i],
                 times[2][i] / times[2][kCount - 1], hot[i]);
   }
-  std::printf("to reach: growth at most 1.25; sample and delta at most 400 ns\n");
   std::printf("subscribed, and sampled for the first time: %.0f %.0f %.0f ns\n",
               memory[0].firstSample, memory[1].firstSample, memory[2].firstSample);
   std::printf("memory of a subscribed and sampled channel: %.0f %.0f %.0f bytes\n",
