@@ -71,7 +71,7 @@ std::size_t NumberLayout::bytes(std::size_t count) const {
 NumberLayout narrowestLayout(std::span<const std::uint64_t> numbers) {
   std::array<std::size_t, kMostBits + 1> countOfWidth{};
   for (const std::uint64_t number : numbers) {
-    ++countOfWidth[std::min<std::size_t>(std::bit_width(number), kMostBits)];
+    ++countOfWidth[std::min(static_cast<unsigned>(std::bit_width(number)), kMostBits)];
   }
   unsigned widest = kMostBits;
   while (widest > 0 && countOfWidth[widest] == 0) --widest;

@@ -16,12 +16,12 @@ namespace {
 // that are values, weights and differences of offsets: the width (8 bits) and the exceptions (16
 // bits) of each. Then of a constant the value, of decimals the least one's digits (64 bits) and the
 // numbers by which each exceeds them.
-enum ValueForm : std::uint8_t { kConstant, kDecimals, kFloat, kDouble };
+enum RowForm : std::uint8_t { kOneValue, kDecimals, kFloats, kDoubles };
 constexpr std::size_t kBytesOfLayout = 3;
 constexpr std::size_t kHeader = 2 + 3 * kBytesOfLayout;
 
 // Weights: the least one (32 bits), and the numbers by which each exceeds it.
-constexpr std::size_t kBytesBeforeWeights = sizeof(std::uint32_t);
+constexpr std::size_t kBytesOfLeastWeight = sizeof(std::uint32_t);
 // Offsets: the first one, the least difference from one to the next (32 bits each, modulo 2^32,
 // since clocks may step back), and the numbers by which each difference exceeds it.
 constexpr std::size_t kBytesBeforeOffsets = 2 * sizeof(std::uint32_t);
@@ -31,7 +31,7 @@ constexpr std::size_t kMostBytesOfNumbers = kMostRowSamples * sizeof(std::uint32
 constexpr std::size_t kMostValueBytes = kHeader + kMostRowSamples * sizeof(double);
 
 template <class T>
-void put(std::vector<std::byte>& column, T number) {
+void putNumber(std::vector<std::byte>& column, T number) {
   const auto bytes = std::bit_cast<std::array<std::byte, sizeof(T)>>(number);
   column.insert(column.end(), bytes.begin(), bytes.end());
 }
@@ -49,10 +49,10 @@ NumberLayout layoutAt(const ByteReader& reader, std::size_t which) {
 }
 
 void packValues(std::span<const double> values, std::vector<std::byte>& column) {
-  const auto setForm = [&](ValueForm form) { column[0] = std::byte{form}; };
+  const auto setForm = [&](RowForm form) { column[0] = std::byte{form}; };
   if (areEqual(values)) {
-    setForm(kConstant);
-    return put(column, values[0]);
+    setForm(kOneValue);
+    return putNumber(column, values[0]);
   }
   const std::size_t floating = values.size() * (fitFloats(values) ? sizeof(float) : sizeof(double));
   if (const auto decimals = decimalsOf(values)) {
@@ -61,18 +61,18 @@ void packValues(std::span<const double> values, std::vector<std::byte>& column) 
       setForm(kDecimals);
       column[1] = static_cast<std::byte>(decimals->scale);
       putLayout(column, 0, layout);
-      put(column, decimals->least);
+      putNumber(column, decimals->least);
       return putNumbers(column, layout, decimals->excess);
     }
   }
   if (floating == values.size_bytes()) {
-    setForm(kDouble);
+    setForm(kDoubles);
     const auto bytes = std::as_bytes(values);
     column.insert(column.end(), bytes.begin(), bytes.end());
     return;
   }
-  setForm(kFloat);
-  for (const double value : values) put(column, static_cast<float>(value));
+  setForm(kFloats);
+  for (const double value : values) putNumber(column, static_cast<float>(value));
 }
 
 // The numbers by which others exceed the least of them.
@@ -101,7 +101,7 @@ PackedRow packRow(const SampleColumns& samples) {
     const auto excesses = excessesOf(weights, least);
     const NumberLayout layout = narrowestLayout(excesses);
     putLayout(row.values, 1, layout);
-    put(row.weights, static_cast<std::uint32_t>(least));
+    putNumber(row.weights, static_cast<std::uint32_t>(least));
     putNumbers(row.weights, layout, excesses);
   }
 
@@ -113,15 +113,15 @@ PackedRow packRow(const SampleColumns& samples) {
   const auto excesses = excessesOf(differences, least);
   const NumberLayout layout = narrowestLayout(excesses);
   putLayout(row.values, 2, layout);
-  put(row.offsets, samples.offsets[0]);
-  put(row.offsets, static_cast<std::int32_t>(least));
+  putNumber(row.offsets, samples.offsets[0]);
+  putNumber(row.offsets, static_cast<std::int32_t>(least));
   putNumbers(row.offsets, layout, excesses);
   return row;
 }
 
 // As the texts of the queries say.
 static_assert(kMostValueBytes == 131083);
-static_assert(kBytesBeforeWeights + kMostBytesOfNumbers == 65540);
+static_assert(kBytesOfLeastWeight + kMostBytesOfNumbers == 65540);
 static_assert(kBytesBeforeOffsets + kMostBytesOfNumbers == 65544);
 
 bool SampleRow::Shape::isPossible() const {
@@ -130,7 +130,7 @@ bool SampleRow::Shape::isPossible() const {
   };
   return samples >= 1 && samples <= static_cast<std::int64_t>(kMostRowSamples) &&
          isWithin(valueBytes, kHeader, kMostValueBytes) &&
-         isWithin(weightBytes, 0, kBytesBeforeWeights + kMostBytesOfNumbers) &&
+         isWithin(weightBytes, 0, kBytesOfLeastWeight + kMostBytesOfNumbers) &&
          isWithin(offsetBytes, kBytesBeforeOffsets, kBytesBeforeOffsets + kMostBytesOfNumbers) &&
          (weightBytes > 0) == (weight != samples);
 }
@@ -152,7 +152,7 @@ bool SampleRow::open(const Shape& shape, std::span<const std::byte> values) {
   data_ = values.subspan(kHeader);
   std::size_t bytes = 0;
   switch (form_) {
-    case kConstant:
+    case kOneValue:
       bytes = sizeof(double);
       break;
     case kDecimals: {
@@ -161,17 +161,17 @@ bool SampleRow::open(const Shape& shape, std::span<const std::byte> values) {
       bytes = sizeof *least + values_.bytes(count);
       break;
     }
-    case kFloat:
+    case kFloats:
       bytes = count * sizeof(float);
       break;
-    case kDouble:
+    case kDoubles:
       bytes = count * sizeof(double);
       break;
     default:
       return false;
   }
   isWeighted_ = shape.weightBytes > 0;
-  const std::size_t weightBytes = isWeighted_ ? kBytesBeforeWeights + weights_.bytes(count) : 0;
+  const std::size_t weightBytes = isWeighted_ ? kBytesOfLeastWeight + weights_.bytes(count) : 0;
   const std::size_t offsetBytes = kBytesBeforeOffsets + offsets_.bytes(count - 1);
   if (data_.size() != bytes || static_cast<std::size_t>(shape.weightBytes) != weightBytes ||
       static_cast<std::size_t>(shape.offsetBytes) != offsetBytes) {
@@ -184,7 +184,7 @@ bool SampleRow::open(const Shape& shape, std::span<const std::byte> values) {
 
 void SampleRow::unpackValues(std::size_t first, std::span<double> out) const {
   const ByteReader reader(data_);
-  if (form_ == kConstant) {
+  if (form_ == kOneValue) {
     std::ranges::fill(out, reader.read<double>(0).value_or(0));
     return;
   }
@@ -193,7 +193,7 @@ void SampleRow::unpackValues(std::size_t first, std::span<double> out) const {
     const NumberColumn numbers(data_.subspan(sizeof least), size_, values_);
     return numbers.unpackQuotients(first, least, kPowersOfTen[scale_], out);
   }
-  if (form_ == kFloat) {
+  if (form_ == kFloats) {
     for (std::size_t i = 0; i < out.size(); ++i) {
       out[i] = reader.read<float>((first + i) * sizeof(float)).value_or(0);
     }
@@ -210,7 +210,7 @@ void SampleRow::unpackWeights(std::span<const std::byte> column, std::size_t fir
     std::ranges::fill(out, 1u);
     return;
   }
-  NumberColumn(column.subspan(kBytesBeforeWeights), size_, weights_).unpack(first, out);
+  NumberColumn(column.subspan(kBytesOfLeastWeight), size_, weights_).unpack(first, out);
   for (std::uint32_t& weight : out) {
     const std::uint64_t sum = std::uint64_t{*least} + weight;
     weight = static_cast<std::uint32_t>(
