@@ -83,7 +83,7 @@ WhitelistFile loadWhitelistFile(Platform& platform) {
     return *count;
   });
   readContent(window, file);
-  // The digest is of the whole file, also of one that is no property list.
+  // The digest is of the whole file, even if it is not a property list.
   while (!window.endsDocument()) window.more(window.text().size());
   if (failure) return {.read = false, .digest = {}, .content = nullptr, .fault = failure->message};
   file.read = true;
