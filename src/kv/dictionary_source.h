@@ -15,6 +15,7 @@ class KvDictionarySource {
  public:
   KvDictionarySource(const KvDictionarySource&) = delete;
   KvDictionarySource& operator=(const KvDictionarySource&) = delete;
+  virtual ~KvDictionarySource() = default;
   void retain() const noexcept { references_.fetch_add(1, std::memory_order_relaxed); }
   void release() const noexcept {
     if (references_.fetch_sub(1, std::memory_order_acq_rel) == 1) delete this;
@@ -24,7 +25,6 @@ class KvDictionarySource {
 
  protected:
   KvDictionarySource() noexcept = default;
-  virtual ~KvDictionarySource() = default;
 
  private:
   mutable std::atomic<std::uint32_t> references_{1};

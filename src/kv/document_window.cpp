@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
+#include <span>
 
 namespace tally {
 
@@ -26,24 +27,27 @@ DocumentWindow::DocumentWindow(std::string_view document) : text_(document), end
 }
 
 DocumentWindow::DocumentWindow(PlistSource source, std::size_t piece)
-    : source_(std::move(source)), buffer_(piece) {}
+    : source_(std::move(source)),
+      capacity_(piece),
+      buffer_(std::make_unique_for_overwrite<char[]>(piece)) {}
 
 void DocumentWindow::more(std::size_t dropped) {
   linesBefore_ += countLines(text_.substr(0, dropped));
   text_.remove_prefix(dropped);
   if (endsDocument_) return;
   const std::size_t kept = text_.size();
-  if (kept > buffer_.size() / 2) {
+  if (kept > capacity_ / 2) {
     // One part of the document is larger than the window.
-    std::vector<char> larger(buffer_.size() * 2);
-    std::ranges::copy(text_, larger.begin());
-    buffer_.swap(larger);
+    auto larger = std::make_unique_for_overwrite<char[]>(capacity_ * 2);
+    std::ranges::copy(text_, larger.get());
+    buffer_ = std::move(larger);
+    capacity_ *= 2;
   } else if (kept != 0) {
-    std::memmove(buffer_.data(), text_.data(), kept);
+    std::memmove(buffer_.get(), text_.data(), kept);
   }
-  const std::size_t added = source_(std::span(buffer_).subspan(kept));
+  const std::size_t added = source_({buffer_.get() + kept, capacity_ - kept});
   endsDocument_ = added == 0;
-  text_ = {buffer_.data(), kept + added};
+  text_ = {buffer_.get(), kept + added};
   look(text_.substr(kept));
 }
 

@@ -2,8 +2,8 @@
 #pragma once
 
 #include <cstddef>
+#include <memory>
 #include <string_view>
-#include <vector>
 
 #include "kv/plist_receiver.h"
 
@@ -36,7 +36,8 @@ class DocumentWindow {
  private:
   void look(std::string_view added);
   PlistSource source_;
-  std::vector<char> buffer_;
+  std::size_t capacity_ = 0;
+  std::unique_ptr<char[]> buffer_;
   std::string_view text_;
   bool endsDocument_ = false;
   bool hasZeroBytes_ = false;

@@ -4,6 +4,7 @@
 #include <functional>
 #include <string_view>
 
+#include "base/result.h"
 #include "kv/value.h"
 
 namespace tally {
@@ -14,6 +15,8 @@ class LogFile {
   virtual ~LogFile() = default;
   // False when the bytes could not be written whole; the log is then not submitted.
   virtual bool write(std::string_view bytes) = 0;
+  // What was written is not whole: the log is not submitted.
+  virtual void abandon(const Error& reason) = 0;
 };
 
 class LogSubmission {

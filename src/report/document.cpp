@@ -203,8 +203,9 @@ void submitLog(Platform& platform, std::int32_t day, LogValues& values,
       [&](LogFile& file) {
         XmlPlistWriter writer(kDailyLogMaximumBytes,
                               [&file](std::string_view piece) { return file.write(piece); });
-        // The file knows why it took no more.
-        (void)writeDocument(writer, *frame, values);
+        if (const Status whole = writeDocument(writer, *frame, values); !whole) {
+          file.abandon(whole.error());
+        }
       });
   if (!written) platform.log->message(LogLevel::Error, "Failed to write tallyd log");
 }

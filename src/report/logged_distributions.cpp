@@ -25,7 +25,7 @@ void LoggedDistributions::set(std::string_view key, DistributionResult result) {
       return;
     }
   }
-  Entry& entry = entries_.emplace_back(std::string(key), std::move(result));
+  Entry& entry = entries_.emplace_back(Entry{std::string(key), std::move(result)});
   if (!rises) byKey_.emplace(entry.key, &entry);
 }
 

@@ -9,7 +9,7 @@ namespace tally {
 namespace {
 
 // Tags, indentation and the longest number; and the longest reference in place of a character.
-constexpr std::size_t kMostAround = 80, kMostOfByte = 5;
+constexpr std::size_t kMostAroundScalar = 80, kMostOfKeyByte = 5;
 
 void appendNumber(std::string& out, std::uint64_t number) {
   std::byte bytes[kLongestVarint];
@@ -53,7 +53,7 @@ class LoggedScalars::Cursor {
 };
 
 void LoggedScalars::set(std::string_view key, std::int64_t value) {
-  mostBytes_ += kMostAround + kMostOfByte * key.size();
+  mostBytes_ += kMostAroundScalar + kMostOfKeyByte * key.size();
   if (!others_->empty() || (!rows_.empty() && key <= last_)) {
     others_->set(key, KvNumber::int64(value));
     return;

@@ -236,6 +236,7 @@ struct FakeLogSubmission final : LogSubmission {
         if (!failed) body.append(bytes);
         return !failed;
       }
+      void abandon(const Error&) override { failed = true; }
     } file;
     file.fail = failWrite;
     writer(file);

@@ -39,6 +39,9 @@ class SpoolFile final : public LogFile {
     }
     return static_cast<bool>(status_);
   }
+  void abandon(const Error& reason) override {
+    if (status_) status_ = reason;
+  }
   const Status& status() const { return status_; }
 
  private:

@@ -129,14 +129,12 @@ class SqliteMetricsStore final : public MetricsStore {
   Status convertIfDue(StoreWriter& store) {
     const auto packed = store.isPacked();
     if (!packed) return packed.error();
-    if (!*packed) {
-      if (!conversionIsDue(*preferences_, TBDaysSince1970())) return Done{};
-      auto converted = store.convertToPackedSchema(
-          [this](const std::string& message) { report(Error{message}); });
-      if (!converted) return converted;
-      log_->write(LogLevel::Default,
-                  fmt::format("metrics store {}: converted to the present format", file_.text()));
-    }
+    if (*packed || !conversionIsDue(*preferences_, TBDaysSince1970())) return Done{};
+    auto converted = store.convertToPackedSchema(
+        [this](const std::string& message) { report(Error{message}); });
+    if (!converted) return converted;
+    log_->write(LogLevel::Default,
+                fmt::format("metrics store {}: converted to the present format", file_.text()));
     endConversion(*preferences_);
     return Done{};
   }

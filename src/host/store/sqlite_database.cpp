@@ -297,6 +297,10 @@ Error Database::error(std::string_view reason) const {
   return {"metrics store " + path_ + ": " + std::string(reason)};
 }
 
+bool Database::failedReading() const {
+  return (::sqlite3_errcode(handle_.get()) & 0xff) == SQLITE_IOERR;
+}
+
 bool Database::busy() const { return (::sqlite3_errcode(handle_.get()) & 0xff) == SQLITE_BUSY; }
 
 void Database::foldLogOnClose(bool fold) {

@@ -97,6 +97,8 @@ class Database {
   Error error(std::string_view reason) const;
   // Whether the last call failed since another connection held a lock.
   bool busy() const;
+  // Whether the last call could not read or write a file of the database.
+  bool failedReading() const;
   // Whether closing the last connection may fold the write-ahead log into the file.
   void foldLogOnClose(bool fold);
 

@@ -70,6 +70,12 @@ Status setNewerStoreAside(const StoreFile& file) {
   return directory->sync();
 }
 
+bool awaitSettingAside(const StoreFile& file) {
+  const auto directory = file.directory.open();
+  if (!directory || !directory->identity(std::string(kLockName))) return false;
+  return static_cast<bool>(FileLock::acquire(*directory, kLockName));
+}
+
 std::vector<StoreSetAside> storesSetAside(const StoreFile& file) {
   std::vector<StoreSetAside> found;
   const std::string stem = file.name + asideMark(kWord);
@@ -80,7 +86,8 @@ std::vector<StoreSetAside> storesSetAside(const StoreFile& file) {
     const auto number = parseInt64(name.substr(stem.size()));
     if (!number || *number < 1 || *number > kMostStoresSetAside) continue;
     const auto identity = file.directory.identity(name);
-    found.push_back({name, static_cast<std::uint32_t>(*number), identity ? identity->size : 0});
+    if (!identity || !identity->regular) continue;
+    found.push_back({name, static_cast<std::uint32_t>(*number), identity->size});
   }
   std::ranges::sort(found, {}, &StoreSetAside::number);
   return found;

@@ -17,6 +17,8 @@ namespace tally {
 // stays, and says why: above all while another process has it open, which may be the newer program
 // at work.
 Status setNewerStoreAside(const StoreFile& file);
+// Waits for a process that is about to do so. False if none ever did.
+bool awaitSettingAside(const StoreFile& file);
 
 // Far more often than a device can be rolled back.
 constexpr std::uint32_t kMostStoresSetAside = 9999;

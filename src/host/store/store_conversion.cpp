@@ -48,7 +48,8 @@ Status moveSamples(Database& database, const StoreFaultHandler& onFault) {
       stop = !moved;
     });
   }
-  if (moved && !losses.isComplete) return Error{reason};
+  // First: a full disk ends the reading too, and what follows fails for another reason.
+  if (!losses.isComplete) return Error{reason};
   if (moved && losses.damagedRows > 0) onFault(reason);
   return moved;
 }

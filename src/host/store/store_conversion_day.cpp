@@ -1,5 +1,6 @@
 #include "host/store/store_conversion_day.h"
 
+#include <algorithm>
 #include <optional>
 
 #include "platform/tables/known_preferences.h"
@@ -33,7 +34,7 @@ DayCount countDay(std::optional<DayCount> former, std::int64_t today, std::int64
   // This program processes a day on a later one, which it has counted.
   const bool byAnother = former && processed >= former->last;
   if (!former || byAnother || today < former->last) return {today, 1};
-  return {today, former->days + (today > former->last ? 1 : 0)};
+  return {today, std::min(former->days, kDaysToWait) + (today > former->last ? 1 : 0)};
 }
 
 }  // namespace

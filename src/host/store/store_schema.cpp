@@ -124,6 +124,8 @@ Result<std::optional<Directory>> directoryOf(const StoreFile& file) {
 
 // As the error of a system call, which none of those that open a store has.
 constexpr int kNewerStore = EPROTONOSUPPORT;
+// While other processes make the store or set it aside, its files may not belong together yet.
+constexpr int kUnsettled = EIO;
 
 // False for a database in which nothing was ever made. REQUIRES: a transaction, since another
 // process may be making the store right now.
@@ -298,13 +300,17 @@ Result<std::optional<Database>> openForWriting(const StoreFile& file, IfMissing 
                                  create ? Database::Access::Create : Database::Access::ReadWrite);
   if (!database) return database.error();
   database->foldLogOnClose(false);  // not a byte of a file that turns out to be another's changes
-  if (auto begun = database->execute("BEGIN"); !begun) return begun.error();
+  const auto failure = [&](Error error) {
+    if (database->failedReading()) error.systemError = kUnsettled;
+    return error;
+  };
+  if (auto begun = database->execute("BEGIN"); !begun) return failure(begun.error());
   const auto store = isStore(*database);
-  if (!store) return store.error();
-  if (auto ended = database->execute("COMMIT"); !ended) return ended.error();
+  if (!store) return failure(store.error());
+  if (auto ended = database->execute("COMMIT"); !ended) return failure(ended.error());
   if (!*store) {
     if (!create) return std::optional<Database>();
-    if (auto made = makeTables(*database); !made) return made.error();
+    if (auto made = makeTables(*database); !made) return failure(made.error());
   }
   database->foldLogOnClose(true);
   // The log of a large import is not kept at its full length.
@@ -312,13 +318,29 @@ Result<std::optional<Database>> openForWriting(const StoreFile& file, IfMissing 
   return std::optional<Database>(std::move(*database));
 }
 
+// Which file has the store's name; zeros if there is none.
+std::pair<std::uint64_t, std::uint64_t> fileOf(const StoreFile& file) {
+  const auto identity = file.directory.identity(file.name).value_or(FileIdentity());
+  return {identity.device, identity.inode};
+}
+
 }  // namespace
 
 Result<std::optional<Database>> openStoreForWriting(const StoreFile& file, IfMissing ifMissing) {
-  auto store = openForWriting(file, ifMissing);
-  if (store || store.error().systemError != kNewerStore) return store;
-  if (auto moved = setNewerStoreAside(file); !moved) return moved.error();
-  return openForWriting(file, ifMissing);
+  constexpr int kAttempts = 20;
+  constexpr useconds_t kPause = 10000;
+  for (int attempt = 1;; ++attempt) {
+    const auto former = fileOf(file);
+    auto store = openForWriting(file, ifMissing);
+    if (store || attempt == kAttempts) return store;
+    if (store.error().systemError == kNewerStore) {
+      if (auto moved = setNewerStoreAside(file); !moved) return moved.error();
+    } else if (store.error().systemError == kUnsettled) {
+      ::usleep(kPause);
+    } else if (!awaitSettingAside(file) || fileOf(file) == former) {
+      return store;  // not because another process set the file aside meanwhile
+    }
+  }
 }
 
 }  // namespace tally

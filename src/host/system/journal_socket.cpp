@@ -5,6 +5,7 @@
 #include <sys/un.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstdint>
 #include <cstring>
 
@@ -12,6 +13,7 @@ namespace tally {
 namespace {
 
 constexpr timeval kPatience{.tv_sec = 1, .tv_usec = 0};
+constexpr std::chrono::nanoseconds kMostWaited = std::chrono::seconds(1);
 
 void appendLength(std::string& entry, std::uint64_t length) {
   for (unsigned byte = 0; byte < sizeof length; ++byte) {  // little endian
@@ -53,12 +55,13 @@ bool JournalSocket::send(std::string_view entry) {
   sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
   if (!socket_ || path_.size() >= sizeof address.sun_path) return false;
   std::memcpy(address.sun_path, path_.data(), path_.size());
-  const int flags = MSG_NOSIGNAL | (full_ ? MSG_DONTWAIT : 0);
+  const auto begin = std::chrono::steady_clock::now();
+  const int flags = MSG_NOSIGNAL | (waited_ < kMostWaited.count() ? 0 : MSG_DONTWAIT);
   const auto sent = retried([&] {
     return ::sendto(socket_.get(), entry.data(), entry.size(), flags,
                     reinterpret_cast<const sockaddr*>(&address), sizeof address);
   });
-  full_ = sent < 0 && errno == EAGAIN;
+  waited_ += std::chrono::nanoseconds(std::chrono::steady_clock::now() - begin).count();
   return sent >= 0;
 }
 

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
 #include <span>
 #include <string>
 #include <string_view>
@@ -26,13 +27,13 @@ class JournalSocket {
   explicit JournalSocket(std::string path);
 
   // False when the journal has not taken the entry: it is absent, or its queue stays full for a
-  // second. Entries after such a second are not waited for until the journal takes one again.
+  // second. No more than a second is ever waited in all: a slow journal must not hold up a run.
   bool send(std::string_view entry);
 
  private:
   std::string path_;
   Descriptor socket_;
-  std::atomic<bool> full_ = false;
+  std::atomic<std::int64_t> waited_ = 0;  // nanoseconds
 };
 
 }  // namespace tally

@@ -18,19 +18,20 @@ constexpr HwResult kDeltaFailed = 1;
 constexpr bool isValid(std::uint64_t value) { return value != kHwReportInvalidValue; }
 
 // Where the elements of a result go.
-class Result {
+class DeltaOutput {
  public:
+  DeltaOutput() = default;
+  DeltaOutput(const DeltaOutput&) = delete;
+  DeltaOutput& operator=(const DeltaOutput&) = delete;
+  virtual ~DeltaOutput() = default;
   // Copies the first elements of a run, and bytes of its tail, to be changed.
   virtual WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t tail = 0) = 0;
-
- protected:
-  ~Result() = default;
 };
 
 // Runs of a block have no tails.
-class ResultInBlock final : public Result {
+class OutputInBlock final : public DeltaOutput {
  public:
-  ResultInBlock(RunBlock& block, std::size_t row) : block_(block), row_(row) {}
+  OutputInBlock(RunBlock& block, std::size_t row) : block_(block), row_(row) {}
   WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t) override {
     return block_.addCopy(row_, run, elements);
   }
@@ -40,7 +41,7 @@ class ResultInBlock final : public Result {
   const std::size_t row_;
 };
 
-class ResultInData final : public Result {
+class OutputInData final : public DeltaOutput {
  public:
   WritableRun copy(const ElementRun& run, std::size_t elements, std::size_t tail) override {
     bytes_.resize(elements * element::kSize + tail);
@@ -57,7 +58,7 @@ class ResultInData final : public Result {
 enum class OtherSlots { KeepEarlier, Invalidate };
 
 bool subtractSimple(const ChannelReading& earlier, const ChannelReading& later, OtherSlots others,
-                    Result& result) {
+                    DeltaOutput& result) {
   const auto before = earlier.runOfFormat(kHwReportFormatSimple);
   const auto after = later.runOfFormat(kHwReportFormatSimple);
   if (!before || !after || before->count() != 1 || after->count() != 1) return false;
@@ -75,7 +76,7 @@ bool subtractSimple(const ChannelReading& earlier, const ChannelReading& later, 
   return true;
 }
 
-bool subtractStates(const ElementRun& earlier, const ElementRun& later, Result& result) {
+bool subtractStates(const ElementRun& earlier, const ElementRun& later, DeltaOutput& result) {
   const WritableRun made = result.copy(later, later.count());
   for (std::size_t i = 0; i < later.count(); ++i) {
     for (const auto slot : {state_slot::kInTransitions, state_slot::kResidency}) {
@@ -87,7 +88,7 @@ bool subtractStates(const ElementRun& earlier, const ElementRun& later, Result& 
   return true;
 }
 
-bool subtractBuckets(const ElementRun& earlier, const ElementRun& later, Result& result) {
+bool subtractBuckets(const ElementRun& earlier, const ElementRun& later, DeltaOutput& result) {
   const WritableRun made = result.copy(later, later.count());
   for (std::size_t i = 0; i < later.count(); ++i) {
     const std::uint64_t before = earlier.slot(i, bucket_slot::kHits);
@@ -104,7 +105,7 @@ bool subtractBuckets(const ElementRun& earlier, const ElementRun& later, Result&
   return true;
 }
 
-bool subtractArrays(const ElementRun& earlier, const ElementRun& later, Result& result) {
+bool subtractArrays(const ElementRun& earlier, const ElementRun& later, DeltaOutput& result) {
   const WritableRun made = result.copy(later, later.count());
   for (std::size_t i = 0; i < later.count(); ++i) {
     for (std::size_t slot = 0; slot < element::kSlotCount; ++slot) {
@@ -120,7 +121,7 @@ struct RunFormat {
   std::uint8_t format;
   // The run that can be subtracted; empty when there is none.
   std::optional<ElementRun> (ChannelReading::*run)(std::uint8_t format) const;
-  bool (*subtract)(const ElementRun& earlier, const ElementRun& later, Result& result);
+  bool (*subtract)(const ElementRun& earlier, const ElementRun& later, DeltaOutput& result);
 };
 constexpr RunFormat kRunFormats[] = {
     {kHwReportFormatState, &ChannelReading::runOfLegend, subtractStates},
@@ -130,7 +131,7 @@ constexpr RunFormat kRunFormats[] = {
 
 // Puts later - earlier into the result; 0 or the code of the error that was reported.
 HwResult subtract(const ChannelReading& earlier, const ChannelReading& later, OtherSlots others,
-                  Result& result, KvRef<HwReportError>* error) {
+                  DeltaOutput& result, KvRef<HwReportError>* error) {
   const std::uint8_t format = later.format();
   if (format == kHwReportFormatUnknown || earlier.format() == kHwReportFormatUnknown) {
     return reportError(error, HwErrBadArgument);
@@ -168,7 +169,7 @@ bool subtractRows(const ChannelFrame& earlier, const ChannelFrame& later, Channe
     const auto type =
         known ? TypeWord{index->typeBits(position)} : typeWordOfLegend(later.rows().legend(row));
     ++position;
-    ResultInBlock made(result.block(), row);
+    OutputInBlock made(result.block(), row);
     ++done;
     return subtract({type, before.run(row)}, {type, after}, OtherSlots::Invalidate, made,
                     nullptr) == 0;
@@ -197,7 +198,7 @@ int subtractChannels(const KvArray& earlier, const KvArray& later, ChannelFrame&
       result.copyElements(row, *channel);
       continue;
     }
-    ResultInData made;
+    OutputInData made;
     *explained = subtract(readingOf(*counterpart), readingOf(channel), OtherSlots::Invalidate, made,
                           error) != 0;
     if (*explained) return HwIterFailed;
@@ -236,7 +237,7 @@ KvRef<KvDictionary> HwReportCreateSamplesDelta(KvDictionary* earlier, KvDictiona
 
 KvRef<KvDictionary> HwReportSampleCreateDelta(KvDictionary* earlier, KvDictionary* later,
                                               KvRef<HwReportError>* error) {
-  ResultInData made;
+  OutputInData made;
   const HwResult failure =
       subtract(readingOf(earlier), readingOf(later), OtherSlots::KeepEarlier, made, error);
   if (failure != 0) return nullptr;

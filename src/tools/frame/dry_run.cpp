@@ -35,12 +35,15 @@ class KeptSubmission final : public LogSubmission {
                                 const Writer& writer) override {
     struct Body final : LogFile {
       std::string text;
+      bool isWhole = true;
       bool write(std::string_view bytes) override {
         text += bytes;
         return true;
       }
+      void abandon(const Error&) override { isWhole = false; }
     } body;
     writer(body);
+    if (!body.isWhole) return false;
     run_.logs.push_back({std::string(typeCode), std::string(name), std::move(body.text),
                          options != nullptr ? options->copy() : nullptr});
     return true;
