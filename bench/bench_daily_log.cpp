@@ -11,6 +11,7 @@
 #include <limits>
 #include <string_view>
 
+#include "data/sample_device.h"
 #include "figures.h"
 #include "host/linux_platform.h"
 #include "host/store/store_history.h"
@@ -18,7 +19,6 @@
 #include "host/store/store_writer.h"
 #include "process_cost.h"
 #include "report/distribution_pass.h"
-#include "sample_device.h"
 
 namespace {
 
@@ -203,6 +203,8 @@ int measure(const std::string& self, const std::string& yardsticks) {
             "reading a raw store", floor.cpuSeconds, atMost(1.5));
   addFigure("a large day, the pass over packed samples", pass.cpuSeconds, "s CPU", "over raw ones",
             rawPass.cpuSeconds, atMost(1));
+  addFigure("a large day, the pass beside reading alone", pass.cpuSeconds, "s CPU",
+            "reading the packed store", packed.cpuSeconds, noTarget());
   addFigure("a large day, peak", mebibytes(whole), "MiB", atMost(28));
   addFigure("a large day, growth of the peak", mebibytes(whole), "MiB",
             "a hundredth of the samples", mebibytes(small), atMost(1.05));

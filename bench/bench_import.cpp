@@ -5,10 +5,10 @@
 #include <cstdio>
 #include <filesystem>
 
+#include "data/sample_device.h"
 #include "figures.h"
 #include "host/store/store_schema.h"
 #include "process_cost.h"
-#include "sample_device.h"
 
 int main(int, char** arguments) {
   using namespace tally::bench;

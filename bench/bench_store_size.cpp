@@ -15,11 +15,11 @@
 #include <string_view>
 #include <vector>
 
+#include "data/raw_store.h"
 #include "figures.h"
 #include "host/store/store_history.h"
 #include "host/store/store_writer.h"
 #include "process_cost.h"
-#include "raw_store.h"
 
 namespace {
 

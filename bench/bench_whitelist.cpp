@@ -15,10 +15,10 @@
 
 #include "base/files/device_root.h"
 #include "config/whitelist.h"
+#include "data/sample_device.h"
 #include "figures.h"
 #include "host/linux_platform.h"
 #include "process_cost.h"
-#include "sample_device.h"
 
 namespace {
 

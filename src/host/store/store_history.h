@@ -17,7 +17,7 @@ using StoreFaultHandler = std::function<void(const std::string& message)>;
 using DamagedRowHandler = std::function<void(std::string_view key, std::int64_t day)>;
 
 // The rows that the store has at this moment; none, without a fault, when there is no
-// store. Samples are read chunk by chunk, so memory does not grow with their number. A damaged row
+// store. Samples are read row by row, so memory does not grow with their number. A damaged row
 // is left out. Each enumeration reports at most one fault. Never null.
 std::unique_ptr<HistoryStore> openSqliteHistory(const StoreFile& file, StoreFaultHandler onFault,
                                                 DamagedRowHandler onDamaged = {});

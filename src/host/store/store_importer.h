@@ -14,7 +14,7 @@ namespace tally {
 
 // All rows of one import are one transaction, which begins with the first row: an import that fails
 // or is killed leaves the store as it was. Memory is bounded whatever the rows are: samples are
-// gathered by key until there are many, so that they can be written as chunks.
+// gathered by key until there are many, so that they can be written as rows.
 class StoreImporter {
  public:
   explicit StoreImporter(StoreFile file) : file_(std::move(file)) {}

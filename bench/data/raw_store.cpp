@@ -1,4 +1,4 @@
-#include "raw_store.h"
+#include "data/raw_store.h"
 
 #include "host/store/samples/packed_samples.h"
 

@@ -1,4 +1,4 @@
-#include "sample_device.h"
+#include "data/sample_device.h"
 
 #include <sqlite3.h>
 
@@ -9,9 +9,9 @@
 
 #include "base/files/device_root.h"
 #include "base/files/temporary_file.h"
+#include "data/raw_store.h"
 #include "host/store/store_importer.h"
 #include "kv/plist_codec.h"
-#include "raw_store.h"
 #include "tools/store/store_csv.h"
 
 namespace tally::bench {
