@@ -13,7 +13,11 @@ namespace tally {
 namespace {
 
 constexpr timeval kPatience{.tv_sec = 1, .tv_usec = 0};
-constexpr std::chrono::nanoseconds kMostWaited = std::chrono::seconds(1);
+constexpr std::chrono::nanoseconds kMostWaited = std::chrono::milliseconds(900);
+
+std::int64_t nanosecondsNow() {
+  return std::chrono::nanoseconds(std::chrono::steady_clock::now().time_since_epoch()).count();
+}
 
 void appendLength(std::string& entry, std::uint64_t length) {
   for (unsigned byte = 0; byte < sizeof length; ++byte) {  // little endian
@@ -55,13 +59,17 @@ bool JournalSocket::send(std::string_view entry) {
   sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
   if (!socket_ || path_.size() >= sizeof address.sun_path) return false;
   std::memcpy(address.sun_path, path_.data(), path_.size());
-  const auto begin = std::chrono::steady_clock::now();
+  const std::int64_t begin = nanosecondsNow();
+  if (begin - minute_ > std::chrono::nanoseconds(std::chrono::minutes(1)).count()) {
+    minute_ = begin;
+    waited_ = 0;
+  }
   const int flags = MSG_NOSIGNAL | (waited_ < kMostWaited.count() ? 0 : MSG_DONTWAIT);
   const auto sent = retried([&] {
     return ::sendto(socket_.get(), entry.data(), entry.size(), flags,
                     reinterpret_cast<const sockaddr*>(&address), sizeof address);
   });
-  waited_ += std::chrono::nanoseconds(std::chrono::steady_clock::now() - begin).count();
+  waited_ += nanosecondsNow() - begin;
   return sent >= 0;
 }
 

@@ -27,13 +27,15 @@ class JournalSocket {
   explicit JournalSocket(std::string path);
 
   // False when the journal has not taken the entry: it is absent, or its queue stays full for a
-  // second. No more than a second is ever waited in all: a slow journal must not hold up a run.
+  // second. Of a minute, no more than a second is waited in all: a slow journal must not hold up a
+  // run.
   bool send(std::string_view entry);
 
  private:
   std::string path_;
   Descriptor socket_;
-  std::atomic<std::int64_t> waited_ = 0;  // nanoseconds
+  // In nanoseconds: when the present minute began, and how long was waited in it.
+  std::atomic<std::int64_t> minute_ = 0, waited_ = 0;
 };
 
 }  // namespace tally
