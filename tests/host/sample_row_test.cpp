@@ -41,7 +41,7 @@ TEST(SampleRows, EverySampleComesBackBitForBitInAsFewBitsAsItNeeds) {
     return [&random, bits, scale] { return static_cast<double>(random() >> (64 - bits)) / scale; };
   };
   const auto oneOf = [&](std::vector<double> pool) {
-    return [&random, pool] { return pool[random() % pool.size()]; };
+    return [&random, pool] { return pool[static_cast<std::size_t>(random()) % pool.size()]; };
   };
   const struct {
     const char* name;
@@ -129,8 +129,8 @@ TEST(SampleRows, ARowThatWasChangedIsRefusedOrGivesOtherSamples) {
     for (auto* const column : {&spoiled.values, &spoiled.weights, &spoiled.offsets}) {
       const std::size_t reach =
           round % 2 == 0 ? std::min<std::size_t>(column->size(), 11) : column->size();
-      (*column)[random() % reach] = static_cast<std::byte>(random());
-      if (round % 5 == 0) column->resize(column->size() - random() % 2);
+      (*column)[static_cast<std::size_t>(random()) % reach] = static_cast<std::byte>(random());
+      if (round % 5 == 0) column->resize(column->size() - static_cast<std::size_t>(random() % 2));
     }
     SampleRow::Shape shape = shapeOf(spoiled, samples);
     if (round % 7 == 0) shape.samples += static_cast<int>(random() % 3) - 1;
