@@ -16,10 +16,14 @@
 namespace tally {
 namespace {
 
+std::size_t below(std::mt19937_64& random, std::size_t bound) {
+  return static_cast<std::size_t>(random()) % bound;
+}
+
 // Few letters and lengths, so that keys begin alike and come again.
 std::string anyKey(std::mt19937_64& random) {
-  std::string key(random() % 5, 'a');
-  for (char& letter : key) letter = "ab\x7f&<"[random() % 5];
+  std::string key(below(random, 5), 'a');
+  for (char& letter : key) letter = "ab\x7f&<"[below(random, 5)];
   if (random() % 8 == 0) key += "\u00e9\u20ac";
   return key + std::string(random() % 50 == 0 ? 300 : 0, 'z');
 }
@@ -33,7 +37,7 @@ std::int64_t anyValue(std::mt19937_64& random) {
                                     -65,
                                     std::numeric_limits<std::int64_t>::max(),
                                     std::numeric_limits<std::int64_t>::min()};
-  return random() % 2 == 0 ? kEnds[random() % std::size(kEnds)]
+  return random() % 2 == 0 ? kEnds[below(random, std::size(kEnds))]
                            : static_cast<std::int64_t>(random()) >> (random() % 64);
 }
 
@@ -42,7 +46,7 @@ TEST(LoggedScalars, AreInTheOrderOfADictionary) {
     std::mt19937_64 random(seed);
     LoggedScalars scalars;
     const auto expected = KvDictionary::create();
-    std::vector<std::string> keys(random() % 40);
+    std::vector<std::string> keys(below(random, 40));
     for (std::string& key : keys) key = anyKey(random);
     // As the store gives them, then what is measured; or in any order.
     if (seed % 3 != 0) std::ranges::sort(keys);
@@ -78,7 +82,7 @@ TEST(LoggedDistributions, TheLastOfAKeyStays) {
     std::mt19937_64 random(seed);
     LoggedDistributions distributions;
     const auto statistics = KvDictionary::create();
-    std::vector<std::string> keys(random() % 20);
+    std::vector<std::string> keys(below(random, 20));
     for (std::string& key : keys) key = anyKey(random);
     if (seed % 2 != 0) std::ranges::sort(keys);
     for (const std::string& key : keys) {

@@ -18,6 +18,7 @@ EntryKind kindOf(const KvString& key, const KvObject& value) {
 
 // A channel of six entries.
 void prefetch(const KvObject* dictionary) {
+  if (dictionary == nullptr) return;
   constexpr std::size_t kLines = 3, kCacheLine = 64;
   const auto* const start = reinterpret_cast<const char*>(dictionary);
   for (std::size_t line = 0; line < kLines; ++line) __builtin_prefetch(start + line * kCacheLine);
