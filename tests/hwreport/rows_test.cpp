@@ -31,8 +31,8 @@ TEST_F(Rows, AreWhatDictionariesWouldBe) {
   for (std::uint64_t id = 0; id < 60; ++id) {
     types.push_back(id % 20 == 7 ? 0 : typeWord(1 + id % 4, id % 4 == 0 ? 1 : 1 + one(4)));
     const auto driver = 0x10 + id / 30;
-    channels->append(channel(id, types[id], id % 3 == 0 ? nullptr : "n", "G", nullptr, driver));
-    if (id % 25 == 3) channels->append(channel(id, types[id], "twice", "G", nullptr, driver));
+    channels->append(channel(id, types.back(), id % 3 == 0 ? nullptr : "n", "G", nullptr, driver));
+    if (id % 25 == 3) channels->append(channel(id, types.back(), "twice", "G", nullptr, driver));
   }
   std::vector<std::uint64_t> order(60);
   std::iota(order.begin(), order.end(), 0);
@@ -46,8 +46,9 @@ TEST_F(Rows, AreWhatDictionariesWouldBe) {
     std::vector<std::byte> buffer;
     for (const auto id : order) {
       if (round % 7 == 3 && one(20) == 0) continue;  // is not served
-      const std::uint64_t type = types[id] != 0 ? types[id] : typeWord(4, 2);
-      std::vector<Element> elements(type >> 32);
+      const std::uint64_t known = types[static_cast<std::size_t>(id)];
+      const std::uint64_t type = known != 0 ? known : typeWord(4, 2);
+      std::vector<Element> elements(static_cast<std::size_t>(type >> 32));
       for (auto& element : elements) element = {{one(9), one(9), one(9), one(9)}, one(50)};
       auto bytes = run(id, type, elements, 0x10 + id / 30);
       if (one(30) == 0) bytes[bytes.size() - 64 + 17] = std::byte{9};  // an id of its own

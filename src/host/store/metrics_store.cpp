@@ -130,8 +130,8 @@ class SqliteMetricsStore final : public MetricsStore {
     const auto packed = store.isPacked();
     if (!packed) return packed.error();
     if (*packed || !conversionIsDue(*preferences_, TBDaysSince1970())) return Done{};
-    auto converted = store.convertToPackedSchema(
-        [this](const std::string& message) { report(Error{message}); });
+    auto converted =
+        store.convertToPackedSchema([this](const std::string& message) { report(Error{message}); });
     if (!converted) return converted;
     log_->write(LogLevel::Default,
                 fmt::format("metrics store {}: converted to the present format", file_.text()));

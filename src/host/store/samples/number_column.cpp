@@ -29,7 +29,7 @@ T load(const std::byte* from) {
 }
 
 template <class T>
-void put(std::vector<std::byte>& column, T number) {
+void putPart(std::vector<std::byte>& column, T number) {
   const auto bytes = std::bit_cast<std::array<std::byte, sizeof(T)>>(number);
   column.insert(column.end(), bytes.begin(), bytes.end());
 }
@@ -105,8 +105,8 @@ void putNumbers(std::vector<std::byte>& column, const NumberLayout& layout,
   column.resize(start + bytes);
   for (std::size_t i = 0; i < numbers.size(); ++i) {
     if (numbers[i] <= mask) continue;
-    put(column, static_cast<std::uint16_t>(i));
-    put(column, static_cast<std::uint32_t>(numbers[i] >> layout.width));
+    putPart(column, static_cast<std::uint16_t>(i));
+    putPart(column, static_cast<std::uint32_t>(numbers[i] >> layout.width));
   }
 }
 
