@@ -28,7 +28,7 @@ class PlistReceiver {
   // The key of the value that follows; may occur again in the same dictionary, whose last value
   // then counts. Not always well-formed UTF-8.
   virtual void key(std::string_view text) = 0;
-  // A value that is no container, or a container that was wanted as an object.
+  // A value that is not a container, or a container that was wanted as an object.
   virtual void value(KvRef<KvObject> value) = 0;
 };
 
